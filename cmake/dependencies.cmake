@@ -1,0 +1,24 @@
+# The libraries that the project calls. packaging/debian-packages.txt names the packages they are in.
+
+find_package(Threads REQUIRED)
+find_package(PkgConfig REQUIRED)
+find_package(ICU REQUIRED COMPONENTS uc i18n)
+pkg_check_modules(uchardet REQUIRED IMPORTED_TARGET uchardet)
+find_package(simdjson REQUIRED)
+pkg_check_modules(libzip REQUIRED IMPORTED_TARGET libzip)
+pkg_check_modules(libdeflate REQUIRED IMPORTED_TARGET libdeflate)
+find_package(pugixml REQUIRED)
+find_package(OpenSSL REQUIRED COMPONENTS Crypto)
+find_package(CLI11 REQUIRED)
+find_package(spdlog REQUIRED)
+
+# The real bundle framework is used where it is installed; framework/ stands in for it elsewhere.
+find_package(CppMicroServices 3.8 CONFIG QUIET)
+
+if(BUILD_TESTING)
+  find_package(GTest REQUIRED)
+  include(GoogleTest)
+endif()
+if(EDITOR_SERIALIZATION_BENCHMARKS)
+  find_package(benchmark REQUIRED)
+endif()

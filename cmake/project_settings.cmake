@@ -1,0 +1,65 @@
+# Compiler settings that hold for every target of the project, and the helpers with which the folders
+# declare their libraries and tests.
+
+set(CMAKE_CXX_STANDARD 20)
+set(CMAKE_CXX_STANDARD_REQUIRED ON)
+set(CMAKE_CXX_EXTENSIONS OFF)
+set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+set(CMAKE_CXX_VISIBILITY_PRESET hidden)
+set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
+set(CMAKE_EXPORT_COMPILE_COMMANDS ON)
+
+# Everything that runs lands in two folders, so that a host finds the bundle beside it.
+set(CMAKE_RUNTIME_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/bin")
+set(CMAKE_LIBRARY_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/lib")
+
+option(EDITOR_SERIALIZATION_WARNINGS_AS_ERRORS "Treat compiler warnings as errors" ON)
+set(EDITOR_SERIALIZATION_SANITIZERS "" CACHE STRING "Sanitizers to build with, as for -fsanitize=")
+
+add_compile_options(-Wall -Wextra -Wpedantic -Wconversion -Wshadow)
+if(EDITOR_SERIALIZATION_WARNINGS_AS_ERRORS)
+  add_compile_options(-Werror)
+endif()
+if(EDITOR_SERIALIZATION_SANITIZERS)
+  add_compile_options(-fsanitize=${EDITOR_SERIALIZATION_SANITIZERS} -fno-omit-frame-pointer
+                      -fno-sanitize-recover=all)
+  add_link_options(-fsanitize=${EDITOR_SERIALIZATION_SANITIZERS})
+endif()
+
+# project_library(<name> [STATIC|SHARED] [SOURCES ...] [LINKS ...] [PRIVATE_LINKS ...])
+#
+# Declares library `editor_<name>` with the alias EditorSerialization::<name>. Without sources it is
+# header-only. Includes are written from the project's root ("json/value.h").
+function(project_library name)
+  cmake_parse_arguments(arg "SHARED" "" "SOURCES;LINKS;PRIVATE_LINKS" ${ARGN})
+  set(target "editor_${name}")
+  if(NOT arg_SOURCES)
+    add_library(${target} INTERFACE)
+    target_include_directories(${target} INTERFACE "${PROJECT_SOURCE_DIR}")
+    target_link_libraries(${target} INTERFACE ${arg_LINKS})
+  else()
+    if(arg_SHARED)
+      add_library(${target} SHARED ${arg_SOURCES})
+    else()
+      add_library(${target} STATIC ${arg_SOURCES})
+    endif()
+    target_include_directories(${target} PUBLIC "${PROJECT_SOURCE_DIR}")
+    target_link_libraries(${target} PUBLIC ${arg_LINKS} PRIVATE ${arg_PRIVATE_LINKS})
+  endif()
+  add_library(EditorSerialization::${name} ALIAS ${target})
+endfunction()
+
+# project_test(<name> SOURCES ... [LINKS ...])
+#
+# Declares the test program `<name>_test` and registers each of its tests with CTest as <name>.<test>.
+# Tests find the project's files under PROJECT_SOURCE_ROOT.
+function(project_test name)
+  cmake_parse_arguments(arg "" "" "SOURCES;LINKS" ${ARGN})
+  set(target "${name}_test")
+  add_executable(${target} ${arg_SOURCES})
+  target_include_directories(${target} PRIVATE "${PROJECT_SOURCE_DIR}")
+  target_compile_definitions(${target} PRIVATE PROJECT_SOURCE_ROOT="${PROJECT_SOURCE_DIR}")
+  target_link_libraries(${target} PRIVATE ${arg_LINKS} GTest::gmock GTest::gtest_main)
+  gtest_discover_tests(${target} TEST_PREFIX "${name}." DISCOVERY_TIMEOUT 60
+                       PROPERTIES TIMEOUT 600)
+endfunction()
