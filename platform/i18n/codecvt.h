@@ -25,8 +25,8 @@ public:
     ~codecvt_string_to_ustring();
 
     /// Decodes `length` bytes at `data` as one whole text. A byte-order mark is kept as U+FEFF.
-    /// Throws std::runtime_error naming the charset and the byte offset of malformed input when strict.
-    /// Linear in `length`.
+    /// Throws std::runtime_error naming the charset and the byte offset of malformed input when
+    /// strict. Linear in `length`.
     std::u16string do_convert(const char* data, std::size_t length);
 
 private:
@@ -36,8 +36,8 @@ private:
 /// Encodes UTF-16 to bytes of one charset. Sharing is as for codecvt_string_to_ustring.
 class codecvt_ustring_to_string {
 public:
-    /// As for codecvt_string_to_ustring; not strict puts the charset's substitution character in the
-    /// place of what it cannot hold.
+    /// As for codecvt_string_to_ustring; not strict puts the charset's substitution character in
+    /// the place of what it cannot hold.
     codecvt_ustring_to_string(const std::string& charset, bool strict);
     codecvt_ustring_to_string(codecvt_ustring_to_string&&) noexcept;
     codecvt_ustring_to_string& operator=(codecvt_ustring_to_string&&) noexcept;

@@ -9,10 +9,10 @@
 namespace platform::i18n {
 
 /// The charset of the `length` bytes at `data`, by its IANA preferred name ("UTF-8", "Shift_JIS",
-/// "windows-1251"); always one that both converters accept and in which all the bytes decode strictly.
-/// A byte-order mark decides; empty, ASCII and valid UTF-8 input is "UTF-8"; what fits nothing is
-/// "ISO-8859-1", which holds every byte, and only then one line that names `sourceName` is written to
-/// `diagnostics`. Linear in `length`.
+/// "windows-1251"); always one that both converters accept and in which all the bytes decode
+/// strictly. A byte-order mark decides; empty, ASCII and valid UTF-8 input is "UTF-8"; what fits
+/// nothing is "ISO-8859-1", which holds every byte, and only then one line that names `sourceName`
+/// is written to `diagnostics`. Linear in `length`.
 std::string detect_charset(const char* data, std::size_t length, std::ostream& diagnostics,
                            std::u16string_view sourceName);
 

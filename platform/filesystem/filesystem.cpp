@@ -1,0 +1,24 @@
+// Questions to the file system about UTF-16 paths.
+#include "platform/filesystem/filesystem.h"
+
+#include <filesystem>
+#include <stdexcept>
+
+#include "platform/i18n/codecvt.h"
+
+namespace platform::filesystem {
+
+bool exists(std::u16string_view path) {
+    return std::filesystem::exists(make_native_access_form_with_cleanup(path));
+}
+
+std::string make_native_access_form_with_cleanup(std::u16string_view path) {
+    const auto zero = path.find(u'\0');
+    if (zero != std::u16string_view::npos) {
+        throw std::runtime_error("Invalid path: it holds a zero at code unit " +
+                                 std::to_string(zero));
+    }
+    return i18n::to_string(path);
+}
+
+}  // namespace platform::filesystem

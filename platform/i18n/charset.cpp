@@ -1,0 +1,52 @@
+// Opens charsets by name.
+#include "platform/i18n/charset.h"
+
+#include <optional>
+
+#include "platform/i18n/charset_names.h"
+#include "platform/i18n/conversion_error.h"
+#include "platform/i18n/icu_charset.h"
+#include "platform/i18n/unicode_charsets.h"
+
+namespace platform::i18n::detail {
+
+namespace {
+
+ByteOrder byteOrderOf(std::string_view converter) {
+    if (converter.find("BE") != std::string_view::npos) {
+        return ByteOrder::big;
+    }
+    return converter.find("LE") != std::string_view::npos ? ByteOrder::little : ByteOrder::fromMark;
+}
+
+std::unique_ptr<Charset> makeCharset(const std::string& name, const std::string& converter,
+                                     bool strict) {
+    if (converter == "UTF-8") {
+        return makeUtf8(name, strict);
+    }
+    // ICU's variants of these differ only in what they do with byte-order marks and in the byte
+    // order of the machine; neither is wanted.
+    if (converter.starts_with("UTF-16") || converter.starts_with("UTF16")) {
+        return makeUtf16(name, byteOrderOf(converter), strict);
+    }
+    if (converter.starts_with("UTF-32") || converter.starts_with("UTF32")) {
+        return makeUtf32(name, byteOrderOf(converter), strict);
+    }
+    return makeIcuCharset(name, converter, strict);
+}
+
+}  // namespace
+
+std::unique_ptr<Charset> openCharset(std::string_view name, bool strict) {
+    const std::optional<std::string> converter = converterName(name);
+    std::unique_ptr<Charset> charset;
+    if (converter) {
+        charset = makeCharset(std::string(name), *converter, strict);
+    }
+    if (!charset) {
+        throwUnknownCharset(name);
+    }
+    return charset;
+}
+
+}  // namespace platform::i18n::detail
