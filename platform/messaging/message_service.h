@@ -1,7 +1,8 @@
-// The message service that a host offers its bundles: channels of byte messages, one client per user.
+// The message service that a host offers its bundles: channels of byte messages, one client per
+// user.
 //
-// A host with a messaging library of its own puts it behind this interface; ours is an in-process bus
-// (in_process_bus.h).
+// A host with a messaging library of its own puts it behind this interface; ours is an in-process
+// bus (in_process_bus.h).
 #pragma once
 
 #include <functional>
@@ -19,7 +20,8 @@ namespace platform::messaging {
 /// One delivered message. Copies share the payload.
 class JsonMessage {
 public:
-    JsonMessage(std::shared_ptr<const std::string> channel, std::shared_ptr<const DataBuffer> payload)
+    JsonMessage(std::shared_ptr<const std::string> channel,
+                std::shared_ptr<const DataBuffer> payload)
         : channel_(std::move(channel)), payload_(std::move(payload)) {}
 
     /// The channel on which the message was published.
@@ -36,7 +38,8 @@ private:
 using MessageHandler = std::function<void(const JsonMessage&)>;
 
 /// The handle of a subscription, which lasts while it is held. When its destruction returns, the
-/// handler is not running and will not run again, except when it is destroyed by that handler itself.
+/// handler is not running and will not run again, except when it is destroyed by that handler
+/// itself.
 class Subscription {
 public:
     Subscription() = default;
@@ -55,12 +58,13 @@ public:
 
     /// Has `handler` called for every message that is published on `channel` once the future has
     /// resolved: on the bus's own threads, one at a time and in order unless the channel is set to
-    /// concurrent delivery. An exception that leaves the handler is logged with the channel and dropped.
+    /// concurrent delivery. An exception that leaves the handler is logged with the channel and
+    /// dropped.
     virtual futures::Future<std::shared_ptr<Subscription>> subscribe(const std::string& channel,
                                                                      MessageHandler handler) = 0;
 
-    /// Sends `payload` to the subscribers of `channel`, taking the buffer over. The future resolves when
-    /// the bus has accepted the message, or holds an exception when it has not.
+    /// Sends `payload` to the subscribers of `channel`, taking the buffer over. The future resolves
+    /// when the bus has accepted the message, or holds an exception when it has not.
     virtual futures::Future<void> publish(const std::string& channel, DataBuffer payload) = 0;
 };
 
@@ -68,7 +72,7 @@ public:
 using MessageServiceOptions = std::unordered_map<std::string, std::string>;
 
 /// Creates the client `clientName` on the transport that the host has chosen.
-[[gnu::visibility("default")]] futures::Future<std::shared_ptr<MessageService>> createMessageService(
-    const std::string& clientName, const MessageServiceOptions& options);
+[[gnu::visibility("default")]] futures::Future<std::shared_ptr<MessageService>>
+createMessageService(const std::string& clientName, const MessageServiceOptions& options);
 
 }  // namespace platform::messaging

@@ -1,0 +1,312 @@
+#include "platform/messaging/in_process_bus.h"
+
+#include <algorithm>
+#include <condition_variable>
+#include <exception>
+#include <mutex>
+#include <stdexcept>
+#include <thread>
+#include <type_traits>
+#include <unordered_map>
+#include <utility>
+
+#include "platform/messaging/delivery_queue.h"
+#include "platform/messaging/log.h"
+#include "platform/messaging/revocable_function.h"
+
+namespace platform::messaging {
+namespace {
+
+// What a bus has accepted and not finished. The holds that it hands out may outlive the bus.
+class Backlog : public std::enable_shared_from_this<Backlog> {
+public:
+    using Hold = std::shared_ptr<const void>;
+
+    explicit Backlog(std::size_t maxQueuedBytes) : maxQueuedBytes_(maxQueuedBytes) {}
+
+    // Keeps the bus from being idle until the hold is released.
+    Hold holdBusy() {
+        {
+            const std::lock_guard lock(mutex_);
+            ++unfinished_;
+        }
+        return Hold(nullptr, [backlog = shared_from_this()](const void*) { backlog->finish(); });
+    }
+
+    // Takes `bytes` of the bound until the hold is released; throws when that many are not left.
+    Hold holdBytes(std::size_t bytes, const std::string& channel) {
+        {
+            const std::lock_guard lock(mutex_);
+            if (bytes > maxQueuedBytes_ - queuedBytes_) {
+                throw std::runtime_error("Message of " + std::to_string(bytes) +
+                                         " bytes on channel \"" + channel +
+                                         "\" was not accepted: " + std::to_string(queuedBytes_) +
+                                         " bytes are waiting to be delivered, and " +
+                                         std::to_string(maxQueuedBytes_) + " may wait at most.");
+            }
+            queuedBytes_ += bytes;
+        }
+        return Hold(nullptr, [backlog = shared_from_this(), bytes](const void*) {
+            const std::lock_guard lock(backlog->mutex_);
+            backlog->queuedBytes_ -= bytes;
+        });
+    }
+
+    void waitUntilIdle() {
+        std::unique_lock lock(mutex_);
+        idle_.wait(lock, [this] { return unfinished_ == 0; });
+    }
+
+    std::size_t queuedBytes() {
+        const std::lock_guard lock(mutex_);
+        return queuedBytes_;
+    }
+
+private:
+    void finish() {
+        const std::lock_guard lock(mutex_);
+        if (--unfinished_ == 0) {
+            idle_.notify_all();
+        }
+    }
+
+    const std::size_t maxQueuedBytes_;
+
+    std::mutex mutex_;  // guards what follows
+    std::condition_variable idle_;
+    std::size_t queuedBytes_ = 0;
+    std::size_t unfinished_ = 0;
+};
+
+using ObserverFunction = RevocableFunction<std::string_view, const JsonMessage&>;
+
+// The resolved future of what `make` returns or throws.
+template <typename Make>
+auto resolved(Make&& make) {
+    using Result = std::invoke_result_t<Make>;
+    futures::Promise<Result> promise;
+    try {
+        if constexpr (std::is_void_v<Result>) {
+            make();
+            promise.setValue();
+        } else {
+            promise.setValue(make());
+        }
+    } catch (...) {
+        promise.setException(std::current_exception());
+    }
+    return promise.getFuture();
+}
+
+template <typename T>
+void eraseFrom(std::vector<std::shared_ptr<T>>& list, const std::shared_ptr<T>& item) {
+    list.erase(std::remove(list.begin(), list.end(), item), list.end());
+}
+
+}  // namespace
+
+// What the clients and the subscriptions of a bus share. No callback runs while its mutex is held.
+class InProcessBus::Core : public std::enable_shared_from_this<Core> {
+public:
+    explicit Core(InProcessBusOptions options)
+        : options_(std::move(options)),
+          backlog_(std::make_shared<Backlog>(options_.maxQueuedBytes)) {}
+
+    std::shared_ptr<MessageService> connect(const std::string& clientName);
+    std::shared_ptr<Subscription> subscribe(const std::string& channel, MessageHandler handler);
+    std::shared_ptr<Subscription> observe(MessageObserver observer);
+    void publish(std::string_view clientName, const std::string& channel, DataBuffer payload);
+
+    Backlog& backlog() noexcept { return *backlog_; }
+
+private:
+    class Client;
+    class ChannelSubscription;
+    class Observation;
+    using Queues = std::vector<std::shared_ptr<DeliveryQueue>>;
+    using Observers = std::vector<std::shared_ptr<ObserverFunction>>;
+
+    std::size_t threadsFor(const std::string& channel) const;
+    Queues queuesOf(const std::string& channel);
+    Observers observers();
+
+    const InProcessBusOptions options_;
+    const std::shared_ptr<Backlog> backlog_;
+
+    std::mutex mutex_;  // guards what follows
+    std::unordered_map<std::string, Queues> queues_;
+    Observers observers_;
+};
+
+class InProcessBus::Core::ChannelSubscription final : public Subscription {
+public:
+    ChannelSubscription(std::shared_ptr<Core> core, const std::string& channel,
+                        MessageHandler handler)
+        : core_(std::move(core)),
+          channel_(channel),
+          queue_(std::make_shared<DeliveryQueue>(std::move(handler), core_->threadsFor(channel))) {}
+
+    void begin() {
+        const std::lock_guard lock(core_->mutex_);
+        core_->queues_[channel_].push_back(queue_);
+    }
+
+    ~ChannelSubscription() override {
+        {
+            const std::lock_guard lock(core_->mutex_);
+            const auto found = core_->queues_.find(channel_);
+            if (found != core_->queues_.end()) {
+                eraseFrom(found->second, queue_);
+                if (found->second.empty()) {
+                    core_->queues_.erase(found);
+                }
+            }
+        }
+        // A publisher may hold the queue a moment longer, so it does not close by itself here.
+        queue_->close();
+    }
+
+private:
+    const std::shared_ptr<Core> core_;
+    const std::string channel_;
+    const std::shared_ptr<DeliveryQueue> queue_;
+};
+
+class InProcessBus::Core::Observation final : public Subscription {
+public:
+    Observation(std::shared_ptr<Core> core, MessageObserver observer)
+        : core_(std::move(core)),
+          observer_(std::make_shared<ObserverFunction>(std::move(observer))) {}
+
+    void begin() {
+        const std::lock_guard lock(core_->mutex_);
+        core_->observers_.push_back(observer_);
+    }
+
+    ~Observation() override {
+        {
+            const std::lock_guard lock(core_->mutex_);
+            eraseFrom(core_->observers_, observer_);
+        }
+        observer_->revoke();
+    }
+
+private:
+    const std::shared_ptr<Core> core_;
+    const std::shared_ptr<ObserverFunction> observer_;
+};
+
+class InProcessBus::Core::Client final : public MessageService {
+public:
+    Client(std::shared_ptr<Core> core, std::string name)
+        : core_(std::move(core)), name_(std::move(name)) {}
+
+    futures::Future<std::shared_ptr<Subscription>> subscribe(const std::string& channel,
+                                                             MessageHandler handler) override {
+        return resolved([&] { return core_->subscribe(channel, std::move(handler)); });
+    }
+
+    futures::Future<void> publish(const std::string& channel, DataBuffer payload) override {
+        return resolved([&] { core_->publish(name_, channel, std::move(payload)); });
+    }
+
+private:
+    const std::shared_ptr<Core> core_;
+    const std::string name_;
+};
+
+std::shared_ptr<MessageService> InProcessBus::Core::connect(const std::string& clientName) {
+    return std::make_shared<Client>(shared_from_this(), clientName);
+}
+
+std::shared_ptr<Subscription> InProcessBus::Core::subscribe(const std::string& channel,
+                                                            MessageHandler handler) {
+    if (!handler) {
+        throw std::invalid_argument("No handler was given for channel \"" + channel + "\".");
+    }
+    auto subscription =
+        std::make_shared<ChannelSubscription>(shared_from_this(), channel, std::move(handler));
+    subscription->begin();
+    return subscription;
+}
+
+std::shared_ptr<Subscription> InProcessBus::Core::observe(MessageObserver observer) {
+    if (!observer) {
+        throw std::invalid_argument("No observer was given.");
+    }
+    auto observation = std::make_shared<Observation>(shared_from_this(), std::move(observer));
+    observation->begin();
+    return observation;
+}
+
+void InProcessBus::Core::publish(std::string_view clientName, const std::string& channel,
+                                 DataBuffer payload) {
+    const Backlog::Hold busy = backlog_->holdBusy();
+    const Queues queues = queuesOf(channel);
+    Backlog::Hold queuedBytes;
+    if (!queues.empty()) {
+        queuedBytes = backlog_->holdBytes(payload.length(), channel);
+    }
+    const JsonMessage message(std::make_shared<const std::string>(channel),
+                              std::make_shared<const DataBuffer>(std::move(payload)));
+    // Observers first, so that none sees an answer before the request that it answers.
+    for (const auto& observer : observers()) {
+        try {
+            (*observer)(clientName, message);
+        } catch (...) {
+            logFailure("observer", channel);
+        }
+    }
+    for (const auto& queue : queues) {
+        queue->push({message, queuedBytes, busy});
+    }
+}
+
+std::size_t InProcessBus::Core::threadsFor(const std::string& channel) const {
+    const auto& concurrent = options_.concurrentChannels;
+    if (std::find(concurrent.begin(), concurrent.end(), channel) == concurrent.end()) {
+        return 1;
+    }
+    return options_.concurrency != 0
+               ? options_.concurrency
+               : std::max<std::size_t>(2, std::thread::hardware_concurrency());
+}
+
+InProcessBus::Core::Queues InProcessBus::Core::queuesOf(const std::string& channel) {
+    const std::lock_guard lock(mutex_);
+    const auto found = queues_.find(channel);
+    return found != queues_.end() ? found->second : Queues();
+}
+
+InProcessBus::Core::Observers InProcessBus::Core::observers() {
+    const std::lock_guard lock(mutex_);
+    return observers_;
+}
+
+InProcessBus::InProcessBus(std::shared_ptr<Core> core) : core_(std::move(core)) {}
+
+InProcessBus::~InProcessBus() = default;
+
+std::shared_ptr<InProcessBus> InProcessBus::create(InProcessBusOptions options) {
+    auto core = std::make_shared<Core>(std::move(options));
+    return std::shared_ptr<InProcessBus>(new InProcessBus(std::move(core)));
+}
+
+futures::Future<std::shared_ptr<MessageService>> InProcessBus::connect(
+    const std::string& clientName) {
+    return resolved([&] { return core_->connect(clientName); });
+}
+
+std::shared_ptr<Subscription> InProcessBus::observe(MessageObserver observer) {
+    return core_->observe(std::move(observer));
+}
+
+void InProcessBus::waitUntilIdle() {
+    core_->backlog().waitUntilIdle();
+}
+
+std::size_t InProcessBus::queuedBytes() const {
+    return core_->backlog().queuedBytes();
+}
+
+}  // namespace platform::messaging
