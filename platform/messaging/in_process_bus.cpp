@@ -33,8 +33,9 @@ public:
         return Hold(nullptr, [backlog = shared_from_this()](const void*) { backlog->finish(); });
     }
 
-    // Takes `bytes` of the bound until the hold is released; throws when that many are not left.
-    Hold holdBytes(std::size_t bytes, const std::string& channel) {
+    // Counts a message of `bytes` as queued until the hold is released; throws when fewer bytes are
+    // left of the bound.
+    Hold holdQueued(std::size_t bytes, const std::string& channel) {
         {
             const std::lock_guard lock(mutex_);
             if (bytes > maxQueuedBytes_ - queuedBytes_) {
@@ -45,11 +46,19 @@ public:
                                          std::to_string(maxQueuedBytes_) + " may wait at most.");
             }
             queuedBytes_ += bytes;
+            ++queuedMessages_;
         }
         return Hold(nullptr, [backlog = shared_from_this(), bytes](const void*) {
             const std::lock_guard lock(backlog->mutex_);
             backlog->queuedBytes_ -= bytes;
+            --backlog->queuedMessages_;
+            backlog->dequeued_.notify_all();
         });
+    }
+
+    void waitUntilQueuedAtMost(std::size_t messages, std::size_t bytes) {
+        std::unique_lock lock(mutex_);
+        dequeued_.wait(lock, [&] { return queuedMessages_ <= messages && queuedBytes_ <= bytes; });
     }
 
     void waitUntilIdle() {
@@ -74,7 +83,9 @@ private:
 
     std::mutex mutex_;  // guards what follows
     std::condition_variable idle_;
+    std::condition_variable dequeued_;
     std::size_t queuedBytes_ = 0;
+    std::size_t queuedMessages_ = 0;
     std::size_t unfinished_ = 0;
 };
 
@@ -243,9 +254,9 @@ void InProcessBus::Core::publish(std::string_view clientName, const std::string&
                                  DataBuffer payload) {
     const Backlog::Hold busy = backlog_->holdBusy();
     const Queues queues = queuesOf(channel);
-    Backlog::Hold queuedBytes;
+    Backlog::Hold queued;
     if (!queues.empty()) {
-        queuedBytes = backlog_->holdBytes(payload.length(), channel);
+        queued = backlog_->holdQueued(payload.length(), channel);
     }
     const JsonMessage message(std::make_shared<const std::string>(channel),
                               std::make_shared<const DataBuffer>(std::move(payload)));
@@ -258,7 +269,7 @@ void InProcessBus::Core::publish(std::string_view clientName, const std::string&
         }
     }
     for (const auto& queue : queues) {
-        queue->push({message, queuedBytes, busy});
+        queue->push({message, queued, busy});
     }
 }
 
@@ -303,6 +314,10 @@ std::shared_ptr<Subscription> InProcessBus::observe(MessageObserver observer) {
 
 void InProcessBus::waitUntilIdle() {
     core_->backlog().waitUntilIdle();
+}
+
+void InProcessBus::waitUntilQueuedAtMost(std::size_t messages, std::size_t bytes) {
+    core_->backlog().waitUntilQueuedAtMost(messages, bytes);
 }
 
 std::size_t InProcessBus::queuedBytes() const {

@@ -62,6 +62,12 @@ public:
     /// which it would wait for.
     void waitUntilIdle();
 
+    /// Blocks until no more than `messages` messages wait in queues, and their payloads have no
+    /// more than `bytes` bytes together: with it a publisher that is faster than the handlers slows
+    /// down before its messages are refused. A message that several queues hold counts once. Must
+    /// not be called from a handler or an observer.
+    void waitUntilQueuedAtMost(std::size_t messages, std::size_t bytes);
+
     /// Payload bytes of the messages that wait in queues. A message that several queues hold counts
     /// once.
     std::size_t queuedBytes() const;
