@@ -1,0 +1,18 @@
+// Conversions of the pieces that JSON text is made of: number texts and UTF-16 escapes.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace json {
+
+/// The double nearest to the number that `text` begins with, written as JSON writes numbers. A
+/// number too large becomes infinity, one too small zero or a denormal; a text that begins with no
+/// number is 0. No locale has a part in it.
+double string_to_double(std::string_view text);
+
+/// The UTF-8 form of one UTF-16 unit, or of two that are taken for a surrogate pair. What is no
+/// character (a surrogate alone, two units that are no pair) becomes U+FFFD.
+std::string u16_to_u8(std::u16string_view units);
+
+}  // namespace json

@@ -1,0 +1,209 @@
+// Copying, comparing and destroying trees of values without recursing into them as deep as they
+// are.
+#include "json/value.h"
+
+#include <array>
+#include <iterator>
+#include <stdexcept>
+#include <string>
+#include <utility>
+#include <vector>
+
+namespace json {
+namespace {
+
+static_assert(std::is_nothrow_move_constructible_v<Storage> &&
+              std::is_nothrow_move_assignable_v<Storage>);
+
+template <typename... Held>
+constexpr auto namesOf(std::type_identity<std::variant<Held...>>) {
+    return std::array{traits<Held>::name...};
+}
+
+constexpr auto kindNames = namesOf(std::type_identity<Storage>());
+
+// ---- Copying ----
+
+struct CopyTask {
+    const Value* source;
+    Value* target;
+};
+
+/// Makes `target` an array of copies. Elements that hold others are left undefined and put on
+/// `tasks`.
+void copyElements(const Array& source, Array& target, std::vector<CopyTask>& tasks) {
+    target.reserve(source.size());
+    for (const Value& element : source) {
+        if (element.holdsElements())
+            tasks.push_back({&element, &target.emplace_back()});
+        else
+            target.push_back(element);
+    }
+}
+
+void copyElements(const Object& source, Object& target, std::vector<CopyTask>& tasks) {
+    for (const auto& [key, element] : source) {
+        if (element.holdsElements())
+            tasks.push_back({&element, &target.emplace_hint(target.end(), key, Value())->second});
+        else
+            target.emplace_hint(target.end(), key, element);
+    }
+}
+
+void copyTree(const Value& source, Value& target) {
+    std::vector<CopyTask> tasks;
+    CopyTask task{&source, &target};
+    for (;;) {
+        if (task.source->is<Array>())
+            copyElements(task.source->get<Array>(), task.target->emplace<Array>(), tasks);
+        else
+            copyElements(task.source->get<Object>(), task.target->emplace<Object>(), tasks);
+        if (tasks.empty())
+            return;
+        task = tasks.back();
+        tasks.pop_back();
+    }
+}
+
+// ---- Destroying ----
+
+/// Levels of nesting that are destroyed by plain recursion, which is the quickest way for usual
+/// trees.
+constexpr int recursiveLevels = 32;
+
+Value& first(Value& container) {
+    return container.is<Array>() ? container.get<Array>().front()
+                                 : container.get<Object>().begin()->second;
+}
+
+Value& last(Value& container) {
+    return container.is<Array>() ? container.get<Array>().back()
+                                 : container.get<Object>().rbegin()->second;
+}
+
+void removeLast(Value& container) {
+    if (container.is<Array>())
+        container.get<Array>().pop_back();
+    else
+        container.get<Object>().erase(std::prev(container.get<Object>().end()));
+}
+
+bool hasOneElement(const Value& container) {
+    return container.is<Array>() ? container.get<Array>().size() == 1
+                                 : container.get<Object>().size() == 1;
+}
+
+/// Destroys the contents of a tree of any depth. A destructor may neither recurse that deep nor
+/// allocate a stack of its own, so the way back up is kept in the tree itself: going down from
+/// `current` to its last element, that element takes in `current` as its own first one, and what
+/// was first there moves up to the place that came free.
+///
+///     current: [a, [b, c]]   becomes   current: [[a, b], c]
+///
+/// From there c is destroyed, then [a, b] is the only element and becomes `current` again. Each
+/// container is gone down to once, so the time is linear.
+void unwind(Value& root) noexcept {
+    Value current(std::move(root));
+    while (current.holdsElements()) {
+        Value& deepest = last(current);
+        if (!deepest.holdsElements()) {
+            removeLast(current);
+            continue;
+        }
+        Value next(std::move(deepest));
+        if (!hasOneElement(current)) {
+            deepest = std::move(first(next));
+            first(next) = std::move(current);
+        }
+        current = std::move(next);
+    }
+}
+
+/// Empties each container within `container`, so that it can be destroyed without further
+/// recursion.
+void releaseWithin(Value& container, int levels) noexcept {
+    const auto release = [levels](Value& element) noexcept {
+        if (!element.holdsElements())
+            return;
+        if (levels > 0) {
+            releaseWithin(element, levels - 1);
+            element.emplace<Undefined>();
+        } else {
+            unwind(element);
+        }
+    };
+    if (container.is<Array>()) {
+        for (Value& element : container.get<Array>())
+            release(element);
+    } else {
+        for (auto& [key, element] : container.get<Object>())
+            release(element);
+    }
+}
+
+// ---- Comparing ----
+
+using Comparison = std::pair<const Value*, const Value*>;
+
+/// Compares two arrays but for those elements that hold others on both sides: these go on `tasks`.
+bool equalBut(const Array& left, const Array& right, std::vector<Comparison>& tasks) {
+    if (left.size() != right.size())
+        return false;
+    for (std::size_t i = 0; i < left.size(); ++i) {
+        if (left[i].holdsElements() && right[i].holdsElements())
+            tasks.emplace_back(&left[i], &right[i]);
+        else if (!(left[i] == right[i]))
+            return false;
+    }
+    return true;
+}
+
+bool equalBut(const Object& left, const Object& right, std::vector<Comparison>& tasks) {
+    if (left.size() != right.size())
+        return false;
+    for (auto l = left.begin(), r = right.begin(); l != left.end(); ++l, ++r) {
+        if (l->first != r->first)
+            return false;
+        if (l->second.holdsElements() && r->second.holdsElements())
+            tasks.emplace_back(&l->second, &r->second);
+        else if (!(l->second == r->second))
+            return false;
+    }
+    return true;
+}
+
+}  // namespace
+
+Value::Value(const Value& other) : storage(other.holdsElements() ? Storage() : other.storage) {
+    if (other.holdsElements())
+        copyTree(other, *this);
+}
+
+void Value::releaseElements() noexcept {
+    releaseWithin(*this, recursiveLevels);
+}
+
+void Value::throwInvalidConversion(char const* target) const {
+    throw std::runtime_error(std::string("invalid conversion: ") + kindNames[index()] + " to " +
+                             target);
+}
+
+bool operator==(const Value& left, const Value& right) {
+    if (left.index() != right.index())
+        return false;
+    if (!left.holdsElements() || !right.holdsElements())
+        return left.storage == right.storage;
+    std::vector<Comparison> tasks{{&left, &right}};
+    while (!tasks.empty()) {
+        const auto [l, r] = tasks.back();
+        tasks.pop_back();
+        if (l->index() != r->index())
+            return false;
+        if (l->is<Array>() ? !equalBut(l->get<Array>(), r->get<Array>(), tasks)
+                           : !equalBut(l->get<Object>(), r->get<Object>(), tasks))
+            return false;
+    }
+    return true;
+}
+
+}  // namespace json
