@@ -1,0 +1,104 @@
+// Reads text files: bytes, detected charset, UTF-16, and back to the file's own charset.
+
+#include <algorithm>
+#include <exception>
+#include <filesystem>
+#include <fstream>
+#include <iostream>
+#include <system_error>
+#include <utility>
+
+#include "platform/filesystem/filesystem.h"
+#include "platform/i18n/codecvt.h"
+#include "platform/i18n/detect_charset.h"
+#include "serialization/reading/result_keys.h"
+#include "serialization/serialization.h"
+
+namespace EditorServices {
+
+using platform::filesystem::exists;
+using platform::filesystem::make_native_access_form_with_cleanup;
+using platform::i18n::codecvt_string_to_ustring;
+using platform::i18n::codecvt_ustring_to_string;
+using platform::i18n::detect_charset;
+using platform::i18n::to_string;
+using platform::i18n::to_ustring;
+
+namespace {
+
+constexpr char16_t kByteOrderMark = u'\uFEFF';
+
+/// Everything that `file` still holds, which is probably `expectedSize` bytes.
+/// Throws std::ios_base::failure on an input error.
+std::string readToEnd(std::ifstream& file, std::size_t expectedSize) {
+    constexpr std::size_t kSmallestPiece = 4096;
+    std::string bytes;
+    std::size_t length = 0;
+    // One byte more than expected, so that the end is seen without growing.
+    bytes.resize(std::max(expectedSize + 1, kSmallestPiece));
+    file.exceptions(std::ios_base::badbit);
+    while (file.read(bytes.data() + length, static_cast<std::streamsize>(bytes.size() - length))) {
+        length = bytes.size();
+        bytes.resize(bytes.size() * 2);
+    }
+    bytes.resize(length + static_cast<std::size_t>(file.gcount()));
+    return bytes;
+}
+
+}  // namespace
+
+json::Object Serialization::readTextDocument(std::u16string path) const {
+    json::Object result;
+    try {
+        if (exists(path)) {
+            result[kStatusKey] = true;
+            result[kDataKey] = readTextFileContent(std::move(path));
+        } else {
+            result[kStatusKey] = false;
+            result[kExceptionKey] = "File does not exist";
+        }
+    } catch (const std::exception& error) {
+        result[kStatusKey] = false;
+        result[kExceptionKey] = error.what();
+    }
+    return result;
+}
+
+std::string Serialization::readTextFileContent(std::u16string path) const {
+    std::string charset;
+    const std::u16string text = readTextFile(std::move(path), charset);
+    codecvt_ustring_to_string converter(charset, true);
+    return to_string(text, converter);
+}
+
+std::u16string Serialization::readTextFile(std::u16string path, std::string& charset) const {
+    const std::string bytes = readFileBytes(std::move(path));
+    charset = detect_charset(bytes.data(), bytes.size(), std::cout, u"<unknown>");
+    codecvt_string_to_ustring converter(charset, true);
+    std::u16string text = to_ustring(bytes, converter);
+    if (!text.empty() && text.front() == kByteOrderMark) {
+        text.erase(0, 1);
+    }
+    if (charset == "Shift_JIS") {
+        // Conversion tables of the IBM family turn byte 1A, the end-of-file mark of DOS texts, into
+        // U+001C. A text that came through one gets its mark back.
+        std::replace(text.begin(), text.end(), u'\u001C', u'\u001A');
+    }
+    return text;
+}
+
+std::string Serialization::readFileBytes(std::u16string path) const {
+    const std::string nativePath = make_native_access_form_with_cleanup(path);
+    std::error_code notExaminable;
+    if (!std::filesystem::is_regular_file(nativePath, notExaminable)) {
+        return {};
+    }
+    std::ifstream file(nativePath, std::ios_base::in);
+    if (!file.is_open()) {
+        return {};
+    }
+    const std::uintmax_t size = std::filesystem::file_size(nativePath, notExaminable);
+    return readToEnd(file, notExaminable ? 0 : static_cast<std::size_t>(size));
+}
+
+}  // namespace EditorServices

@@ -1,0 +1,59 @@
+// The two request handlers.
+
+#include <utility>
+
+#include "json/parser.h"
+#include "platform/filesystem/filesystem.h"
+#include "platform/i18n/codecvt.h"
+#include "serialization/serialization.h"
+
+namespace EditorServices {
+
+using platform::filesystem::exists;
+using platform::i18n::to_ustring;
+using platform::messaging::JsonMessage;
+
+json::Object Serialization::parseMessage(const JsonMessage& message) const {
+    return json::parse(message.payload());
+}
+
+void Serialization::handleReadRequest(const JsonMessage& message) {
+    json::Object request = parseMessage(message);
+    const std::string rtcId = request[rtcIdKey].get<std::string>();
+    const std::string contentType = request[contentTypeKey].get<std::string>();
+    const std::string filePath = request[filePathKey].get<std::string>();
+
+    std::u16string path = to_ustring(filePath);
+    json::Object result = contentType == packageContentType ? readPackageDocument(std::move(path))
+                                                            : readTextDocument(std::move(path));
+    publish(readResponsePrefix + rtcId, std::move(result));
+}
+
+void Serialization::handleWriteRequest(const JsonMessage& message) {
+    json::Object request = parseMessage(message);
+    const std::string rtcId = request[rtcIdKey].get<std::string>();
+    const std::string contentType = request[contentTypeKey].get<std::string>();
+    const std::string filePath = request[filePathKey].get<std::string>();
+    json::Value content = std::move(request[contentKey]);
+
+    std::u16string path = to_ustring(filePath);
+    // Asked before anything is written, so that the notification can tell a new file from a
+    // replaced one.
+    const bool existed = exists(path);
+
+    bool written = false;
+    if (contentType == packageContentType) {
+        written = writePackageDocument(std::move(path), std::move(content.get<json::Object>()));
+    } else {
+        // The encoding is read first: when both keys are wrong, it is the one that the failure
+        // names.
+        std::string encoding = request[encodingKey].get<std::string>();
+        written = writeTextDocument(std::move(path), std::move(content.get<std::string>()),
+                                    std::move(encoding));
+    }
+    // Whatever the result: a writer that answers false may have changed the file all the same.
+    notifyFileSystem(filePath, existed);
+    publish(writeResponsePrefix + rtcId, written);
+}
+
+}  // namespace EditorServices

@@ -1,0 +1,33 @@
+#include "serialization/serialization.h"
+
+#include "json/serialize.h"
+
+namespace EditorServices {
+
+using platform::DataBuffer;
+
+Serialization::Serialization() {
+    initializeMessageService();
+}
+
+bool Serialization::isNonCharacter(char16_t unit) const noexcept {
+    return static_cast<std::int32_t>(unit) >= firstNonCharacter;
+}
+
+bool Serialization::isZeroWidthSpace(char16_t unit) const noexcept {
+    return unit == zeroWidthSpace;
+}
+
+bool Serialization::isDisallowedControl(char16_t unit) const noexcept {
+    return isControl(unit) && unit != u'\t' && unit != u'\n' && unit != u'\r';
+}
+
+bool Serialization::isControl(char16_t unit) const noexcept {
+    return unit <= 0x1F || (unit >= 0x7F && unit <= 0x9F);
+}
+
+void Serialization::publish(const std::string& channel, const json::Value& value) const {
+    messageService->publish(channel, DataBuffer::copyOf(json::serialize(value)));
+}
+
+}  // namespace EditorServices

@@ -1,0 +1,49 @@
+// Writes text files. The text arrives in the charset that the request names and is decoded and
+// encoded again, so that what is not valid in that charset is refused before the file is touched.
+
+#include <exception>
+#include <fstream>
+#include <utility>
+
+#include "platform/filesystem/filesystem.h"
+#include "platform/i18n/codecvt.h"
+#include "serialization/serialization.h"
+
+namespace EditorServices {
+
+using platform::filesystem::make_native_access_form_with_cleanup;
+using platform::i18n::codecvt_string_to_ustring;
+using platform::i18n::codecvt_ustring_to_string;
+
+bool Serialization::writeTextDocument(std::u16string path, std::string text,
+                                      std::string charset) const {
+    try {
+        codecvt_string_to_ustring converter(charset, true);
+        std::u16string decoded;
+        if (!text.empty()) {
+            decoded = converter.do_convert(text.data(), text.size());
+        }
+        return writeTextFileContent(std::move(path), std::move(decoded), std::move(charset));
+    } catch (const std::exception&) {
+        return false;
+    }
+}
+
+bool Serialization::writeTextFileContent(std::u16string path, std::u16string text,
+                                         std::string charset) const {
+    std::ofstream file(make_native_access_form_with_cleanup(path), std::ios_base::out);
+    const bool opened = file.is_open();
+    if (opened) {
+        codecvt_ustring_to_string converter(charset, true);
+        std::string bytes;
+        if (!text.empty()) {
+            bytes = converter.do_convert(text.data(), text.size());
+        }
+        file.write(bytes.data(), static_cast<std::streamsize>(bytes.size()));
+    }
+    file.close();
+    // Clients have always been told only whether the file could be opened.
+    return opened;
+}
+
+}  // namespace EditorServices
