@@ -104,6 +104,12 @@ public:
         throwInvalidConversion(traits<T>::name);
     }
 
+    /// Calls `visitor` with the held object, and returns what it returns.
+    template <typename Visitor>
+    decltype(auto) visit(Visitor&& visitor) const {
+        return std::visit(std::forward<Visitor>(visitor), storage);
+    }
+
     /// Replaces the contents by a default-made T, and returns it.
     template <HeldType T>
     T& emplace() noexcept {
