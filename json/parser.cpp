@@ -1,0 +1,595 @@
+// The parser. Strings, numbers, literals and typed data have a routine each; arrays, objects and
+// the values in them are parsed together by TreeParser, which keeps the containers that are open on
+// a stack of its own, so that no depth can exhaust the thread's.
+//
+//     object  =  "{" [ member *( "," member ) ] "}"        member  =  string ":" value
+//     array   =  "[" [ value *( "," value ) ] "]"
+//     value   =  string / number / object / array / "true" / "false" / "null"
+//     number  =  [ "-" ] ( "0" / 1-9 *digit ) [ "." 1*digit ] [ ( "e" / "E" ) [ "+" / "-" ] 1*digit
+//     ] data    =  "[" [ integer *( "," integer ) ] "]"      integer =  [ "-" ] ( "0" / 1-9 *digit
+//     )
+//
+// White space may come after each of "{" "[" ":" ",", and before ":" "," "]" "}".
+#include "json/parser.h"
+
+#include <array>
+#include <charconv>
+#include <exception>
+#include <forward_list>
+#include <limits>
+#include <stack>
+#include <system_error>
+#include <utility>
+
+#include "json/byte_scan.h"
+#include "json/conversions.h"
+#include "platform/i18n/ascii.h"
+
+namespace json {
+namespace {
+
+using platform::i18n::isdigit_ascii;
+using platform::i18n::isspace_ascii;
+
+bool atEnd(const Input& input) {
+    return input.position == input.end;
+}
+
+bool at(const Input& input, char c) {
+    return !atEnd(input) && *input.position == c;
+}
+
+std::string_view rest(const Input& input) {
+    return {input.position, input.end};
+}
+
+// ---- Strings ----
+
+/// Parses the four hexadecimal digits of a "\u" escape.
+Status parseUnit(Input& input, char16_t& unit) {
+    if (input.end - input.position < 4)
+        return Status::endOfInput;
+    std::uint16_t number = 0;
+    const char* const last = input.position + 4;
+    if (std::from_chars(input.position, last, number, 16).ptr != last)
+        return Status::badUnicodeEscape;
+    unit = number;
+    input.position = last;
+    return Status::success;
+}
+
+/// Parses what follows "\u": the digits of one unit, and after a high surrogate a second escape,
+/// whatever its unit.
+Status parseUnicodeEscape(Input& input, std::string& text) {
+    std::array<char16_t, 2> units{};
+    std::size_t count = 1;
+    if (const Status status = parseUnit(input, units[0]); status != Status::success)
+        return status;
+    if (units[0] >= 0xD800 && units[0] <= 0xDBFF) {
+        if (input.end - input.position < 6)
+            return Status::endOfInput;
+        if (!rest(input).starts_with("\\u"))
+            return Status::badUnicodeEscape;
+        input.position += 2;
+        if (const Status status = parseUnit(input, units[1]); status != Status::success)
+            return status;
+        count = 2;
+    }
+    text += u16_to_u8({units.data(), count});
+    return Status::success;
+}
+
+/// The character that an escape letter other than "u" stands for, or NUL for a letter that is none.
+char escapedCharacter(char letter) {
+    switch (letter) {
+        case '"':
+        case '/':
+        case '\\':
+            return letter;
+        case 'b':
+            return '\b';
+        case 'f':
+            return '\f';
+        case 'n':
+            return '\n';
+        case 'r':
+            return '\r';
+        case 't':
+            return '\t';
+        default:
+            return '\0';
+    }
+}
+
+/// Parses what follows a backslash.
+Status parseEscape(Input& input, std::string& text) {
+    if (atEnd(input))
+        return Status::endOfInput;
+    if (*input.position == 'u') {
+        ++input.position;
+        return parseUnicodeEscape(input, text);
+    }
+    const char c = escapedCharacter(*input.position);
+    if (c == '\0')
+        return Status::badEscape;
+    text += c;
+    ++input.position;
+    return Status::success;
+}
+
+// ---- Numbers ----
+
+void skipDigits(Input& input) {
+    while (!atEnd(input) && isdigit_ascii(*input.position))
+        ++input.position;
+}
+
+Status skipSomeDigits(Input& input, Status ifNone) {
+    if (atEnd(input))
+        return Status::endOfInput;
+    if (!isdigit_ascii(*input.position))
+        return ifNone;
+    skipDigits(input);
+    return Status::success;
+}
+
+/// Skips an optional "-", then a "0" or digits that begin with another.
+Status skipInteger(Input& input, Status ifNone) {
+    if (at(input, '-'))
+        ++input.position;
+    if (at(input, '0')) {
+        ++input.position;
+        return Status::success;
+    }
+    return skipSomeDigits(input, ifNone);
+}
+
+Status skipNumber(Input& input) {
+    if (const Status status = skipInteger(input, Status::notNumber); status != Status::success)
+        return status;
+    if (at(input, '.')) {
+        ++input.position;
+        if (const Status status = skipSomeDigits(input, Status::noFraction);
+            status != Status::success)
+            return status;
+    }
+    if (at(input, 'e') || at(input, 'E')) {
+        ++input.position;
+        if (at(input, '+') || at(input, '-'))
+            ++input.position;
+        return skipSomeDigits(input, Status::noExponent);
+    }
+    return Status::success;
+}
+
+// ---- Typed data ----
+
+enum class IntegerType : std::uint8_t { none, signedInteger, unsignedInteger };
+
+/// The kind of the elements that a "kqtype" names. The narrower types are not held to their range.
+IntegerType integerType(std::string_view name) {
+    if (name == "int64" || name == "int32" || name == "int16" || name == "int8")
+        return IntegerType::signedInteger;
+    if (name == "uint64" || name == "uint32" || name == "uint16" || name == "uint8")
+        return IntegerType::unsignedInteger;
+    return IntegerType::none;
+}
+
+/// The integer that `text` is written as, or the nearest that the type has.
+template <typename Integer>
+Integer toInteger(std::string_view text) {
+    using Limits = std::numeric_limits<Integer>;
+    const bool negative = text.starts_with('-');
+    if (negative && !Limits::is_signed)
+        return 0;
+    Integer integer = 0;
+    if (std::from_chars(text.data(), text.data() + text.size(), integer).ec == std::errc())
+        return integer;
+    return negative ? Limits::min() : Limits::max();
+}
+
+/// Whether the next byte would make the integer before it something else.
+bool atNonInteger(const Input& input) {
+    return !atEnd(input) &&
+           std::string_view(".eE\"{").find(*input.position) != std::string_view::npos;
+}
+
+/// Reads an array of integers and hands the text of each to `take`.
+template <typename Take>
+Status readIntegers(Input& input, Take take) {
+    if (atEnd(input))
+        return Status::endOfInput;
+    if (!at(input, '['))
+        return Status::notArray;
+    ++input.position;
+    skipWhitespace(input);
+    if (at(input, ']')) {
+        ++input.position;
+        return Status::success;
+    }
+    for (;;) {
+        const char* const start = input.position;
+        if (const Status status = skipInteger(input, Status::badTypedElement);
+            status != Status::success)
+            return status;
+        const std::string_view integer(start, input.position);
+        if (atNonInteger(input))
+            return Status::badTypedElement;
+        take(integer);
+        skipWhitespace(input);
+        if (atEnd(input))
+            return Status::endOfInput;
+        if (atNonInteger(input))
+            return Status::badTypedElement;
+        const char separator = *input.position;
+        if (separator != ',' && separator != ']')
+            return Status::badArraySeparator;
+        ++input.position;
+        if (separator == ']')
+            return Status::success;
+        skipWhitespace(input);
+    }
+}
+
+/// Parses an array of integers of a type other than none. Running out of memory counts as a fault
+/// here.
+Status parseIntegers(Input& input, IntegerType type, Value& target) try {
+    Array integers;
+    const Status status = readIntegers(input, [&](std::string_view text) {
+        if (type == IntegerType::signedInteger)
+            integers.emplace_back(toInteger<long>(text));
+        else
+            integers.emplace_back(toInteger<unsigned long>(text));
+    });
+    if (status == Status::success)
+        target = std::move(integers);
+    return status;
+} catch (const std::exception&) {
+    return Status::endOfInput;
+}
+
+Status checkIntegers(Input input) {
+    return readIntegers(input, [](std::string_view) {});
+}
+
+// ---- Values, arrays and objects ----
+
+/// Parses a value and all within it.
+///
+/// By the rules a value is tried as a string, a number, an object, an array, a boolean and null,
+/// and the attempt that gets furthest decides what is reported. The first byte tells which one that
+/// is: the others fail without moving, as does a literal that is not complete. When all fail there,
+/// the string as the first of them decides.
+class TreeParser {
+public:
+    explicit TreeParser(Input& text) : input(text) {}
+
+    /// Parses the value at the input's position. After a fault `root` holds a part of it.
+    Status parse(Value& root) {
+        Status status = startValue(root);
+        while (status == Status::success && !open.empty()) {
+            status = open.top().value->is<Array>() ? continueArray(open.top())
+                                                   : continueObject(open.top());
+        }
+        return status;
+    }
+
+private:
+    /// An array or object of which a part has been parsed, up to the end of an element or, at
+    /// first, to where the first element begins.
+    struct OpenContainer {
+        Value* value;
+        bool hasElements = false;
+
+        // The rest is for objects.
+        bool dropsMember = false;  // the value of the latest member is the front of `dropped`
+        bool dataChecked = false;  // `data` is known to be an array of integers
+        IntegerType type = IntegerType::none;  // what the latest "kqtype" that names a type names
+        const char* data = nullptr;            // the text of the latest "kqdata"
+        const char* typedData = nullptr;       // what "kqdata" was when that "kqtype" came
+    };
+
+    /// Parses a value whole, or the opening of an array or object that is not empty.
+    Status startValue(Value& value);
+    Status startLiteral(std::string_view literal, Value meaning, Value& value);
+    template <typename Container>
+    Status startContainer(Value& value, char closing);
+
+    /// Each parses on up to the end of the next element, the start of one that is itself left open,
+    /// or the end of the container.
+    Status continueArray(OpenContainer& container);
+    Status continueObject(OpenContainer& container);
+
+    /// Moves past what follows an element: a separator, and the white space after it, or the
+    /// closing.
+    Status skipSeparator(char closing, Status fault, bool& closed);
+    Status parseKey(std::string& key);
+    Value& memberValue(OpenContainer& container, std::string key);
+    Status startData(OpenContainer& container, Value& value);
+    Status applyType(OpenContainer& container, const Value& name);
+    Status closeObject(OpenContainer& container);
+
+    Input& input;
+    std::stack<OpenContainer> open;    // from the outermost to the innermost
+    std::forward_list<Value> dropped;  // values of members whose key was there, the innermost first
+};
+
+Status TreeParser::startValue(Value& value) {
+    if (atEnd(input))
+        return Status::endOfInput;
+    switch (*input.position) {
+        case '"':
+            return parseString(input, value.emplace<std::string>());
+        case '-':
+        case '0':
+        case '1':
+        case '2':
+        case '3':
+        case '4':
+        case '5':
+        case '6':
+        case '7':
+        case '8':
+        case '9':
+            return parseNumber(input, value.emplace<double>());
+        case '{':
+            return startContainer<Object>(value, '}');
+        case '[':
+            return startContainer<Array>(value, ']');
+        case 't':
+            return startLiteral("true", true, value);
+        case 'f':
+            return startLiteral("false", false, value);
+        case 'n':
+            return startLiteral("null", Null(), value);
+        default:
+            return Status::notString;
+    }
+}
+
+Status TreeParser::startLiteral(std::string_view literal, Value meaning, Value& value) {
+    // Whatever is wrong with the literal, no attempt has moved: it counts as a string that is none.
+    const Status status = parseLiteral(input, literal, Status::notString);
+    if (status != Status::success)
+        return Status::notString;
+    value = std::move(meaning);
+    return status;
+}
+
+template <typename Container>
+Status TreeParser::startContainer(Value& value, char closing) {
+    ++input.position;
+    skipWhitespace(input);
+    if (atEnd(input))
+        return Status::endOfInput;
+    value.emplace<Container>();
+    if (*input.position == closing)
+        ++input.position;
+    else
+        open.push({.value = &value});
+    return Status::success;
+}
+
+Status TreeParser::skipSeparator(char closing, Status fault, bool& closed) {
+    skipWhitespace(input);
+    if (atEnd(input))
+        return Status::endOfInput;
+    closed = *input.position == closing;
+    if (!closed && *input.position != ',')
+        return fault;
+    ++input.position;
+    if (!closed)
+        skipWhitespace(input);
+    return Status::success;
+}
+
+Status TreeParser::continueArray(OpenContainer& container) {
+    if (container.hasElements) {
+        bool closed = false;
+        const Status status = skipSeparator(']', Status::badArraySeparator, closed);
+        if (status != Status::success)
+            return status;
+        if (closed) {
+            open.pop();
+            return Status::success;
+        }
+    }
+    container.hasElements = true;
+    return startValue(container.value->get<Array>().emplace_back());
+}
+
+Status TreeParser::continueObject(OpenContainer& container) {
+    if (container.hasElements) {
+        if (std::exchange(container.dropsMember, false))
+            dropped.pop_front();
+        bool closed = false;
+        const Status status = skipSeparator('}', Status::badObjectSeparator, closed);
+        if (status != Status::success)
+            return status;
+        if (closed)
+            return closeObject(container);
+    }
+    container.hasElements = true;
+
+    std::string key;
+    if (const Status status = parseKey(key); status != Status::success)
+        return status;
+    const bool isType = key == "kqtype";
+    const bool isData = key == "kqdata";
+    Value& value = memberValue(container, std::move(key));
+    if (isData)
+        return startData(container, value);
+    const Status status = startValue(value);
+    if (isType && status == Status::success)
+        return applyType(container, value);
+    return status;
+}
+
+/// Parses the key of a member and moves to where its value begins.
+Status TreeParser::parseKey(std::string& key) {
+    if (const Status status = parseString(input, key); status != Status::success)
+        return status;
+    skipWhitespace(input);
+    if (atEnd(input))
+        return Status::endOfInput;
+    if (!at(input, ':'))
+        return Status::noColon;
+    ++input.position;
+    skipWhitespace(input);
+    return atEnd(input) ? Status::endOfInput : Status::success;
+}
+
+/// Where the value of a member is to be put: into the object, unless the key is there already. Then
+/// the first value stays, and the later one has to be parsed only to get past it.
+Value& TreeParser::memberValue(OpenContainer& container, std::string key) {
+    Object& object = container.value->get<Object>();
+    const std::size_t size = object.size();
+    const auto member = object.try_emplace(object.end(), std::move(key));
+    if (object.size() > size)
+        return member->second;
+    container.dropsMember = true;
+    return dropped.emplace_front();
+}
+
+Status TreeParser::startData(OpenContainer& container, Value& value) {
+    container.data = input.position;
+    container.dataChecked = container.type != IntegerType::none;
+    return container.dataChecked ? parseIntegers(input, container.type, value) : startValue(value);
+}
+
+/// Remembers the type that a "kqtype" names, if it does. Data that came before it is to be read
+/// again as data of that type, and put into the object in the place of what is there. Whether that
+/// can be done does not depend on the type, so each data is checked once, and read when the object
+/// ends: a request may repeat "kqtype" after long data many times.
+Status TreeParser::applyType(OpenContainer& container, const Value& name) {
+    if (!name.is<std::string>())
+        return Status::success;
+    const IntegerType type = integerType(name.get<std::string>());
+    if (type == IntegerType::none)
+        return Status::success;
+    container.type = type;
+    container.typedData = container.data;
+    if (container.data == nullptr || container.dataChecked)
+        return Status::success;
+    container.dataChecked = true;
+    return checkIntegers({container.data, input.end, input.comments});
+}
+
+Status TreeParser::closeObject(OpenContainer& container) {
+    Status status = Status::success;
+    if (container.typedData != nullptr) {
+        Input data{container.typedData, input.end, input.comments};
+        status = parseIntegers(data, container.type, container.value->get<Object>().at("kqdata"));
+    }
+    open.pop();
+    return status;
+}
+
+}  // namespace
+
+Object parse(std::string_view text) {
+    Input input{text.data(), text.data() + text.size()};
+    Object object;
+    parseObject(input, object);
+    return object;
+}
+
+Status skipWhitespace(Input& input) {
+    for (;;) {
+        while (!atEnd(input) && isspace_ascii(*input.position))
+            ++input.position;
+        if (!input.comments)
+            return Status::success;
+        std::string_view terminator;
+        if (rest(input).starts_with("//"))
+            terminator = "\n";
+        else if (rest(input).starts_with("/*"))
+            terminator = "*/";
+        else
+            return Status::success;
+        const std::size_t found = rest(input).find(terminator, 2);
+        if (found == std::string_view::npos) {
+            input.position = input.end;
+            return Status::endOfInput;
+        }
+        input.position += found + terminator.size();
+    }
+}
+
+Status parseString(Input& input, std::string& target) {
+    if (atEnd(input))
+        return Status::endOfInput;
+    if (!at(input, '"'))
+        return Status::notString;
+    ++input.position;
+    std::string text;
+    for (;;) {
+        const char* const run = input.position;
+        input.position = detail::findFirst<detail::QuoteOrBackslash>(run, input.end);
+        text.append(run, input.position);
+        if (atEnd(input))
+            return Status::endOfInput;
+        if (*input.position++ == '"') {
+            target = std::move(text);
+            return Status::success;
+        }
+        if (const Status status = parseEscape(input, text); status != Status::success)
+            return status;
+    }
+}
+
+Status parseNumber(Input& input, double& target) {
+    const char* const start = input.position;
+    const Status status = skipNumber(input);
+    if (status == Status::success)
+        target = string_to_double({start, input.position});
+    return status;
+}
+
+Status parseLiteral(Input& input, std::string_view literal, Status mismatch) {
+    if (rest(input).starts_with(literal)) {
+        input.position += literal.size();
+        return Status::success;
+    }
+    return literal.starts_with(rest(input)) ? Status::endOfInput : mismatch;
+}
+
+Status parseObject(Input& input, Object& target) {
+    if (atEnd(input))
+        return Status::endOfInput;
+    if (!at(input, '{'))
+        return Status::notObject;
+    Value object;
+    const Status status = TreeParser(input).parse(object);
+    if (status == Status::success)
+        target = std::move(object.get<Object>());
+    return status;
+}
+
+Status parseArray(Input& input, Array& target) {
+    if (atEnd(input))
+        return Status::endOfInput;
+    if (!at(input, '['))
+        return Status::notArray;
+    Value array;
+    const Status status = TreeParser(input).parse(array);
+    if (status == Status::success)
+        target = std::move(array.get<Array>());
+    return status;
+}
+
+Status parseValue(Input& input, Value& target) {
+    Value value;
+    const Status status = TreeParser(input).parse(value);
+    if (status == Status::success)
+        target = std::move(value);
+    return status;
+}
+
+Status parseTypedData(Input& input, std::string_view typeName, Value& target) {
+    const IntegerType type = integerType(typeName);
+    return type == IntegerType::none ? parseValue(input, target)
+                                     : parseIntegers(input, type, target);
+}
+
+}  // namespace json
