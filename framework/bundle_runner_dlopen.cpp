@@ -45,7 +45,7 @@ Library openLibrary(const std::filesystem::path& bundle) {
     }
     Library library(dlopen(bundle.c_str(), RTLD_NOW | RTLD_LOCAL));
     if (!library) {
-        throw std::runtime_error(std::string("cannot load the bundle: ") + dlerror());
+        throw std::runtime_error(std::string("cannot load bundle ") + dlerror());
     }
     return library;
 }
@@ -97,17 +97,23 @@ public:
         if (!activator_) {
             return;
         }
-        // Destroyed on every way out, while the library is still loaded.
+        // On every way out the activator is destroyed, and then the context taken back.
+        const ContextEnd contextEnd{setContext_};
         const auto activator = std::move(activator_);
         attempt("stop", [&] { activator->Stop(BundleContext(context_)); });
-        setContext_(nullptr);
     }
 
 private:
+    struct ContextEnd {
+        SetContext* setContext;
+        ~ContextEnd() { setContext(nullptr); }
+    };
+
     // Runs code of the bundle. Its exceptions go no further: their types leave with the library.
     template <typename Call>
     void attempt(const char* what, Call call) const {
-        const std::string failure = "bundle " + bundle_.string() + " failed to " + what + ": ";
+        const std::string failure =
+            std::string("cannot ") + what + " bundle " + bundle_.string() + ": ";
         try {
             call();
         } catch (const std::exception& error) {

@@ -1,0 +1,29 @@
+# Bundles: shared libraries that a host's framework loads by the three functions that they export.
+
+# project_bundle(<target> NAME <symbolic name> MANIFEST <file> SOURCES ... [LINKS ...])
+#
+# Declares the bundle lib<symbolic name>.so. It carries the JSON file MANIFEST in its section
+# .us_resources, and of all that is linked into it exports only the three entry points.
+function(project_bundle target)
+  cmake_parse_arguments(arg "" "NAME;MANIFEST" "SOURCES;LINKS" ${ARGN})
+  cmake_path(ABSOLUTE_PATH arg_MANIFEST NORMALIZE)
+  set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS "${arg_MANIFEST}")
+
+  set(BUNDLE_NAME "${arg_NAME}")
+  file(READ "${arg_MANIFEST}" BUNDLE_MANIFEST)
+  set(resources "${CMAKE_CURRENT_BINARY_DIR}/${arg_NAME}_resources.cpp")
+  set(exports "${CMAKE_CURRENT_BINARY_DIR}/${arg_NAME}_exports.map")
+  configure_file("${PROJECT_SOURCE_DIR}/framework/bundle_resources.cpp.in" "${resources}" @ONLY)
+  configure_file("${PROJECT_SOURCE_DIR}/framework/bundle_exports.map.in" "${exports}" @ONLY)
+
+  add_library(${target} MODULE ${arg_SOURCES} "${resources}")
+  set_target_properties(${target} PROPERTIES OUTPUT_NAME "${arg_NAME}" LINK_DEPENDS "${exports}")
+  target_include_directories(${target} PRIVATE "${PROJECT_SOURCE_DIR}")
+  target_compile_definitions(${target} PRIVATE US_BUNDLE_NAME=${arg_NAME})
+  target_link_libraries(${target} PRIVATE EditorSerialization::framework_headers ${arg_LINKS})
+  target_link_options(${target} PRIVATE "LINKER:--version-script=${exports}")
+  if(NOT EDITOR_SERIALIZATION_SANITIZERS)
+    # The sanitizers' own functions are found in the host.
+    target_link_options(${target} PRIVATE "LINKER:--no-undefined")
+  endif()
+endfunction()

@@ -1,0 +1,10 @@
+#include "tests/framework/sample_bundle_control.h"
+
+namespace sample {
+
+Control& control() {
+    static Control instance;
+    return instance;
+}
+
+}  // namespace sample

@@ -1,0 +1,9 @@
+// A library that lacks one of a bundle's three functions.
+
+extern "C" {
+
+[[gnu::visibility("default")]] void _us_set_bundle_context_instance_without_destroy_activator() {}
+
+[[gnu::visibility("default")]] void _us_create_activator_without_destroy_activator() {}
+
+}  // extern "C"
