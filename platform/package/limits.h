@@ -1,0 +1,42 @@
+// How much of a package is accepted. A package is expanded into memory whole, and a file of a few
+// kilobytes can claim to expand to anything, so all of these are checked against what the archive
+// declares before memory is taken. The writer keeps to them too: what it writes can be read.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+namespace platform::package::limits {
+
+constexpr std::uint64_t kMebibyte = 1024 * 1024;
+
+/// Entries of an archive. As many as an end record can count without ZIP64; office documents have
+/// some hundreds.
+constexpr std::uint64_t kMaxEntries = 65'534;
+
+/// Bytes of an archive's directory: room for kMaxEntries names of a thousand bytes.
+constexpr std::uint64_t kMaxDirectoryBytes = 64 * kMebibyte;
+
+/// Bytes of one part, expanded. Several copies of a part exist while it becomes JSON.
+constexpr std::uint64_t kMaxPartBytes = 1024 * kMebibyte;
+
+/// Bytes of all entries together, expanded.
+constexpr std::uint64_t kMaxTotalBytes = 2048 * kMebibyte;
+
+/// Bytes of the content types or of one relationships part, whose XML trees take a multiple of
+/// that: the content types of kMaxEntries parts, or the links of a worksheet full of them, are some
+/// 15 MB.
+constexpr std::uint64_t kMaxPackageXmlBytes = 32 * kMebibyte;
+
+/// Expanded bytes per byte of the archive. Sheets full of equal cells reach 150, archives made to
+/// fill memory 1000 and more.
+constexpr std::uint64_t kMaxExpansionRatio = 256;
+
+/// Expanded bytes that are accepted whatever the ratio.
+constexpr std::uint64_t kHarmlessBytes = 64 * kMebibyte;
+
+/// What one byte of deflated data can expand to at most: 258 bytes take two bits. A declared size
+/// beyond that is wrong.
+constexpr std::uint64_t kMaxDeflateRatio = 1032;
+
+}  // namespace platform::package::limits

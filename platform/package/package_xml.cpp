@@ -1,0 +1,132 @@
+#include "platform/package/package_xml.h"
+
+#include <cstddef>
+#include <new>
+#include <stdexcept>
+
+namespace platform::package {
+namespace {
+
+struct QualifiedName {
+    std::string_view prefix;
+    std::string_view localName;
+};
+
+QualifiedName qualifiedName(const pugi::xml_node& element) {
+    const std::string_view name = element.name();
+    const std::size_t colon = name.find(':');
+    if (colon == std::string_view::npos) {
+        return {{}, name};
+    }
+    return {name.substr(0, colon), name.substr(colon + 1)};
+}
+
+// The namespace that is bound to the prefix of `element` by itself or the nearest of its ancestors.
+std::string_view namespaceOf(const pugi::xml_node& element) {
+    const std::string_view prefix = qualifiedName(element).prefix;
+    std::string declaration = "xmlns";
+    if (!prefix.empty()) {
+        declaration.append(":").append(prefix);
+    }
+    for (pugi::xml_node node = element; node; node = node.parent()) {
+        if (const pugi::xml_attribute attribute = node.attribute(declaration.c_str())) {
+            return attribute.value();
+        }
+    }
+    return {};
+}
+
+void parse(pugi::xml_document& document, std::vector<std::uint8_t>& bytes) {
+    const pugi::xml_parse_result result = document.load_buffer_inplace(
+        bytes.data(), bytes.size(), pugi::parse_default | pugi::parse_doctype);
+    if (result.status == pugi::status_out_of_memory) {
+        throw std::bad_alloc();
+    }
+    if (!result) {
+        throw std::runtime_error(std::string("is not well-formed XML: ") + result.description() +
+                                 " at offset " + std::to_string(result.offset));
+    }
+    for (const pugi::xml_node& node : document.children()) {
+        if (node.type() == pugi::node_doctype) {
+            throw std::runtime_error("has a document type declaration, which is not allowed");
+        }
+    }
+}
+
+}  // namespace
+
+void forEachElement(std::vector<std::uint8_t> bytes, std::string_view root,
+                    std::string_view namespaceUri,
+                    const std::function<void(std::string_view, const pugi::xml_node&)>& visit) {
+    pugi::xml_document document;
+    parse(document, bytes);
+    const pugi::xml_node rootElement = document.document_element();
+    if (qualifiedName(rootElement).localName != root || namespaceOf(rootElement) != namespaceUri) {
+        throw std::runtime_error("has another root element than " + std::string(root));
+    }
+    for (const pugi::xml_node& child : rootElement.children()) {
+        if (child.type() == pugi::node_element && namespaceOf(child) == namespaceUri) {
+            visit(qualifiedName(child).localName, child);
+        }
+    }
+}
+
+std::string_view requiredAttribute(const pugi::xml_node& element, const char* name) {
+    const pugi::xml_attribute attribute = element.attribute(name);
+    if (!attribute) {
+        throw std::runtime_error(std::string("has a ") + element.name() + " without " + name);
+    }
+    return attribute.value();
+}
+
+std::string xmlStart(std::string_view root, std::string_view namespaceUri) {
+    std::string xml = "<?xml version=\"1.0\" encoding=\"UTF-8\" standalone=\"yes\"?>\n<";
+    xml.append(root);
+    appendAttribute(xml, "xmlns", namespaceUri);
+    return xml.append(">");
+}
+
+void appendAttribute(std::string& xml, std::string_view name, std::string_view value) {
+    xml.append(" ").append(name).append("=\"");
+    appendEscaped(xml, value);
+    xml.append("\"");
+}
+
+void appendEscaped(std::string& xml, std::string_view text) {
+    if (text.find("\xEF\xBF\xBE") != std::string_view::npos ||
+        text.find("\xEF\xBF\xBF") != std::string_view::npos) {
+        throw std::runtime_error("has a character that XML cannot hold");
+    }
+    for (const char c : text) {
+        switch (c) {
+            case '&':
+                xml += "&amp;";
+                break;
+            case '<':
+                xml += "&lt;";
+                break;
+            case '>':
+                xml += "&gt;";
+                break;
+            case '"':
+                xml += "&quot;";
+                break;
+            case '\t':
+                xml += "&#9;";
+                break;
+            case '\n':
+                xml += "&#10;";
+                break;
+            case '\r':
+                xml += "&#13;";
+                break;
+            default:
+                if (static_cast<unsigned char>(c) < 0x20) {
+                    throw std::runtime_error("has a character that XML cannot hold");
+                }
+                xml += c;
+        }
+    }
+}
+
+}  // namespace platform::package

@@ -1,0 +1,109 @@
+// What the package tests share: a folder of their own, files, and small packages.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstdint>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <stdexcept>
+#include <string>
+#include <system_error>
+#include <vector>
+
+#include "platform/i18n/codecvt.h"
+#include "platform/package/quillet_file_package.h"
+#include "zip_builder.h"
+
+namespace testing_package {
+
+using platform::package::QuilletFilePackage;
+using Part = QuilletFilePackage::Part;
+using Relationship = QuilletFilePackage::Relationship;
+
+/// A new folder that is removed with all that is in it.
+class TemporaryFolder {
+public:
+    TemporaryFolder() {
+        std::string pattern = testing::TempDir() + "package-test-XXXXXX";
+        if (::mkdtemp(pattern.data()) == nullptr) {
+            throw std::runtime_error("no temporary folder");
+        }
+        path_ = pattern;
+    }
+    TemporaryFolder(const TemporaryFolder&) = delete;
+    TemporaryFolder& operator=(const TemporaryFolder&) = delete;
+    ~TemporaryFolder() {
+        std::error_code ignored;
+        std::filesystem::remove_all(path_, ignored);
+    }
+
+    const std::filesystem::path& path() const { return path_; }
+
+    /// Writes a file of the folder and returns its path.
+    std::u16string file(const std::string& name, const std::string& bytes) const {
+        std::ofstream(path_ / name, std::ios::binary) << bytes;
+        return at(name);
+    }
+
+    std::u16string at(const std::string& name) const {
+        return platform::i18n::to_ustring((path_ / name).string());
+    }
+
+    std::string bytesOf(const std::string& name) const {
+        std::ifstream stream(path_ / name, std::ios::binary);
+        return {std::istreambuf_iterator<char>(stream), {}};
+    }
+
+    /// The names of all files in the folder, sorted.
+    std::vector<std::string> names() const {
+        std::vector<std::string> result;
+        for (const auto& entry : std::filesystem::directory_iterator(path_)) {
+            result.push_back(entry.path().filename().string());
+        }
+        std::sort(result.begin(), result.end());
+        return result;
+    }
+
+private:
+    std::filesystem::path path_;
+};
+
+inline std::string textOf(const std::vector<std::uint8_t>& bytes) {
+    return {bytes.begin(), bytes.end()};
+}
+
+inline std::vector<std::uint8_t> bytesOf(const std::string& text) {
+    return {text.begin(), text.end()};
+}
+
+inline std::string typesXml(const std::string& elements) {
+    return "<?xml version=\"1.0\"?>"
+           "<Types xmlns=\"http://schemas.openxmlformats.org/package/2006/content-types\">" +
+           elements + "</Types>";
+}
+
+inline std::string relationshipsXmlOf(const std::string& elements) {
+    return "<Relationships "
+           "xmlns=\"http://schemas.openxmlformats.org/package/2006/relationships\">" +
+           elements + "</Relationships>";
+}
+
+/// Content types that make every .xml and .txt and .png entry a part.
+inline ZipEntry usualTypes() {
+    return {"[Content_Types].xml",
+            typesXml("<Default Extension='xml' ContentType='application/xml'/>"
+                     "<Default Extension='txt' ContentType='text/plain'/>"
+                     "<Default Extension='png' ContentType='image/png'/>")};
+}
+
+/// An archive of `entries` behind usualTypes().
+inline std::string usualPackage(std::vector<ZipEntry> entries, const ZipOptions& options = {}) {
+    entries.insert(entries.begin(), usualTypes());
+    return buildZip(entries, options);
+}
+
+}  // namespace testing_package
