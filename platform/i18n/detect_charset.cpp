@@ -1,20 +1,29 @@
 // Detection of the charset of a text file.
+//
+// In this order: a byte-order mark; UTF-16 and UTF-32 without one; charsets of escape sequences;
+// UTF-8; the legacy charsets, ranked by how plausible their text is. Whatever is returned decodes
+// the whole file and encodes it back to the same bytes.
 #include "platform/i18n/detect_charset.h"
 
 #include <simdjson.h>
-#include <uchardet/uchardet.h>
 
+#include <algorithm>
 #include <array>
-#include <memory>
-#include <optional>
 #include <ostream>
 #include <stdexcept>
 
+#include "platform/i18n/charset.h"
 #include "platform/i18n/codecvt.h"
+#include "platform/i18n/escape_charsets.h"
+#include "platform/i18n/ranking.h"
+#include "platform/i18n/sample.h"
+#include "platform/i18n/unicode_guess.h"
 
 namespace platform::i18n {
 
 namespace {
+
+constexpr const char* lastResort = "ISO-8859-1";
 
 struct Mark {
     std::string_view bytes;
@@ -22,57 +31,93 @@ struct Mark {
 };
 
 // UTF-32's little-endian mark begins with UTF-16's, so it comes first.
-using namespace std::string_view_literals;
 constexpr std::array<Mark, 5> marks{{
-    {"\xEF\xBB\xBF"sv, "UTF-8"},
-    {"\xFF\xFE\0\0"sv, "UTF-32LE"},
-    {"\0\0\xFE\xFF"sv, "UTF-32BE"},
-    {"\xFF\xFE"sv, "UTF-16LE"},
-    {"\xFE\xFF"sv, "UTF-16BE"},
+    {{"\xEF\xBB\xBF", 3}, "UTF-8"},
+    {{"\xFF\xFE\0\0", 4}, "UTF-32LE"},
+    {{"\0\0\xFE\xFF", 4}, "UTF-32BE"},
+    {{"\xFF\xFE", 2}, "UTF-16LE"},
+    {{"\xFE\xFF", 2}, "UTF-16BE"},
 }};
 
-bool holds(const std::string& charset, std::string_view bytes) {
+bool decodesStrictly(const char* charset, std::string_view bytes) {
     try {
-        codecvt_string_to_ustring decoder(charset, true);
-        codecvt_ustring_to_string encoder(charset, true);
-        return to_string(to_ustring(bytes, decoder), encoder) == bytes;
+        detail::openCharset(charset, true)->decode(bytes);
+        return true;
     } catch (const std::runtime_error&) {
         return false;
     }
 }
 
-std::string askUchardet(std::string_view bytes) {
-    struct Delete {
-        void operator()(uchardet_t detector) const { uchardet_delete(detector); }
-    };
-    const std::unique_ptr<std::remove_pointer_t<uchardet_t>, Delete> detector(uchardet_new());
-    uchardet_handle_data(detector.get(), bytes.data(), bytes.size());
-    uchardet_data_end(detector.get());
-    return uchardet_get_charset(detector.get());
+std::string markedCharset(std::string_view bytes) {
+    for (const Mark& mark : marks) {
+        if (bytes.starts_with(mark.bytes) && decodesStrictly(mark.charset, bytes)) {
+            return mark.charset;
+        }
+    }
+    return {};
+}
+
+bool isAscii(std::string_view bytes) {
+    return std::all_of(bytes.begin(), bytes.end(),
+                       [](char byte) { return static_cast<unsigned char>(byte) < 0x80; });
+}
+
+// Whether so much of the sample is control codes that it is no text in any legacy charset.
+bool isBinary(std::string_view sample) {
+    const auto controls = std::count_if(sample.begin(), sample.end(), [](char c) {
+        const auto byte = static_cast<unsigned char>(c);
+        return byte < 0x20 && !(byte >= '\t' && byte <= '\r') && byte != 0x1A && byte != 0x1B;
+    });
+    return static_cast<std::size_t>(controls) * 20 > sample.size();
+}
+
+std::string legacyCharset(std::string_view bytes) {
+    const std::string sample = detail::charsetSample(bytes);
+    if (isBinary(sample)) {
+        return {};
+    }
+    for (const detail::Candidate* candidate : detail::rankedCandidates(sample, bytes)) {
+        if (candidate->holds(bytes)) {
+            return candidate->charset();
+        }
+    }
+    return {};
+}
+
+std::string findCharset(std::string_view bytes) {
+    if (std::string marked = markedCharset(bytes); !marked.empty()) {
+        return marked;
+    }
+    if (bytes.empty()) {
+        return "UTF-8";
+    }
+    const bool ascii = isAscii(bytes);
+    const bool hasZeros = bytes.find('\0') != std::string_view::npos;
+    if (ascii && !hasZeros) {
+        std::string escaped = detail::escapedCharset(bytes);
+        return escaped.empty() ? "UTF-8" : escaped;
+    }
+    const bool utf8 = simdjson::validate_utf8(bytes.data(), bytes.size());
+    if (!utf8 || hasZeros) {
+        if (std::string unicode = detail::unmarkedUnicode(bytes); !unicode.empty()) {
+            return unicode;
+        }
+    }
+    return utf8 ? "UTF-8" : legacyCharset(bytes);
 }
 
 }  // namespace
 
 std::string detect_charset(const char* data, std::size_t length, std::ostream& diagnostics,
                            std::u16string_view sourceName) {
-    const std::string_view bytes(data, length);
-    for (const Mark& mark : marks) {
-        if (bytes.starts_with(mark.bytes) && holds(mark.charset, bytes)) {
-            return mark.charset;
-        }
-    }
-    if (simdjson::validate_utf8(data, length)) {
-        return "UTF-8";
-    }
-    const std::string guess = askUchardet(bytes);
-    const std::string name = guess == "SHIFT_JIS" ? "Shift_JIS" : guess;
-    if (holds(name, bytes)) {
-        return name;
+    const std::string charset = findCharset({data, length});
+    if (!charset.empty()) {
+        return charset;
     }
     codecvt_ustring_to_string toUtf8("UTF-8", false);
-    diagnostics << "No known charset fits " << to_string(sourceName, toUtf8)
-                << "; read as ISO-8859-1\n";
-    return "ISO-8859-1";
+    diagnostics << "No known charset fits " << to_string(sourceName, toUtf8) << "; taken as "
+                << lastResort << '\n';
+    return lastResort;
 }
 
 }  // namespace platform::i18n

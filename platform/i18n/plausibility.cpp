@@ -1,0 +1,329 @@
+// The cost of text in the known languages.
+//
+// Only runs of letters that hold something beyond ASCII tell charsets apart. In them each letter
+// costs what the language's table says about it behind its neighbour, and capitals where no one
+// writes them cost extra. All other ASCII costs the same everywhere, so that candidates in which
+// bytes are ASCII and candidates in which they are halves of characters compare fairly.
+#include "platform/i18n/plausibility.h"
+
+#include <unicode/uchar.h>
+
+#include <algorithm>
+#include <array>
+#include <cmath>
+#include <cstdint>
+#include <limits>
+#include <string>
+
+#include "platform/i18n/language_tables.h"
+#include "platform/i18n/symbol_cost.h"
+
+namespace platform::i18n::detail {
+
+namespace {
+
+constexpr double bitsPerAscii = 5;
+constexpr double bitsPerStrayControl = 20;
+constexpr int foreignLetterCost = 12;
+constexpr int foreignScriptCost = 15;
+constexpr int scriptChangeCost = 6;
+constexpr double capitalInsideWordCost = 7;
+constexpr double smallAfterCapitalsCost = 5;
+constexpr double firstCapitalCost = 1;
+
+constexpr char16_t wordEnd = 0;
+
+// All letters of alphabets, and nothing that the ideographic languages need, lie below this.
+constexpr std::size_t alphabetLimit = 0x2000;
+
+constexpr bool isAsciiLetter(char16_t c) {
+    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
+}
+
+bool isWordCharacter(char16_t c) {
+    if (c == 0x00AA || c == 0x00BA || c == 0x00B5) {
+        return false;
+    }
+    return (U_GET_GC_MASK(c) & (U_GC_L_MASK | U_GC_M_MASK)) != 0;
+}
+
+char16_t folded(char16_t c) {
+    return static_cast<char16_t>(u_tolower(c));
+}
+
+}  // namespace
+
+class Language {
+public:
+    virtual ~Language() = default;
+    virtual bool isWritableWith(std::u16string_view repertoire) const = 0;
+
+    // The cost of runs of word characters, folded, each run closed by `wordEnd`.
+    virtual double costOfWords(std::u16string_view words) const = 0;
+};
+
+namespace {
+
+class AlphabeticLanguage final : public Language {
+public:
+    explicit AlphabeticLanguage(const LetterTable& table)
+        : table_(table), size_(table.alphabet.size() + 1) {
+        std::uint8_t next = 1;
+        for (const char16_t letter : table.alphabet) {
+            index_[letter] = next++;
+        }
+    }
+
+    bool isWritableWith(std::u16string_view repertoire) const override {
+        // Charsets lack letters that only names and foreign words have, and are used all the same.
+        constexpr double acceptableGap = 0.005;
+        double missing = 0;
+        for (std::size_t i = 0; i < table_.alphabet.size(); ++i) {
+            const char16_t letter = table_.alphabet[i];
+            if (letter >= 0x80 && repertoire.find(letter) == std::u16string_view::npos) {
+                missing += std::exp2((table_.frequencies[i] - '0') / -4.0);
+            }
+        }
+        return missing < acceptableGap;
+    }
+
+    double costOfWords(std::u16string_view words) const override {
+        std::uint64_t quarterBits = 0;
+        std::size_t previous = 0;
+        char16_t before = wordEnd;
+        for (const char16_t c : words) {
+            const std::size_t current = c < alphabetLimit ? index_[c] : 0;
+            if (current == 0 && c != wordEnd) {
+                quarterBits += 4U * static_cast<unsigned>(foreignCost(c, before));
+            }
+            quarterBits +=
+                static_cast<std::uint64_t>(table_.costs[previous * size_ + current] - '0');
+            previous = current;
+            before = c;
+        }
+        return static_cast<double>(quarterBits) / 4;
+    }
+
+private:
+    int foreignCost(char16_t letter, char16_t before) const {
+        const bool sameScript = letter < 0x0250 && table_.alphabet.front() == u'a';
+        return sameScript ? foreignLetterCost
+                          : foreignScriptCost + (before == wordEnd ? 0 : scriptChangeCost);
+    }
+
+    const LetterTable& table_;
+    std::size_t size_;
+    std::array<std::uint8_t, alphabetLimit> index_{};
+};
+
+class IdeographicLanguage final : public Language {
+public:
+    explicit IdeographicLanguage(const CharacterTable& table)
+        : halfBits_(std::size_t{0x10000}, std::uint8_t{0}) {
+        for (std::size_t c = 0; c < halfBits_.size(); ++c) {
+            halfBits_[c] = static_cast<std::uint8_t>(2 * costOfUnlisted(static_cast<char16_t>(c)));
+        }
+        for (const CharacterGroup& group : table.groups) {
+            for (const char16_t c : group.characters) {
+                halfBits_[c] = static_cast<std::uint8_t>(group.halfBits);
+            }
+        }
+    }
+
+    bool isWritableWith(std::u16string_view) const override { return true; }
+
+    double costOfWords(std::u16string_view words) const override {
+        std::uint64_t halfBits = 0;
+        char16_t before = wordEnd;
+        for (const char16_t c : words) {
+            halfBits += halfBits_[c];
+            // Western letters stand apart from these scripts, or at least in words of their own.
+            if (before != wordEnd && c != wordEnd && isAsciiLetter(before) != isAsciiLetter(c)) {
+                halfBits += 6;
+            }
+            before = c;
+        }
+        return static_cast<double>(halfBits) / 2;
+    }
+
+private:
+    static int costOfUnlisted(char16_t c) {
+        if (c < 0x80) {
+            return c == wordEnd ? 0 : static_cast<int>(bitsPerAscii);
+        }
+        if (c >= 0x3040 && c <= 0x30FF) {
+            return 15;
+        }
+        if (c >= 0x4E00 && c <= 0x9FFF) {
+            return 17;
+        }
+        if (c >= 0xAC00 && c <= 0xD7A3) {
+            return 18;
+        }
+        if (c >= 0xFF61 && c <= 0xFF9F) {
+            return 11;
+        }
+        if (c >= 0xFF00 && c <= 0xFFEF) {
+            return 13;
+        }
+        return c < 0x0250 || (c >= 0x0370 && c < 0x0530) ? 14 : 22;
+    }
+
+    std::vector<std::uint8_t> halfBits_;
+};
+
+struct Languages {
+    std::vector<AlphabeticLanguage> alphabetic;
+    std::vector<IdeographicLanguage> ideographic;
+    std::vector<const Language*> alphabeticList;
+    std::vector<const Language*> ideographicList;
+    std::vector<const Language*> all;
+
+    Languages() {
+        for (const LetterTable& table : letterTables()) {
+            alphabetic.emplace_back(table);
+        }
+        for (const CharacterTable& table : characterTables()) {
+            ideographic.emplace_back(table);
+        }
+        for (const AlphabeticLanguage& language : alphabetic) {
+            alphabeticList.push_back(&language);
+        }
+        for (const IdeographicLanguage& language : ideographic) {
+            ideographicList.push_back(&language);
+        }
+        all = alphabeticList;
+        all.insert(all.end(), ideographicList.begin(), ideographicList.end());
+    }
+};
+
+const Languages& languages() {
+    static const Languages known;
+    return known;
+}
+
+// What is the same in every language: the words, and the cost of everything between them.
+class Dissection {
+public:
+    explicit Dissection(std::u16string_view text) : text_(text) {
+        words_.reserve(text.size());
+        std::size_t position = 0;
+        while (position < text_.size()) {
+            const std::size_t end = endOfRun(position);
+            if (end == position) {
+                cost_ += costOfAscii(text_[position]);
+                ++position;
+            } else if (isAsciiRun(position, end)) {
+                cost_ += bitsPerAscii * static_cast<double>(end - position);
+                position = end;
+            } else {
+                dissectRun(position, end);
+                position = end;
+            }
+        }
+    }
+
+    std::u16string_view words() const { return words_; }
+    double cost() const { return cost_; }
+
+private:
+    std::size_t endOfRun(std::size_t position) const {
+        while (position < text_.size() &&
+               (text_[position] >= 0x80 || isAsciiLetter(text_[position]))) {
+            ++position;
+        }
+        return position;
+    }
+
+    bool isAsciiRun(std::size_t begin, std::size_t end) const {
+        return std::all_of(text_.begin() + static_cast<std::ptrdiff_t>(begin),
+                           text_.begin() + static_cast<std::ptrdiff_t>(end),
+                           [](char16_t c) { return c < 0x80; });
+    }
+
+    static double costOfAscii(char16_t c) {
+        const bool stray =
+            (c < 0x20 && !(c >= '\t' && c <= '\r') && c != 0x1B && c != 0x1A) || c == 0x7F;
+        return stray ? bitsPerStrayControl : bitsPerAscii;
+    }
+
+    void dissectRun(std::size_t begin, std::size_t end) {
+        Case previous = Case::none;
+        bool previousTwoCapital = false;
+        for (std::size_t i = begin; i < end; ++i) {
+            const char16_t c = text_[i];
+            if (!isWordCharacter(c)) {
+                if (!words_.empty() && words_.back() != wordEnd) {
+                    words_ += wordEnd;
+                }
+                cost_ += symbolCost(c, {at(i, -1), at(i, 1)});
+                previous = Case::none;
+                previousTwoCapital = false;
+                continue;
+            }
+            words_ += folded(c);
+            const Case current = caseOf(c);
+            cost_ += costOfCase(previous, previousTwoCapital, current);
+            previousTwoCapital = previous == Case::capital && current == Case::capital;
+            previous = current;
+        }
+        if (!words_.empty() && words_.back() != wordEnd) {
+            words_ += wordEnd;
+        }
+    }
+
+    enum class Case { none, small, capital };
+
+    static Case caseOf(char16_t c) {
+        if (u_isULowercase(c)) {
+            return Case::small;
+        }
+        return u_isUUppercase(c) ? Case::capital : Case::none;
+    }
+
+    static double costOfCase(Case previous, bool previousTwoCapital, Case current) {
+        if (current == Case::capital) {
+            return previous == Case::small ? capitalInsideWordCost
+                                           : (previous == Case::none ? firstCapitalCost : 0.25);
+        }
+        return current == Case::small && previousTwoCapital ? smallAfterCapitalsCost : 0;
+    }
+
+    char16_t at(std::size_t position, int step) const {
+        const std::size_t wanted = position + static_cast<std::size_t>(step);
+        return wanted < text_.size() ? text_[wanted] : u'\0';
+    }
+
+    std::u16string_view text_;
+    std::u16string words_;
+    double cost_ = 0;
+};
+
+}  // namespace
+
+const std::vector<const Language*>& alphabeticLanguages() {
+    return languages().alphabeticList;
+}
+
+const std::vector<const Language*>& ideographicLanguages() {
+    return languages().ideographicList;
+}
+
+const std::vector<const Language*>& allLanguages() {
+    return languages().all;
+}
+
+bool isWritableWith(const Language& language, std::u16string_view repertoire) {
+    return language.isWritableWith(repertoire);
+}
+
+double costInBits(std::u16string_view text, const std::vector<const Language*>& candidates) {
+    const Dissection dissection(text);
+    double cheapest = std::numeric_limits<double>::infinity();
+    for (const Language* language : candidates) {
+        cheapest = std::min(cheapest, language->costOfWords(dissection.words()));
+    }
+    return dissection.cost() + cheapest;
+}
+
+}  // namespace platform::i18n::detail
