@@ -10,6 +10,7 @@
 
 #include "json/value.h"
 #include "platform/messaging/message_service.h"
+#include "platform/package/quillet_file_package.h"
 
 namespace EditorServices {
 
@@ -132,6 +133,32 @@ public:
     /// "exception"; "status" alone when nothing is at `path`. Throws nothing that derives from
     /// std::exception.
     json::Object readPackageDocument(std::u16string path) const;
+
+    /// The document JSON of `package`: its parts under "parts", its own relationships under
+    /// "relationships". This and the conversions below throw std::runtime_error for text that is
+    /// not valid UTF-16, and are linear in the size of what they convert.
+    json::Object packageToJson(platform::package::QuilletFilePackage package) const;
+
+    /// One object for each part, in order.
+    json::Array partsToJson(std::vector<platform::package::QuilletFilePackage::Part> parts) const;
+
+    /// The part with its content type, its URI, its content as encodePartContent gives it, and its
+    /// relationships under the singular "relationship".
+    json::Object partToJson(platform::package::QuilletFilePackage::Part part) const;
+
+    /// One object for each relationship, in order.
+    json::Array relationshipsToJson(
+        const std::vector<platform::package::QuilletFilePackage::Relationship>& relationships)
+        const;
+
+    /// The relationship, with an empty "targetMode" whatever its mode is.
+    json::Object relationshipToJson(
+        const platform::package::QuilletFilePackage::Relationship& relationship) const;
+
+    /// The "content" of a part: its bytes as they are, or a base64 data URI for the "image/" types,
+    /// unless the bytes are that very form already. Throws std::runtime_error "Out of memory!".
+    std::string encodePartContent(std::vector<std::uint8_t> bytes,
+                                  const std::string& contentType) const;
 
     // Writing.
 

@@ -1,15 +1,25 @@
-// Reads document packages.
+// Reads document packages into the document JSON.
 
+#include <cstring>
 #include <exception>
-#include <stdexcept>
+#include <string_view>
+#include <utility>
 
+#include "platform/base64/base64.h"
 #include "platform/filesystem/filesystem.h"
+#include "platform/i18n/codecvt.h"
+#include "platform/package/quillet_file_reader.h"
 #include "serialization/reading/result_keys.h"
 #include "serialization/serialization.h"
 
 namespace EditorServices {
 
+using platform::DataBuffer;
 using platform::filesystem::exists;
+using platform::i18n::codecvt_ustring_to_string;
+using platform::i18n::to_string;
+using platform::package::QuilletFilePackage;
+using platform::package::QuilletFileReader;
 
 json::Object Serialization::readPackageDocument(std::u16string path) const {
     json::Object result;
@@ -19,12 +29,80 @@ json::Object Serialization::readPackageDocument(std::u16string path) const {
             result[kStatusKey] = false;
             return result;
         }
-        throw std::runtime_error("Document packages cannot be read yet.");
+        QuilletFileReader reader(std::move(path));
+        result = packageToJson(reader.read());
+        result[kStatusKey] = true;
     } catch (const std::exception& error) {
         result[kExceptionKey] = error.what();
         result[kStatusKey] = false;
     }
     return result;
+}
+
+json::Object Serialization::packageToJson(QuilletFilePackage package) const {
+    json::Object document;
+    document[partsKey] = partsToJson(std::move(package).getParts());
+    document[relationshipsKey] = relationshipsToJson(std::move(package).getRelationships());
+    return document;
+}
+
+json::Array Serialization::partsToJson(std::vector<QuilletFilePackage::Part> parts) const {
+    json::Array array;
+    array.reserve(parts.size());
+    for (QuilletFilePackage::Part& part : parts) {
+        // Each part is given away as it is converted, so that a large package is not held twice.
+        array.push_back(partToJson(std::move(part)));
+    }
+    return array;
+}
+
+json::Object Serialization::partToJson(QuilletFilePackage::Part part) const {
+    codecvt_ustring_to_string converter("UTF-8", true);
+    const std::string type = to_string(part.contentType, converter);
+
+    json::Object object;
+    object[relationshipKey] = relationshipsToJson(part.relationships);
+    object[contentKey] = encodePartContent(std::move(part.content), type);
+    object[contentTypeKey] = type;
+    object[partUriKey] = to_string(part.partUri, converter);
+    return object;
+}
+
+json::Array Serialization::relationshipsToJson(
+    const std::vector<QuilletFilePackage::Relationship>& relationships) const {
+    json::Array array;
+    array.reserve(relationships.size());
+    for (const QuilletFilePackage::Relationship& relationship : relationships) {
+        array.push_back(relationshipToJson(relationship));
+    }
+    return array;
+}
+
+json::Object Serialization::relationshipToJson(
+    const QuilletFilePackage::Relationship& relationship) const {
+    codecvt_ustring_to_string converter("UTF-8", true);
+    json::Object object;
+    object[relationshipIdKey] = to_string(relationship.relationshipId, converter);
+    object[relationshipTypeKey] = to_string(relationship.relationshipType, converter);
+    object[targetKey] = to_string(relationship.target, converter);
+    // Empty whatever the record says: clients decide by the target.
+    object[targetModeKey] = "";
+    return object;
+}
+
+std::string Serialization::encodePartContent(std::vector<std::uint8_t> bytes,
+                                             const std::string& contentType) const {
+    std::string text(bytes.begin(), bytes.end());
+    if (!contentType.starts_with(imagePrefix)) {
+        return text;
+    }
+    const std::string prefix = dataUriPrefix + contentType + ";base64,";
+    if (text.starts_with(prefix)) {
+        // Stored as a data URI by someone; encoding it once more would hide the image.
+        return text;
+    }
+    const DataBuffer encoded = platform::base64encode(DataBuffer::copyOf(text));
+    return prefix + std::string(encoded.view());
 }
 
 }  // namespace EditorServices
