@@ -80,7 +80,7 @@ TEST_F(PackageDocumentReading, ConvertsPartsAndRelationshipsInTheirOrder) {
 }
 
 TEST_F(PackageDocumentReading, NeverTellsTheTargetMode) {
-    for (const std::uint8_t mode : {0, 1}) {
+    for (const std::uint8_t mode : {std::uint8_t{0}, std::uint8_t{1}}) {
         const json::Object object =
             service.relationshipToJson({u"urn:type", u"target", u"id", mode});
         EXPECT_EQ(object.at("targetMode").get<std::string>(), "");
