@@ -18,8 +18,9 @@ set(EDITOR_SERIALIZATION_SANITIZERS "" CACHE STRING "Sanitizers to build with, a
 
 add_compile_options(-Wall -Wextra -Wpedantic -Wconversion -Wshadow)
 if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU" AND CMAKE_CXX_COMPILER_VERSION VERSION_LESS 13)
-  # Cries wolf over every std::variant that is moved through an inlined temporary.
-  add_compile_options(-Wno-maybe-uninitialized)
+  # Cries wolf over every std::variant that is moved through an inlined temporary, and over
+  # overlaps in plain concatenations of strings.
+  add_compile_options(-Wno-maybe-uninitialized -Wno-restrict)
 endif()
 if(EDITOR_SERIALIZATION_WARNINGS_AS_ERRORS)
   add_compile_options(-Werror)
