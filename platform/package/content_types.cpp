@@ -5,6 +5,7 @@
 #include <stdexcept>
 #include <utility>
 
+#include "platform/package/about.h"
 #include "platform/package/package_xml.h"
 #include "platform/package/part_name.h"
 #include "platform/package/relationships.h"
@@ -19,11 +20,11 @@ constexpr std::string_view kXmlMediaType = "application/xml";
 template <class Map>
 void enter(Map& types, std::string key, std::string_view mediaType) {
     if (mediaType.empty()) {
-        throw std::runtime_error("has an empty content type for \"" + key + "\"");
+        throw std::runtime_error("has an empty content type for " + quoted(key));
     }
     const auto [place, isNew] = types.try_emplace(std::move(key), mediaType);
     if (!isNew && place->second != mediaType) {
-        throw std::runtime_error("has two content types for \"" + place->first + "\"");
+        throw std::runtime_error("has two content types for " + quoted(place->first));
     }
 }
 

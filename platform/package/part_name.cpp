@@ -11,15 +11,8 @@ namespace {
 constexpr std::string_view kRelationshipsFolder = "_rels";
 constexpr std::string_view kRelationshipsExtension = ".rels";
 
-constexpr char toLowerAscii(char c) {
+constexpr char lowered(char c) {
     return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
-}
-
-std::string toLowerAscii(std::string_view text) {
-    std::string lower(text);
-    std::transform(lower.begin(), lower.end(), lower.begin(),
-                   [](char c) { return toLowerAscii(c); });
-    return lower;
 }
 
 bool equalsIgnoringCase(std::string_view a, std::string_view b) {
@@ -89,7 +82,7 @@ std::string_view lastSegment(std::string_view name) {
 
 // Whether `reference` begins with a scheme, as absolute URIs do.
 bool hasScheme(std::string_view reference) {
-    const auto isLetter = [](char c) { return toLowerAscii(c) >= 'a' && toLowerAscii(c) <= 'z'; };
+    const auto isLetter = [](char c) { return lowered(c) >= 'a' && lowered(c) <= 'z'; };
     if (reference.empty() || !isLetter(reference.front())) {
         return false;
     }
@@ -120,6 +113,12 @@ std::string withoutDotSegments(std::string_view path) {
 }
 
 }  // namespace
+
+std::string toLowerAscii(std::string_view text) {
+    std::string lower(text);
+    std::transform(lower.begin(), lower.end(), lower.begin(), lowered);
+    return lower;
+}
 
 std::string partNameKey(std::string_view name) {
     return toLowerAscii(withEscapesResolved(name));

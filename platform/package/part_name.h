@@ -15,6 +15,9 @@ constexpr std::string_view kContentTypesName = "/[Content_Types].xml";
 /// The source of package-level relationships, which is the package and not a part.
 constexpr std::string_view kPackageRoot = "/";
 
+/// `text` with its ASCII letters in lower case.
+std::string toLowerAscii(std::string_view text);
+
 /// What two names that mean the same part have in common: percent escapes resolved and ASCII
 /// letters in lower case.
 std::string partNameKey(std::string_view name);

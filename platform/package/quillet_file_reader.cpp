@@ -12,6 +12,7 @@
 
 #include "platform/filesystem/filesystem.h"
 #include "platform/i18n/codecvt.h"
+#include "platform/package/about.h"
 #include "platform/package/content_types.h"
 #include "platform/package/limits.h"
 #include "platform/package/part_name.h"
@@ -37,16 +38,6 @@ struct Item {
     std::vector<Fragment> fragments;
 };
 
-// Does `work`, putting `subject` before what it throws.
-template <class Work>
-auto about(const std::string& subject, Work work) {
-    try {
-        return work();
-    } catch (const std::runtime_error& error) {
-        throw std::runtime_error(subject + " " + error.what());
-    }
-}
-
 // Entry names have no slash before them, but some producers write one, or backslashes for slashes.
 std::string partNameOf(const ZipArchive::Entry& entry) {
     std::string name = entry.name;
@@ -63,11 +54,11 @@ void order(Item& item) {
         return a.number == b.number;
     };
     if (std::adjacent_find(fragments.begin(), fragments.end(), sameNumber) != fragments.end()) {
-        throw std::runtime_error("has two entries named \"" + item.name + "\"");
+        throw std::runtime_error("has two entries named " + quoted(item.name));
     }
     for (std::size_t i = 0; i < fragments.size(); ++i) {
         if (fragments[i].number != i || fragments[i].isLast != (i + 1 == fragments.size())) {
-            throw std::runtime_error("lacks pieces of the interleaved part " + item.name);
+            throw std::runtime_error("lacks pieces of the interleaved part " + quoted(item.name));
         }
     }
 }
@@ -139,7 +130,7 @@ private:
     }
 
     Part readPart(const Item& item, const std::string& mediaType) {
-        return about("has a broken part: " + item.name, [&] {
+        return about("has a broken part: " + quoted(item.name), [&] {
             if (const std::string_view problem = partNameProblem(item.name); !problem.empty()) {
                 throw std::runtime_error("is not a valid part name: " + std::string(problem));
             }
@@ -158,7 +149,7 @@ private:
         if (item == nullptr) {
             return {};
         }
-        return about("has a broken relationships part: " + item->name, [&] {
+        return about("has a broken relationships part: " + quoted(item->name), [&] {
             return parseRelationships(contentOf(*item, limits::kMaxPackageXmlBytes));
         });
     }
@@ -174,7 +165,7 @@ QuilletFileReader::QuilletFileReader(std::u16string path) : path_(std::move(path
 
 QuilletFilePackage QuilletFileReader::read() {
     const std::string path = filesystem::make_native_access_form_with_cleanup(path_);
-    return about("\"" + path + "\"", [&] { return PackageFile(path).read(); });
+    return about(quoted(path), [&] { return PackageFile(path).read(); });
 }
 
 }  // namespace platform::package

@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "platform/i18n/codecvt.h"
+#include "platform/package/about.h"
 #include "platform/package/package_xml.h"
 
 namespace platform::package {
@@ -19,10 +20,10 @@ void check(const std::string& id, std::string_view type, Ids& ids) {
         throw std::runtime_error("has a relationship without an id");
     }
     if (type.empty()) {
-        throw std::runtime_error("has a relationship \"" + id + "\" without a type");
+        throw std::runtime_error("has a relationship " + quoted(id) + " without a type");
     }
     if (!ids.insert(id).second) {
-        throw std::runtime_error("has two relationships of the id \"" + id + "\"");
+        throw std::runtime_error("has two relationships of the id " + quoted(id));
     }
 }
 

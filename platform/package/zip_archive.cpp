@@ -17,6 +17,7 @@
 #include <utility>
 
 #include "platform/i18n/codecvt.h"
+#include "platform/package/about.h"
 #include "platform/package/limits.h"
 #include "platform/package/little_endian.h"
 #include "platform/package/zip_format.h"
@@ -31,7 +32,7 @@ using Bytes = std::span<const std::uint8_t>;
 }
 
 [[noreturn]] void failForEntry(const std::string& name, const std::string& problem) {
-    fail("entry \"" + name + "\" " + problem);
+    fail("entry " + quoted(name) + " " + problem);
 }
 
 [[noreturn]] void failForSystem(const char* what) {

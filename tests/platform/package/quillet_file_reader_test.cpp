@@ -200,7 +200,7 @@ TEST_F(QuilletFileReaderTest, JoinsInterleavedPieces) {
 
 TEST_F(QuilletFileReaderTest, RefusesMissingOrRepeatedPieces) {
     expectRefused(usualPackage({{"a.xml/[0].piece", "x"}}),
-                  "lacks pieces of the interleaved part /a.xml");
+                  "lacks pieces of the interleaved part \"/a.xml\"");
     expectRefused(usualPackage({{"a.xml/[1].last.piece", "x"}}), "lacks pieces");
     expectRefused(usualPackage({{"a.xml/[0].piece", "x"}, {"a.xml/[2].last.piece", "x"}}),
                   "lacks pieces");
@@ -221,7 +221,7 @@ TEST_F(QuilletFileReaderTest, RefusesNamesThatAreEqualButForCaseOrEscapes) {
 }
 
 TEST_F(QuilletFileReaderTest, RefusesPartsWithInvalidNames) {
-    expectRefused(usualPackage({{"a/../b.xml", "x"}}), "/a/../b.xml is not a valid part name");
+    expectRefused(usualPackage({{"a/../b.xml", "x"}}), "\"/a/../b.xml\" is not a valid part name");
     expectRefused(usualPackage({{"a//b.xml", "x"}}), "empty segment");
     expectRefused(usualPackage({{"a\nb.xml", "x"}}), "control character");
     expectRefused(usualPackage({{std::string("a\0b.xml", 7), "x"}}), "whose name holds a zero");
@@ -231,16 +231,17 @@ TEST_F(QuilletFileReaderTest, RefusesPartsWithInvalidNames) {
 TEST_F(QuilletFileReaderTest, NamesThePartThatIsBroken) {
     ZipEntry entry{"word/document.xml", "text", true};
     entry.checksum = 1;
-    expectRefused(usualPackage({entry}), "part: /word/document.xml is damaged (CRC)");
+    expectRefused(usualPackage({entry}), "part: \"/word/document.xml\" is damaged (CRC)");
     entry.checksum.reset();
     entry.size = 5;
-    expectRefused(usualPackage({entry}), "part: /word/document.xml is damaged (wrong size)");
+    expectRefused(usualPackage({entry}), "part: \"/word/document.xml\" is damaged (wrong size)");
     entry.size.reset();
     entry.flags = 1;
-    expectRefused(usualPackage({entry}), "part: /word/document.xml is encrypted");
+    expectRefused(usualPackage({entry}), "part: \"/word/document.xml\" is encrypted");
     entry.flags = 0;
     entry.method = 99;
-    expectRefused(usualPackage({entry}), "part: /word/document.xml is compressed with the unknown");
+    expectRefused(usualPackage({entry}),
+                  "part: \"/word/document.xml\" is compressed with the unknown");
 }
 
 TEST_F(QuilletFileReaderTest, RefusesWhatIsNoPackage) {
@@ -294,7 +295,7 @@ TEST_F(QuilletFileReaderTest, AcceptsAContentTypeThatIsGivenTwice) {
 TEST_F(QuilletFileReaderTest, RefusesBrokenRelationships) {
     const auto refused = [&](const std::string& xml, const std::string& message) {
         expectRefused(usualPackage({{"a.xml", "<a/>"}, {"_rels/a.xml.rels", xml}}),
-                      "has a broken relationships part: /_rels/a.xml.rels " + message);
+                      "has a broken relationships part: \"/_rels/a.xml.rels\" " + message);
     };
     refused("<Relationships", "is not well-formed XML");
     refused("<Relationships/>", "has another root element than Relationships");

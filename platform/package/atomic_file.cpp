@@ -1,0 +1,287 @@
+#include "platform/package/atomic_file.h"
+
+#include <fcntl.h>
+#include <sys/random.h>
+#include <sys/xattr.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <climits>
+#include <cstddef>
+#include <cstdint>
+#include <cstdio>
+#include <stdexcept>
+#include <system_error>
+#include <vector>
+
+namespace platform::package {
+namespace {
+
+constexpr std::size_t kBufferSize = 64 * 1024;
+constexpr const char* kAccessControlList = "system.posix_acl_access";
+
+[[noreturn]] void failForSystem(const char* what) {
+    throw std::system_error(errno, std::generic_category(), what);
+}
+
+// Repeats `call` as long as a signal interrupts it.
+template <class Call>
+auto uninterrupted(Call call) {
+    auto result = call();
+    while (result < 0 && errno == EINTR) {
+        result = call();
+    }
+    return result;
+}
+
+// The folder of `path`, with a slash at its end; empty for the current one.
+std::string folderOf(const std::string& path) {
+    return path.substr(0, path.rfind('/') + 1);
+}
+
+// The path at the end of the symbolic links that begin at `path`, where there may be nothing. Links
+// in the folders on the way there are the system's business.
+std::string followLinks(std::string path) {
+    constexpr int maxLinks = 40;  // as the system itself
+    for (int i = 0; i < maxLinks; ++i) {
+        std::array<char, PATH_MAX> buffer{};
+        const ssize_t length = ::readlink(path.c_str(), buffer.data(), buffer.size());
+        if (length < 0 && (errno == EINVAL || errno == ENOENT)) {
+            return path;
+        }
+        if (length < 0) {
+            failForSystem("cannot be found");
+        }
+        const std::string link(buffer.data(), static_cast<std::size_t>(length));
+        path = link.starts_with('/') ? link : folderOf(path) + link;
+    }
+    errno = ELOOP;
+    failForSystem("cannot be found");
+}
+
+// A name that no other save uses, short enough for every file system.
+std::string randomName() {
+    std::uint64_t number = 0;
+    if (uninterrupted([&] { return ::getrandom(&number, sizeof number, 0); }) != sizeof number) {
+        failForSystem("cannot be saved: no random name for a temporary file");
+    }
+    std::array<char, 32> name{};
+    std::snprintf(name.data(), name.size(), ".~saving-%016llx.tmp",
+                  static_cast<unsigned long long>(number));
+    return name.data();
+}
+
+// The value of the extended attribute `name` of the file at `path`, or nothing if it cannot be had.
+std::optional<std::vector<char>> attributeOf(const std::string& path, const char* name) {
+    const ssize_t size = ::lgetxattr(path.c_str(), name, nullptr, 0);
+    if (size < 0) {
+        return std::nullopt;
+    }
+    std::vector<char> value(static_cast<std::size_t>(size));
+    if (::lgetxattr(path.c_str(), name, value.data(), value.size()) != size) {
+        return std::nullopt;
+    }
+    return value;
+}
+
+// The names of the extended attributes of the file at `path`; none where there is no such thing.
+std::vector<std::string> attributeNamesOf(const std::string& path) {
+    const ssize_t size = ::llistxattr(path.c_str(), nullptr, 0);
+    std::string list(static_cast<std::size_t>(std::max<ssize_t>(size, 0)), '\0');
+    if (size <= 0 || ::llistxattr(path.c_str(), list.data(), list.size()) != size) {
+        return {};
+    }
+    std::vector<std::string> names;
+    for (std::size_t at = 0; at < list.size(); at += names.back().size() + 1) {
+        names.emplace_back(list.c_str() + at);
+    }
+    return names;
+}
+
+}  // namespace
+
+AtomicFile::AtomicFile(const std::string& path) : targetPath_(followLinks(path)) {
+    const std::string folder = folderOf(targetPath_);
+    targetName_ = targetPath_.substr(folder.size());
+    if (targetName_.empty() || targetName_ == "." || targetName_ == "..") {
+        throw std::runtime_error(path.empty() ? "has no name" : "is a folder");
+    }
+    buffer_.reserve(kBufferSize);
+    openFolder(folder.empty() ? "." : folder);
+    examineTarget();
+    createTemporary();
+}
+
+AtomicFile::~AtomicFile() {
+    if (!temporaryName_.empty()) {
+        ::unlinkat(folder_.get(), temporaryName_.c_str(), 0);
+    }
+}
+
+// The folder is held open so that everything happens in it even if it is renamed meanwhile. A
+// folder that may be written but not listed cannot be opened in the way that syncing it needs.
+void AtomicFile::openFolder(const std::string& folder) {
+    folder_ = FileDescriptor(
+        uninterrupted([&] { return ::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); }));
+    if (!folder_ && errno == EACCES) {
+        folderCanSync_ = false;
+        folder_ = FileDescriptor(uninterrupted(
+            [&] { return ::open(folder.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC); }));
+    }
+    if (!folder_) {
+        failForSystem("cannot be saved: its folder cannot be opened");
+    }
+}
+
+// Replacing a file needs no permission to write it, so that is asked for.
+void AtomicFile::examineTarget() {
+    struct stat status {};
+    if (::fstatat(folder_.get(), targetName_.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
+        if (errno == ENOENT) {
+            return;
+        }
+        failForSystem("cannot be examined");
+    }
+    if (!S_ISREG(status.st_mode)) {
+        throw std::runtime_error(S_ISDIR(status.st_mode) ? "is a folder" : "is not a regular file");
+    }
+    if (::faccessat(folder_.get(), targetName_.c_str(), W_OK, AT_EACCESS) != 0) {
+        failForSystem("may not be written");
+    }
+    target_ = status;
+}
+
+// The content of an existing document stays private until its permissions are known to be right; a
+// new one gets what the process gives to new files.
+void AtomicFile::createTemporary() {
+    constexpr int attempts = 100;
+    const mode_t mode = target_ ? 0600 : 0666;
+    for (int i = 0; i < attempts && !temporary_; ++i) {
+        const std::string name = randomName();
+        temporary_ = FileDescriptor(uninterrupted([&] {
+            return ::openat(folder_.get(), name.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC,
+                            mode);
+        }));
+        if (temporary_) {
+            temporaryName_ = name;
+        } else if (errno != EEXIST) {
+            break;
+        }
+    }
+    if (!temporary_) {
+        failForSystem("cannot be saved: no file can be created in its folder");
+    }
+}
+
+void AtomicFile::write(std::string_view bytes) {
+    if (buffer_.size() + bytes.size() > kBufferSize) {
+        flush();
+    }
+    if (bytes.size() >= kBufferSize) {
+        writeAll(bytes);
+    } else {
+        buffer_.append(bytes);
+    }
+}
+
+void AtomicFile::flush() {
+    writeAll(buffer_);
+    buffer_.clear();
+}
+
+void AtomicFile::writeAll(std::string_view bytes) {
+    while (!bytes.empty()) {
+        const ssize_t count =
+            uninterrupted([&] { return ::write(temporary_.get(), bytes.data(), bytes.size()); });
+        if (count < 0) {
+            failForSystem("cannot be saved");
+        }
+        bytes.remove_prefix(static_cast<std::size_t>(count));
+    }
+}
+
+void AtomicFile::commit() {
+    flush();
+    if (target_) {
+        takeOverAccess();
+    }
+    if (uninterrupted([&] { return ::fsync(temporary_.get()); }) != 0) {
+        failForSystem("cannot be saved");
+    }
+    if (::close(temporary_.release()) != 0) {
+        failForSystem("cannot be saved");
+    }
+    if (::renameat(folder_.get(), temporaryName_.c_str(), folder_.get(), targetName_.c_str()) !=
+        0) {
+        failForSystem("cannot be replaced");
+    }
+    temporaryName_.clear();
+    syncFolder();
+}
+
+// The permissions come last: changing the owner can clear some of them, and the group's permissions
+// are those of the access control list's mask where there is a list.
+void AtomicFile::takeOverAccess() {
+    const mode_t mode = takeOverOwner();
+    takeOverAttributes();
+    if (::fchmod(temporary_.get(), mode) != 0) {
+        failForSystem("cannot be saved with its permissions");
+    }
+}
+
+// Returns the permissions that the file may have with the owner and the group that it got.
+mode_t AtomicFile::takeOverOwner() {
+    const auto change = [this](uid_t owner, gid_t group) {
+        if (::fchown(temporary_.get(), owner, group) == 0) {
+            return true;
+        }
+        if (errno != EPERM &&
+            errno != EINVAL) {  // EINVAL: an owner whom this container does not know
+            failForSystem("cannot be saved with its owner");
+        }
+        return false;
+    };
+    const mode_t mode = target_->st_mode;
+    if (change(target_->st_uid, target_->st_gid)) {
+        return mode & 07777U;
+    }
+    if (change(static_cast<uid_t>(-1), target_->st_gid)) {
+        return mode & 01777U;
+    }
+    const mode_t forAll = mode & (mode >> 3U) & 07U;
+    return (mode & 01707U) | forAll << 3U;
+}
+
+// Attributes are copied as far as the system lets them be, but for the access control list: without
+// it, or with one that the folder gave to the new file, others could read what they should not.
+void AtomicFile::takeOverAttributes() {
+    bool hasList = false;
+    for (const std::string& name : attributeNamesOf(targetPath_)) {
+        const std::optional<std::vector<char>> value = attributeOf(targetPath_, name.c_str());
+        const bool isList = name == kAccessControlList;
+        hasList = hasList || isList;
+        const bool done = value && ::fsetxattr(temporary_.get(), name.c_str(), value->data(),
+                                               value->size(), 0) == 0;
+        if (isList && !done) {
+            failForSystem("cannot be saved with its access control list");
+        }
+    }
+    if (!hasList && ::fremovexattr(temporary_.get(), kAccessControlList) != 0 && errno != ENODATA &&
+        errno != ENOTSUP) {
+        failForSystem("cannot be saved with its permissions");
+    }
+}
+
+void AtomicFile::syncFolder() {
+    if (!folderCanSync_) {
+        return;
+    }
+    // Some file systems cannot sync folders, and say so.
+    if (uninterrupted([&] { return ::fsync(folder_.get()); }) != 0 && errno != EINVAL) {
+        failForSystem("has been replaced, but that may not be safe on disk");
+    }
+}
+
+}  // namespace platform::package
