@@ -1,0 +1,72 @@
+// The bundle in the framework that this build has.
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <fstream>
+#include <sstream>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+#include "framework/bundle_runner.h"
+#include "tests/serialization/activator/watched_messaging.h"
+
+namespace {
+
+using framework::BundleRunner;
+using testing::ElementsAre;
+using testing::HasSubstr;
+using testing::IsEmpty;
+using testing::Not;
+using tests::WatchedMessaging;
+
+class BundleInFrameworkTest : public testing::Test {
+protected:
+    std::vector<std::string> answersToRead() {
+        return messaging_.publish(
+            "/zpr/service/readRequest_cpp",
+            R"({"rtcId":"r","contentType":"text/plain","filePath":"/dev/null"})");
+    }
+
+    WatchedMessaging messaging_;
+};
+
+TEST_F(BundleInFrameworkTest, AnswersRequestsUntilItIsStopped) {
+    BundleRunner runner(BUNDLE);
+    EXPECT_THAT(answersToRead(),
+                ElementsAre(R"(/zpr/service/readResponse/r {"data":"","status":true})"));
+    runner.stop();
+    EXPECT_THAT(answersToRead(), IsEmpty());
+}
+
+TEST_F(BundleInFrameworkTest, FailsToStartWithTheTextOfTheMessageService) {
+    messaging_.createWith([](const std::string&, const platform::messaging::MessageServiceOptions&)
+                              -> WatchedMessaging::Created { throw std::runtime_error("no bus"); });
+    try {
+        const BundleRunner runner(BUNDLE);
+        ADD_FAILURE() << "the bundle starts";
+    } catch (const std::runtime_error& error) {
+        EXPECT_THAT(error.what(), HasSubstr("no bus"));
+    }
+}
+
+#ifdef BUNDLES_ARE_UNLOADED
+TEST_F(BundleInFrameworkTest, LeavesTheProcessInTheEnd) {
+    const auto loadedFiles = [] {
+        std::ostringstream maps;
+        maps << std::ifstream("/proc/self/maps").rdbuf();
+        return maps.str();
+    };
+    const std::string file = std::filesystem::path(BUNDLE).filename().string();
+    {
+        const BundleRunner runner(BUNDLE);
+        answersToRead();
+        ASSERT_THAT(loadedFiles(), HasSubstr(file));
+    }
+    EXPECT_THAT(loadedFiles(), Not(HasSubstr(file)));
+}
+#endif
+
+}  // namespace
