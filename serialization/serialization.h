@@ -186,6 +186,22 @@ public:
     /// array.
     bool writePackageDocument(std::u16string path, json::Object document) const;
 
+    /// The parts that the objects of `array` describe. This and the conversions below throw
+    /// std::runtime_error when a key is missing, has the wrong kind or holds text that is not
+    /// UTF-8, and are linear in the size of what they convert.
+    std::vector<platform::package::QuilletFilePackage::Part> partsFromJson(json::Array array) const;
+
+    /// The relationships that the objects of `array` describe; external are those whose
+    /// "targetMode" begins with "External", and all of them unless `allowInternal`.
+    std::vector<platform::package::QuilletFilePackage::Relationship> relationshipsFromJson(
+        json::Array array, bool allowInternal) const;
+
+    /// The bytes of a part. "application/" content is text and is cleaned; "image/" content that is
+    /// a data URI is decoded, and throws std::runtime_error where it is no base64; all other
+    /// content is taken as it stands.
+    std::vector<std::uint8_t> decodePartContent(std::string content,
+                                                const std::string& contentType) const;
+
     /// `text` in UTF-8 with replacementChar in the place of each code unit that a package's text
     /// must not contain.
     std::vector<std::uint8_t> cleanTextToUtf8(std::string text) const;

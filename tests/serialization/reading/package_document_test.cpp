@@ -7,6 +7,7 @@
 #include "json/serialize.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/package/quillet_file_package.h"
+#include "platform/package/quillet_file_writer.h"
 #include "serialization/serialization.h"
 #include "tests/support/temporary_directory.h"
 
@@ -15,6 +16,7 @@ namespace {
 
 using platform::i18n::to_ustring;
 using platform::package::QuilletFilePackage;
+using platform::package::QuilletFileWriter;
 using test::writeFile;
 using Part = QuilletFilePackage::Part;
 using Relationship = QuilletFilePackage::Relationship;
@@ -57,6 +59,17 @@ TEST_F(PackageDocumentReading, AnswersWhyTheSystemCannotTellWhetherTheFileExists
     EXPECT_FALSE(result.at("status").get<bool>());
     EXPECT_THAT(result.at("exception").get<std::string>(),
                 testing::HasSubstr("File name too long"));
+}
+
+TEST_F(PackageDocumentReading, AnswersAnEmptyPackageWithEmptyArrays) {
+    std::vector<Part> parts;
+    std::vector<Relationship> relationships;
+    const std::u16string path = to_ustring((folder / "empty.docx").string());
+    QuilletFileWriter writer(path, {});
+    writer.write(QuilletFilePackage(parts, relationships));
+    writer.close(false);
+    EXPECT_EQ(textOf(json::Value(service.readPackageDocument(path))),
+              R"({"parts":[],"relationships":[],"status":true})");
 }
 
 TEST_F(PackageDocumentReading, ConvertsPartsAndRelationshipsInTheirOrder) {
