@@ -33,7 +33,7 @@ constexpr double firstCapitalCost = 1;
 
 constexpr char16_t wordEnd = 0;
 
-// All letters of alphabets, and nothing that the ideographic languages need, lie below this.
+// The letters of alphabets, and nothing that the ideographic languages need, lie below this.
 constexpr std::size_t alphabetLimit = 0x2000;
 
 constexpr bool isAsciiLetter(char16_t c) {
@@ -70,7 +70,11 @@ public:
         : table_(table), size_(table.alphabet.size() + 1) {
         std::uint8_t next = 1;
         for (const char16_t letter : table.alphabet) {
-            index_[letter] = next++;
+            // Arabic has some presentation forms above the limit, which count as foreign.
+            if (letter < alphabetLimit) {
+                index_[letter] = next;
+            }
+            ++next;
         }
     }
 
