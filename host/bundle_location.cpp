@@ -1,0 +1,31 @@
+#include "host/bundle_location.h"
+
+#include <array>
+#include <stdexcept>
+#include <string>
+#include <system_error>
+
+namespace host {
+
+std::filesystem::path findBundle() {
+    const std::filesystem::path programFolder =
+        std::filesystem::read_symlink("/proc/self/exe").parent_path();
+    // From the program's folder, the library folder of a build tree and that of an installation.
+    const std::array<std::filesystem::path, 2> libraryFolders = {"../lib",
+                                                                 INSTALLED_LIBRARY_FOLDER};
+    std::string places;
+    for (const std::filesystem::path& folder : libraryFolders) {
+        const std::filesystem::path bundle =
+            (programFolder / folder / BUNDLE_FILE_NAME).lexically_normal();
+        std::error_code ignored;
+        if (std::filesystem::exists(bundle, ignored)) {
+            return bundle;
+        }
+        if (places.find(bundle.string()) == std::string::npos) {
+            places += (places.empty() ? "" : " nor ") + bundle.string();
+        }
+    }
+    throw std::runtime_error("there is no bundle at " + places + "; name one with --bundle");
+}
+
+}  // namespace host

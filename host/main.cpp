@@ -1,0 +1,134 @@
+// serialization_host: loads the bundle and gives it a message bus.
+#include <spdlog/sinks/stdout_color_sinks.h>
+#include <spdlog/spdlog.h>
+
+#include <unistd.h>
+
+#include <CLI/CLI.hpp>
+#include <chrono>
+#include <csignal>
+#include <exception>
+#include <filesystem>
+#include <iostream>
+#include <sstream>
+#include <string>
+
+#include "host/bundle_location.h"
+#include "host/exit_status.h"
+#include "host/file_descriptor.h"
+#include "host/read_command.h"
+#include "host/standard_streams.h"
+#include "host/stdio_command.h"
+
+namespace {
+
+constexpr const char* programName = "serialization_host";
+
+struct CommandLine {
+    std::string logLevel = "warning";
+    std::filesystem::path bundle;
+    host::ReadOptions read;
+    host::StdioOptions stdio;
+};
+
+void declareRead(CLI::App& command, host::ReadOptions& options) {
+    command.add_option("FILE", options.files, "The files to read")->required();
+    command
+        .add_option("--content-type", options.contentType,
+                    "The content type to ask for (default: text/xml for a document package, else "
+                    "text/plain)")
+        ->type_name("TYPE");
+    command
+        .add_option_function<unsigned>(
+            "--timeout",
+            [&options](unsigned seconds) { options.timeout = std::chrono::seconds(seconds); },
+            "How long to wait for a response (default: " + std::to_string(options.timeout.count()) +
+                ")")
+        ->type_name("SECONDS")
+        ->check(CLI::Range(1U, 1'000'000'000U));
+}
+
+void declareStdio(CLI::App& command, host::StdioOptions& options) {
+    command
+        .add_option(
+            "--max-message", options.largestMessage,
+            "The largest message to take, in bytes or with a unit such as MB (default: 1 GB)")
+        ->type_name("SIZE")
+        ->transform(CLI::AsSizeValue(false));
+}
+
+// Declares the options and commands of `app`, which a parse puts into `line`.
+void declare(CLI::App& app, CommandLine& line) {
+    app.set_version_flag("--version", std::string(programName) + " " + PROGRAM_VERSION);
+    app.add_option("--bundle", line.bundle,
+                   "The bundle to load (default: the one that belongs to the program)")
+        ->type_name("PATH");
+    app.add_option("--log-level", line.logLevel,
+                   "What to tell on standard error (default: " + line.logLevel + ")")
+        ->type_name("LEVEL")
+        ->check(CLI::IsMember({"trace", "debug", "info", "warning", "error", "critical", "off"}));
+    app.require_subcommand(1);
+    app.fallthrough();
+    declareRead(*app.add_subcommand("read", "Read files and print the response for each on a line"),
+                line.read);
+    declareStdio(*app.add_subcommand("stdio", "Carry framed messages on standard input and output"),
+                 line.stdio);
+}
+
+void setUpLogging(const std::string& level) {
+    spdlog::set_default_logger(spdlog::stderr_color_mt(programName));
+    spdlog::set_pattern("%^%n: %l:%$ %v");
+    spdlog::set_level(spdlog::level::from_str(level));
+}
+
+int run(CLI::App& app, CommandLine& line, int output) {
+    const std::filesystem::path bundle = line.bundle.empty() ? host::findBundle() : line.bundle;
+    if (app.got_subcommand("read")) {
+        line.read.bundle = bundle;
+        return host::runRead(line.read, output);
+    }
+    line.stdio.bundle = bundle;
+    return host::runStdio(line.stdio, STDIN_FILENO, output);
+}
+
+// Tells what ended the parse early: help and version on `output`, an error on standard error.
+int explain(const CLI::App& app, const CLI::ParseError& error, int output) {
+    std::ostringstream help;
+    std::ostringstream complaint;
+    const bool isHelp = app.exit(error, help, complaint) == 0;
+    if (!isHelp) {
+        std::cerr << programName << ": " << complaint.str();
+        return host::exitWrongUsage;
+    }
+    host::writeAll(output, {help.str()});
+    return host::exitDone;
+}
+
+int runCommandLine(int argc, char** argv) {
+    host::openMissingStandardStreams();
+    const host::FileDescriptor output = host::divertStandardOutput();
+    CLI::App app("Loads the document-serialization bundle and gives it a message bus.",
+                 programName);
+    CommandLine line;
+    declare(app, line);
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError& error) {
+        return explain(app, error, output.get());
+    }
+    setUpLogging(line.logLevel);
+    return run(app, line, output.get());
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    // A reader that goes away shall be an error of the write, not the end of the process.
+    std::signal(SIGPIPE, SIG_IGN);
+    try {
+        return runCommandLine(argc, argv);
+    } catch (const std::exception& error) {
+        std::cerr << programName << ": " << error.what() << '\n';
+        return host::exitRequestFailed;
+    }
+}

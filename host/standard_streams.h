@@ -1,0 +1,31 @@
+// The program's standard input and output, read and written without a buffer between.
+//
+// Results leave through the standard output that the program was started with, and nothing else
+// does: the process's own standard output is pointed at standard error, so that no library's print
+// gets between the results.
+#pragma once
+
+#include <cstddef>
+#include <initializer_list>
+#include <string_view>
+
+#include "host/file_descriptor.h"
+
+namespace host {
+
+/// Makes sure that descriptors 0, 1 and 2 are open, on /dev/null where they are not, so that no
+/// file opened later takes the place of a standard stream. Throws std::system_error.
+void openMissingStandardStreams();
+
+/// Points descriptor 1 at standard error and returns what it was. Throws std::system_error.
+FileDescriptor divertStandardOutput();
+
+/// Writes all `pieces`, one after the other, waiting where `fd` takes nothing more for now. Throws
+/// std::system_error when it cannot; part of the bytes may have been written by then.
+void writeAll(int fd, std::initializer_list<std::string_view> pieces);
+
+/// Reads up to `room` bytes to `to`, waiting for the first of them. Returns how many there were;
+/// zero means the end of the input. Throws std::system_error.
+std::size_t readSome(int fd, char* to, std::size_t room);
+
+}  // namespace host

@@ -1,0 +1,114 @@
+#include "host/stdio_command.h"
+
+#include <poll.h>
+#include <spdlog/spdlog.h>
+#include <sys/eventfd.h>
+
+#include <array>
+#include <atomic>
+#include <cerrno>
+#include <exception>
+#include <mutex>
+#include <optional>
+#include <stdexcept>
+#include <string>
+#include <system_error>
+#include <utility>
+
+#include "host/bundle_host.h"
+#include "host/exit_status.h"
+#include "host/file_descriptor.h"
+#include "host/framing.h"
+#include "host/standard_streams.h"
+
+namespace host {
+
+namespace {
+
+using platform::messaging::JsonMessage;
+
+// Writes messages as frames, one after the other whoever brings them, until a write fails.
+class FrameOutput {
+public:
+    explicit FrameOutput(int output) : output_(output), broken_(::eventfd(0, EFD_CLOEXEC)) {
+        if (broken_.get() < 0) {
+            throw std::system_error(errno, std::generic_category(), "cannot make an eventfd");
+        }
+    }
+
+    // Any thread may call it. A message that no frame can carry is left out; what comes after a
+    // failed write is too, for its reader could not tell where it begins.
+    void write(const JsonMessage& message) {
+        std::string headers;
+        try {
+            headers = frameHeaders(message.channel(), message.payload().size());
+        } catch (const std::invalid_argument& error) {
+            spdlog::error("a message is left out: {}", error.what());
+            return;
+        }
+        const std::lock_guard lock(mutex_);
+        if (isBroken_) {
+            return;
+        }
+        try {
+            writeAll(output_, {headers, message.payload()});
+        } catch (const std::system_error& error) {
+            spdlog::error("{}", error.what());
+            isBroken_ = true;
+            ::eventfd_write(broken_.get(), 1);
+        }
+    }
+
+    bool isBroken() const { return isBroken_; }
+
+    // Blocks until `input` has bytes or has ended; returns false when the output broke instead.
+    bool waitForInput(int input) const {
+        std::array<pollfd, 2> waited{{{input, POLLIN, 0}, {broken_.get(), POLLIN, 0}}};
+        while (::poll(waited.data(), waited.size(), -1) < 0) {
+            if (errno != EINTR) {
+                throw std::system_error(errno, std::generic_category(), "cannot wait for input");
+            }
+        }
+        return !isBroken_;
+    }
+
+private:
+    int output_;
+    FileDescriptor broken_;  // Becomes readable when a write has failed.
+    std::atomic<bool> isBroken_ = false;
+    std::mutex mutex_;  // Held while a frame is written.
+};
+
+// Sends on the messages of `input` until it ends. Returns the exit status that it leads to.
+int takeMessages(FrameReader& input, BundleHost& host) {
+    try {
+        while (std::optional<Frame> frame = input.next()) {
+            host.publish(frame->channel, std::move(frame->payload));
+        }
+        return exitDone;
+    } catch (const FramingError& error) {
+        spdlog::error("{}", error.what());
+        return exitWrongUsage;
+    } catch (const std::exception& error) {
+        spdlog::error("{}", error.what());
+        return exitRequestFailed;
+    }
+}
+
+}  // namespace
+
+int runStdio(const StdioOptions& options, int input, int output) {
+    FrameOutput frames(output);
+    BundleHost host(options.bundle, options.largestMessage,
+                    [&frames](const JsonMessage& message) { frames.write(message); });
+    FrameReader reader(
+        [&frames, input](char* to, std::size_t room) {
+            return frames.waitForInput(input) ? readSome(input, to, room) : 0;
+        },
+        options.largestMessage);
+    const int status = takeMessages(reader, host);
+    host.waitUntilIdle();
+    return frames.isBroken() ? exitRequestFailed : status;
+}
+
+}  // namespace host

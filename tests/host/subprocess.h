@@ -1,0 +1,59 @@
+// A program run with pipes on its standard streams.
+#pragma once
+
+#include <sys/types.h>
+
+#include <future>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "host/file_descriptor.h"
+
+namespace test {
+
+/// What a program that has ended leaves behind.
+struct Outcome {
+    int status = 0;  ///< Its exit status; when a signal ended it, minus the signal's number.
+    std::string output;
+    std::string errors;
+};
+
+/// Runs a program with pipes on its standard streams. Errors of the system calls are exceptions.
+class Subprocess {
+public:
+    /// Starts `command`: the path of a program and its arguments.
+    explicit Subprocess(const std::vector<std::string>& command);
+
+    Subprocess(const Subprocess&) = delete;
+    Subprocess& operator=(const Subprocess&) = delete;
+
+    /// Kills and collects the program when it has not been waited for.
+    ~Subprocess();
+
+    pid_t id() const noexcept { return id_; }
+
+    void write(std::string_view input);
+    void closeInput() { input_ = {}; }
+
+    /// Up to 64 KiB of what the program writes to its standard output; empty at the end of it.
+    std::string readSome();
+    void closeOutput() { output_ = {}; }
+
+    /// Reads what is left of the output and waits for the program's end.
+    Outcome waitForEnd();
+
+    /// Closes the input and waits for the program's end.
+    Outcome finish();
+
+private:
+    host::FileDescriptor input_;
+    host::FileDescriptor output_;
+    pid_t id_ = -1;
+    std::future<std::string> errors_;
+};
+
+/// Runs `command` with `input` on its standard input until it ends.
+Outcome run(const std::vector<std::string>& command, std::string_view input = {});
+
+}  // namespace test
