@@ -1,0 +1,94 @@
+# shellcheck shell=bash disable=SC2154
+# Shell code that ./start, ./test and .ci/run share: installing packages, configuring, building.
+#
+# The caller sets `root` to the project's folder and `set -euo pipefail`. What is said here goes to
+# standard error, so that a program's standard output stays its own.
+
+# step TEXT...: says what is being done.
+step() {
+    printf '== %s\n' "$*" >&2
+}
+
+# quietly LOG COMMAND...: runs the command with its output in the file LOG of the build folder, and
+# prints that file only when the command fails, which ends the script.
+quietly() {
+    local log="$root/build/$1.log"
+    shift
+    mkdir -p "$root/build"
+    if ! "$@" >"$log" 2>&1; then
+        cat "$log" >&2
+        step "failed: $*"
+        exit 1
+    fi
+}
+
+# as_root COMMAND...: runs the command as root.
+as_root() {
+    if ((EUID == 0)); then
+        "$@"
+    else
+        sudo "$@"
+    fi
+}
+
+# install_packages FILE: installs those of the Debian packages named in FILE that are missing.
+install_packages() {
+    if ! command -v dpkg-query >/dev/null; then
+        step "this is no Debian system; what the build needs is named in $1"
+        return
+    fi
+    local wanted installed missing
+    wanted=$(sed 's/#.*//' "$1" | xargs -n 1 | sort -u)
+    # shellcheck disable=SC2086 # one word for each package
+    installed=$(dpkg-query -W -f '${db:Status-Status} ${Package}\n' $wanted 2>/dev/null |
+        sed -n 's/^installed //p' | sort -u || true)
+    missing=$(comm -23 <(printf '%s\n' "$wanted") <(printf '%s\n' "$installed") | xargs)
+    if [[ -z $missing ]]; then
+        return
+    fi
+    step "installing $missing"
+    quietly apt-update as_root apt-get update
+    # shellcheck disable=SC2086
+    quietly apt-install as_root env DEBIAN_FRONTEND=noninteractive \
+        apt-get install -y --no-install-recommends $missing
+}
+
+# build NAME [CMAKE-ARGUMENT...] [-- TARGET...]: builds the targets, or all, in build/NAME, which is
+# configured by the preset NAME unless arguments are given. Says nothing when there is nothing to do.
+build() {
+    local name=$1 folder="$root/build/$1"
+    shift
+    local -a configure=() targets=()
+    while (($# > 0)) && [[ $1 != -- ]]; do
+        configure+=("$1")
+        shift
+    done
+    targets=("${@:2}")
+    ((${#configure[@]} > 0)) || configure=(--preset "$name")
+
+    # One at a time: two scripts in one build folder would spoil each other's work.
+    mkdir -p "$folder"
+    exec 9>"$root/build/$name.lock"
+    flock 9
+    if [[ ! -f $folder/build.ninja ]]; then
+        step "configuring $name"
+        # cmake takes presets from the folder it is started in.
+        (cd "$root" && quietly "$name-configure" cmake -G Ninja -S . -B "$folder" "${configure[@]}")
+    fi
+    if [[ $(ninja -C "$folder" -n "${targets[@]}" 2>&1) != *"no work to do"* ]]; then
+        step "building $name"
+        quietly "$name-build" cmake --build "$folder" ${targets[@]+--target "${targets[@]}"}
+    fi
+    exec 9>&-
+}
+
+# run_tests NAME [CTEST-ARGUMENT...]: runs the tests of build/NAME in parallel. Prints what is said of
+# tests that do not pass, and the summary.
+run_tests() {
+    local name=$1
+    shift
+    step "running the tests of $name"
+    ctest --test-dir "$root/build/$name" --parallel "$(nproc)" --output-on-failure \
+        --no-tests=error "$@" |
+        grep --line-buffered -vE '^ +Start +[0-9]+: |^ *[0-9]+/[0-9]+ Test +#[0-9]+: .* Passed '
+}
