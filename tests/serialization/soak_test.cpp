@@ -1,0 +1,254 @@
+// Several clients at once over the real bundle and bus: mixed reads and writes of texts and
+// packages, on files of their own and on files that all of them use.
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <condition_variable>
+#include <deque>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <random>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "tests/support/running_bundle.h"
+#include "tests/support/temporary_directory.h"
+
+namespace {
+
+using namespace platform::messaging;
+using test::kNotifications;
+using test::kReadRequests;
+using test::kReadResponses;
+using test::kWriteRequests;
+using test::kWriteResponses;
+using test::Message;
+using test::RunningBundle;
+
+constexpr int kClients = 5;
+constexpr int kRounds = 150;
+
+/// A text that tells its version, long enough that a reader may meet it half-written.
+std::string sharedText(unsigned version) {
+    return "version " + std::to_string(version) +
+           std::string(20'000, static_cast<char>('a' + version % 26));
+}
+
+/// A package's document JSON, as a read answers with it but for the status.
+json::Object packageDocument(const std::string& text) {
+    json::Object part;
+    part["partUri"] = "/document.xml";
+    part["contentType"] = "application/xml";
+    part["content"] = "<text>" + text + "</text>";
+    part["relationship"] = json::Array();
+    json::Object image;
+    image["partUri"] = "/image.png";
+    image["contentType"] = "image/png";
+    image["content"] = "data:image/png;base64,iVBORw==";
+    image["relationship"] = json::Array();
+    json::Object relationship;
+    relationship["relationshipId"] = "r1";
+    relationship["relationshipType"] = "urn:document";
+    relationship["target"] = "document.xml";
+    relationship["targetMode"] = "";
+    json::Object document;
+    document["parts"] = json::Array{std::move(part), std::move(image)};
+    document["relationships"] = json::Array{std::move(relationship)};
+    return document;
+}
+
+std::string packageAnswer(const std::string& text) {
+    json::Object document = packageDocument(text);
+    document["status"] = true;
+    return json::serialize(std::move(document));
+}
+
+std::string textAnswer(const std::string& text) {
+    json::Object answer;
+    answer["data"] = text;
+    answer["status"] = true;
+    return json::serialize(std::move(answer));
+}
+
+/// One client with a connection of its own, which receives the answers to its requests.
+class Client {
+public:
+    Client(InProcessBus& bus, int number)
+        : rtcId_("client-" + std::to_string(number)),
+          service_(bus.connect(rtcId_).get()),
+          reads_(service_->subscribe(kReadResponses + rtcId_, receiver("read")).get()),
+          writes_(service_->subscribe(kWriteResponses + rtcId_, receiver("write")).get()) {}
+
+    const std::string& rtcId() const { return rtcId_; }
+
+    void read(const std::string& path, const std::string& contentType) {
+        publish(kReadRequests, RunningBundle::request(path, contentType, rtcId_));
+    }
+
+    void write(const std::string& path, const std::string& contentType, json::Value content) {
+        json::Object request;
+        request["rtcId"] = rtcId_;
+        request["contentType"] = contentType;
+        request["filePath"] = path;
+        request["content"] = std::move(content);
+        request["encoding"] = "UTF-8";
+        publish(kWriteRequests, json::serialize(std::move(request)));
+    }
+
+    /// The next answer to a read or a write, in the order in which they came; "no answer" when none
+    /// comes for a minute.
+    std::string next(const std::string& kind) {
+        std::unique_lock lock(mutex_);
+        if (!received_.wait_for(lock, std::chrono::minutes(1),
+                                [&] { return !answers_[kind].empty(); })) {
+            return "no answer";
+        }
+        std::string answer = std::move(answers_[kind].front());
+        answers_[kind].pop_front();
+        return answer;
+    }
+
+    bool hasMore() {
+        const std::lock_guard lock(mutex_);
+        return !answers_["read"].empty() || !answers_["write"].empty();
+    }
+
+private:
+    MessageHandler receiver(const std::string& kind) {
+        return [this, kind](const JsonMessage& message) {
+            const std::lock_guard lock(mutex_);
+            answers_[kind].emplace_back(message.payload());
+            received_.notify_all();
+        };
+    }
+
+    void publish(const std::string& channel, const std::string& payload) {
+        service_->publish(channel, platform::DataBuffer::copyOf(payload)).get();
+    }
+
+    const std::string rtcId_;
+    std::mutex mutex_;
+    std::condition_variable received_;
+    std::map<std::string, std::deque<std::string>> answers_;  // guarded by mutex_
+    const std::shared_ptr<MessageService> service_;
+    const std::shared_ptr<Subscription> reads_;
+    const std::shared_ptr<Subscription> writes_;
+};
+
+class Soak : public testing::Test {
+protected:
+    /// What one client does: on its own files every answer is known to the byte; on the shared ones
+    /// it has to be one that some client's write explains.
+    void run(Client& client, unsigned seed) {
+        std::mt19937 random(seed);
+        const std::string ownText = (folder / (client.rtcId() + ".txt")).string();
+        const std::string ownPackage = (folder / (client.rtcId() + ".docx")).string();
+        for (int round = 0; round < kRounds; ++round) {
+            const std::string text = client.rtcId() + " round " + std::to_string(round);
+            client.write(ownText, "text/plain", text);
+            ASSERT_EQ(client.next("write"), "true");
+            client.read(ownText, "text/plain");
+            ASSERT_EQ(client.next("read"), textAnswer(text));
+
+            client.write(ownPackage, "text/xml", packageDocument(text));
+            ASSERT_EQ(client.next("write"), "true");
+            client.read(ownPackage, "text/xml");
+            ASSERT_EQ(client.next("read"), packageAnswer(text));
+
+            // Several at once, answered in the order of asking on each channel.
+            const unsigned version = static_cast<unsigned>(random());
+            client.write(sharedTextPath(), "text/plain", sharedText(version % kVersions));
+            client.write((folder / "missing/file.txt").string(), "text/plain", "never");
+            client.write(sharedPackagePath(), "text/xml",
+                         packageDocument(sharedText(version % kVersions)));
+            client.read(sharedTextPath(), "text/plain");
+            client.read((folder / "no-such-file").string(), "text/plain");
+            client.read(sharedPackagePath(), "text/xml");
+            ASSERT_EQ(client.next("write"), "true");
+            ASSERT_EQ(client.next("write"), "false");
+            ASSERT_EQ(client.next("write"), "true");
+            expectPartOfAVersion(client.next("read"));
+            ASSERT_EQ(client.next("read"), R"({"exception":"File does not exist","status":false})");
+            expectWholeVersion(client.next("read"));
+        }
+    }
+
+    std::string sharedTextPath() const { return (folder / "shared.txt").string(); }
+    std::string sharedPackagePath() const { return (folder / "shared.docx").string(); }
+
+    // Texts are written in place: a reader may meet the beginning of one.
+    static void expectPartOfAVersion(const std::string& answer) {
+        const json::Object object = json::parse(answer);
+        ASSERT_TRUE(object.at("status").get<bool>()) << answer;
+        const std::string& data = object.at("data").get<std::string>();
+        for (unsigned version = 0; version < kVersions; ++version) {
+            if (sharedText(version).starts_with(data)) {
+                return;
+            }
+        }
+        ADD_FAILURE() << "not from any version: " << data.substr(0, 40);
+    }
+
+    // Packages are replaced as a whole: a reader never meets anything else.
+    static void expectWholeVersion(const std::string& answer) {
+        for (unsigned version = 0; version < kVersions; ++version) {
+            if (answer == packageAnswer(sharedText(version))) {
+                return;
+            }
+        }
+        ADD_FAILURE() << "not any version: " << answer.substr(0, 80);
+    }
+
+    static constexpr unsigned kVersions = 7;
+
+    test::TemporaryDirectory folder;
+    RunningBundle bundle;
+};
+
+TEST_F(Soak, EveryRequestIsAnsweredOnceInOrderAndAfterItsNotification) {
+    test::writeFile(sharedTextPath(), sharedText(0));
+    std::vector<std::unique_ptr<Client>> clients;
+    for (int number = 0; number < kClients; ++number) {
+        clients.push_back(std::make_unique<Client>(bundle.bus(), number));
+    }
+    // The first version, so that the shared package is there from the start.
+    clients[0]->write(sharedPackagePath(), "text/xml", packageDocument(sharedText(0)));
+    ASSERT_EQ(clients[0]->next("write"), "true");
+
+    std::vector<std::thread> threads;
+    for (unsigned number = 0; number < kClients; ++number) {
+        threads.emplace_back([&, number] { run(*clients[number], number); });
+    }
+    for (std::thread& thread : threads) {
+        thread.join();
+    }
+    bundle.bus().waitUntilIdle();
+    for (const auto& client : clients) {
+        EXPECT_FALSE(client->hasMore()) << client->rtcId();
+    }
+
+    std::size_t notifications = 0;
+    std::size_t writeAnswers = 0;
+    std::size_t readAnswers = 0;
+    for (const Message& message : bundle.published()) {
+        if (message.channel == kNotifications) {
+            ++notifications;
+        } else if (message.channel.starts_with(kWriteResponses)) {
+            ++writeAnswers;
+            // Writes are handled one at a time, so that each answer comes right after its
+            // notification.
+            ASSERT_EQ(notifications, writeAnswers);
+        } else {
+            ASSERT_THAT(message.channel, testing::StartsWith(kReadResponses));
+            ++readAnswers;
+        }
+    }
+    EXPECT_EQ(writeAnswers, std::size_t{kClients} * kRounds * 5 + 1);
+    EXPECT_EQ(readAnswers, std::size_t{kClients} * kRounds * 5);
+}
+
+}  // namespace
