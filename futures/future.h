@@ -142,6 +142,18 @@ private:
 
 namespace detail {
 
+/// Calls `function` and returns the exception that it throws, or null. So that what happens next
+/// with the exception happens outside a handler, which would hold on to it.
+template <typename F>
+std::exception_ptr exceptionOf(F&& function) {
+    try {
+        std::forward<F>(function)();
+        return nullptr;
+    } catch (...) {
+        return std::current_exception();
+    }
+}
+
 /// Calls a callback of type F, once, with the future of a `SharedFutureState<T>` and delivers its
 /// result of type R. Destroyed without having been run, it cancels the state of that result.
 template <typename T, typename F, typename R = ContinuationResult<F, T>>
@@ -151,20 +163,22 @@ public:
     Continuation(Promise<R> result, Callback&& callback)
         : result_(std::move(result)), callback_(std::forward<Callback>(callback)) {}
 
-    // Stated because it must hold even when the callback's own destructor may throw.
-    ~Continuation() noexcept override = default;
+    // An exception from the callback's destructor has nowhere to go and ends the process. Written
+    // out, since g++ 12 lets it out of a defaulted destructor.
+    ~Continuation() noexcept override {}
 
     void run(std::shared_ptr<SharedFutureState<T>> state) override {
         Future<T> future(std::move(state));
-        try {
+        std::exception_ptr failure = exceptionOf([&] {
             if constexpr (std::is_void_v<R>) {
                 std::invoke(std::move(callback_), std::move(future));
                 result_.setValue();
             } else {
                 result_.setValue(std::invoke(std::move(callback_), std::move(future)));
             }
-        } catch (...) {
-            result_.setException(std::current_exception());
+        });
+        if (failure) {
+            result_.setException(std::move(failure));
         }
     }
 
@@ -198,19 +212,15 @@ inline Future<void> unwrap(Future<Future<void>>&& outer) {
     const auto promise = std::make_shared<Promise<void>>();
     Future<void> result = promise->getFuture();
     const auto passOn = [promise](Future<void> inner) {
-        try {
-            inner.get();
-        } catch (...) {
-            promise->setException(std::current_exception());
-            return;
+        if (auto failure = detail::exceptionOf([&] { inner.get(); })) {
+            promise->setException(std::move(failure));
+        } else {
+            promise->setValue();
         }
-        promise->setValue();
     };
     outer.then([promise, passOn](Future<Future<void>> resolved) {
-        try {
-            resolved.get().then(passOn);
-        } catch (...) {
-            promise->setException(std::current_exception());
+        if (auto failure = detail::exceptionOf([&] { resolved.get().then(passOn); })) {
+            promise->setException(std::move(failure));
         }
     });
     return result;

@@ -169,13 +169,8 @@ private:
         } else {
             lock.unlock();
         }
-        destroy(std::move(detached));
-        ready.notify_all();
-    }
-
-    // An exception from the destructor of a callback has nowhere to go: it ends the process.
-    static void destroy(std::unique_ptr<ContinuationBase<T>> detached) noexcept {
         detached.reset();
+        ready.notify_all();
     }
 };
 

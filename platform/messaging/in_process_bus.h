@@ -74,7 +74,7 @@ public:
 
 private:
     class [[gnu::visibility("hidden")]] Core;
-    explicit InProcessBus(std::shared_ptr<Core> core);
+    [[gnu::visibility("hidden")]] explicit InProcessBus(std::shared_ptr<Core> core);
 
     std::shared_ptr<Core> core_;
 };
