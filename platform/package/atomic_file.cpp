@@ -73,7 +73,8 @@ std::string randomName() {
     return name.data();
 }
 
-// The value of the extended attribute `name` of the file at `path`, or nothing if it cannot be had.
+// The value of the extended attribute `name` of the file at `path`, or nothing, with the reason in
+// errno, if it cannot be had.
 std::optional<std::vector<char>> attributeOf(const std::string& path, const char* name) {
     const ssize_t size = ::lgetxattr(path.c_str(), name, nullptr, 0);
     if (size < 0) {
@@ -226,6 +227,7 @@ void AtomicFile::commit() {
 void AtomicFile::takeOverAccess() {
     const mode_t mode = takeOverOwner();
     takeOverAttributes();
+    takeOverAccessControlList();
     if (::fchmod(temporary_.get(), mode) != 0) {
         failForSystem("cannot be saved with its permissions");
     }
@@ -254,23 +256,27 @@ mode_t AtomicFile::takeOverOwner() {
     return (mode & 01707U) | forAll << 3U;
 }
 
-// Attributes are copied as far as the system lets them be, but for the access control list: without
-// it, or with one that the folder gave to the new file, others could read what they should not.
+// Attributes are copied as far as the system lets them be.
 void AtomicFile::takeOverAttributes() {
-    bool hasList = false;
     for (const std::string& name : attributeNamesOf(targetPath_)) {
-        const std::optional<std::vector<char>> value = attributeOf(targetPath_, name.c_str());
-        const bool isList = name == kAccessControlList;
-        hasList = hasList || isList;
-        const bool done = value && ::fsetxattr(temporary_.get(), name.c_str(), value->data(),
-                                               value->size(), 0) == 0;
-        if (isList && !done) {
-            failForSystem("cannot be saved with its access control list");
+        const auto value = attributeOf(targetPath_, name.c_str());
+        if (value && name != kAccessControlList) {
+            ::fsetxattr(temporary_.get(), name.c_str(), value->data(), value->size(), 0);
         }
     }
-    if (!hasList && ::fremovexattr(temporary_.get(), kAccessControlList) != 0 && errno != ENODATA &&
-        errno != ENOTSUP) {
-        failForSystem("cannot be saved with its permissions");
+}
+
+// Without its list, or with one that the folder gave to the new file, others could read the
+// document who should not.
+void AtomicFile::takeOverAccessControlList() {
+    const auto hasNone = [] { return errno == ENODATA || errno == ENOTSUP; };
+    const auto list = attributeOf(targetPath_, kAccessControlList);
+    const bool done =
+        list
+            ? ::fsetxattr(temporary_.get(), kAccessControlList, list->data(), list->size(), 0) == 0
+            : hasNone() && (::fremovexattr(temporary_.get(), kAccessControlList) == 0 || hasNone());
+    if (!done) {
+        failForSystem("cannot be saved with its access control list");
     }
 }
 

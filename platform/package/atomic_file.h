@@ -50,6 +50,7 @@ private:
     void takeOverAccess();
     mode_t takeOverOwner();
     void takeOverAttributes();
+    void takeOverAccessControlList();
     void syncFolder();
 
     FileDescriptor folder_;
