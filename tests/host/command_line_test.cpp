@@ -123,6 +123,17 @@ TEST_F(CopiedProgram, TellsWhereItLookedForABundle) {
     EXPECT_THAT(outcome.errors, HasSubstr("--bundle"));
 }
 
+TEST(Installation, HoldsAllThatTheProgramNeeds) {
+    const test::TemporaryDirectory folder;
+    const Outcome installation =
+        test::run({CMAKE_COMMAND, "--install", PROJECT_BINARY_ROOT, "--prefix", folder.path()});
+    ASSERT_EQ(installation.status, 0) << installation.errors;
+    const Outcome outcome = test::run(
+        {folder / "bin/serialization_host", "read", PROJECT_SOURCE_ROOT "/examples/empty.txt"});
+    EXPECT_EQ(outcome.status, 0) << outcome.errors;
+    EXPECT_EQ(outcome.output, "{\"data\":\"\",\"status\":true}\n");
+}
+
 TEST(StandardOutput, CarriesNothingThatALibraryPrints) {
     const Outcome outcome = test::run(hostCommand({"--bundle", UNRESPONSIVE_BUNDLE, "stdio"}));
     EXPECT_EQ(outcome.status, 0);
