@@ -12,7 +12,7 @@ namespace {
 
 TEST(ParserDifferential, GivesTheStatusPositionAndValueOfTheRules) {
     std::map<std::uint32_t, int> seen;
-    for (unsigned seed = 0; seed < 60000; ++seed) {
+    for (unsigned seed = 0; seed < 30000; ++seed) {
         const std::string text = RandomJson(seed).text(5);
         ASSERT_EQ(differenceFromReference(text), "") << "seed " << seed << ": " << text;
         Input input{text.data(), text.data() + text.size(), seed % 2 == 0};
@@ -22,7 +22,7 @@ TEST(ParserDifferential, GivesTheStatusPositionAndValueOfTheRules) {
     // The texts have to be varied enough to end in every way that an object can.
     for (const std::uint32_t status :
          {0u, 5u, 6u, 8u, 11u, 12u, 13u, 14u, 15u, 16u, 17u, 18u, 19u, 20u})
-        EXPECT_GT(seen[status], 20) << "status " << status;
+        EXPECT_GT(seen[status], 10) << "status " << status;
     EXPECT_GT(seen[0], 2000);
 }
 
