@@ -1,9 +1,15 @@
 #include "host/bundle_host.h"
 
+#include <spdlog/spdlog.h>
+
 #include <algorithm>
+#include <cstdlib>
+#include <exception>
+#include <future>
 #include <string_view>
 #include <utility>
 
+#include "host/exit_status.h"
 #include "platform/messaging/transport.h"
 
 namespace host {
@@ -58,6 +64,19 @@ void BundleHost::publish(const std::string& channel, platform::DataBuffer payloa
 
 void BundleHost::waitUntilIdle() {
     bus_->waitUntilIdle();
+}
+
+void BundleHost::waitUntilIdle(std::chrono::seconds timeout, const std::function<void()>& giveUp) {
+    const std::future<void> idle =
+        std::async(std::launch::async, [this] { bus_->waitUntilIdle(); });
+    if (idle.wait_for(timeout) == std::future_status::timeout) {
+        try {
+            giveUp();
+        } catch (const std::exception& error) {
+            spdlog::error("{}", error.what());
+        }
+        std::_Exit(exitRequestFailed);
+    }
 }
 
 }  // namespace host

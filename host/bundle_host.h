@@ -1,6 +1,7 @@
 // The bundle, running on a message bus of its own.
 #pragma once
 
+#include <chrono>
 #include <cstddef>
 #include <filesystem>
 #include <functional>
@@ -20,6 +21,12 @@ inline constexpr const char* readRequestChannel = "/zpr/service/readRequest_cpp"
 /// What precedes the "rtcId" of a read request in the channel of its response.
 inline constexpr const char* readResponsePrefix = "/zpr/service/readResponse/";
 
+/// The channel on which the bundle takes write requests.
+inline constexpr const char* writeRequestChannel = "/zpr/service/writeRequest_cpp";
+
+/// What precedes the "rtcId" of a write request in the channel of its response.
+inline constexpr const char* writeResponsePrefix = "/zpr/service/writeResponse/";
+
 /// A message bus with the bundle as a client, and the host as another. One per process, since the
 /// bundle finds the bus through the process's transport.
 class BundleHost {
@@ -37,6 +44,11 @@ public:
 
     /// Blocks until the bundle is done with all that was sent.
     void waitUntilIdle();
+
+    /// The same, but when that takes longer than `timeout`, calls `giveUp` and ends the process
+    /// with the exit status of a failed request: the bundle is still at work, and whatever ends it
+    /// in an orderly way would wait for it.
+    void waitUntilIdle(std::chrono::seconds timeout, const std::function<void()>& giveUp);
 
 private:
     std::shared_ptr<platform::messaging::InProcessBus> bus_;

@@ -19,6 +19,7 @@
 #include "host/read_command.h"
 #include "host/standard_streams.h"
 #include "host/stdio_command.h"
+#include "host/write_command.h"
 
 namespace {
 
@@ -29,7 +30,17 @@ struct CommandLine {
     std::filesystem::path bundle;
     host::ReadOptions read;
     host::StdioOptions stdio;
+    host::WriteOptions write;
 };
+
+void declareTimeout(CLI::App& command, std::chrono::seconds& timeout) {
+    command
+        .add_option_function<unsigned>(
+            "--timeout", [&timeout](unsigned seconds) { timeout = std::chrono::seconds(seconds); },
+            "How long to wait for a response (default: " + std::to_string(timeout.count()) + ")")
+        ->type_name("SECONDS")
+        ->check(CLI::Range(1U, 1'000'000'000U));
+}
 
 void declareRead(CLI::App& command, host::ReadOptions& options) {
     command.add_option("FILE", options.files, "The files to read")->required();
@@ -38,14 +49,7 @@ void declareRead(CLI::App& command, host::ReadOptions& options) {
                     "The content type to ask for (default: text/xml for a document package, else "
                     "text/plain)")
         ->type_name("TYPE");
-    command
-        .add_option_function<unsigned>(
-            "--timeout",
-            [&options](unsigned seconds) { options.timeout = std::chrono::seconds(seconds); },
-            "How long to wait for a response (default: " + std::to_string(options.timeout.count()) +
-                ")")
-        ->type_name("SECONDS")
-        ->check(CLI::Range(1U, 1'000'000'000U));
+    declareTimeout(command, options.timeout);
 }
 
 void declareStdio(CLI::App& command, host::StdioOptions& options) {
@@ -55,6 +59,21 @@ void declareStdio(CLI::App& command, host::StdioOptions& options) {
             "The largest message to take, in bytes or with a unit such as MB (default: 1 GB)")
         ->type_name("SIZE")
         ->transform(CLI::AsSizeValue(false));
+}
+
+void declareWrite(CLI::App& command, host::WriteOptions& options) {
+    command.add_option("FILE", options.file, "The file to write")->required();
+    command
+        .add_option("--content-type", options.contentType,
+                    "The content type of the request (default: text/xml for the JSON of a document "
+                    "package, as read prints it, else text/plain)")
+        ->type_name("TYPE");
+    command
+        .add_option("--encoding", options.encoding,
+                    "The charset of a text, as it comes in and as it is stored (default: " +
+                        options.encoding + ")")
+        ->type_name("CHARSET");
+    declareTimeout(command, options.timeout);
 }
 
 // Declares the options and commands of `app`, which a parse puts into `line`.
@@ -73,6 +92,9 @@ void declare(CLI::App& app, CommandLine& line) {
                 line.read);
     declareStdio(*app.add_subcommand("stdio", "Carry framed messages on standard input and output"),
                  line.stdio);
+    declareWrite(*app.add_subcommand(
+                     "write", "Write standard input to a file and print the answer, true or false"),
+                 line.write);
 }
 
 void setUpLogging(const std::string& level) {
@@ -86,6 +108,10 @@ int run(CLI::App& app, CommandLine& line, int output) {
     if (app.got_subcommand("read")) {
         line.read.bundle = bundle;
         return host::runRead(line.read, output);
+    }
+    if (app.got_subcommand("write")) {
+        line.write.bundle = bundle;
+        return host::runWrite(line.write, STDIN_FILENO, output);
     }
     line.stdio.bundle = bundle;
     return host::runStdio(line.stdio, STDIN_FILENO, output);

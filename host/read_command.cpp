@@ -5,9 +5,6 @@
 
 #include <algorithm>
 #include <cstddef>
-#include <cstdlib>
-#include <exception>
-#include <future>
 #include <map>
 #include <mutex>
 #include <optional>
@@ -104,10 +101,10 @@ public:
                               platform::DataBuffer::copyOf(requestFor(options_, file)));
             }
         }
-        std::future<void> idle = std::async(std::launch::async, [this] { host_.waitUntilIdle(); });
-        if (idle.wait_for(options_.timeout) == std::future_status::timeout) {
-            giveUp(batch);
-        }
+        host_.waitUntilIdle(options_.timeout, [this, batch] {
+            printResponses(
+                batch, "no answer within " + std::to_string(options_.timeout.count()) + " seconds");
+        });
         return printResponses(batch, "no answer");
     }
 
@@ -127,14 +124,6 @@ private:
             }
         }
         return allSucceeded;
-    }
-
-    // Prints the responses that have come and ends the process: the bundle is still at work, and
-    // whatever ends it in an orderly way would wait for it.
-    [[noreturn]] void giveUp(std::span<const std::string> batch) noexcept {
-        printResponses(batch,
-                       "no answer within " + std::to_string(options_.timeout.count()) + " seconds");
-        std::_Exit(exitRequestFailed);
     }
 
     const ReadOptions& options_;

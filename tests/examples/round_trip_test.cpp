@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <cstdlib>
 #include <filesystem>
+#include <initializer_list>
 #include <string>
 #include <vector>
 
@@ -19,18 +20,27 @@ using test::Message;
 using test::RunningBundle;
 using testing::SizeIs;
 
-std::vector<std::filesystem::path> examples(bool packages) {
+/// The examples with one of `extensions`, by name.
+std::vector<std::filesystem::path> examples(std::initializer_list<std::string> extensions) {
     std::vector<std::filesystem::path> found;
-    for (const auto& entry : std::filesystem::directory_iterator(
-             std::filesystem::path(PROJECT_SOURCE_ROOT) / "examples")) {
-        const std::string extension = entry.path().extension();
-        const bool package = extension == ".docx" || extension == ".xlsx" || extension == ".pptx";
-        if (entry.is_regular_file() && package == packages && extension != ".md") {
+    for (const auto& entry : std::filesystem::directory_iterator(PROJECT_SOURCE_ROOT "/examples")) {
+        if (std::find(extensions.begin(), extensions.end(), entry.path().extension()) !=
+            extensions.end()) {
             found.push_back(entry.path());
         }
     }
     std::sort(found.begin(), found.end());
     return found;
+}
+
+std::vector<std::filesystem::path> packages() {
+    return examples({".docx", ".xlsx", ".pptx"});
+}
+
+/// The charset that a text's name tells: "name.charset.txt", with "-with-mark" where it has one.
+std::string charsetOf(const std::filesystem::path& path) {
+    const std::string charset = path.stem().extension().string();
+    return charset.empty() ? "UTF-8" : charset.substr(1, charset.find("-with-mark") - 1);
 }
 
 class Examples : public testing::Test {
@@ -62,7 +72,7 @@ protected:
 };
 
 TEST_F(Examples, ThatArePackagesReadTheSameAfterTheyAreWritten) {
-    const auto paths = examples(true);
+    const auto paths = packages();
     ASSERT_THAT(paths, SizeIs(testing::Ge(4u)));
     for (const auto& path : paths) {
         SCOPED_TRACE(path);
@@ -76,7 +86,7 @@ TEST_F(Examples, ThatArePackagesReadTheSameAfterTheyAreWritten) {
 }
 
 TEST_F(Examples, ThatArePackagesAreTheSameToAnIndependentReaderAfterTheyAreWritten) {
-    for (const auto& path : examples(true)) {
+    for (const auto& path : packages()) {
         SCOPED_TRACE(path);
         const std::filesystem::path copy = folder / path.filename().string();
         ASSERT_TRUE(write(copy, "text/xml", read(path, "text/xml")));
@@ -84,6 +94,25 @@ TEST_F(Examples, ThatArePackagesAreTheSameToAnIndependentReaderAfterTheyAreWritt
                                     "/tests/examples/compare_packages.py' '" +
                                     path.string() + "' '" + copy.string() + "'";
         EXPECT_EQ(std::system(command.c_str()), 0);
+    }
+}
+
+TEST_F(Examples, ThatAreTextsAreTheSameOnDiskLessTheirMarksAfterTheyAreWritten) {
+    const auto paths = examples({".txt", ".log"});
+    ASSERT_THAT(paths, SizeIs(testing::Ge(8u)));
+    for (const auto& path : paths) {
+        SCOPED_TRACE(path);
+        const json::Object answer = read(path, "text/plain");
+        const std::filesystem::path copy = folder / path.filename().string();
+        ASSERT_TRUE(write(copy, "text/plain", answer.at("data"), charsetOf(path)));
+        const std::string original = test::readFile(path);
+        const std::string written = test::readFile(copy);
+        EXPECT_TRUE(original.ends_with(written));
+        const bool marked = path.stem().string().ends_with("-with-mark");
+        EXPECT_EQ(original.size() - written.size(), !marked                                 ? 0
+                                                    : charsetOf(path).starts_with("utf-16") ? 2
+                                                                                            : 3);
+        EXPECT_EQ(json::serialize(read(copy, "text/plain")), json::serialize(answer));
     }
 }
 
