@@ -1,6 +1,7 @@
 #include "platform/package/package_xml.h"
 
 #include <cstddef>
+#include <map>
 #include <new>
 #include <stdexcept>
 
@@ -21,16 +22,30 @@ QualifiedName qualifiedName(const pugi::xml_node& element) {
     return {name.substr(0, colon), name.substr(colon + 1)};
 }
 
-// The namespace that is bound to the prefix of `element` by itself or the nearest of its ancestors.
-std::string_view namespaceOf(const pugi::xml_node& element) {
-    const std::string_view prefix = qualifiedName(element).prefix;
-    std::string declaration = "xmlns";
-    if (!prefix.empty()) {
-        declaration.append(":").append(prefix);
+// Namespaces by the prefixes that are bound to them; the empty prefix is that of the default one.
+using Namespaces = std::map<std::string_view, std::string_view>;
+
+Namespaces declaredBy(const pugi::xml_node& element) {
+    constexpr std::string_view declaration = "xmlns";
+    Namespaces namespaces;
+    for (const pugi::xml_attribute& attribute : element.attributes()) {
+        const std::string_view name = attribute.name();
+        if (name == declaration) {
+            namespaces.emplace(std::string_view(), attribute.value());
+        } else if (name.starts_with("xmlns:")) {
+            namespaces.emplace(name.substr(declaration.size() + 1), attribute.value());
+        }
     }
-    for (pugi::xml_node node = element; node; node = node.parent()) {
-        if (const pugi::xml_attribute attribute = node.attribute(declaration.c_str())) {
-            return attribute.value();
+    return namespaces;
+}
+
+// The namespace of `element`, whose own declarations hide `inherited` ones.
+std::string_view namespaceOf(const pugi::xml_node& element, const Namespaces& inherited) {
+    const std::string_view prefix = qualifiedName(element).prefix;
+    const Namespaces own = declaredBy(element);
+    for (const Namespaces* namespaces : {&own, &inherited}) {
+        if (const auto found = namespaces->find(prefix); found != namespaces->end()) {
+            return found->second;
         }
     }
     return {};
@@ -61,11 +76,13 @@ void forEachElement(std::vector<std::uint8_t> bytes, std::string_view root,
     pugi::xml_document document;
     parse(document, bytes);
     const pugi::xml_node rootElement = document.document_element();
-    if (qualifiedName(rootElement).localName != root || namespaceOf(rootElement) != namespaceUri) {
+    const Namespaces namespaces = declaredBy(rootElement);
+    if (qualifiedName(rootElement).localName != root ||
+        namespaceOf(rootElement, namespaces) != namespaceUri) {
         throw std::runtime_error("has another root element than " + std::string(root));
     }
     for (const pugi::xml_node& child : rootElement.children()) {
-        if (child.type() == pugi::node_element && namespaceOf(child) == namespaceUri) {
+        if (child.type() == pugi::node_element && namespaceOf(child, namespaces) == namespaceUri) {
             visit(qualifiedName(child).localName, child);
         }
     }

@@ -184,6 +184,22 @@ TEST_F(QuilletFileReaderTest, ReadsPackageXmlInUtf16AndWithAByteOrderMark) {
               1U);
 }
 
+TEST_F(QuilletFileReaderTest, TakesEachAttributeAndElementOfPackageXmlOnce) {
+    // Looking at all attributes of the root for each element would take hours.
+    std::string xml = "<Types";
+    for (int i = 0; i < 500'000; ++i) {
+        xml.append(" xmlns:p").append(std::to_string(i)).append("='urn:x'");
+    }
+    xml +=
+        " xmlns='http://schemas.openxmlformats.org/package/2006/content-types'>"
+        "<Default Extension='txt' ContentType='a/b'/>";
+    for (int i = 0; i < 500'000; ++i) {
+        xml += "<p1:x/><y:x/>";
+    }
+    xml += "</Types>";
+    EXPECT_EQ(read(buildZip({{"[Content_Types].xml", xml}, {"a.txt", ""}})).parts().size(), 1U);
+}
+
 TEST_F(QuilletFileReaderTest, JoinsInterleavedPieces) {
     const auto package =
         read(buildZip({{"[Content_Types].xml/[0].piece",
