@@ -7,6 +7,7 @@
 #include <filesystem>
 #include <stdexcept>
 #include <string>
+#include <system_error>
 #include <utility>
 #include <vector>
 
@@ -32,17 +33,29 @@ std::u16string fileInMemory(std::span<const char> bytes) {
     return platform::i18n::to_ustring("/proc/self/fd/" + std::to_string(file));
 }
 
-// A file in a folder that lasts as long as the process.
-std::u16string fileOnDisk() {
-    static const std::string folder = [] {
-        std::string pattern = "/dev/shm/package-fuzz-XXXXXX";
-        if (::mkdtemp(pattern.data()) == nullptr) {
+// A folder that lasts as long as the process.
+class Folder {
+public:
+    Folder() : path_("/dev/shm/package-fuzz-XXXXXX") {
+        if (::mkdtemp(path_.data()) == nullptr) {
             std::abort();
         }
-        std::atexit([] { std::filesystem::remove_all(folder); });
-        return pattern;
-    }();
-    return platform::i18n::to_ustring(folder + "/a.docx");
+    }
+    Folder(const Folder&) = delete;
+    Folder& operator=(const Folder&) = delete;
+    ~Folder() {
+        std::error_code ignored;
+        std::filesystem::remove_all(path_, ignored);
+    }
+    const std::string& path() const { return path_; }
+
+private:
+    std::string path_;
+};
+
+std::u16string fileOnDisk() {
+    static const Folder folder;
+    return platform::i18n::to_ustring(folder.path() + "/a.docx");
 }
 
 // The modes are left out: a relationship to no part comes back as external.

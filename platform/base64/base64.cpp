@@ -21,7 +21,7 @@ namespace {
 
 constexpr std::size_t kBytesPerGroup = 3;
 constexpr std::size_t kCharactersPerGroup = 4;
-constexpr std::size_t kGroupsPerChunk = 8 * 1024;
+constexpr std::size_t kGroupsPerChunk = 8'192;
 
 unsigned char* asBytes(char* data) {
     return reinterpret_cast<unsigned char*>(data);
@@ -85,7 +85,7 @@ DataBuffer base64encode(const DataBuffer& bytes) {
 DataBuffer base64decode(std::string_view text) {
     const std::size_t end = std::min(text.find('='), text.size());
     DataBuffer bytes((end + kCharactersPerGroup - 1) / kCharactersPerGroup * kBytesPerGroup);
-    std::array<char, kGroupsPerChunk * kCharactersPerGroup> chunk;
+    std::array<char, kGroupsPerChunk * kCharactersPerGroup> chunk{};
     std::size_t length = 0;
     std::size_t leftOver = 0;  // characters of an incomplete group, which only the last chunk has
     for (std::size_t at = 0; at < end;) {

@@ -14,12 +14,14 @@
 #include <cstdio>
 #include <stdexcept>
 #include <system_error>
+#include <utility>
 #include <vector>
 
 namespace platform::package {
 namespace {
 
-constexpr std::size_t kBufferSize = 64 * 1024;
+constexpr std::size_t kBufferSize = 65'536;
+constexpr std::size_t kMaxAttributeSize = 65'536;  // of a value, and of the list of all names
 constexpr const char* kAccessControlList = "system.posix_acl_access";
 
 [[noreturn]] void failForSystem(const char* what) {
@@ -55,7 +57,7 @@ std::string followLinks(std::string path) {
             failForSystem("cannot be found");
         }
         const std::string link(buffer.data(), static_cast<std::size_t>(length));
-        path = link.starts_with('/') ? link : folderOf(path) + link;
+        path = link.starts_with('/') ? link : folderOf(path).append(link);
     }
     errno = ELOOP;
     failForSystem("cannot be found");
@@ -75,30 +77,32 @@ std::string randomName() {
 
 // The value of the extended attribute `name` of the file at `path`, or nothing, with the reason in
 // errno, if it cannot be had.
-std::optional<std::vector<char>> attributeOf(const std::string& path, const char* name) {
-    const ssize_t size = ::lgetxattr(path.c_str(), name, nullptr, 0);
+std::optional<std::string> attributeOf(const std::string& path, const char* name) {
+    std::string value(kMaxAttributeSize, '\0');
+    const ssize_t size = ::lgetxattr(path.c_str(), name, value.data(), value.size());
     if (size < 0) {
         return std::nullopt;
     }
-    std::vector<char> value(static_cast<std::size_t>(size));
-    if (::lgetxattr(path.c_str(), name, value.data(), value.size()) != size) {
-        return std::nullopt;
-    }
+    value.resize(static_cast<std::size_t>(size));
     return value;
 }
 
 // The names of the extended attributes of the file at `path`; none where there is no such thing.
 std::vector<std::string> attributeNamesOf(const std::string& path) {
-    const ssize_t size = ::llistxattr(path.c_str(), nullptr, 0);
-    std::string list(static_cast<std::size_t>(std::max<ssize_t>(size, 0)), '\0');
-    if (size <= 0 || ::llistxattr(path.c_str(), list.data(), list.size()) != size) {
-        return {};
-    }
+    std::string list(kMaxAttributeSize, '\0');
+    const ssize_t size = ::llistxattr(path.c_str(), list.data(), list.size());
+    list.resize(static_cast<std::size_t>(std::max<ssize_t>(size, 0)));
     std::vector<std::string> names;
     for (std::size_t at = 0; at < list.size(); at += names.back().size() + 1) {
         names.emplace_back(list.c_str() + at);
     }
     return names;
+}
+
+// Whether an attribute is worth taking over: what users noted, and the label that access depends
+// on. Others say things about the old content, such as its signature.
+bool isLasting(const std::string& attributeName) {
+    return attributeName.starts_with("user.") || attributeName == "security.selinux";
 }
 
 }  // namespace
@@ -160,13 +164,13 @@ void AtomicFile::createTemporary() {
     constexpr int attempts = 100;
     const mode_t mode = target_ ? 0600 : 0666;
     for (int i = 0; i < attempts && !temporary_; ++i) {
-        const std::string name = randomName();
+        std::string name = randomName();
         temporary_ = FileDescriptor(uninterrupted([&] {
             return ::openat(folder_.get(), name.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC,
                             mode);
         }));
         if (temporary_) {
-            temporaryName_ = name;
+            temporaryName_ = std::move(name);
         } else if (errno != EEXIST) {
             break;
         }
@@ -239,8 +243,8 @@ mode_t AtomicFile::takeOverOwner() {
         if (::fchown(temporary_.get(), owner, group) == 0) {
             return true;
         }
-        if (errno != EPERM &&
-            errno != EINVAL) {  // EINVAL: an owner whom this container does not know
+        const bool isUnknownHere = errno == EINVAL;  // as owners from outside a container are
+        if (errno != EPERM && !isUnknownHere) {
             failForSystem("cannot be saved with its owner");
         }
         return false;
@@ -259,8 +263,8 @@ mode_t AtomicFile::takeOverOwner() {
 // Attributes are copied as far as the system lets them be.
 void AtomicFile::takeOverAttributes() {
     for (const std::string& name : attributeNamesOf(targetPath_)) {
-        const auto value = attributeOf(targetPath_, name.c_str());
-        if (value && name != kAccessControlList) {
+        const auto value = isLasting(name) ? attributeOf(targetPath_, name.c_str()) : std::nullopt;
+        if (value) {
             ::fsetxattr(temporary_.get(), name.c_str(), value->data(), value->size(), 0);
         }
     }
@@ -270,11 +274,13 @@ void AtomicFile::takeOverAttributes() {
 // document who should not.
 void AtomicFile::takeOverAccessControlList() {
     const auto hasNone = [] { return errno == ENODATA || errno == ENOTSUP; };
-    const auto list = attributeOf(targetPath_, kAccessControlList);
-    const bool done =
-        list
-            ? ::fsetxattr(temporary_.get(), kAccessControlList, list->data(), list->size(), 0) == 0
-            : hasNone() && (::fremovexattr(temporary_.get(), kAccessControlList) == 0 || hasNone());
+    bool done = false;
+    if (const auto list = attributeOf(targetPath_, kAccessControlList)) {
+        done =
+            ::fsetxattr(temporary_.get(), kAccessControlList, list->data(), list->size(), 0) == 0;
+    } else if (hasNone()) {
+        done = ::fremovexattr(temporary_.get(), kAccessControlList) == 0 || hasNone();
+    }
     if (!done) {
         failForSystem("cannot be saved with its access control list");
     }

@@ -16,9 +16,10 @@ namespace platform::package {
 /// the place of the target when it is committed and is removed when it is not.
 ///
 /// A symbolic link is followed: the file at its end is replaced, or created if there is none. The
-/// new file has the permissions, the owner and group, the access control list and the extended
-/// attributes of the old one. Where the process may not give a file away, the owner becomes its
-/// own, and nobody gets permissions who did not have them. Other hard links keep the old content.
+/// new file has the permissions, the owner and group, the access control list and the user's
+/// extended attributes of the old one. Where the process may not give a file away, the owner
+/// becomes its own, and nobody gets permissions who did not have them. Other hard links keep the
+/// old content.
 class AtomicFile {
 public:
     /// Creates the temporary file for `path` (UTF-8). Throws std::runtime_error when the target is

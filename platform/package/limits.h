@@ -8,7 +8,7 @@
 
 namespace platform::package::limits {
 
-constexpr std::uint64_t kMebibyte = 1024 * 1024;
+constexpr std::uint64_t kMebibyte = std::uint64_t{1} << 20U;
 
 /// Entries of an archive. As many as an end record can count without ZIP64; office documents have
 /// some hundreds.

@@ -101,7 +101,7 @@ std::size_t ZipWriter::deflate(std::span<const std::uint8_t> content, std::size_
 // is tried on a sample first, taken from the middle because headers compress even where the rest
 // does not.
 std::size_t ZipWriter::deflateIfWorthIt(std::span<const std::uint8_t> content) {
-    constexpr std::size_t sampleSize = 64 * 1024;
+    constexpr std::size_t sampleSize = 65'536;
     constexpr std::size_t worthwhile = sampleSize - sampleSize / 32;
     if (content.empty()) {
         return 0;
