@@ -22,6 +22,9 @@ namespace {
 constexpr std::size_t kBytesPerGroup = 3;
 constexpr std::size_t kCharactersPerGroup = 4;
 constexpr std::size_t kGroupsPerChunk = 8'192;
+constexpr std::size_t kBytesPerChunk = kGroupsPerChunk * kBytesPerGroup;
+
+using Chunk = std::array<char, kGroupsPerChunk * kCharactersPerGroup>;
 
 unsigned char* asBytes(char* data) {
     return reinterpret_cast<unsigned char*>(data);
@@ -45,6 +48,25 @@ bool isInAlphabet(char c) {
         ++offset;
     }
     fail("a character outside the alphabet", offset);
+}
+
+// Decodes `groups`, which are at most a chunk. Returns whether they are nothing but whole groups of
+// the alphabet's characters; if not, what is behind `bytes` is undefined.
+bool decodeGroups(std::string_view groups, char* bytes) {
+    return EVP_DecodeBlock(asBytes(bytes), asBytes(groups.data()),
+                           static_cast<int>(groups.size())) ==
+           static_cast<int>(groups.size() / kCharactersPerGroup * kBytesPerGroup);
+}
+
+// Copies what is no white space from `text`, from `at` on, until `chunk` is full or the text ends.
+// Returns how much that is, and moves `at` behind it.
+std::size_t gather(std::string_view text, std::size_t& at, Chunk& chunk) {
+    std::size_t filled = 0;
+    for (; at < text.size() && filled < chunk.size(); ++at) {
+        chunk[filled] = text[at];
+        filled += i18n::isspace_ascii(text[at]) ? 0 : 1;
+    }
+    return filled;
 }
 
 // Checks the text from its first '=' on, before which the last group has `leftOver` characters.
@@ -71,10 +93,9 @@ DataBuffer base64encode(const DataBuffer& bytes) {
     }
     const std::size_t groups = (bytes.length() + kBytesPerGroup - 1) / kBytesPerGroup;
     DataBuffer text(groups * kCharactersPerGroup + 1);  // one for the encoder's zero
-    constexpr std::size_t step = kGroupsPerChunk * kBytesPerGroup;
     std::size_t length = 0;
-    for (std::size_t at = 0; at < bytes.length(); at += step) {
-        const std::size_t count = std::min(step, bytes.length() - at);
+    for (std::size_t at = 0; at < bytes.length(); at += kBytesPerChunk) {
+        const std::size_t count = std::min(kBytesPerChunk, bytes.length() - at);
         length += static_cast<std::size_t>(EVP_EncodeBlock(
             asBytes(text.data() + length), asBytes(bytes.data() + at), static_cast<int>(count)));
     }
@@ -85,28 +106,30 @@ DataBuffer base64encode(const DataBuffer& bytes) {
 DataBuffer base64decode(std::string_view text) {
     const std::size_t end = std::min(text.find('='), text.size());
     DataBuffer bytes((end + kCharactersPerGroup - 1) / kCharactersPerGroup * kBytesPerGroup);
-    std::array<char, kGroupsPerChunk * kCharactersPerGroup> chunk{};
+    Chunk chunk{};
     std::size_t length = 0;
     std::size_t leftOver = 0;  // characters of an incomplete group, which only the last chunk has
     for (std::size_t at = 0; at < end;) {
-        const std::size_t chunkStart = at;
-        std::size_t filled = 0;
-        for (; at < end && filled < chunk.size(); ++at) {
-            chunk[filled] = text[at];
-            filled += i18n::isspace_ascii(text[at]) ? 0 : 1;
+        // Most text is nothing but groups and is decoded from where it stands.
+        const std::size_t whole =
+            std::min(chunk.size(), (end - at) / kCharactersPerGroup * kCharactersPerGroup);
+        if (whole != 0 && decodeGroups(text.substr(at, whole), bytes.data() + length)) {
+            at += whole;
+            length += whole / kCharactersPerGroup * kBytesPerGroup;
+            continue;
         }
+        const std::size_t chunkStart = at;
+        const std::size_t filled = gather(text.substr(0, end), at, chunk);
         leftOver = filled % kCharactersPerGroup;
         if (leftOver == 1) {
             fail("a single left-over character before the end", end);
         }
         const std::size_t added = leftOver == 0 ? 0 : kCharactersPerGroup - leftOver;
         std::fill_n(chunk.begin() + static_cast<std::ptrdiff_t>(filled), added, 'A');
-        const std::size_t decoded = (filled + added) / kCharactersPerGroup * kBytesPerGroup;
-        if (EVP_DecodeBlock(asBytes(bytes.data() + length), asBytes(chunk.data()),
-                            static_cast<int>(filled + added)) != static_cast<int>(decoded)) {
+        if (!decodeGroups({chunk.data(), filled + added}, bytes.data() + length)) {
             failAtFirstStranger(text, chunkStart);
         }
-        length += decoded;
+        length += (filled + added) / kCharactersPerGroup * kBytesPerGroup;
         for (std::size_t i = 0; i < added; ++i) {
             if (bytes.data()[--length] != 0) {
                 fail("left-over bits that are not zero before the end", end);

@@ -43,7 +43,7 @@ void ZipWriter::add(std::string_view name, std::span<const std::uint8_t> content
     const std::size_t deflatedSize = mayDeflate ? deflateIfWorthIt(content) : 0;
     const bool isDeflated = deflatedSize != 0;
     const std::span<const std::uint8_t> data =
-        isDeflated ? std::span<const std::uint8_t>(deflated_).first(deflatedSize) : content;
+        isDeflated ? std::span<const std::uint8_t>(deflated_.get(), deflatedSize) : content;
 
     // What the local header and the directory's entry have in common.
     std::string common;
@@ -88,13 +88,16 @@ void ZipWriter::finish() {
     write(end);
 }
 
-// Deflates `content` into deflated_. Returns the size, or zero if that exceeds `maxSize`.
+// Deflates `content` into deflated_. Returns the size, or zero if that exceeds `maxSize`. What of
+// the buffer is not written to takes no memory.
 std::size_t ZipWriter::deflate(std::span<const std::uint8_t> content, std::size_t maxSize) {
-    if (deflated_.size() < maxSize) {
-        deflated_.resize(maxSize);
+    if (deflatedCapacity_ < maxSize) {
+        deflated_.reset();
+        deflated_ = std::make_unique_for_overwrite<std::uint8_t[]>(maxSize);
+        deflatedCapacity_ = maxSize;
     }
     return libdeflate_deflate_compress(compressor_.get(), content.data(), content.size(),
-                                       deflated_.data(), maxSize);
+                                       deflated_.get(), maxSize);
 }
 
 // Returns the size of the deflated form in deflated_, or zero to store the content. Large content

@@ -4,12 +4,12 @@
 // bytes: all of them have one fixed date. The archives stay within limits.h, and so need no ZIP64.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <span>
 #include <string>
 #include <string_view>
-#include <vector>
 
 #include "platform/package/atomic_file.h"
 
@@ -42,7 +42,8 @@ private:
 
     AtomicFile& file_;
     std::unique_ptr<libdeflate_compressor, FreeCompressor> compressor_;
-    std::vector<std::uint8_t> deflated_;  // room for the deflated form of the entry being written
+    std::unique_ptr<std::uint8_t[]> deflated_;  // the deflated form of the entry being written
+    std::size_t deflatedCapacity_ = 0;
     std::string directory_;
     std::uint64_t entryCount_ = 0;
     std::uint64_t contentSize_ = 0;  // of all entries, before deflating

@@ -125,6 +125,8 @@ TEST(Base64, SkipsWhiteSpaceWhereverItStands) {
     EXPECT_EQ(decoded(" Z\tg\n=\v=\f\r"), "f");
     EXPECT_EQ(decoded("Zm9v\r\nYmFy\r\n"), "foobar");
     EXPECT_EQ(decoded(" \r\n\t"), "");
+    EXPECT_EQ(decoded("    Zm9v    "), "foo");
+    EXPECT_EQ(decoded("Zm9v" + std::string(100'000, ' ') + "YmFy"), "foobar");
 }
 
 TEST(Base64, SkipsWhiteSpaceInLongText) {
