@@ -6,6 +6,7 @@
 #include "platform/i18n/charset_names.h"
 #include "platform/i18n/conversion_error.h"
 #include "platform/i18n/icu_charset.h"
+#include "platform/i18n/table_charset.h"
 #include "platform/i18n/unicode_charsets.h"
 
 namespace platform::i18n::detail {
@@ -19,8 +20,14 @@ ByteOrder byteOrderOf(std::string_view converter) {
     return converter.find("LE") != std::string_view::npos ? ByteOrder::little : ByteOrder::fromMark;
 }
 
-std::unique_ptr<Charset> makeCharset(const std::string& name, const std::string& converter,
-                                     bool strict) {
+std::unique_ptr<Charset> makeCharset(const std::string& name, bool strict) {
+    if (std::unique_ptr<Charset> ours = makeTableCharset(name, strict)) {
+        return ours;
+    }
+    const std::string converter = converterName(name).value_or("");
+    if (converter.empty()) {
+        return nullptr;
+    }
     if (converter == "UTF-8") {
         return makeUtf8(name, strict);
     }
@@ -38,11 +45,7 @@ std::unique_ptr<Charset> makeCharset(const std::string& name, const std::string&
 }  // namespace
 
 std::unique_ptr<Charset> openCharset(std::string_view name, bool strict) {
-    const std::optional<std::string> converter = converterName(name);
-    std::unique_ptr<Charset> charset;
-    if (converter) {
-        charset = makeCharset(std::string(name), *converter, strict);
-    }
+    std::unique_ptr<Charset> charset = makeCharset(std::string(name), strict);
     if (!charset) {
         throwUnknownCharset(name);
     }

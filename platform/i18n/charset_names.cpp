@@ -36,12 +36,6 @@ constexpr std::array<NamePair, 4> supersets{{
     {"ibm-874_P100-1995", "windows-874-2000"},          // TIS-620
 }};
 
-bool isPlausibleName(std::string_view name) {
-    return !name.empty() && name.size() <= UCNV_MAX_CONVERTER_NAME_LENGTH &&
-           std::all_of(name.begin(), name.end(),
-                       [](char c) { return c > ' ' && c <= '~' && c != UCNV_OPTION_SEP_CHAR; });
-}
-
 std::string resolveExtraAlias(std::string name) {
     for (const NamePair& alias : extraAliases) {
         if (ucnv_compareNames(alias.from, name.c_str()) == 0) {
@@ -64,6 +58,12 @@ const char* icuMeaning(const std::string& name) {
 }
 
 }  // namespace
+
+bool isPlausibleName(std::string_view name) {
+    return !name.empty() && name.size() <= UCNV_MAX_CONVERTER_NAME_LENGTH &&
+           std::all_of(name.begin(), name.end(),
+                       [](char c) { return c > ' ' && c <= '~' && c != UCNV_OPTION_SEP_CHAR; });
+}
 
 std::optional<std::string> converterName(std::string_view name) {
     if (!isPlausibleName(name)) {

@@ -9,8 +9,10 @@
 
 #include <algorithm>
 #include <array>
+#include <optional>
 #include <ostream>
 #include <stdexcept>
+#include <vector>
 
 #include "platform/i18n/charset.h"
 #include "platform/i18n/codecvt.h"
@@ -73,12 +75,17 @@ bool isBinary(std::string_view sample) {
 
 std::string legacyCharset(std::string_view bytes) {
     const std::string sample = detail::charsetSample(bytes);
-    if (isBinary(sample)) {
-        return {};
+    const std::optional<detail::UnicodeGuess> unicode = detail::unmarkedUnicode(bytes);
+    const auto ranking = isBinary(sample) ? std::vector<detail::RankedCandidate>()
+                                          : detail::rankedCandidates(sample, bytes);
+    if (unicode &&
+        (ranking.empty() ||
+         unicode->bitsPerByte < ranking.front().cost / static_cast<double>(sample.size()))) {
+        return unicode->charset;
     }
-    for (const detail::Candidate* candidate : detail::rankedCandidates(sample, bytes)) {
-        if (candidate->holds(bytes)) {
-            return candidate->charset();
+    for (const detail::RankedCandidate& ranked : ranking) {
+        if (ranked.candidate->holds(bytes)) {
+            return ranked.candidate->charset();
         }
     }
     return {};
@@ -88,22 +95,16 @@ std::string findCharset(std::string_view bytes) {
     if (std::string marked = markedCharset(bytes); !marked.empty()) {
         return marked;
     }
-    if (bytes.empty()) {
-        return "UTF-8";
+    if (!simdjson::validate_utf8(bytes.data(), bytes.size())) {
+        return legacyCharset(bytes);
     }
-    const bool ascii = isAscii(bytes);
-    const bool hasZeros = bytes.find('\0') != std::string_view::npos;
-    if (ascii && !hasZeros) {
-        std::string escaped = detail::escapedCharset(bytes);
-        return escaped.empty() ? "UTF-8" : escaped;
+    // Valid UTF-8, but the bytes of ASCII text in UTF-16 and of escape sequences are that, too.
+    if (bytes.find('\0') != std::string_view::npos) {
+        const std::optional<detail::UnicodeGuess> unicode = detail::unmarkedUnicode(bytes);
+        return unicode ? unicode->charset : "UTF-8";
     }
-    const bool utf8 = simdjson::validate_utf8(bytes.data(), bytes.size());
-    if (!utf8 || hasZeros) {
-        if (std::string unicode = detail::unmarkedUnicode(bytes); !unicode.empty()) {
-            return unicode;
-        }
-    }
-    return utf8 ? "UTF-8" : legacyCharset(bytes);
+    const std::string escaped = isAscii(bytes) ? detail::escapedCharset(bytes) : std::string();
+    return escaped.empty() ? "UTF-8" : escaped;
 }
 
 }  // namespace

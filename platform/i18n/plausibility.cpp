@@ -40,6 +40,11 @@ constexpr bool isAsciiLetter(char16_t c) {
     return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
 }
 
+bool isWordByte(char byte) {
+    const auto value = static_cast<unsigned char>(byte);
+    return value >= 0x80 || isAsciiLetter(value);
+}
+
 bool isWordCharacter(char16_t c) {
     if (c == 0x00AA || c == 0x00BA || c == 0x00B5) {
         return false;
@@ -57,6 +62,7 @@ class Language {
 public:
     virtual ~Language() = default;
     virtual bool isWritableWith(std::u16string_view repertoire) const = 0;
+    virtual bool isLatin() const = 0;
 
     // The cost of runs of word characters, folded, each run closed by `wordEnd`.
     virtual double costOfWords(std::u16string_view words) const = 0;
@@ -91,6 +97,8 @@ public:
         return missing < acceptableGap;
     }
 
+    bool isLatin() const override { return table_.alphabet.front() == u'a'; }
+
     double costOfWords(std::u16string_view words) const override {
         std::uint64_t quarterBits = 0;
         std::size_t previous = 0;
@@ -110,7 +118,7 @@ public:
 
 private:
     int foreignCost(char16_t letter, char16_t before) const {
-        const bool sameScript = letter < 0x0250 && table_.alphabet.front() == u'a';
+        const bool sameScript = letter < 0x0250 && isLatin();
         return sameScript ? foreignLetterCost
                           : foreignScriptCost + (before == wordEnd ? 0 : scriptChangeCost);
     }
@@ -135,6 +143,7 @@ public:
     }
 
     bool isWritableWith(std::u16string_view) const override { return true; }
+    bool isLatin() const override { return false; }
 
     double costOfWords(std::u16string_view words) const override {
         std::uint64_t halfBits = 0;
@@ -321,11 +330,76 @@ bool isWritableWith(const Language& language, std::u16string_view repertoire) {
     return language.isWritableWith(repertoire);
 }
 
-double costInBits(std::u16string_view text, const std::vector<const Language*>& candidates) {
+namespace {
+
+// The ASCII words of `sample`, folded, each closed by `wordEnd`; and how much else there is.
+struct AsciiWords {
+    std::u16string words;
+    std::size_t beyondAscii = 0;
+};
+
+AsciiWords asciiWords(std::string_view sample) {
+    constexpr std::size_t enough = 4000;
+    AsciiWords found;
+    std::size_t position = 0;
+    while (position < sample.size() && found.words.size() < enough) {
+        if (sample[position] == '<') {
+            const std::size_t end = sample.find('>', position);
+            position = end == std::string_view::npos ? position + 1 : end + 1;
+            continue;
+        }
+        const std::size_t begin = position;
+        bool ascii = true;
+        while (position < sample.size() && isWordByte(sample[position])) {
+            ascii = ascii && static_cast<unsigned char>(sample[position]) < 0x80;
+            ++position;
+        }
+        if (position == begin) {
+            ++position;
+        } else if (!ascii) {
+            found.beyondAscii += position - begin;
+        } else if (position - begin > 1) {
+            for (const char c : sample.substr(begin, position - begin)) {
+                found.words += folded(static_cast<unsigned char>(c));
+            }
+            found.words += wordEnd;
+        }
+    }
+    return found;
+}
+
+}  // namespace
+
+Surroundings::Surroundings(std::string_view sample) {
+    constexpr double weight = 0.5;
+    constexpr double bound = 10;
+    const AsciiWords found = asciiWords(sample);
+    double cheapest = std::numeric_limits<double>::infinity();
+    for (const Language* language : alphabeticLanguages()) {
+        if (language->isLatin()) {
+            costs_[language] = weight * language->costOfWords(found.words);
+            cheapest = std::min(cheapest, costs_[language]);
+        }
+    }
+    const double share = static_cast<double>(found.words.size()) /
+                         static_cast<double>(found.words.size() + 4 * found.beyondAscii + 1);
+    for (const Language* language : allLanguages()) {
+        costs_[language] =
+            language->isLatin() ? std::min(bound, costs_[language] - cheapest) : bound * share;
+    }
+}
+
+double Surroundings::cost(const Language& language) const {
+    return costs_.at(&language);
+}
+
+double costInBits(std::u16string_view text, const std::vector<const Language*>& candidates,
+                  const Surroundings& surroundings) {
     const Dissection dissection(text);
     double cheapest = std::numeric_limits<double>::infinity();
     for (const Language* language : candidates) {
-        cheapest = std::min(cheapest, language->costOfWords(dissection.words()));
+        cheapest = std::min(
+            cheapest, language->costOfWords(dissection.words()) + surroundings.cost(*language));
     }
     return dissection.cost() + cheapest;
 }

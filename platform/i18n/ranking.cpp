@@ -18,23 +18,22 @@ constexpr double declaredDiscount = 40;
 constexpr double uchardetDiscount = 4;
 constexpr double icuDiscount = 2;
 
-struct Ranked {
-    const Candidate* candidate;
-    double cost;
-};
-
-bool isSameCharset(const std::optional<std::string>& converter, const Candidate& candidate) {
-    return converter && converter == converterName(candidate.charset());
+bool isSameCharset(const std::string& name, const Candidate& candidate) {
+    if (name.empty()) {
+        return false;
+    }
+    const std::optional<std::string> converter = converterName(name);
+    return name == candidate.charset() ||
+           (converter && converter == converterName(candidate.charset()));
 }
 
 class Discounts {
 public:
     Discounts(std::string_view sample, std::string_view head)
-        : declared_(converterName(declaredCharset(head))),
-          uchardet_(converterName(uchardetGuess(sample))) {
+        : declared_(declaredCharset(head)), uchardet_(uchardetGuess(sample)) {
         const std::vector<std::string> guesses = icuGuesses(sample);
         if (!guesses.empty()) {
-            icu_ = converterName(guesses.front());
+            icu_ = guesses.front();
         }
     }
 
@@ -47,29 +46,27 @@ public:
     }
 
 private:
-    std::optional<std::string> declared_;
-    std::optional<std::string> uchardet_;
-    std::optional<std::string> icu_;
+    std::string declared_;
+    std::string uchardet_;
+    std::string icu_;
 };
 
 }  // namespace
 
-std::vector<const Candidate*> rankedCandidates(std::string_view sample, std::string_view head) {
+std::vector<RankedCandidate> rankedCandidates(std::string_view sample, std::string_view head) {
     const Discounts discounts(sample, head);
-    std::vector<Ranked> ranking;
+    const Surroundings surroundings(sample);
+    std::vector<RankedCandidate> ranking;
     for (const Candidate& candidate : legacyCandidates()) {
         if (const std::optional<std::u16string> text = candidate.decode(sample)) {
-            const double cost = costInBits(*text, candidate.languages());
+            const double cost = costInBits(*text, candidate.languages(), surroundings);
             ranking.push_back({&candidate, cost + candidate.rarity() - discounts(candidate)});
         }
     }
-    std::stable_sort(ranking.begin(), ranking.end(),
-                     [](const Ranked& a, const Ranked& b) { return a.cost < b.cost; });
-    std::vector<const Candidate*> candidates;
-    for (const Ranked& ranked : ranking) {
-        candidates.push_back(ranked.candidate);
-    }
-    return candidates;
+    std::stable_sort(
+        ranking.begin(), ranking.end(),
+        [](const RankedCandidate& a, const RankedCandidate& b) { return a.cost < b.cost; });
+    return ranking;
 }
 
 }  // namespace platform::i18n::detail

@@ -8,8 +8,14 @@
 
 namespace platform::i18n::detail {
 
-/// The candidates in which the file that `sample` was taken from may be, likeliest first. `head` is
-/// the beginning of the file, where it may name its charset.
-std::vector<const Candidate*> rankedCandidates(std::string_view sample, std::string_view head);
+/// A candidate with the bits that a sample costs in it, discounts and rarity included.
+struct RankedCandidate {
+    const Candidate* candidate;
+    double cost;
+};
+
+/// The candidates in which `sample` decodes, likeliest first. `head` is the beginning of the file
+/// that the sample is of, where it may name its charset.
+std::vector<RankedCandidate> rankedCandidates(std::string_view sample, std::string_view head);
 
 }  // namespace platform::i18n::detail

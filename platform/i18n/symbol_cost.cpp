@@ -62,9 +62,19 @@ bool joinsLetters(char16_t sign) {
         sign);
 }
 
+// Signs that fill lines.
+bool isOrnament(char16_t sign) {
+    return (sign >= 0x2500 && sign <= 0x25FF) || (sign >= 0xFF00 && sign <= 0xFF0F) ||
+           sign == 0xFF1D ||
+           contains(u"\u2014\u2013\u2015\u2026\u2022\u00B7\u3000\u2605\u2606\u203B\u00A0", sign);
+}
+
 bool isMisplaced(char16_t sign, Neighbours neighbours) {
     const bool letterBefore = isLetter(neighbours.before);
     const bool letterAfter = isLetter(neighbours.after);
+    if (sign == 0x2019) {
+        return !letterBefore && letterAfter;
+    }
     if (contains(u"\u00BF\u00A1\u00A9\u00A7\u2116", sign)) {
         return letterBefore;
     }
@@ -90,16 +100,19 @@ int symbolCost(char16_t sign, Neighbours neighbours) {
         default:
             break;
     }
-    if (sign == neighbours.before) {
-        return repeatedCost;
-    }
     if (sign == 0xFFFD) {
         return unassignedCost;
+    }
+    if (sign == neighbours.before && isOrnament(sign)) {
+        return repeatedCost;
     }
     if (sign >= 0x2500 && sign <= 0x259F) {
         const bool drawing = neighbours.before >= 0x2500 && neighbours.before <= 0x259F;
         const bool amongLetters = isLetter(neighbours.before) || isLetter(neighbours.after);
         return drawing ? boxDrawingCost / 2 : boxDrawingCost + (amongLetters ? misplacedCost : 0);
+    }
+    if ((sign == 0x2013 || sign == 0x2014) && neighbours.before == ' ' && neighbours.after == ' ') {
+        return 4;
     }
     return commonness(sign) + (isMisplaced(sign, neighbours) ? misplacedCost : 0);
 }

@@ -28,7 +28,7 @@ struct Form {
 double bitsPerByte(const Form& form, std::string_view bytes) {
     const std::string_view sample = bytes.substr(0, sampleSize);
     const std::u16string text = openCharset(form.name, false)->decode(sample);
-    return costInBits(text, allLanguages()) / static_cast<double>(sample.size());
+    return costInBits(text, allLanguages(), Surroundings("")) / static_cast<double>(sample.size());
 }
 
 bool isWhole(const Form& form, std::string_view bytes) {
@@ -42,7 +42,7 @@ bool isWhole(const Form& form, std::string_view bytes) {
 
 }  // namespace
 
-std::string unmarkedUnicode(std::string_view bytes) {
+std::optional<UnicodeGuess> unmarkedUnicode(std::string_view bytes) {
     constexpr std::array<Form, 4> forms{
         {{"UTF-32LE", 4}, {"UTF-32BE", 4}, {"UTF-16LE", 2}, {"UTF-16BE", 2}}};
     const Form* best = nullptr;
@@ -56,7 +56,10 @@ std::string unmarkedUnicode(std::string_view bytes) {
             }
         }
     }
-    return best != nullptr && isWhole(*best, bytes) ? best->name : std::string();
+    if (best == nullptr || !isWhole(*best, bytes)) {
+        return std::nullopt;
+    }
+    return UnicodeGuess{best->name, bestCost};
 }
 
 }  // namespace platform::i18n::detail
