@@ -1,7 +1,11 @@
 // A part of a file from which its charset can be told.
+//
+// Pieces from all over the file show its language. Then come the words around byte values that
+// these pieces lack: often two charsets differ in a single letter, and that letter may occur once.
 #include "platform/i18n/sample.h"
 
 #include <algorithm>
+#include <array>
 
 namespace platform::i18n::detail {
 
@@ -9,8 +13,10 @@ namespace {
 
 constexpr std::size_t wholeFileLimit = 24 * 1024;
 constexpr std::size_t pieceCount = 16;
-constexpr std::size_t pieceSize = wholeFileLimit / pieceCount;
+constexpr std::size_t pieceSize = 1024;
 constexpr std::size_t boundarySearch = 16 * 1024;
+constexpr std::size_t wordSearch = 64;
+constexpr int wantedOccurrences = 2;
 
 bool isBeyondAscii(char byte) {
     return static_cast<unsigned char>(byte) >= 0x80;
@@ -27,52 +33,87 @@ std::size_t findBeyondAscii(std::string_view bytes, std::size_t from) {
     return static_cast<std::size_t>(found - bytes.begin());
 }
 
-// The boundary before `position`, or npos when there is none near.
-std::size_t boundaryBefore(std::string_view bytes, std::size_t position, std::size_t lowest) {
-    const std::size_t limit = std::max(lowest, position - std::min(position, boundarySearch));
-    for (std::size_t i = position; i > limit; --i) {
-        if (isBoundary(bytes[i - 1])) {
-            return i;
-        }
-    }
-    return limit == 0 || limit == lowest ? limit : std::string_view::npos;
-}
+class Sampler {
+public:
+    explicit Sampler(std::string_view bytes) : bytes_(bytes) {}
 
-std::size_t boundaryAfter(std::string_view bytes, std::size_t position) {
-    const std::size_t limit = std::min(bytes.size(), position + boundarySearch);
-    for (std::size_t i = position; i < limit; ++i) {
-        if (isBoundary(bytes[i])) {
-            return i;
+    std::string sample() {
+        for (std::size_t i = 0; i < pieceCount; ++i) {
+            const std::size_t position =
+                findBeyondAscii(bytes_, std::max(done_, bytes_.size() / pieceCount * i));
+            if (position == bytes_.size()) {
+                break;
+            }
+            take(position, position + pieceSize, boundarySearch);
+        }
+        // Not one boundary in all of it: a text without a space or an end of line.
+        if (sample_.empty()) {
+            return std::string(bytes_.substr(0, boundarySearch));
+        }
+        takeRareBytes();
+        return sample_;
+    }
+
+private:
+    void takeRareBytes() {
+        done_ = 0;
+        for (std::size_t i = 0; i < bytes_.size(); ++i) {
+            if (isBeyondAscii(bytes_[i]) && i >= done_ &&
+                occurrences(bytes_[i]) < wantedOccurrences) {
+                take(i, i + 1, wordSearch);
+            }
         }
     }
-    return limit == bytes.size() ? limit : std::string_view::npos;
-}
+
+    // Adds the bytes from `begin` to `end` and what is around them up to the boundaries, if there
+    // are any within `search` bytes.
+    void take(std::size_t begin, std::size_t end, std::size_t search) {
+        const std::size_t first = boundaryBefore(begin, search);
+        const std::size_t last = boundaryAfter(std::min(end, bytes_.size()), search);
+        if (first == std::string_view::npos || last == std::string_view::npos) {
+            return;
+        }
+        for (const char byte : bytes_.substr(first, last - first)) {
+            ++occurrences(byte);
+        }
+        sample_ += bytes_.substr(first, last - first);
+        sample_ += '\n';
+        done_ = last;
+    }
+
+    std::size_t boundaryBefore(std::size_t position, std::size_t search) const {
+        const std::size_t limit = std::max(done_, position - std::min(position, search));
+        for (std::size_t i = position; i > limit; --i) {
+            if (isBoundary(bytes_[i - 1])) {
+                return i;
+            }
+        }
+        return limit == done_ ? limit : std::string_view::npos;
+    }
+
+    std::size_t boundaryAfter(std::size_t position, std::size_t search) const {
+        const std::size_t limit = std::min(bytes_.size(), position + search);
+        for (std::size_t i = position; i < limit; ++i) {
+            if (isBoundary(bytes_[i])) {
+                return i;
+            }
+        }
+        return limit == bytes_.size() ? limit : std::string_view::npos;
+    }
+
+    int& occurrences(char byte) { return occurrences_[static_cast<unsigned char>(byte)]; }
+
+    std::string_view bytes_;
+    std::string sample_;
+    std::array<int, 256> occurrences_{};
+    // The end of the last piece taken, which is a boundary.
+    std::size_t done_ = 0;
+};
 
 }  // namespace
 
 std::string charsetSample(std::string_view bytes) {
-    if (bytes.size() <= wholeFileLimit) {
-        return std::string(bytes);
-    }
-    std::string sample;
-    std::size_t done = 0;
-    for (std::size_t i = 0; i < pieceCount; ++i) {
-        const std::size_t from = std::max(done, bytes.size() / pieceCount * i);
-        const std::size_t position = findBeyondAscii(bytes, from);
-        if (position == bytes.size()) {
-            break;
-        }
-        const std::size_t begin = boundaryBefore(bytes, position, done);
-        const std::size_t end = boundaryAfter(bytes, std::min(bytes.size(), position + pieceSize));
-        if (begin == std::string_view::npos || end == std::string_view::npos) {
-            continue;
-        }
-        sample += bytes.substr(begin, end - begin);
-        sample += '\n';
-        done = end;
-    }
-    // Not one boundary in all of it: a text without a space or an end of line.
-    return sample.empty() ? std::string(bytes.substr(0, boundarySearch)) : sample;
+    return bytes.size() <= wholeFileLimit ? std::string(bytes) : Sampler(bytes).sample();
 }
 
 }  // namespace platform::i18n::detail

@@ -18,6 +18,7 @@ constexpr int boxDrawingCost = 11;
 constexpr int repeatedCost = 2;
 constexpr int rareCost = 13;
 constexpr int misplacedCost = 6;
+constexpr int standingAloneCost = 4;
 
 bool contains(std::u16string_view set, char16_t character) {
     return set.find(character) != std::u16string_view::npos;
@@ -33,7 +34,7 @@ constexpr std::u16string_view usual =
     u"\u00A9\u00AE\u2122\u00A7\u20AC\u00A3\u00BF\u00A1\u2022\u00B7\u2116\u00AD\u061B\u2010\u2011"
     u"\u300E\u300F\u30FB\uFF01\uFF1F\uFF1B\u3010\u3011\u0387\u037E\u05BE\u05F3\u05F4";
 constexpr std::u16string_view lessUsual =
-    u"\u00BD\u00BC\u00BE\u00B2\u00B3\u00B9\u00D7\u00F7\u00B1\u00AA\u00BA\u201A\u2039\u203A\u2020"
+    u"\u00B4\u00BD\u00BC\u00BE\u00B2\u00B3\u00B9\u00D7\u00F7\u00B1\u00AA\u00BA\u201A\u2039\u203A\u2020"
     u"\u00B5"
     u"\u200E\u200F\u2030\u2192\u2190\u2605\u25CF\u25A0\u25CB\u25C6\u203B";
 
@@ -48,6 +49,10 @@ int commonness(char16_t sign) {
         return 8;
     }
     return contains(lessUsual, sign) ? 10 : rareCost;
+}
+
+bool isBlank(char16_t character) {
+    return character <= u' ';
 }
 
 bool isLetter(char16_t character) {
@@ -72,6 +77,12 @@ bool isOrnament(char16_t sign) {
 bool isMisplaced(char16_t sign, Neighbours neighbours) {
     const bool letterBefore = isLetter(neighbours.before);
     const bool letterAfter = isLetter(neighbours.after);
+    if (isBlank(neighbours.after) && contains(u"\u201E\u201A\u00BF\u00A1", sign)) {
+        return true;
+    }
+    if (isBlank(neighbours.before) && isBlank(neighbours.after) && sign == 0x2026) {
+        return true;
+    }
     if (sign == 0x2019) {
         return !letterBefore && letterAfter;
     }
@@ -111,8 +122,9 @@ int symbolCost(char16_t sign, Neighbours neighbours) {
         const bool amongLetters = isLetter(neighbours.before) || isLetter(neighbours.after);
         return drawing ? boxDrawingCost / 2 : boxDrawingCost + (amongLetters ? misplacedCost : 0);
     }
-    if ((sign == 0x2013 || sign == 0x2014) && neighbours.before == ' ' && neighbours.after == ' ') {
-        return 4;
+    const bool alone = isBlank(neighbours.before) && isBlank(neighbours.after);
+    if (alone && contains(u"\u2013\u2014\u2022", sign)) {
+        return standingAloneCost;
     }
     return commonness(sign) + (isMisplaced(sign, neighbours) ? misplacedCost : 0);
 }
