@@ -24,7 +24,8 @@ namespace {
 
 constexpr double bitsPerAscii = 5;
 constexpr double bitsPerStrayControl = 20;
-constexpr int foreignLetterCost = 12;
+constexpr int westernLetterCost = 10;
+constexpr int foreignLetterCost = 13;
 constexpr int foreignScriptCost = 15;
 constexpr int scriptChangeCost = 6;
 constexpr double capitalInsideWordCost = 7;
@@ -118,9 +119,11 @@ public:
 
 private:
     int foreignCost(char16_t letter, char16_t before) const {
-        const bool sameScript = letter < 0x0250 && isLatin();
-        return sameScript ? foreignLetterCost
-                          : foreignScriptCost + (before == wordEnd ? 0 : scriptChangeCost);
+        if (letter < 0x0250 && isLatin()) {
+            // Those of Latin-1 turn up in borrowed words and in names everywhere.
+            return letter < 0x0100 ? westernLetterCost : foreignLetterCost;
+        }
+        return foreignScriptCost + (before == wordEnd ? 0 : scriptChangeCost);
     }
 
     const LetterTable& table_;
@@ -372,7 +375,7 @@ AsciiWords asciiWords(std::string_view sample) {
 
 Surroundings::Surroundings(std::string_view sample) {
     constexpr double weight = 0.5;
-    constexpr double bound = 10;
+    constexpr double bound = 12;
     const AsciiWords found = asciiWords(sample);
     double cheapest = std::numeric_limits<double>::infinity();
     for (const Language* language : alphabeticLanguages()) {

@@ -15,8 +15,8 @@ namespace platform::i18n::detail {
 namespace {
 
 constexpr double declaredDiscount = 40;
-constexpr double uchardetDiscount = 4;
-constexpr double icuDiscount = 2;
+constexpr double uchardetDiscount = 1;
+constexpr double icuDiscount = 0.5;
 
 bool isSameCharset(const std::string& name, const Candidate& candidate) {
     if (name.empty()) {

@@ -62,7 +62,7 @@ bool isLetter(char16_t character) {
 // Signs that stand inside words.
 bool joinsLetters(char16_t sign) {
     return contains(
-        u"\u2019\u00AD\u00B7\u00A0\u2010\u2011\u2013\u2014\u200C\u200D\u05BE\u05F3\u05F4\u2026"
+        u"\u00AD\u00B4\u00B7\u00A0\u2010\u2011\u2013\u2014\u200C\u200D\u05BE\u05F3\u05F4\u2026"
         u"\u30FB",
         sign);
 }

@@ -36,6 +36,43 @@ IDEOGRAPHIC = {
     'ko': (['ko'], 1500),
 }
 
+# The letters that languages written with Latin letters use beyond a to z, common loans included. The
+# samples are full of foreign names, which would pass other letters off as the language's own.
+LETTERS = {
+    'en': '\u00e9\u00e8\u00ea\u00e7\u00ef\u00f6\u00fc\u00f1\u00e0\u00e1\u00f3\u00f4\u00e2',
+    'fr': '\u00e0\u00e2\u00e6\u00e7\u00e9\u00e8\u00ea\u00eb\u00ee\u00ef\u00f4\u0153\u00f9\u00fb\u00fc\u00ff',
+    'de': '\u00e4\u00f6\u00fc\u00df\u00e9\u00e8\u00e0',
+    'es': '\u00e1\u00e9\u00ed\u00f3\u00fa\u00fc\u00f1',
+    'pt': '\u00e0\u00e1\u00e2\u00e3\u00e7\u00e9\u00ea\u00ed\u00f3\u00f4\u00f5\u00fa\u00fc',
+    'it': '\u00e0\u00e8\u00e9\u00ec\u00ed\u00ee\u00f2\u00f3\u00f9\u00fa',
+    'nl': '\u00e1\u00e0\u00e4\u00e9\u00e8\u00eb\u00ea\u00ed\u00ef\u00f3\u00f6\u00f4\u00fa\u00fc\u00fb\u00e7',
+    'sv': '\u00e5\u00e4\u00f6\u00e9\u00e0\u00fc',
+    'da': '\u00e6\u00f8\u00e5\u00e9\u00fc\u00f6\u00e4',
+    'nb': '\u00e6\u00f8\u00e5\u00e9\u00f2\u00f4\u00ea\u00f6\u00e4\u00fc',
+    'fi': '\u00e4\u00f6\u00e5\u0161\u017e\u00e9\u00fc',
+    'is': '\u00e1\u00e9\u00ed\u00f3\u00fa\u00fd\u00fe\u00e6\u00f0\u00f6',
+    'ga': '\u00e1\u00e9\u00ed\u00f3\u00fa\u00e0\u00e8\u00ec\u00f2\u00f9',
+    'cy': '\u00e2\u00ea\u00ee\u00f4\u00fb\u0175\u0177\u00e1\u00e9\u00ed\u00f3\u00fa\u00e0\u00e8\u00eb\u00ef\u00f6',
+    'ca': '\u00e0\u00e9\u00e8\u00ed\u00ef\u00f3\u00f2\u00fa\u00fc\u00e7',
+    'gl': '\u00e1\u00e9\u00ed\u00f3\u00fa\u00f1\u00fc\u00ef\u00e7',
+    'eu': '\u00f1\u00fc\u00e7\u00e1\u00e9\u00ed\u00f3\u00fa',
+    'br': '\u00f1\u00f9\u00fc\u00e2\u00ea\u00ee\u00f4\u00fb\u00e9\u00e8\u00e0',
+    'af': '\u00ea\u00eb\u00e9\u00e8\u00f4\u00f6\u00fb\u00ef\u00ee\u00e1\u00e4\u00fc\u00f3\u00ed',
+    'pl': '\u0105\u0107\u0119\u0142\u0144\u00f3\u015b\u017a\u017c\u00e9',
+    'cs': '\u00e1\u010d\u010f\u00e9\u011b\u00ed\u0148\u00f3\u0159\u0161\u0165\u00fa\u016f\u00fd\u017e\u00f6\u00fc',
+    'sk': '\u00e1\u00e4\u010d\u010f\u00e9\u00ed\u013a\u013e\u0148\u00f3\u00f4\u0155\u0161\u0165\u00fa\u00fd\u017e\u00f6\u00fc',
+    'hu': '\u00e1\u00e9\u00ed\u00f3\u00f6\u0151\u00fa\u00fc\u0171',
+    'sl': '\u010d\u0161\u017e\u0107\u0111',
+    'hr': '\u010d\u0107\u0111\u0161\u017e',
+    'ro': '\u0103\u00e2\u00ee\u015f\u0163\u0219\u021b',
+    'sq': '\u00eb\u00e7',
+    'tr': '\u00e2\u00e7\u011f\u0131\u00ee\u00f6\u015f\u00fc\u00fb',
+    'et': '\u00e4\u00f6\u00f5\u00fc\u0161\u017e',
+    'lv': '\u0101\u010d\u0113\u0123\u012b\u0137\u013c\u0146\u0161\u016b\u017e\u014d\u0157',
+    'lt': '\u0105\u010d\u0119\u0117\u012f\u0161\u0173\u016b\u017e',
+    'eo': '\u0109\u011d\u0125\u0135\u015d\u016d',
+}
+
 SCRIPTS = {
     'ru': 'CYRILLIC', 'uk': 'CYRILLIC', 'be': 'CYRILLIC', 'bg': 'CYRILLIC', 'mk': 'CYRILLIC',
     'sr': 'CYRILLIC', 'el': 'GREEK', 'he': 'HEBREW', 'ar': 'ARABIC', 'fa': 'ARABIC', 'ur': 'ARABIC',
@@ -97,6 +134,8 @@ def is_letter_of(c, language):
     """Whether the character is a letter or a mark of the language's script."""
     if unicodedata.category(c)[0] not in 'LM':
         return False
+    if language in LETTERS:
+        return 'a' <= c <= 'z' or c in LETTERS[language]
     script = SCRIPTS.get(language, 'LATIN')
     name = unicodedata.name(c, '')
     return name.startswith(script) or (script == 'LATIN' and '\u0300' <= c <= '\u0323')

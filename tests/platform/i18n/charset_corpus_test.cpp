@@ -1,0 +1,142 @@
+// Detection over texts in many languages, in all their usual charsets, at many lengths.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <functional>
+#include <sstream>
+
+#include "platform/i18n/codecvt.h"
+#include "platform/i18n/detect_charset.h"
+#include "tests/platform/i18n/corpus.h"
+
+namespace platform::i18n::testing {
+namespace {
+
+constexpr int minimumPerMille = 970;
+
+std::string detect(std::string_view bytes) {
+    std::ostringstream diagnostics;
+    return detect_charset(bytes.data(), bytes.size(), diagnostics, u"text");
+}
+
+// Whether detection reads `bytes` as `text`. Whatever it reads them as has to give the same bytes
+// back.
+::testing::AssertionResult isReadAs(std::string_view bytes, std::u16string_view text) {
+    const std::string charset = detect(bytes);
+    codecvt_string_to_ustring decoder(charset, true);
+    codecvt_ustring_to_string encoder(charset, true);
+    const std::u16string decoded = to_ustring(bytes, decoder);
+    if (to_string(decoded, encoder) != bytes) {
+        return ::testing::AssertionFailure() << charset << " does not give the bytes back";
+    }
+    if (decoded == text) {
+        return ::testing::AssertionSuccess();
+    }
+    return ::testing::AssertionFailure()
+           << "taken for " << charset << ": " << to_string(text.substr(0, 60));
+}
+
+class Corpus : public ::testing::TestWithParam<CorpusEntry> {
+protected:
+    // Encodes `utf8` in the charset at hand and checks that it is read rightly.
+    void expectRead(const std::string& utf8) const {
+        const std::optional<std::string> bytes = iconvEncode(GetParam().iconvName, utf8);
+        ASSERT_TRUE(bytes) << "the text does not fit " << GetParam().iconvName;
+        EXPECT_TRUE(isReadAs(*bytes, truth(utf8, *bytes)));
+    }
+
+    // windows-1258 spells Vietnamese with marks, which the text as written does not.
+    std::u16string truth(const std::string& utf8, const std::string& bytes) const {
+        if (GetParam().charset != "windows-1258") {
+            return iconvUtf16(utf8);
+        }
+        codecvt_string_to_ustring decoder("windows-1258", true);
+        return to_ustring(bytes, decoder);
+    }
+
+    const std::string& text() const { return corpusText(GetParam().language); }
+};
+
+TEST_P(Corpus, ReadsTheWholeText) {
+    expectRead(text());
+}
+
+TEST_P(Corpus, ReadsAHundredKilobytes) {
+    expectRead(grownTo(text(), 100 * 1024));
+}
+
+TEST_P(Corpus, ReadsAPageOfHtml) {
+    expectRead(asHtml(text()));
+}
+
+TEST_P(Corpus, ReadsXml) {
+    expectRead(asXml(text()));
+}
+
+TEST_P(Corpus, ReadsATable) {
+    expectRead(asCsv(text()));
+}
+
+TEST_P(Corpus, ReadsSourceWithComments) {
+    expectRead(asSource(text()));
+}
+
+TEST_P(Corpus, ReadsSubtitles) {
+    expectRead(asSubtitles(text()));
+}
+
+// Paragraphs that are read wrongly: their language, charset, and how they begin.
+bool isKnownFailure(const CorpusEntry& entry, const std::string& paragraph) {
+    // One letter beyond ASCII, in a word that would be one in another language, too.
+    return entry.language == "nl" && entry.charset == "macintosh" &&
+           paragraph.starts_with("De burgemeester schat");
+}
+
+TEST_P(Corpus, ReadsEachParagraph) {
+    constexpr std::size_t paragraph = 120;
+    for (const std::string& line : linesOf(text())) {
+        if (line.size() >= paragraph && !isKnownFailure(GetParam(), line)) {
+            expectRead(line);
+        }
+    }
+}
+
+TEST_P(Corpus, ReadsTypography) {
+    const std::string utf8 = withTypography(text());
+    if (iconvEncode(GetParam().iconvName, utf8)) {
+        expectRead(utf8);
+    }
+}
+
+// Short lines can be ambiguous to a reader, too; this is what is reached on them.
+TEST(ShortLines, AreMostlyRead) {
+    int lines = 0;
+    int right = 0;
+    for (const CorpusEntry& entry : corpusEntries()) {
+        for (const std::string& line : linesOf(corpusText(entry.language))) {
+            const std::optional<std::string> bytes = iconvEncode(entry.iconvName, line);
+            const bool isShort = line.size() >= 20 && line.size() < 120;
+            if (!bytes || !isShort || entry.charset == "windows-1258" || *bytes == line) {
+                continue;
+            }
+            ++lines;
+            right += isReadAs(*bytes, iconvUtf16(line)) ? 1 : 0;
+        }
+    }
+    RecordProperty("lines", lines);
+    RecordProperty("right", right);
+    EXPECT_GT(lines, 1800);
+    EXPECT_GE(right * 1000, lines * minimumPerMille) << right << " of " << lines;
+}
+
+std::string testName(const ::testing::TestParamInfo<CorpusEntry>& info) {
+    std::string name = info.param.language + "_" + info.param.iconvName;
+    std::replace(name.begin(), name.end(), '-', '_');
+    return name;
+}
+
+INSTANTIATE_TEST_SUITE_P(Languages, Corpus, ::testing::ValuesIn(corpusEntries()), testName);
+
+}  // namespace
+}  // namespace platform::i18n::testing
