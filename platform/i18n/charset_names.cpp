@@ -36,6 +36,9 @@ constexpr std::array<NamePair, 4> supersets{{
     {"ibm-874_P100-1995", "windows-874-2000"},          // TIS-620
 }};
 
+// ICU 72 crashes when it encodes to this one.
+constexpr std::string_view unusable = "x11-compound-text";
+
 std::string resolveExtraAlias(std::string name) {
     for (const NamePair& alias : extraAliases) {
         if (ucnv_compareNames(alias.from, name.c_str()) == 0) {
@@ -70,7 +73,7 @@ std::optional<std::string> converterName(std::string_view name) {
         return std::nullopt;
     }
     const char* const meaning = icuMeaning(resolveExtraAlias(std::string(name)));
-    if (meaning == nullptr) {
+    if (meaning == nullptr || meaning == unusable) {
         return std::nullopt;
     }
     std::string converter = meaning;

@@ -6,9 +6,11 @@
 #include "platform/i18n/detect_charset.h"
 
 #include <simdjson.h>
+#include <unicode/utf8.h>
 
 #include <algorithm>
 #include <array>
+#include <cstdint>
 #include <optional>
 #include <ostream>
 #include <stdexcept>
@@ -70,14 +72,31 @@ bool isBinary(std::string_view sample) {
         const auto byte = static_cast<unsigned char>(c);
         return byte < 0x20 && !(byte >= '\t' && byte <= '\r') && byte != 0x1A && byte != 0x1B;
     });
-    return static_cast<std::size_t>(controls) * 20 > sample.size();
+    return static_cast<std::size_t>(controls) * 20 > sample.size() + 20;
+}
+
+// Whether the sample is UTF-8 but for a few damaged places. Legacy charsets could decode it, as
+// nonsense.
+bool isDamagedUtf8(std::string_view sample) {
+    std::size_t characters = 0;
+    std::size_t damaged = 0;
+    const auto* const data = reinterpret_cast<const std::uint8_t*>(sample.data());
+    const auto size = static_cast<std::int32_t>(sample.size());
+    for (std::int32_t i = 0; i < size;) {
+        UChar32 character = 0;
+        U8_NEXT(data, i, size, character);
+        characters += character >= 0x80 ? 1U : 0U;
+        damaged += character < 0 ? 1U : 0U;
+    }
+    return characters >= 10 && characters >= 10 * damaged;
 }
 
 std::string legacyCharset(std::string_view bytes) {
     const std::string sample = detail::charsetSample(bytes);
     const std::optional<detail::UnicodeGuess> unicode = detail::unmarkedUnicode(bytes);
-    const auto ranking = isBinary(sample) ? std::vector<detail::RankedCandidate>()
-                                          : detail::rankedCandidates(sample, bytes);
+    const auto ranking = isBinary(sample) || isDamagedUtf8(sample)
+                             ? std::vector<detail::RankedCandidate>()
+                             : detail::rankedCandidates(sample, bytes);
     if (unicode &&
         (ranking.empty() ||
          unicode->bitsPerByte < ranking.front().cost / static_cast<double>(sample.size()))) {
@@ -98,13 +117,17 @@ std::string findCharset(std::string_view bytes) {
     if (!simdjson::validate_utf8(bytes.data(), bytes.size())) {
         return legacyCharset(bytes);
     }
-    // Valid UTF-8, but the bytes of ASCII text in UTF-16 and of escape sequences are that, too.
-    if (bytes.find('\0') != std::string_view::npos) {
+    // Valid UTF-8, but so are the bytes of escape sequences, and some of UTF-16.
+    if (isAscii(bytes)) {
+        if (std::string escaped = detail::escapedCharset(bytes); !escaped.empty()) {
+            return escaped;
+        }
+    }
+    if (bytes.find('\0') != std::string_view::npos || isBinary(bytes)) {
         const std::optional<detail::UnicodeGuess> unicode = detail::unmarkedUnicode(bytes);
         return unicode ? unicode->charset : "UTF-8";
     }
-    const std::string escaped = isAscii(bytes) ? detail::escapedCharset(bytes) : std::string();
-    return escaped.empty() ? "UTF-8" : escaped;
+    return "UTF-8";
 }
 
 }  // namespace

@@ -51,6 +51,17 @@ private:
     std::string icu_;
 };
 
+// The text of the sample in `candidate`. A sample of a large file can end inside a character.
+std::optional<std::u16string> decodeSample(const Candidate& candidate, std::string_view sample) {
+    constexpr std::size_t longestCharacter = 4;
+    for (std::size_t cut = 0; cut < longestCharacter && cut <= sample.size(); ++cut) {
+        if (auto text = candidate.decode(sample.substr(0, sample.size() - cut))) {
+            return text;
+        }
+    }
+    return std::nullopt;
+}
+
 }  // namespace
 
 std::vector<RankedCandidate> rankedCandidates(std::string_view sample, std::string_view head) {
@@ -58,7 +69,7 @@ std::vector<RankedCandidate> rankedCandidates(std::string_view sample, std::stri
     const Surroundings surroundings(sample);
     std::vector<RankedCandidate> ranking;
     for (const Candidate& candidate : legacyCandidates()) {
-        if (const std::optional<std::u16string> text = candidate.decode(sample)) {
+        if (const std::optional<std::u16string> text = decodeSample(candidate, sample)) {
             const double cost = costInBits(*text, candidate.languages(), surroundings);
             ranking.push_back({&candidate, cost + candidate.rarity() - discounts(candidate)});
         }

@@ -83,7 +83,7 @@ bool isMisplaced(char16_t sign, Neighbours neighbours) {
     if (isBlank(neighbours.before) && isBlank(neighbours.after) && sign == 0x2026) {
         return true;
     }
-    if (sign == 0x2019) {
+    if (sign == 0x2019 || sign == 0x00B4) {
         return !letterBefore && letterAfter;
     }
     if (contains(u"\u00BF\u00A1\u00A9\u00A7\u2116", sign)) {

@@ -17,7 +17,7 @@ namespace {
 
 constexpr std::size_t sampleSize = 4096;
 // Text costs around five bits for a byte of UTF-16, other bytes eight and more.
-constexpr double plausibleBitsPerByte = 6.2;
+constexpr double plausibleBitsPerByte = 7;
 
 struct Form {
     const char* name;
