@@ -24,6 +24,7 @@ namespace {
 using platform::messaging::MessageService;
 using platform::messaging::MessageServiceOptions;
 using testing::ElementsAre;
+using testing::EndsWith;
 using testing::IsEmpty;
 
 using tests::LoadedBundle;
@@ -106,6 +107,14 @@ TEST_F(BundleTest, NamesItselfToTheMessageServiceAndGivesNoOptions) {
 TEST_F(BundleTest, AnswersReadRequests) {
     bundle_.start();
     EXPECT_THAT(answersToRead(), oneAnswer);
+}
+
+// Detection and conversion bring in libraries with caches of their own, which outlast the bundle.
+TEST_F(BundleTest, LosesNothingOfItsLibrariesWhenItIsUnloaded) {
+    std::filesystem::copy_file(PROJECT_SOURCE_ROOT "/examples/library-notice.shift_jis.txt",
+                               document_, std::filesystem::copy_options::overwrite_existing);
+    bundle_.start();
+    EXPECT_THAT(answersToRead(), ElementsAre(EndsWith(R"("status":true})")));
 }
 
 TEST_F(BundleTest, AnswersRequestsAfterStop) {

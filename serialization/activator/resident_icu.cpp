@@ -1,0 +1,18 @@
+// Keeps ICU in the process when the bundle is unloaded. ICU's caches last as long as the process,
+// and only the program as a whole may free them (u_cleanup). Were ICU unloaded along with the
+// bundle, they would be lost, and made anew with the next loading.
+
+#include <dlfcn.h>
+#include <unicode/ucsdet.h>
+
+namespace {
+
+[[gnu::constructor]] void keepIcuLoaded() {
+    // The library of the detector needs that of the converters, and so keeps it too.
+    Dl_info icu;
+    if (dladdr(reinterpret_cast<void*>(&ucsdet_open), &icu) != 0) {
+        dlopen(icu.dli_fname, RTLD_LAZY | RTLD_NOLOAD | RTLD_NODELETE);
+    }
+}
+
+}  // namespace
