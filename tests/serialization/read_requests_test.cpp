@@ -16,6 +16,7 @@ using test::kReadRequests;
 using test::kReadResponses;
 using test::Message;
 using test::RunningBundle;
+using test::takeBusLog;
 using test::writeFile;
 using testing::ElementsAre;
 using testing::IsEmpty;
@@ -171,6 +172,21 @@ TEST_F(ReadRequests, NestedTenMillionDeepDoNotStopTheBundle) {
     EXPECT_THAT(bundle.send(kReadRequests, "{\"rtcId\":" + std::string(10'000'000, '[')),
                 IsEmpty());
     EXPECT_TRUE(stillAnswers());
+}
+
+TEST_F(ReadRequests, ReadTheirKeysInOrder) {
+    const auto failureOf = [this](const std::string& request) {
+        takeBusLog();
+        EXPECT_THAT(bundle.send(kReadRequests, request), IsEmpty());
+        const std::vector<std::string> log = takeBusLog();
+        return log.empty() ? "no failure" : log.back();
+    };
+    EXPECT_THAT(failureOf(R"({"contentType":true,"filePath":1})"),
+                testing::HasSubstr("undefined to string"));
+    EXPECT_THAT(failureOf(R"({"rtcId":"","contentType":true,"filePath":1})"),
+                testing::HasSubstr("boolean to string"));
+    EXPECT_THAT(failureOf(R"({"rtcId":"","contentType":"","filePath":1})"),
+                testing::HasSubstr("double to string"));
 }
 
 }  // namespace

@@ -16,8 +16,10 @@ using test::kNotifications;
 using test::kWriteRequests;
 using test::Message;
 using test::readFile;
+using test::takeBusLog;
 using test::writeFile;
 using testing::ElementsAre;
+using testing::HasSubstr;
 using testing::IsEmpty;
 
 class WriteRequests : public testing::Test {
@@ -181,6 +183,95 @@ TEST_F(WriteRequests, ForAPackageDoNotReadAnEncoding) {
     request["encoding"] = 1.0;
     EXPECT_THAT(send(request), ElementsAre(notification(path, false), answer(true)));
     EXPECT_TRUE(std::filesystem::exists(path));
+}
+
+TEST_F(WriteRequests, StoreTextWithoutAByteOrderMark) {
+    EXPECT_THAT(send(textRequest(path, "abc")),
+                ElementsAre(notification(path, false), answer(true)));
+    EXPECT_EQ(readFile(path), "abc");
+}
+
+TEST_F(WriteRequests, OfEmptyTextTruncateTheFile) {
+    writeFile(path, "old");
+    EXPECT_THAT(send(textRequest(path, "")), ElementsAre(notification(path, true), answer(true)));
+    EXPECT_EQ(readFile(path), "");
+}
+
+TEST_F(WriteRequests, InAnUnknownCharsetLeaveTheFileAsItWas) {
+    writeFile(path, "old");
+    EXPECT_THAT(send(textRequest(path, "new", "no-such-charset")),
+                ElementsAre(notification(path, true), answer(false)));
+    EXPECT_EQ(readFile(path), "old");
+}
+
+TEST_F(WriteRequests, OfTextThatIsNotInItsCharsetLeaveTheFileAsItWas) {
+    writeFile(path, "old");
+    EXPECT_THAT(send(textRequest(path, "caf\xE9")),
+                ElementsAre(notification(path, true), answer(false)));
+    EXPECT_EQ(readFile(path), "old");
+}
+
+TEST_F(WriteRequests, ToAnEmptyPathAreAnnouncedAndAnsweredFalse) {
+    EXPECT_THAT(send(textRequest("", "text")), ElementsAre(notification("", false), answer(false)));
+    EXPECT_THAT(send(packageRequest("", json::parse(R"({"parts":[],"relationships":[]})"))),
+                ElementsAre(notification("", false), answer(false)));
+}
+
+TEST_F(WriteRequests, ReadTheEncodingBeforeTheContent) {
+    json::Object request = textRequest(path, "text");
+    request["encoding"] = true;
+    request["content"] = 1.0;
+    takeBusLog();
+    EXPECT_THAT(send(request), IsEmpty());
+    EXPECT_THAT(takeBusLog(), ElementsAre(HasSubstr("invalid conversion: boolean to string")));
+}
+
+TEST_F(WriteRequests, ReadTheirKeysInOrder) {
+    const auto failureOf = [this](const json::Object& request) {
+        takeBusLog();
+        EXPECT_THAT(send(request), IsEmpty());
+        const std::vector<std::string> log = takeBusLog();
+        return log.empty() ? "no failure" : log.back();
+    };
+    json::Object request;
+    request["contentType"] = true;
+    request["filePath"] = 1.0;
+    EXPECT_THAT(failureOf(request), HasSubstr("undefined to string"));
+    request["rtcId"] = "1";
+    EXPECT_THAT(failureOf(request), HasSubstr("boolean to string"));
+    request["contentType"] = "text/plain";
+    EXPECT_THAT(failureOf(request), HasSubstr("double to string"));
+    request["filePath"] = path;
+    EXPECT_THAT(failureOf(request), HasSubstr("undefined to string"));  // the encoding
+    request["encoding"] = "UTF-8";
+    request["content"] = json::Null();
+    EXPECT_THAT(failureOf(request), HasSubstr("null to string"));
+    request["contentType"] = "text/xml";
+    EXPECT_THAT(failureOf(request), HasSubstr("null to object"));
+    EXPECT_FALSE(std::filesystem::exists(path));
+}
+
+TEST_F(WriteRequests, StorePartsWhoseBytesAreNoTextOnlyUnderATypeThatSaysSo) {
+    const std::string bytes("\xD0\xCF\x11\xE0\0\x01\x7F", 7);
+    const auto document = [&bytes](const char* type) {
+        json::Object part{{"partUri", "/macros.bin"}, {"contentType", type}, {"content", bytes}};
+        part["relationship"] = json::Null();
+        return json::Object{{"parts", json::Array{std::move(part)}},
+                            {"relationships", json::Array()}};
+    };
+    writeFile(path, "old");
+    EXPECT_THAT(send(packageRequest(path, document("application/vnd.example.macros"))),
+                ElementsAre(notification(path, true), answer(false)));
+    EXPECT_EQ(readFile(path), "old");
+
+    EXPECT_THAT(send(packageRequest(path, document("Application/vnd.example.macros"))),
+                ElementsAre(notification(path, true), answer(true)));
+    const std::vector<Message> answers = bundle.read(path, "text/xml");
+    ASSERT_EQ(answers.size(), 1u);
+    const json::Object part =
+        json::parse(answers[0].payload)["parts"].get<json::Array>().at(0).get<json::Object>();
+    EXPECT_EQ(part.at("content").get<std::string>(), bytes);
+    EXPECT_EQ(part.at("contentType").get<std::string>(), "application/vnd.example.macros");
 }
 
 }  // namespace

@@ -2,6 +2,11 @@
 // it.
 #pragma once
 
+#include <spdlog/logger.h>
+#include <spdlog/sinks/ringbuffer_sink.h>
+#include <spdlog/spdlog.h>
+
+#include <cstddef>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -36,9 +41,28 @@ inline void PrintTo(const Message& message, std::ostream* out) {
     *out << message.channel << ' ' << message.payload;
 }
 
+/// What the message bus of this process has logged since the last call: one text for each request
+/// whose handler failed.
+inline std::vector<std::string> takeBusLog() {
+    static const auto sink = [] {
+        auto ring = std::make_shared<spdlog::sinks::ringbuffer_sink_mt>(100'000);
+        auto logger = std::make_shared<spdlog::logger>("messaging", ring);
+        logger->set_pattern("%v");
+        // The bus takes a logger of this name that is there when it first has something to tell.
+        spdlog::register_logger(std::move(logger));
+        return ring;
+    }();
+    static std::size_t taken = 0;
+    std::vector<std::string> lines = sink->last_formatted();
+    lines.erase(lines.begin(), lines.begin() + static_cast<std::ptrdiff_t>(taken));
+    taken += lines.size();
+    return lines;
+}
+
 class RunningBundle {
 public:
     RunningBundle() {
+        takeBusLog();
         using namespace platform::messaging;
         setTransport([bus = bus_](const std::string& clientName, const MessageServiceOptions&) {
             return bus->connect(clientName);

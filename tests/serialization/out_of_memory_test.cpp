@@ -1,0 +1,130 @@
+// What the loaded bundle does when the buffer of a message cannot be allocated. This program has a
+// malloc of its own, which the bundle calls too and which fails when told to.
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <cstddef>
+#include <string>
+#include <vector>
+
+#include "tests/support/running_bundle.h"
+#include "tests/support/temporary_directory.h"
+
+namespace {
+
+// The allocations of `failingSize` bytes fail once `allocationsToSpare` of them were made.
+std::atomic<std::size_t> failingSize = 0;
+std::atomic<int> allocationsToSpare = 0;
+
+void failAllocationsOf(std::size_t size, int spared = 0) {
+    allocationsToSpare = spared;
+    failingSize = size;
+}
+
+}  // namespace
+
+extern "C" void* __libc_malloc(std::size_t size);
+
+extern "C" void* malloc(std::size_t size) {
+    if (size != 0 && size == failingSize && allocationsToSpare-- <= 0) {
+        return nullptr;
+    }
+    return __libc_malloc(size);
+}
+
+namespace {
+
+using test::kReadRequests;
+using test::kWriteRequests;
+using test::Message;
+using test::RunningBundle;
+using test::takeBusLog;
+using testing::ElementsAre;
+using testing::HasSubstr;
+using testing::IsEmpty;
+
+class OutOfMemory : public testing::Test {
+protected:
+    ~OutOfMemory() override { failAllocationsOf(0); }
+
+    std::vector<Message> writeText(const std::string& path, const std::string& text) {
+        json::Object request{{"rtcId", "1"},
+                             {"contentType", "text/plain"},
+                             {"filePath", path},
+                             {"content", text},
+                             {"encoding", "UTF-8"}};
+        return bundle.send(kWriteRequests, json::serialize(std::move(request)));
+    }
+
+    test::TemporaryDirectory folder;
+    RunningBundle bundle;
+};
+
+TEST_F(OutOfMemory, ForTheResponseOfAReadMeansNoAnswer) {
+    const std::string path = (folder / "file").string();
+    test::writeFile(path, std::string(123'457, 'x'));
+    const std::vector<Message> whole = bundle.read(path, "text/plain");
+    ASSERT_EQ(whole.size(), 1u);
+
+    takeBusLog();
+    failAllocationsOf(whole[0].payload.size());
+    EXPECT_THAT(bundle.read(path, "text/plain"), IsEmpty());
+    EXPECT_THAT(takeBusLog(), ElementsAre(HasSubstr("Out of memory!")));
+
+    failAllocationsOf(0);
+    EXPECT_EQ(bundle.read(path, "text/plain"), whole);
+}
+
+TEST_F(OutOfMemory, ForTheNotificationOfAWriteMeansNeitherNotificationNorAnswer) {
+    const std::string path = (folder / std::string(201, 'n')).string();
+    writeText(path, "first");
+    const std::vector<Message> whole = writeText(path, "second");
+    ASSERT_EQ(whole.size(), 2u);
+
+    takeBusLog();
+    failAllocationsOf(whole[0].payload.size());
+    EXPECT_THAT(writeText(path, "third"), IsEmpty());
+    EXPECT_THAT(takeBusLog(), ElementsAre(HasSubstr("Out of memory!")));
+    EXPECT_EQ(test::readFile(path), "third");
+
+    failAllocationsOf(0);
+    EXPECT_EQ(writeText(path, "fourth"), whole);
+}
+
+TEST_F(OutOfMemory, ForTheResponseOfAWriteMeansANotificationWithoutAnswer) {
+    const std::string path = (folder / "file").string();
+    takeBusLog();
+    {
+        const auto armed = bundle.bus().observe([](std::string_view, const auto& message) {
+            if (message.channel() == test::kNotifications) {
+                failAllocationsOf(std::string_view("true").size());
+            }
+        });
+        EXPECT_THAT(writeText(path, "text"),
+                    ElementsAre(Message{test::kNotifications, R"({"filePath":")" + path +
+                                                                  R"(","isExistingFile":false})"}));
+    }
+    EXPECT_THAT(takeBusLog(), ElementsAre(HasSubstr("Out of memory!")));
+}
+
+TEST_F(OutOfMemory, ForTheBase64OfAnImageIsTheAnswerToARead) {
+    const std::string path = (folder / "file.docx").string();
+    const std::string image(54'321, '\xFF');
+    json::Object part{{"partUri", "/image.png"}, {"contentType", "image/png"}, {"content", image}};
+    part["relationship"] = json::Null();
+    json::Object document{{"parts", json::Array{std::move(part)}},
+                          {"relationships", json::Array()}};
+    json::Object request{{"rtcId", "1"}, {"contentType", "text/xml"}, {"filePath", path}};
+    request["content"] = std::move(document);
+    ASSERT_EQ(bundle.send(kWriteRequests, json::serialize(std::move(request))).size(), 2u);
+
+    // The first allocation of that size is the part itself, the next the buffer.
+    failAllocationsOf(image.size(), 1);
+    EXPECT_THAT(bundle.read(path, "text/xml"),
+                ElementsAre(Message{"/zpr/service/readResponse/1",
+                                    R"({"exception":"Out of memory!","status":false})"}));
+}
+
+}  // namespace
