@@ -211,6 +211,14 @@ TEST_F(WriteRequests, OfTextThatIsNotInItsCharsetLeaveTheFileAsItWas) {
     EXPECT_EQ(readFile(path), "old");
 }
 
+TEST_F(WriteRequests, OfTextThatCannotBeEncodedAgainTruncateTheFile) {
+    writeFile(path, "old");
+    // EUC-JP has a second code for the cent sign that decodes, but no way to write it.
+    EXPECT_THAT(send(textRequest(path, "\x8E\xE0", "EUC-JP")),
+                ElementsAre(notification(path, true), answer(false)));
+    EXPECT_EQ(readFile(path), "");
+}
+
 TEST_F(WriteRequests, ToAnEmptyPathAreAnnouncedAndAnsweredFalse) {
     EXPECT_THAT(send(textRequest("", "text")), ElementsAre(notification("", false), answer(false)));
     EXPECT_THAT(send(packageRequest("", json::parse(R"({"parts":[],"relationships":[]})"))),
