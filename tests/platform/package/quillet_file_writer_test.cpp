@@ -131,22 +131,30 @@ protected:
         EXPECT_EQ(folder_.names(), before);
     }
 
-    // Runs `work` in a process of its own as the user `nobody`, and returns what it threw.
-    std::string thrownAsNobody(const std::function<void()>& work) {
+    static std::string thrownBy(const std::function<void()>& work) {
+        try {
+            work();
+            return "nothing thrown";
+        } catch (const std::exception& error) {
+            return error.what();
+        }
+    }
+
+    // Runs `work` as an ordinary user, in a process of its own if this one is root's, and returns
+    // what it threw.
+    std::string thrownAsUser(const std::function<void()>& work) {
+        if (::geteuid() != 0) {
+            return thrownBy(work);
+        }
         std::array<int, 2> ends{};
         EXPECT_EQ(::pipe(ends.data()), 0);
         const pid_t child = ::fork();
         if (child == 0) {
-            std::string text = "nothing thrown";
             if (::setgroups(0, nullptr) != 0 || ::setresgid(65534, 65534, 65534) != 0 ||
                 ::setresuid(65534, 65534, 65534) != 0) {
                 ::_exit(2);
             }
-            try {
-                work();
-            } catch (const std::exception& error) {
-                text = error.what();
-            }
+            const std::string text = thrownBy(work);
             ::_exit(::write(ends[1], text.data(), text.size()) < 0 ? 3 : 0);
         }
         ::close(ends[1]);
@@ -608,7 +616,7 @@ TEST_F(QuilletFileWriterTest, GivesNobodyMoreWhenItCannotKeepTheOwner) {
                                         std::pair{0626U, 0626U}, std::pair{06762U, 0722U}}) {
         folder_.file("a.docx", "old");
         ASSERT_EQ(::chmod(pathOf("a.docx").c_str(), before), 0);
-        EXPECT_EQ(thrownAsNobody([&] { save(folder_.at("a.docx"), packageOf({})); }),
+        EXPECT_EQ(thrownAsUser([&] { save(folder_.at("a.docx"), packageOf({})); }),
                   "nothing thrown");
         EXPECT_EQ(statusOf("a.docx").st_uid, 65534U);
         EXPECT_EQ(modeOf("a.docx"), after);
@@ -617,38 +625,31 @@ TEST_F(QuilletFileWriterTest, GivesNobodyMoreWhenItCannotKeepTheOwner) {
 }
 
 TEST_F(QuilletFileWriterTest, RefusesATargetThatMayNotBeWritten) {
-    if (::geteuid() != 0) {
-        GTEST_SKIP() << "only root can become another user";
-    }
     ASSERT_EQ(::chmod(folder_.path().c_str(), 0777), 0);
     folder_.file("a.docx", "old");
-    ASSERT_EQ(::chmod(pathOf("a.docx").c_str(), 0644), 0);
-    EXPECT_THAT(thrownAsNobody([&] { save(folder_.at("a.docx"), packageOf({})); }),
+    ASSERT_EQ(::chmod(pathOf("a.docx").c_str(), 0444), 0);
+    EXPECT_THAT(thrownAsUser([&] { save(folder_.at("a.docx"), packageOf({})); }),
                 HasSubstr("a.docx\" may not be written: Permission denied"));
     EXPECT_EQ(folder_.bytesOf("a.docx"), "old");
     EXPECT_THAT(folder_.names(), ElementsAre("a.docx"));
 }
 
 TEST_F(QuilletFileWriterTest, RefusesAFolderThatTakesNoFiles) {
-    if (::geteuid() != 0) {
-        GTEST_SKIP() << "only root can become another user";
-    }
-    ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
     folder_.file("a.docx", "old");
     ASSERT_EQ(::chmod(pathOf("a.docx").c_str(), 0666), 0);
+    ASSERT_EQ(::chmod(folder_.path().c_str(), 0555), 0);
     for (const char* name : {"a.docx", "new.docx"}) {
-        EXPECT_THAT(thrownAsNobody([&] { save(folder_.at(name), packageOf({})); }),
+        EXPECT_THAT(thrownAsUser([&] { save(folder_.at(name), packageOf({})); }),
                     HasSubstr("no file can be created in its folder: Permission denied"));
     }
     EXPECT_EQ(folder_.bytesOf("a.docx"), "old");
+    ASSERT_EQ(::chmod(folder_.path().c_str(), 0700), 0);
 }
 
 TEST_F(QuilletFileWriterTest, WritesIntoAFolderThatCannotBeListed) {
-    if (::geteuid() != 0) {
-        GTEST_SKIP() << "only root can become another user";
-    }
-    ASSERT_EQ(::chmod(folder_.path().c_str(), 0733), 0);
-    EXPECT_EQ(thrownAsNobody([&] { save(folder_.at("a.docx"), packageOf({})); }), "nothing thrown");
+    ASSERT_EQ(::chmod(folder_.path().c_str(), 0333), 0);
+    EXPECT_EQ(thrownAsUser([&] { save(folder_.at("a.docx"), packageOf({})); }), "nothing thrown");
+    ASSERT_EQ(::chmod(folder_.path().c_str(), 0700), 0);
     EXPECT_THAT(folder_.names(), ElementsAre("a.docx"));
 }
 
