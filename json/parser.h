@@ -48,8 +48,8 @@ enum class Status : std::uint32_t {
 /// The bytes that a routine reads. Each routine moves `position` past what it consumes; after a
 /// fault it is where the fault was found.
 struct Input {
-    const char* position;
-    const char* end;
+    const char* position = nullptr;
+    const char* end = nullptr;
     bool comments = false;  // whether white space may have "// ..." and "/* ... */" comments in it
 };
 

@@ -195,12 +195,14 @@ bool operator==(const Value& left, const Value& right) {
         return left.storage == right.storage;
     std::vector<Comparison> tasks{{&left, &right}};
     while (!tasks.empty()) {
-        const auto [l, r] = tasks.back();
+        const Value& l = *tasks.back().first;
+        const Value& r = *tasks.back().second;
         tasks.pop_back();
-        if (l->index() != r->index())
+        if (l.index() != r.index())
             return false;
-        if (l->is<Array>() ? !equalBut(l->get<Array>(), r->get<Array>(), tasks)
-                           : !equalBut(l->get<Object>(), r->get<Object>(), tasks))
+        const bool equal = l.is<Array>() ? equalBut(l.get<Array>(), r.get<Array>(), tasks)
+                                         : equalBut(l.get<Object>(), r.get<Object>(), tasks);
+        if (!equal)
             return false;
     }
     return true;

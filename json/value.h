@@ -34,23 +34,23 @@ public:
     /// `int` has no kind (write `long(n)`, `double(n)`), and no pointer becomes a boolean.
     template <typename T>
     requires HeldType<std::remove_cvref_t<T>>
-    // NOLINTNEXTLINE(google-explicit-constructor): a held type is a value
+    // NOLINTNEXTLINE(google-explicit-constructor,bugprone-forwarding-reference-overload)
     Value(T&& held)
     noexcept(std::is_nothrow_constructible_v<std::remove_cvref_t<T>, T&&>)
         : storage(std::in_place_type<std::remove_cvref_t<T>>, std::forward<T>(held)) {}
 
     /// Makes a string of the bytes up to the NUL, as they stand.
-    // NOLINTNEXTLINE(google-explicit-constructor): as for the held types
+    // NOLINTNEXTLINE(google-explicit-constructor)
     Value(char const* text) : storage(std::in_place_type<std::string>, text) {}
 
-    // NOLINTNEXTLINE(google-explicit-constructor): not a null C string
+    // NOLINTNEXTLINE(google-explicit-constructor)
     Value(std::nullptr_t) = delete;
 
     /// Copies the tree. When memory runs out the partial copy is destroyed and std::bad_alloc
     /// thrown.
     Value(const Value& other);
 
-    /// Takes over the contents; `other` keeps its kind and is left empty.
+    /// Takes over the contents. `other` keeps its kind; an array or object in it is left empty.
     Value(Value&& other) noexcept = default;
 
     /// Assigns a copy. `other` may be part of this value's own tree. On std::bad_alloc this value

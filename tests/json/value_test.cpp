@@ -38,9 +38,6 @@ const std::vector<std::string> kindNames = {"undefined", "null",   "boolean", "d
                                             "array",     "object", "float",   "int64",  "uint64"};
 
 template <typename T>
-constexpr std::size_t indexOf = Value(T()).index();
-
-template <typename T>
 class HeldTypes : public ::testing::Test {};
 
 using AllHeldTypes = ::testing::Types<Undefined, Null, bool, double, std::string, Array, Object,
