@@ -256,10 +256,10 @@ Status checkIntegers(Input input) {
 
 /// Parses a value and all within it.
 ///
-/// By the rules a value is tried as a string, a number, an object, an array, a boolean and null,
-/// and the attempt that gets furthest decides what is reported. The first byte tells which one that
-/// is: the others fail without moving, as does a literal that is not complete. When all fail there,
-/// the string as the first of them decides.
+/// A value is one of six things: a string, a number, an object, an array, a boolean or null. When
+/// it is none of them, the status is that of the attempt to read one that gets furthest, the
+/// earliest of several. The first byte tells which one that is: the others fail without moving, and
+/// so does a literal that is not complete, which leaves the string as the earliest of all.
 class TreeParser {
 public:
     explicit TreeParser(Input& text) : input(text) {}
