@@ -10,11 +10,10 @@ namespace host {
 std::filesystem::path findBundle() {
     const std::filesystem::path programFolder =
         std::filesystem::read_symlink("/proc/self/exe").parent_path();
-    // From the program's folder, the library folder of a build tree and that of an installation.
-    const std::array<std::filesystem::path, 2> libraryFolders = {"../lib",
-                                                                 INSTALLED_LIBRARY_FOLDER};
+    // From the program's folder, the bundle's folder in a build tree and in an installation.
+    const std::array<std::filesystem::path, 2> bundleFolders = {"../lib", INSTALLED_BUNDLE_FOLDER};
     std::string places;
-    for (const std::filesystem::path& folder : libraryFolders) {
+    for (const std::filesystem::path& folder : bundleFolders) {
         const std::filesystem::path bundle =
             (programFolder / folder / BUNDLE_FILE_NAME).lexically_normal();
         std::error_code ignored;

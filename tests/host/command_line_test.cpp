@@ -111,7 +111,7 @@ TEST_F(CopiedProgram, FindsTheBundleInTheLibraryFolderBesideItsOwn) {
 }
 
 TEST_F(CopiedProgram, FindsTheBundleWhereItIsInstalled) {
-    copyBundleTo(folder_ / "a folder/bin" / INSTALLED_LIBRARY_FOLDER);
+    copyBundleTo(folder_ / "a folder/bin" / INSTALLED_BUNDLE_FOLDER);
     EXPECT_EQ(readExample().output, "{\"data\":\"\",\"status\":true}\n");
 }
 

@@ -1,0 +1,58 @@
+# What is installed: the program, the bundle, and for hosts that carry the bundle's messages the
+# messaging library with its headers and a CMake package.
+#
+#   bin/serialization_host
+#   lib/libeditor_messaging.so.<version>
+#   lib/<"installpath" of the bundle's manifest>
+#   lib/cmake/EditorSerialization/
+#   include/editor_serialization/
+
+include(CMakePackageConfigHelpers)
+
+install(TARGETS serialization_host)
+install(TARGETS com_vorplanex_serialization LIBRARY DESTINATION "${BUNDLE_INSTALL_FOLDER}")
+
+set(header_folder "${CMAKE_INSTALL_INCLUDEDIR}/editor_serialization")
+install(TARGETS editor_futures editor_messaging EXPORT EditorSerializationTargets
+  INCLUDES DESTINATION "${header_folder}")
+foreach(header IN ITEMS
+    futures/future.h
+    futures/detail/shared_future_state.h
+    platform/data_buffer.h
+    platform/messaging/in_process_bus.h
+    platform/messaging/message_service.h
+    platform/messaging/transport.h)
+  cmake_path(GET header PARENT_PATH folder)
+  install(FILES "${PROJECT_SOURCE_DIR}/${header}" DESTINATION "${header_folder}/${folder}")
+endforeach()
+
+set(package_folder "${CMAKE_INSTALL_LIBDIR}/cmake/EditorSerialization")
+set(package_files
+  "${PROJECT_BINARY_DIR}/EditorSerializationConfig.cmake"
+  "${PROJECT_BINARY_DIR}/EditorSerializationConfigVersion.cmake")
+configure_package_config_file(
+  "${PROJECT_SOURCE_DIR}/cmake/EditorSerializationConfig.cmake.in"
+  "${PROJECT_BINARY_DIR}/EditorSerializationConfig.cmake"
+  INSTALL_DESTINATION "${package_folder}"
+  PATH_VARS BUNDLE_INSTALL_FILE)
+write_basic_package_version_file(
+  "${PROJECT_BINARY_DIR}/EditorSerializationConfigVersion.cmake"
+  COMPATIBILITY SameMinorVersion)
+install(FILES ${package_files} DESTINATION "${package_folder}")
+install(EXPORT EditorSerializationTargets
+  NAMESPACE EditorSerialization:: DESTINATION "${package_folder}")
+
+set(CPACK_GENERATOR TGZ DEB)
+set(CPACK_PACKAGE_NAME editor-serialization)
+set(CPACK_PACKAGE_VENDOR "The Vorplanex Company")
+set(CPACK_PACKAGE_CONTACT "The Vorplanex Company")
+set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "Documents on disk for a browser-based document editor")
+set(CPACK_PACKAGE_DIRECTORY "${PROJECT_BINARY_DIR}/packages")
+set(CPACK_STRIP_FILES ON)
+set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
+set(CPACK_DEBIAN_PACKAGE_SECTION editors)
+# Depends on the packages of the libraries that the files are linked with, which dpkg-shlibdeps finds;
+# the project's own library is in the package itself.
+set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
+set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS_PRIVATE_DIRS "${CMAKE_LIBRARY_OUTPUT_DIRECTORY}")
+include(CPack)
