@@ -44,6 +44,20 @@ constexpr KnownCharset knownCharsets[] = {
     {"x-mac-turkish", 7},
 };
 
+// The names under which the text of a charset can be encoded, the charset's own first.
+std::vector<std::string_view> spellings(std::string_view charset) {
+    if (charset == "Shift_JIS") {
+        return {"Shift_JIS", "x-Shift_JIS-nec", "x-Shift_JIS-ibm"};
+    }
+    if (charset == "EUC-JP") {
+        return {"EUC-JP", "x-EUC-JP-nec"};
+    }
+    if (charset == "Big5") {
+        return {"Big5", "x-Big5-eten"};
+    }
+    return {charset};
+}
+
 }  // namespace
 
 Candidate::Candidate(const char* charset, double rarity) : charset_(charset), rarity_(rarity) {
@@ -98,18 +112,23 @@ std::optional<std::u16string> Candidate::decode(std::string_view bytes) const {
     return text;
 }
 
-bool Candidate::holds(std::string_view bytes) const {
+Candidate::Fit Candidate::fit(std::string_view bytes) const {
     if (isSingleByte_) {
-        return std::all_of(bytes.begin(), bytes.end(), [&](char byte) {
+        const bool fits = std::all_of(bytes.begin(), bytes.end(), [&](char byte) {
             return table_[static_cast<unsigned char>(byte)] != unusedByte;
         });
+        return {fits, fits ? charset_ : std::string()};
     }
-    try {
-        const std::unique_ptr<Charset> charset = openCharset(charset_, true);
-        return charset->encode(charset->decode(bytes)) == bytes;
-    } catch (const std::runtime_error&) {
-        return false;
+    const std::optional<std::u16string> text = decode(bytes);
+    if (!text) {
+        return {false, {}};
     }
+    for (const std::string_view name : spellings(charset_)) {
+        if (openCharset(name, true)->encode(*text) == bytes) {
+            return {true, std::string(name)};
+        }
+    }
+    return {true, {}};
 }
 
 const std::vector<Candidate>& legacyCandidates() {

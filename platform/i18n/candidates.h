@@ -25,8 +25,15 @@ public:
     /// The text of `bytes`; nothing when they are malformed.
     std::optional<std::u16string> decode(std::string_view bytes) const;
 
-    /// Whether all of `bytes` decode strictly, and encode back to the same bytes.
-    bool holds(std::string_view bytes) const;
+    /// How well the charset fits a whole file.
+    struct Fit {
+        /// Whether all the bytes decode strictly.
+        bool decodes;
+        /// The name under which they also encode back to the same bytes: the charset's own, or that
+        /// of a variant which decodes to the same text. Empty when there is none.
+        std::string charset;
+    };
+    Fit fit(std::string_view bytes) const;
 
     /// The languages that this charset was made for.
     const std::vector<const Language*>& languages() const { return languages_; }

@@ -5,6 +5,7 @@
 
 #include "platform/i18n/charset_names.h"
 #include "platform/i18n/conversion_error.h"
+#include "platform/i18n/duplicate_codes.h"
 #include "platform/i18n/icu_charset.h"
 #include "platform/i18n/table_charset.h"
 #include "platform/i18n/unicode_charsets.h"
@@ -23,6 +24,9 @@ ByteOrder byteOrderOf(std::string_view converter) {
 std::unique_ptr<Charset> makeCharset(const std::string& name, bool strict) {
     if (std::unique_ptr<Charset> ours = makeTableCharset(name, strict)) {
         return ours;
+    }
+    if (std::unique_ptr<Charset> variant = makeDuplicateCodesVariant(name, strict)) {
+        return variant;
     }
     const std::string converter = converterName(name).value_or("");
     if (converter.empty()) {

@@ -103,8 +103,10 @@ std::string legacyCharset(std::string_view bytes) {
         return unicode->charset;
     }
     for (const detail::RankedCandidate& ranked : ranking) {
-        if (ranked.candidate->holds(bytes)) {
-            return ranked.candidate->charset();
+        const detail::Candidate::Fit fit = ranked.candidate->fit(bytes);
+        // Where the right charset would not give the bytes back, no other is right either.
+        if (fit.decodes) {
+            return fit.charset;
         }
     }
     return {};

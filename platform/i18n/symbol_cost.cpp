@@ -17,6 +17,7 @@ constexpr int privateUseCost = 24;
 constexpr int boxDrawingCost = 11;
 constexpr int repeatedCost = 2;
 constexpr int rareCost = 13;
+constexpr int currencySignCost = 16;
 constexpr int misplacedCost = 6;
 constexpr int standingAloneCost = 4;
 
@@ -125,6 +126,9 @@ int symbolCost(char16_t sign, Neighbours neighbours) {
     const bool alone = isBlank(neighbours.before) && isBlank(neighbours.after);
     if (alone && contains(u"\u2013\u2014\u2022", sign)) {
         return standingAloneCost;
+    }
+    if (sign == 0x00A4) {
+        return currencySignCost;
     }
     return commonness(sign) + (isMisplaced(sign, neighbours) ? misplacedCost : 0);
 }

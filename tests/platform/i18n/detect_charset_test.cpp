@@ -229,19 +229,36 @@ TEST(DetectCharset, AnyBytesComeBackFromWhatItReturns) {
     }
 }
 
-TEST(DetectCharset, DuplicateCodesComeBack) {
-    // Each of these spells a character that another code spells as well.
-    const std::string japanese = encoded("ja", "CP932");
-    for (const char* code :
-         {"\x87\x90", "\xED\x40", "\xEE\xE0", "\xFA\x4A", "\x81\xCA", "\xFA\x54"}) {
-        const std::string bytes = japanese + code;
+TEST(DetectCharset, ReadsDuplicateCodesAndGivesThemBack) {
+    struct Case {
+        const char* language;
+        const char* iconvName;
+        std::string code;
+        char16_t character;
+    };
+    for (const auto& [language, iconvName, code, character] : {
+             Case{"ja", "CP932", "\x87\x90", u'\u2252'},
+             Case{"ja", "CP932", "\x81\xE0", u'\u2252'},
+             Case{"ja", "CP932", "\xEE\xE0", u'\u9AD9'},
+             Case{"ja", "CP932", "\xFB\xFC", u'\u9AD9'},
+             Case{"ja", "CP932", "\xFA\x4A", u'\u2160'},
+             Case{"ja", "CP932", "\x87\x54", u'\u2160'},
+             Case{"ja", "CP932", "\xFA\x54", u'\uFFE2'},
+             Case{"ja", "EUC-JP", "\xAD\xF0", u'\u2252'},
+             Case{"zh-Hant", "BIG5", "\xA2\xA4", u'\u2550'},
+             Case{"zh-Hant", "BIG5", "\xF9\xF9", u'\u2550'},
+         }) {
+        const std::string bytes = encoded(language, iconvName) + code;
+        codecvt_string_to_ustring decoder(detect(bytes), true);
+        EXPECT_EQ(to_ustring(bytes, decoder).back(), character) << detect(bytes);
         EXPECT_EQ(roundTrip(detect(bytes), bytes), bytes);
     }
-    const std::string chinese = encoded("zh-Hant", "BIG5");
-    for (const char* code : {"\xA2\xA4", "\xF9\xF9", "\xA2\xCC", "\xA4\x51"}) {
-        const std::string bytes = chinese + code;
-        EXPECT_EQ(roundTrip(detect(bytes), bytes), bytes);
-    }
+}
+
+TEST(DetectCharset, KeepsTheBytesWhereBothCodesOfACharacterOccur) {
+    const std::string bytes = encoded("ja", "CP932") + "\x87\x90\x81\xE0";
+    EXPECT_EQ(detect(bytes), "ISO-8859-1");
+    EXPECT_NE(diagnosticsOf(bytes), "");
 }
 
 TEST(LegacyCandidates, OpenInBothConvertersAndAreMadeForSomeLanguage) {

@@ -1,0 +1,49 @@
+// Detection on any bytes: what it returns must decode all of them and give them back, and the converters
+// must neither crash nor read beyond their input under any name.
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+#include <sstream>
+#include <stdexcept>
+#include <string>
+
+#include "platform/i18n/codecvt.h"
+#include "platform/i18n/detect_charset.h"
+
+namespace {
+
+void checkDetection(const std::string& bytes) {
+    std::ostringstream diagnostics;
+    const std::string charset =
+        platform::i18n::detect_charset(bytes.data(), bytes.size(), diagnostics, u"input");
+    platform::i18n::codecvt_string_to_ustring decoder(charset, true);
+    platform::i18n::codecvt_ustring_to_string encoder(charset, true);
+    if (to_string(to_ustring(bytes, decoder), encoder) != bytes) {
+        std::abort();
+    }
+}
+
+// Takes the first line for a charset's name, and the rest for text in it.
+void checkConversion(const std::string& input) {
+    const std::size_t end = input.find('\n');
+    const std::string name = input.substr(0, end);
+    const std::string bytes = end == std::string::npos ? std::string() : input.substr(end + 1);
+    for (const bool strict : {true, false}) {
+        try {
+            platform::i18n::codecvt_string_to_ustring decoder(name, strict);
+            platform::i18n::codecvt_ustring_to_string encoder(name, strict);
+            to_string(to_ustring(bytes, decoder), encoder);
+        } catch (const std::runtime_error&) {
+            continue;
+        }
+    }
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+    const std::string input(reinterpret_cast<const char*>(data), size);
+    checkDetection(input);
+    checkConversion(input);
+    return 0;
+}
