@@ -7,6 +7,7 @@
 #include "platform/i18n/conversion_error.h"
 #include "platform/i18n/duplicate_codes.h"
 #include "platform/i18n/icu_charset.h"
+#include "platform/i18n/johab.h"
 #include "platform/i18n/table_charset.h"
 #include "platform/i18n/unicode_charsets.h"
 
@@ -27,6 +28,9 @@ std::unique_ptr<Charset> makeCharset(const std::string& name, bool strict) {
     }
     if (std::unique_ptr<Charset> variant = makeDuplicateCodesVariant(name, strict)) {
         return variant;
+    }
+    if (isJohab(name)) {
+        return makeJohab(name, strict);
     }
     const std::string converter = converterName(name).value_or("");
     if (converter.empty()) {

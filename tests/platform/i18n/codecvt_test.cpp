@@ -450,5 +450,34 @@ TEST(DuplicateCodes, AreEncodedByTheVariantThatPrefersThem) {
     }
 }
 
+TEST(Johab, HoldsWhatTheCLibrarySaysThatItHolds) {
+    int characters = 0;
+    for (unsigned lead = 0x84; lead <= 0xF9; ++lead) {
+        for (unsigned trail = 0x31; trail <= 0xFE; ++trail) {
+            const std::string code{static_cast<char>(lead), static_cast<char>(trail)};
+            const std::optional<std::string> utf8 = testing::iconvDecode("JOHAB", code);
+            // The letters once more among the symbols, and a sign that was added to them lately.
+            const bool skipped = (lead == 0xDA && trail >= 0x91) || code == "\xD9\xE8";
+            if (skipped || !utf8) {
+                continue;
+            }
+            ++characters;
+            ASSERT_EQ(decode("Johab", code), testing::iconvUtf16(*utf8)) << lead << ' ' << trail;
+            ASSERT_EQ(encode("Johab", testing::iconvUtf16(*utf8)), code);
+        }
+    }
+    EXPECT_GT(characters, 16000);
+}
+
+TEST(Johab, RefusesWhatItLacks) {
+    EXPECT_EQ(decodingError("Johab", "a\x88\x61z\xFF\x41"),
+              "Cannot decode text as Johab: malformed input at byte 4");
+    EXPECT_EQ(decodingError("Johab", "\x88"),
+              "Cannot decode text as Johab: the input ends inside the character at byte 0");
+    EXPECT_EQ(decode("cp1361", "\xFFz", false), u"\uFFFDz");
+    EXPECT_EQ(encode("x-johab", u"\uAC00\U0001F600\u00E9", false), "\x88\x61??");
+    EXPECT_NE(encodingError("Johab", u"\uE000"), "no error");
+}
+
 }  // namespace
 }  // namespace platform::i18n

@@ -125,7 +125,11 @@ const std::vector<CorpusEntry>& corpusEntries() {
             {"zh-Hans",
              {{"GB18030", "GB2312"}, {"GB18030", "GB18030"}, {"ISO-2022-CN", "ISO-2022-CN"}}},
             {"zh-Hant", {{"Big5", "BIG5"}, {"GB18030", "GBK"}, {"EUC-TW", "EUC-TW"}}},
-            {"ko", {{"EUC-KR", "EUC-KR"}, {"EUC-KR", "CP949"}, {"ISO-2022-KR", "ISO-2022-KR"}}},
+            {"ko",
+             {{"EUC-KR", "EUC-KR"},
+              {"EUC-KR", "CP949"},
+              {"Johab", "JOHAB"},
+              {"ISO-2022-KR", "ISO-2022-KR"}}},
         };
         std::vector<CorpusEntry> made;
         std::map<std::string, bool> withUnicode;
@@ -162,6 +166,12 @@ std::optional<std::string> iconvEncode(const std::string& iconvName, std::string
     // windows-1258 writes Vietnamese tones as marks of their own, which iconv does unasked.
     std::string bytes = convert(iconvName.c_str(), "UTF-8", utf8, complete);
     return complete ? std::optional(std::move(bytes)) : std::nullopt;
+}
+
+std::optional<std::string> iconvDecode(const std::string& iconvName, std::string_view bytes) {
+    bool complete = false;
+    std::string utf8 = convert("UTF-8", iconvName.c_str(), bytes, complete);
+    return complete ? std::optional(std::move(utf8)) : std::nullopt;
 }
 
 std::u16string iconvUtf16(std::string_view utf8) {

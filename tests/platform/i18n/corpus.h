@@ -26,6 +26,9 @@ const std::string& corpusText(const std::string& language);
 /// UTF-8 text encoded by the C library; nothing when the charset cannot hold it.
 std::optional<std::string> iconvEncode(const std::string& iconvName, std::string_view utf8);
 
+/// Bytes decoded to UTF-8 by the C library; nothing when they are malformed.
+std::optional<std::string> iconvDecode(const std::string& iconvName, std::string_view bytes);
+
 /// UTF-8 text as UTF-16, by the C library.
 std::u16string iconvUtf16(std::string_view utf8);
 
