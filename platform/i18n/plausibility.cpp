@@ -132,6 +132,12 @@ private:
 };
 
 class IdeographicLanguage final : public Language {
+    static constexpr int unlistedIdeographCost = 17;
+    // In half bits.
+    static constexpr unsigned besideAsciiCost = 6;
+    static constexpr unsigned loneCost = 8;
+    static constexpr unsigned followingHalfWidthCost = 12;
+
 public:
     explicit IdeographicLanguage(const CharacterTable& table)
         : halfBits_(std::size_t{0x10000}, std::uint8_t{0}) {
@@ -150,19 +156,32 @@ public:
 
     double costOfWords(std::u16string_view words) const override {
         std::uint64_t halfBits = 0;
-        char16_t before = wordEnd;
-        for (const char16_t c : words) {
-            halfBits += halfBits_[c];
-            // Western letters stand apart from these scripts, or at least in words of their own.
-            if (before != wordEnd && c != wordEnd && isAsciiLetter(before) != isAsciiLetter(c)) {
-                halfBits += 6;
-            }
-            before = c;
+        for (std::size_t i = 0; i < words.size(); ++i) {
+            const char16_t before = i == 0 ? wordEnd : words[i - 1];
+            halfBits += costAmong(before, words[i], i + 1 < words.size() ? words[i + 1] : wordEnd);
         }
         return static_cast<double>(halfBits) / 2;
     }
 
 private:
+    // The half bits of `c` between its neighbours.
+    unsigned costAmong(char16_t before, char16_t c, char16_t after) const {
+        if (isHalfWidthKatakana(before) && isHalfWidthKatakana(c)) {
+            return followingHalfWidthCost;
+        }
+        unsigned cost = halfBits_[c];
+        if (before != wordEnd && c != wordEnd && isAsciiLetter(before) != isAsciiLetter(c)) {
+            cost += besideAsciiCost;
+        }
+        // A single ideograph among ASCII is more often a letter and half of what follows it.
+        if (c >= 0x80 && before < 0x80 && after < 0x80) {
+            cost += cost >= 2 * unlistedIdeographCost ? 2 * loneCost : loneCost;
+        }
+        return cost;
+    }
+
+    static constexpr bool isHalfWidthKatakana(char16_t c) { return c >= 0xFF61 && c <= 0xFF9F; }
+
     static int costOfUnlisted(char16_t c) {
         if (c < 0x80) {
             return c == wordEnd ? 0 : static_cast<int>(bitsPerAscii);
@@ -171,12 +190,12 @@ private:
             return 15;
         }
         if (c >= 0x4E00 && c <= 0x9FFF) {
-            return 17;
+            return unlistedIdeographCost;
         }
         if (c >= 0xAC00 && c <= 0xD7A3) {
             return 18;
         }
-        if (c >= 0xFF61 && c <= 0xFF9F) {
+        if (isHalfWidthKatakana(c)) {
             return 11;
         }
         if (c >= 0xFF00 && c <= 0xFFEF) {

@@ -35,7 +35,8 @@ constexpr std::u16string_view usual =
     u"\u00A9\u00AE\u2122\u00A7\u20AC\u00A3\u00BF\u00A1\u2022\u00B7\u2116\u00AD\u061B\u2010\u2011"
     u"\u300E\u300F\u30FB\uFF01\uFF1F\uFF1B\u3010\u3011\u0387\u037E\u05BE\u05F3\u05F4";
 constexpr std::u16string_view lessUsual =
-    u"\u00B4\u00BD\u00BC\u00BE\u00B2\u00B3\u00B9\u00D7\u00F7\u00B1\u00AA\u00BA\u201A\u2039\u203A\u2020"
+    u"\u00B4\u00BD\u00BC\u00BE\u00B2\u00B3\u00B9\u00D7\u00F7\u00B1\u00AA\u00BA\u201A\u2039\u203A"
+    u"\u2020"
     u"\u00B5"
     u"\u200E\u200F\u2030\u2192\u2190\u2605\u25CF\u25A0\u25CB\u25C6\u203B";
 
@@ -90,7 +91,10 @@ bool isMisplaced(char16_t sign, Neighbours neighbours) {
     if (contains(u"\u00BF\u00A1\u00A9\u00A7\u2116", sign)) {
         return letterBefore;
     }
-    if (contains(u"\u00B0\u00B1\u00BC\u00BD\u00BE\u00D7\u00F7", sign)) {
+    if (contains(u"\u00B0\u00B5", sign)) {
+        return letterBefore;
+    }
+    if (contains(u"\u00B1\u00BC\u00BD\u00BE\u00D7\u00F7", sign)) {
         return letterBefore || letterAfter;
     }
     if (contains(u"\u00B9\u00B2\u00B3\u00AA\u00BA\u2122\u00AE", sign)) {
