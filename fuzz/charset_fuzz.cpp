@@ -1,5 +1,5 @@
-// Detection on any bytes: what it returns must decode all of them and give them back, and the converters
-// must neither crash nor read beyond their input under any name.
+// Detection on any bytes: what it returns must decode all of them and give them back, and the
+// converters must neither crash nor read beyond their input under any name.
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>

@@ -12,8 +12,8 @@
 
 namespace platform {
 
-/// Owns `capacity()` bytes from malloc, of which the first `length()` are in use. Move-only: bytes are
-/// copied only where a caller says so with `copyOf`.
+/// Owns `capacity()` bytes from malloc, of which the first `length()` are in use. Move-only: bytes
+/// are copied only where a caller says so with `copyOf`.
 class DataBuffer {
 public:
     /// An empty buffer without storage.
@@ -31,8 +31,8 @@ public:
         }
     }
 
-    /// A buffer of exactly `bytes.size()` bytes, without a terminating zero. Throws as the constructor
-    /// does. Linear in the number of bytes.
+    /// A buffer of exactly `bytes.size()` bytes, without a terminating zero. Throws as the
+    /// constructor does. Linear in the number of bytes.
     static DataBuffer copyOf(std::string_view bytes) {
         DataBuffer buffer(bytes.size());
         if (!bytes.empty()) {
@@ -58,7 +58,8 @@ public:
     DataBuffer& operator=(const DataBuffer&) = delete;
     ~DataBuffer() = default;
 
-    /// The storage; null when the capacity is zero. Valid until the buffer is moved from or destroyed.
+    /// The storage; null when the capacity is zero. Valid until the buffer is moved from or
+    /// destroyed.
     char* data() noexcept { return data_.get(); }
     const char* data() const noexcept { return data_.get(); }
 

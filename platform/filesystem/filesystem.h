@@ -12,7 +12,8 @@ namespace platform::filesystem {
 bool exists(std::u16string_view path);
 
 /// `path` in the form in which the standard file streams open it: its UTF-8 bytes. Throws
-/// std::runtime_error when it is not valid UTF-16 or holds a zero, at which the system would cut it.
+/// std::runtime_error when it is not valid UTF-16 or holds a zero, at which the system would cut
+/// it.
 std::string make_native_access_form_with_cleanup(std::u16string_view path);
 
 }  // namespace platform::filesystem
