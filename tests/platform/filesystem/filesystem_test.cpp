@@ -16,7 +16,7 @@
 namespace platform::filesystem {
 namespace {
 
-using namespace std::string_view_literals;
+using std::string_view_literals::operator""sv;
 using ::testing::HasSubstr;
 using ::testing::ThrowsMessage;
 

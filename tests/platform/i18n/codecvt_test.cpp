@@ -17,8 +17,8 @@
 namespace platform::i18n {
 namespace {
 
-using namespace std::string_literals;
-using namespace std::string_view_literals;
+using std::string_literals::operator""s;
+using std::string_view_literals::operator""sv;
 using ::testing::AllOf;
 using ::testing::EndsWith;
 using ::testing::HasSubstr;

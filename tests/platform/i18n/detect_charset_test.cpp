@@ -4,8 +4,10 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <future>
 #include <random>
 #include <sstream>
+#include <vector>
 
 #include "platform/i18n/candidates.h"
 #include "platform/i18n/codecvt.h"
@@ -14,7 +16,7 @@
 namespace platform::i18n {
 namespace {
 
-using namespace std::string_literals;
+using std::string_literals::operator""s;
 using ::testing::AnyOf;
 using ::testing::HasSubstr;
 
@@ -259,6 +261,18 @@ TEST(DetectCharset, KeepsTheBytesWhereBothCodesOfACharacterOccur) {
     const std::string bytes = encoded("ja", "CP932") + "\x87\x90\x81\xE0";
     EXPECT_EQ(detect(bytes), "ISO-8859-1");
     EXPECT_NE(diagnosticsOf(bytes), "");
+}
+
+TEST(DetectCharset, MayBeCalledFromManyThreads) {
+    const std::string russian = encoded("ru", "KOI8-R");
+    const std::string japanese = encoded("ja", "EUC-JP");
+    std::vector<std::future<std::string>> answers;
+    for (int i = 0; i < 8; ++i) {
+        answers.push_back(std::async(std::launch::async, detect, i % 2 == 0 ? russian : japanese));
+    }
+    for (std::size_t i = 0; i < answers.size(); ++i) {
+        EXPECT_EQ(answers[i].get(), i % 2 == 0 ? "KOI8-R" : "EUC-JP");
+    }
 }
 
 TEST(LegacyCandidates, OpenInBothConvertersAndAreMadeForSomeLanguage) {
