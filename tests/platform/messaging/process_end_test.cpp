@@ -1,7 +1,6 @@
 // How a process ends that has used the bus: normally, whatever is still subscribed.
 
 #include <gtest/gtest.h>
-#include <spdlog/spdlog.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -9,19 +8,13 @@
 #include <latch>
 #include <memory>
 #include <stdexcept>
-#include <thread>
+#include <string>
 
 #include "platform/messaging/message_service.h"
 #include "tests/platform/messaging/bus_test_support.h"
 
 namespace platform::messaging {
 namespace {
-
-// What is kept to the end and beyond it.
-template <typename T>
-T& immortal(T value) {
-    return *new T(std::move(value));
-}
 
 std::shared_ptr<MessageService> processClient() {
     return createMessageService("client", {}).get();
@@ -49,18 +42,21 @@ std::shared_ptr<MessageService> processClient() {
 }
 
 [[noreturn]] void exitWithHandlersThatGoOnFailing() {
-    static auto& begun = *new std::latch(1);
-    auto& client = immortal(processClient());
-    immortal(subscribe(*client, "/failing", [&client](const JsonMessage&) {
-        publish(*client, "/failing", "");
-        static const bool first = [] {
-            begun.count_down();
-            return true;
-        }();
-        throw std::runtime_error(first ? "again" : "");
-    }));
-    publish(*client, "/failing", "");
-    begun.wait();
+    struct Kept {  // to the end and beyond it
+        std::shared_ptr<MessageService> client = processClient();
+        std::shared_ptr<Subscription> subscription;
+        std::latch failures{3};
+    };
+    static Kept& kept = *new Kept();
+    kept.subscription = subscribe(*kept.client, "/failing", [](const JsonMessage& message) {
+        publish(*kept.client, "/failing", "");
+        if (!kept.failures.try_wait()) {
+            kept.failures.count_down();
+        }
+        throw std::runtime_error("on and on at " + std::string(message.channel()));
+    });
+    publish(*kept.client, "/failing", "");
+    kept.failures.wait();
     std::exit(0);
 }
 
