@@ -127,9 +127,15 @@ TEST(RevocableFunction, WaitsForOtherThreadsWhenItRevokesItself) {
 }
 
 // Its destructor uses the function that it belongs to.
-struct CallsBack {
-    std::function<void()> callBack;
-    ~CallsBack() { callBack(); }
+class CallsBack {
+public:
+    explicit CallsBack(std::function<void()> callBack) : callBack_(std::move(callBack)) {}
+    ~CallsBack() { callBack_(); }
+    CallsBack(const CallsBack&) = delete;
+    CallsBack& operator=(const CallsBack&) = delete;
+
+private:
+    std::function<void()> callBack_;
 };
 
 TEST(RevocableFunction, IsDestroyedUnlocked) {
