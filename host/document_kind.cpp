@@ -4,13 +4,16 @@
 #include <cstddef>
 #include <cstdint>
 #include <fstream>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <system_error>
 
 // What is read of a zip archive; numbers are little-endian:
 //
-//     local header              "PK\3\4" ...                          the file begins with one
+//     local header              "PK\3\4"                              the file begins with one
+//         +26 (2 bytes)         length of the name
+//         +30                   name
 //     ...
 //     central directory entry   "PK\1\2"                              one for each item
 //         +28 (2 bytes)         length of the name
@@ -18,12 +21,15 @@
 //         +32 (2)               length of the comment
 //         +46                   name, extra field, comment
 //     ...
+//     64-bit end                "PK\6\6"                              only in large archives
+//         +40 (8)               size of the central directory
+//         +48 (8)               its offset from the beginning of the file
+//     64-bit end's locator      "PK\6\7"                              with the above; 20 bytes
+//         +8 (8)                offset of the 64-bit end
 //     end of central directory  "PK\5\6"                              within the last 65557 bytes
 //         +12 (4)               size of the central directory
 //         +16 (4)               its offset from the beginning of the file
 //         +20 (2)               length of the archive's comment, which follows and ends the file
-//
-// The 64-bit forms are not looked at: an archive needs them from 65535 items or 4 GiB on.
 
 namespace host {
 
@@ -32,14 +38,21 @@ namespace {
 constexpr std::string_view localHeaderMark{"PK\3\4", 4};
 constexpr std::string_view directoryEntryMark{"PK\1\2", 4};
 constexpr std::string_view directoryEndMark{"PK\5\6", 4};
+constexpr std::string_view largeEndMark{"PK\6\6", 4};
+constexpr std::string_view locatorMark{"PK\6\7", 4};
+constexpr std::size_t localHeaderSize = 30;
 constexpr std::size_t directoryEntrySize = 46;
 constexpr std::size_t directoryEndSize = 22;
+constexpr std::size_t largeEndSize = 56;
+constexpr std::size_t locatorSize = 20;
+// What is looked at of a directory; documents have a hundredth of it.
+constexpr std::uint64_t mostOfADirectory = 16 * 1024 * 1024;
 constexpr std::size_t longestComment = 0xFFFF;
 // Content types are themselves an item of the package, whole or in pieces below this name.
 constexpr std::string_view contentTypesName = "[content_types].xml";
 
-std::uint32_t numberAt(std::string_view bytes, std::size_t offset, std::size_t size) {
-    std::uint32_t number = 0;
+std::uint64_t numberAt(std::string_view bytes, std::size_t offset, std::size_t size) {
+    std::uint64_t number = 0;
     for (std::size_t i = size; i-- > 0;) {
         number = number << 8 | static_cast<unsigned char>(bytes[offset + i]);
     }
@@ -66,15 +79,51 @@ bool isContentTypes(std::string_view name) {
 
 bool listsContentTypes(std::string_view directory) {
     while (directory.size() >= directoryEntrySize && directory.starts_with(directoryEntryMark)) {
-        const std::size_t nameSize = numberAt(directory, 28, 2);
-        const std::size_t entrySize =
+        const auto nameSize = numberAt(directory, 28, 2);
+        const std::uint64_t entrySize =
             directoryEntrySize + nameSize + numberAt(directory, 30, 2) + numberAt(directory, 32, 2);
         if (isContentTypes(directory.substr(directoryEntrySize, nameSize))) {
             return true;
         }
-        directory.remove_prefix(std::min(entrySize, directory.size()));
+        directory.remove_prefix(std::min<std::uint64_t>(entrySize, directory.size()));
     }
     return false;
+}
+
+// Whether an archive that begins with `header` begins as producers of packages begin theirs. That
+// tells what it is even when its end, and the directory with it, is missing.
+bool beginsAsAPackage(std::string_view header) {
+    if (header.size() < localHeaderSize) {
+        return false;
+    }
+    const auto nameSize = numberAt(header, 26, 2);
+    const std::string_view name = header.substr(localHeaderSize, nameSize);
+    return name.size() == nameSize && (isContentTypes(name) || name == "_rels/.rels");
+}
+
+struct Directory {
+    std::uint64_t offset;
+    std::uint64_t size;
+};
+
+// Where the directory is, by the end of the archive, which `tail` holds and which is at `offset` in
+// the file; nothing when there is no such end.
+std::optional<Directory> findDirectory(std::ifstream& file, std::string_view tail,
+                                       std::uint64_t offset) {
+    const std::size_t end = tail.rfind(directoryEndMark);
+    if (end == std::string::npos || tail.size() - end < directoryEndSize) {
+        return std::nullopt;
+    }
+    if (offset + end >= locatorSize) {
+        const std::string locator = bytesAt(file, offset + end - locatorSize, locatorSize);
+        if (locator.starts_with(locatorMark)) {
+            const std::string large = bytesAt(file, numberAt(locator, 8, 8), largeEndSize);
+            if (large.starts_with(largeEndMark) && large.size() == largeEndSize) {
+                return Directory{numberAt(large, 48, 8), numberAt(large, 40, 8)};
+            }
+        }
+    }
+    return Directory{numberAt(tail, end + 16, 4), numberAt(tail, end + 12, 4)};
 }
 
 }  // namespace
@@ -86,23 +135,24 @@ bool isDocumentPackage(const std::filesystem::path& file) {
     }
     const std::uint64_t fileSize = std::filesystem::file_size(file, error);
     std::ifstream stream(file, std::ios::binary);
-    if (error || bytesAt(stream, 0, localHeaderMark.size()) != localHeaderMark) {
+    const std::string header = bytesAt(stream, 0, localHeaderSize + 64);
+    if (error || !header.starts_with(localHeaderMark)) {
         return false;
+    }
+    if (beginsAsAPackage(header)) {
+        return true;
     }
     const std::size_t tailSize = static_cast<std::size_t>(
         std::min<std::uint64_t>(fileSize, directoryEndSize + longestComment));
     const std::string tail = bytesAt(stream, fileSize - tailSize, tailSize);
-    const std::size_t end = tail.rfind(directoryEndMark);
-    if (end == std::string::npos || tail.size() - end < directoryEndSize) {
-        return false;
-    }
-    const std::uint64_t directorySize = numberAt(tail, end + 12, 4);
-    const std::uint64_t directoryOffset = numberAt(tail, end + 16, 4);
-    if (directoryOffset > fileSize || directorySize > fileSize - directoryOffset) {
+    const std::optional<Directory> directory = findDirectory(stream, tail, fileSize - tailSize);
+    if (!directory || directory->offset > fileSize ||
+        directory->size > fileSize - directory->offset) {
         return false;
     }
     return listsContentTypes(
-        bytesAt(stream, directoryOffset, static_cast<std::size_t>(directorySize)));
+        bytesAt(stream, directory->offset,
+                static_cast<std::size_t>(std::min(directory->size, mostOfADirectory))));
 }
 
 }  // namespace host

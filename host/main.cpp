@@ -151,6 +151,8 @@ int runCommandLine(int argc, char** argv) {
 int main(int argc, char** argv) {
     // A reader that goes away shall be an error of the write, not the end of the process.
     std::signal(SIGPIPE, SIG_IGN);
+    // The same for a file that grows past the process's limit.
+    std::signal(SIGXFSZ, SIG_IGN);
     try {
         return runCommandLine(argc, argv);
     } catch (const std::exception& error) {

@@ -16,6 +16,7 @@
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "json/value.h"
+#include "platform/data_buffer.h"
 
 namespace host {
 
@@ -48,13 +49,14 @@ std::optional<json::Object> packageIn(std::string_view content) {
     return std::nullopt;
 }
 
-std::string requestFor(const WriteOptions& options, std::string content) {
+platform::DataBuffer requestFor(const WriteOptions& options, std::string content) {
     json::Object request{{"rtcId", "0"}, {"filePath", options.file}};
     const bool mayBePackage =
         options.contentType.empty() || options.contentType == packageContentType;
     if (std::optional<json::Object> document = mayBePackage ? packageIn(content) : std::nullopt) {
         request["contentType"] = packageContentType;
         request["content"] = std::move(*document);
+        content = {};
     } else if (options.contentType == packageContentType) {
         throw std::runtime_error(
             "The content is no document package: JSON with the arrays \"parts\" "
@@ -64,22 +66,22 @@ std::string requestFor(const WriteOptions& options, std::string content) {
         request["content"] = std::move(content);
         request["encoding"] = options.encoding;
     }
-    return json::serialize(std::move(request));
+    return platform::DataBuffer::copyOf(json::serialize(std::move(request)));
 }
 
 }  // namespace
 
 int runWrite(const WriteOptions& options, int input, int output) {
-    const std::string request = requestFor(options, readToEnd(input));
+    platform::DataBuffer request = requestFor(options, readToEnd(input));
     std::mutex mutex;
     std::optional<JsonMessage> answer;  // guarded by mutex
-    BundleHost host(options.bundle, request.size(), [&](const JsonMessage& message) {
+    BundleHost host(options.bundle, request.length(), [&](const JsonMessage& message) {
         if (message.channel().starts_with(writeResponsePrefix)) {
             const std::lock_guard lock(mutex);
             answer = message;
         }
     });
-    host.publish(writeRequestChannel, platform::DataBuffer::copyOf(request));
+    host.publish(writeRequestChannel, std::move(request));
     host.waitUntilIdle(options.timeout, [&options] {
         spdlog::error("{}: no answer within {} seconds", options.file, options.timeout.count());
     });

@@ -26,8 +26,11 @@ bool Serialization::isControl(char16_t unit) const noexcept {
     return unit <= 0x1F || (unit >= 0x7F && unit <= 0x9F);
 }
 
-void Serialization::publish(const std::string& channel, const json::Value& value) const {
-    messageService->publish(channel, DataBuffer::copyOf(json::serialize(value)));
+void Serialization::publish(const std::string& channel, json::Value value) const {
+    const std::string text = json::serialize(value);
+    // A large document shall not be held three times.
+    value = json::Value();
+    messageService->publish(channel, DataBuffer::copyOf(text));
 }
 
 }  // namespace EditorServices

@@ -215,7 +215,7 @@ public:
 private:
     /// Publishes the JSON text of `value` on `channel`, without waiting for its delivery.
     /// Throws std::runtime_error "Out of memory!" when the message's buffer cannot be allocated.
-    void publish(const std::string& channel, const json::Value& value) const;
+    void publish(const std::string& channel, json::Value value) const;
 
     std::shared_ptr<platform::messaging::MessageService> messageService;
     std::shared_ptr<platform::messaging::Subscription> readSubscription;

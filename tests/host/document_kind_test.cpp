@@ -43,6 +43,21 @@ TEST_F(IsDocumentPackage, FindsThemInAnArchiveWithAComment) {
         isPackage(test::zipArchive({"a", "[Content_Types].xml"}, std::string(0xFFFF, 'c'))));
 }
 
+TEST_F(IsDocumentPackage, FindsThemInALargeArchive) {
+    testing_package::ZipOptions options;
+    options.isZip64 = true;
+    EXPECT_TRUE(isPackage(
+        testing_package::buildZip({{"a", "x"}, {"[Content_Types].xml", "<x/>"}}, options)));
+    EXPECT_FALSE(isPackage(testing_package::buildZip({{"a", "x"}, {"b", "<x/>"}}, options)));
+}
+
+TEST_F(IsDocumentPackage, IsTrueForTheBeginningOfAPackageThatWasCut) {
+    for (const char* first : {"[Content_Types].xml", "_rels/.rels"}) {
+        const std::string archive = test::zipArchive({first, "a"});
+        EXPECT_TRUE(isPackage(archive.substr(0, archive.size() / 2)));
+    }
+}
+
 TEST_F(IsDocumentPackage, IsFalseForAnotherArchive) {
     EXPECT_FALSE(isPackage(test::zipArchive({"a", "b"})));
     EXPECT_FALSE(isPackage(test::zipArchive({"folder/[Content_Types].xml"})));
