@@ -17,8 +17,8 @@ public:
     /// counts from the working folder. When this returns, Start has returned; what Start set going
     /// on other threads may still be under way. Throws std::runtime_error naming the file when
     /// there is no such file, when it is no loadable library or no bundle, when it creates no
-    /// activator, and when its start fails (with the text of that failure). Nothing of the bundle
-    /// stays behind then.
+    /// activator, and when its start fails (with the text of that failure); an
+    /// activator that was created is destroyed then.
     explicit BundleRunner(const std::filesystem::path& bundle);
 
     BundleRunner(const BundleRunner&) = delete;
