@@ -1,6 +1,7 @@
 // Connects the service object to the message service.
 
 #include <exception>
+#include <stdexcept>
 #include <utility>
 
 #include "serialization/serialization.h"
@@ -25,6 +26,9 @@ void Serialization::initializeMessageService() {
                                      Future<std::shared_ptr<MessageService>> client) mutable {
         try {
             messageService = client.get();
+            if (!messageService) {
+                throw std::runtime_error("The message service gave no client.");
+            }
             readSubscription =
                 messageService
                     ->subscribe(readRequestChannel,

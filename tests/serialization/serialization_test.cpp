@@ -165,5 +165,18 @@ TEST(SerializationDestruction, ReleasesTheWriteThenTheReadSubscriptionThenTheSer
                                           "/zpr/service/readRequest_cpp", "service"));
 }
 
+TEST(SerializationStartUp, SurvivesAMessageServiceThatGivesNoClient) {
+    bool asked = false;
+    platform::messaging::setTransport([&asked](const std::string&, const auto&) {
+        asked = true;
+        futures::Promise<std::shared_ptr<platform::messaging::MessageService>> promise;
+        promise.setValue(nullptr);
+        return promise.getFuture();
+    });
+    { const Serialization service; }
+    platform::messaging::setTransport({});
+    EXPECT_TRUE(asked);
+}
+
 }  // namespace
 }  // namespace EditorServices
