@@ -2,12 +2,13 @@
 // the values in them are parsed together by TreeParser, which keeps the containers that are open on
 // a stack of its own, so that no depth can exhaust the thread's.
 //
-//     object  =  "{" [ member *( "," member ) ] "}"        member  =  string ":" value
+//     object  =  "{" [ member *( "," member ) ] "}"
+//     member  =  string ":" value
 //     array   =  "[" [ value *( "," value ) ] "]"
 //     value   =  string / number / object / array / "true" / "false" / "null"
-//     number  =  [ "-" ] ( "0" / 1-9 *digit ) [ "." 1*digit ] [ ( "e" / "E" ) [ "+" / "-" ] 1*digit
-//     ] data    =  "[" [ integer *( "," integer ) ] "]"      integer =  [ "-" ] ( "0" / 1-9 *digit
-//     )
+//     number  =  integer [ "." 1*digit ] [ ( "e" / "E" ) [ "+" / "-" ] 1*digit ]
+//     data    =  "[" [ integer *( "," integer ) ] "]"
+//     integer =  [ "-" ] ( "0" / 1-9 *digit )
 //
 // White space may come after each of "{" "[" ":" ",", and before ":" "," "]" "}".
 #include "json/parser.h"

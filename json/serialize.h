@@ -12,8 +12,7 @@ namespace json {
 /// Strings are bytes: the quote, the backslash and bytes below 0x20 are escaped and every other
 /// byte is written as it stands, so a string in any charset comes back from the parser byte for
 /// byte. A double or float is the shortest text that reads back to the same value, an integral one
-/// without
-/// ".0"; NaN, the infinities and `Undefined`, which JSON lacks, are `null`.
+/// without ".0"; NaN, the infinities and `Undefined`, which JSON lacks, are `null`.
 ///
 /// Takes time linear in the size of the text, and no stack in proportion to the nesting.
 std::string serialize(const Value& value);

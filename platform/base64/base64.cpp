@@ -1,9 +1,8 @@
 // Base64 on OpenSSL's block functions. They convert whole groups (three bytes, four characters),
 // take lengths as int, and write behind what they report: the encoder a terminating zero, the
 // decoder the last group's zeros. The decoder moreover drops white space and '-' at the ends of a
-// block and reads
-// '=' anywhere as a zero bit. So text goes to it in chunks of a fixed size from which white space
-// and padding have been taken, and the number of bytes that come back is checked.
+// block and reads '=' anywhere as a zero bit. So text goes to it in chunks of a fixed size from
+// which white space and padding have been taken, and the number of bytes that come back is checked.
 #include "platform/base64/base64.h"
 
 #include <openssl/evp.h>

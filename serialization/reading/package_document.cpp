@@ -1,8 +1,6 @@
 // Reads document packages into the document JSON.
 
-#include <cstring>
 #include <exception>
-#include <string_view>
 #include <utility>
 
 #include "platform/base64/base64.h"

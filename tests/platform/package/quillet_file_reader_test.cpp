@@ -118,6 +118,17 @@ TEST_F(QuilletFileReaderTest, TakesRelationshipsPartsForNoParts) {
     EXPECT_THAT(namesOf(package), ElementsAre(u"/[Content_Types].xml.xml"));
 }
 
+TEST_F(QuilletFileReaderTest, LeavesOutFoldersAndRelationshipsThatHaveAContentType) {
+    const auto package = read(buildZip(
+        {{"word.xml/", ""},
+         {"word.xml/a.xml", "<a/>"},
+         {"_rels/.rels", relationshipsXmlOf("")},
+         {"[Content_Types].xml", typesXml("<Default Extension='xml' ContentType='a/b'/>"
+                                          "<Default Extension='rels' ContentType='c/d'/>"
+                                          "<Override PartName='/word.xml' ContentType='e/f'/>")}}));
+    EXPECT_THAT(namesOf(package), ElementsAre(u"/word.xml/a.xml"));
+}
+
 TEST_F(QuilletFileReaderTest, ComparesNamesWithoutCaseAndEscapes) {
     const auto package =
         read(buildZip({{"WORD/Docu%6Dent.XML", "<d/>"},

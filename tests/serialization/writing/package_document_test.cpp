@@ -154,6 +154,28 @@ TEST_F(PackageDocumentWriting, NamesTheFirstOfSeveralFaultyKeysOfAPart) {
     EXPECT_EQ(failure("[]"), "invalid conversion: array to object");
 }
 
+TEST_F(PackageDocumentWriting, NamesTheFirstOfSeveralFaultyKeysOfARelationship) {
+    const auto failure = [&](const std::string& relationship) -> std::string {
+        try {
+            service.relationshipsFromJson(array("[" + relationship + "]"), true);
+        } catch (const std::runtime_error& error) {
+            return error.what();
+        }
+        return "no failure";
+    };
+    EXPECT_EQ(
+        failure(R"({"relationshipType":null,"target":true,"relationshipId":1,"targetMode":[]})"),
+        "invalid conversion: null to string");
+    EXPECT_EQ(
+        failure(R"({"relationshipType":"","target":true,"relationshipId":1,"targetMode":[]})"),
+        "invalid conversion: boolean to string");
+    EXPECT_EQ(failure(R"({"relationshipType":"","target":"","relationshipId":1,"targetMode":[]})"),
+              "invalid conversion: double to string");
+    EXPECT_EQ(failure(R"({"relationshipType":"","target":"","relationshipId":"","targetMode":[]})"),
+              "invalid conversion: array to string");
+    EXPECT_EQ(failure("1"), "invalid conversion: double to object");
+}
+
 TEST_F(PackageDocumentWriting, TakesNullAsNoRelationships) {
     const auto parts = service.partsFromJson(
         array(R"([{"partUri":"/a","contentType":"a/b","content":"c","relationship":null}])"));
