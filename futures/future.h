@@ -95,7 +95,6 @@ public:
         : state_(std::move(state)) {}
 
     Future(Future&&) noexcept = default;
-
     Future& operator=(Future&&) noexcept = default;
     Future(const Future&) = delete;
     Future& operator=(const Future&) = delete;

@@ -40,8 +40,9 @@ using StoredValue = std::conditional_t<std::is_void_v<T>, std::monostate, T>;
 /// with std::make_shared and lives as long as a future, a promise or a running continuation holds
 /// it.
 ///
-/// No callback, and no destructor of a continuation, runs while the mutex is held, so these may use
-/// any future, this one included.
+/// No callback is called, and no continuation destroyed, while the mutex is held, so these may use
+/// any future, this one included. Only the making of a continuation, which copies or moves the
+/// callback into it, is under the mutex.
 template <typename T>
 class SharedFutureState : public std::enable_shared_from_this<SharedFutureState<T>> {
 public:

@@ -1,3 +1,4 @@
+// The queue is a plain deque under a mutex; its threads take messages off it until it is closed.
 #include "platform/messaging/delivery_queue.h"
 
 #include <condition_variable>

@@ -13,9 +13,12 @@ namespace platform::messaging {
 /// A message in a queue, with what its sender wants to have released along the way.
 struct QueuedMessage {
     JsonMessage message;
-    std::shared_ptr<const void> whileQueued;  ///< Released when the message leaves the queue.
-    std::shared_ptr<const void>
-        untilDone;  ///< Released when its handler is done, or it is dropped.
+
+    /// Released when the message leaves the queue.
+    std::shared_ptr<const void> whileQueued;
+
+    /// Released when its handler is done with the message, or the message is dropped.
+    std::shared_ptr<const void> untilDone;
 };
 
 /// Delivers messages to a handler: one at a time and in the order pushed when it has one thread,

@@ -1,3 +1,6 @@
+// A message's way: it is counted against the bound, shown to the observers, and queued at each
+// subscription of its channel. Everything that lasts is in the core, which clients, subscriptions
+// and the bus share; queues and observers guard themselves.
 #include "platform/messaging/in_process_bus.h"
 
 #include <algorithm>

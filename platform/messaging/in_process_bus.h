@@ -13,6 +13,7 @@
 
 namespace platform::messaging {
 
+/// The limits of a bus, and how it delivers.
 struct InProcessBusOptions {
     /// Bound on the payload bytes that wait in queues, over the whole bus.
     std::size_t maxQueuedBytes = std::size_t{1} << 30;
@@ -25,6 +26,7 @@ struct InProcessBusOptions {
     std::size_t concurrency = 0;
 };
 
+/// Is told of a message and of the client that published it; the name is valid during the call.
 using MessageObserver = std::function<void(std::string_view clientName, const JsonMessage&)>;
 
 /// An in-process bus. Every subscription has a queue and threads of its own, so a slow handler
@@ -42,6 +44,7 @@ using MessageObserver = std::function<void(std::string_view clientName, const Js
 /// used.
 class [[gnu::visibility("default")]] InProcessBus {
 public:
+    /// A bus without clients. It starts no thread before the first subscription.
     static std::shared_ptr<InProcessBus> create(InProcessBusOptions options = {});
 
     InProcessBus(const InProcessBus&) = delete;

@@ -1,3 +1,4 @@
+// Logging goes through spdlog, whose registry the host shares with this library.
 #include "platform/messaging/log.h"
 
 #include <spdlog/logger.h>

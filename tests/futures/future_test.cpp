@@ -1,3 +1,5 @@
+// Promises, futures, continuations and unwrap as their users see them.
+
 #include "futures/future.h"
 
 #include <gmock/gmock.h>

@@ -1,3 +1,5 @@
+// The shared state: its fields, its locking, and its rules against a model of them.
+
 #include "futures/detail/shared_future_state.h"
 
 #include <gmock/gmock.h>

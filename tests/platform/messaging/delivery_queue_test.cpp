@@ -1,3 +1,5 @@
+// Queues on their own: order, threads, what messages hold, and ends from every side.
+
 #include "platform/messaging/delivery_queue.h"
 
 #include <gtest/gtest.h>

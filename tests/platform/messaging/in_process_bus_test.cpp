@@ -1,3 +1,5 @@
+// The bus as its clients see it: delivery, ends of subscriptions, bound, observers, idleness.
+
 #include "platform/messaging/in_process_bus.h"
 
 #include <dlfcn.h>

@@ -1,3 +1,5 @@
+// What reaches standard error when handlers fail.
+
 #include "platform/messaging/log.h"
 
 #include <gmock/gmock.h>

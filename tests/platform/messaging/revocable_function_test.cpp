@@ -1,3 +1,5 @@
+// Functions that are revoked while they are called, from outside and from inside.
+
 #include "platform/messaging/revocable_function.h"
 
 #include <gtest/gtest.h>

@@ -1,3 +1,5 @@
+// Where createMessageService gets its clients from.
+
 #include "platform/messaging/transport.h"
 
 #include <gmock/gmock.h>
