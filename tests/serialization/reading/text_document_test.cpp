@@ -4,6 +4,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <initializer_list>
 #include <string>
 
 #include "json/serialize.h"
@@ -111,7 +112,8 @@ TEST_F(TextDocumentReading, KeepsZeroBytesAndLineEndsOfEveryKind) {
 }
 
 TEST_F(TextDocumentReading, ReadsFilesOfAllSizesAroundTheReadersPieces) {
-    for (const std::size_t size : {1, 4095, 4096, 4097, 8192, 65536, 1 << 20}) {
+    for (const std::size_t size :
+         std::initializer_list<std::size_t>{1, 4095, 4096, 4097, 8192, 65536, 1 << 20}) {
         std::string bytes(size, 'x');
         bytes.back() = 'y';
         EXPECT_EQ(service.readFileBytes(file(bytes)), bytes) << size;
