@@ -27,7 +27,8 @@ void failAllocationsOf(std::size_t size, int spared = 0) {
 
 extern "C" void* __libc_malloc(std::size_t size);
 
-extern "C" void* malloc(std::size_t size) {
+// Visible, or clang would keep it from the bundle, which is another object.
+extern "C" [[gnu::visibility("default")]] void* malloc(std::size_t size) {
     if (size != 0 && size == failingSize && allocationsToSpare-- <= 0) {
         return nullptr;
     }
