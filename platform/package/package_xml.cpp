@@ -1,5 +1,6 @@
 #include "platform/package/package_xml.h"
 
+#include <algorithm>
 #include <cstddef>
 #include <map>
 #include <new>
@@ -109,11 +110,19 @@ void appendAttribute(std::string& xml, std::string_view name, std::string_view v
     xml.append("\"");
 }
 
-void appendEscaped(std::string& xml, std::string_view text) {
+void requireXmlCharacters(std::string_view text) {
+    const auto isForbidden = [](char c) {
+        return static_cast<unsigned char>(c) < 0x20 && c != '\t' && c != '\n' && c != '\r';
+    };
     if (text.find("\xEF\xBF\xBE") != std::string_view::npos ||
-        text.find("\xEF\xBF\xBF") != std::string_view::npos) {
+        text.find("\xEF\xBF\xBF") != std::string_view::npos ||
+        std::any_of(text.begin(), text.end(), isForbidden)) {
         throw std::runtime_error("has a character that XML cannot hold");
     }
+}
+
+void appendEscaped(std::string& xml, std::string_view text) {
+    requireXmlCharacters(text);
     for (const char c : text) {
         switch (c) {
             case '&':
@@ -138,9 +147,6 @@ void appendEscaped(std::string& xml, std::string_view text) {
                 xml += "&#13;";
                 break;
             default:
-                if (static_cast<unsigned char>(c) < 0x20) {
-                    throw std::runtime_error("has a character that XML cannot hold");
-                }
                 xml += c;
         }
     }

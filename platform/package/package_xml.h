@@ -31,8 +31,11 @@ std::string_view requiredAttribute(const pugi::xml_node& element, const char* na
 /// The start of a document whose root is `root` in `namespaceUri`: declaration and root tag.
 std::string xmlStart(std::string_view root, std::string_view namespaceUri);
 
-/// Appends ` name="value"` with `value`, in UTF-8, escaped. Throws std::runtime_error when it has a
-/// character that XML cannot hold.
+/// Throws std::runtime_error when `text`, in UTF-8, has a character that XML cannot hold.
+void requireXmlCharacters(std::string_view text);
+
+/// Appends ` name="value"` with `value`, in UTF-8, escaped. Throws what requireXmlCharacters
+/// throws.
 void appendAttribute(std::string& xml, std::string_view name, std::string_view value);
 
 /// Appends `text`, in UTF-8, escaped; throws as appendAttribute does.

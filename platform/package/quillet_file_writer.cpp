@@ -136,19 +136,21 @@ private:
     };
 
     void add(const Part& part) {
-        const std::string name = i18n::to_string(part.partUri);
-        about("part " + quoted(name), [&] {
+        about("part " + quoted(i18n::to_string(part.partUri, toPrintable_)), [&] {
+            const std::string name = i18n::to_string(part.partUri);
             if (const std::string_view problem = nameProblem(name); !problem.empty()) {
                 throw std::runtime_error("has an invalid name: " + std::string(problem));
             }
+            requireXmlCharacters(name);
             if (part.contentType.empty()) {
                 throw std::runtime_error("has no content type");
             }
             if (!keys_.insert(partNameKey(name)).second) {
                 throw std::runtime_error("has the name of another part");
             }
-            items_.push_back(
-                {name, withLowerCaseTopLevel(i18n::to_string(part.contentType)), &part});
+            const std::string mediaType = i18n::to_string(part.contentType);
+            requireXmlCharacters(mediaType);
+            items_.push_back({name, withLowerCaseTopLevel(mediaType), &part});
         });
     }
 
@@ -189,6 +191,8 @@ private:
         zip.add(name.substr(1), content, mayDeflate);
     }
 
+    // For names that are no valid text, which an error has to show all the same.
+    i18n::codecvt_ustring_to_string toPrintable_{"UTF-8", false};
     std::vector<Item> items_;
     std::unordered_set<std::string> keys_;  // of all items
     std::vector<Relationship> relationships_;

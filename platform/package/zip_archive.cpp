@@ -88,18 +88,24 @@ std::optional<Bytes> extraField(Bytes extra, std::uint16_t id) {
     return std::nullopt;
 }
 
+// `name` for an error, which must be valid text.
+std::string printable(Bytes name) {
+    i18n::codecvt_string_to_ustring converter("UTF-8", false);
+    return i18n::to_string(i18n::to_ustring(asText(name), converter));
+}
+
 // Names are UTF-8 if they say so or are valid UTF-8 (many producers do not say so), otherwise code
 // page 437, unless an extra field made for this very name has its Unicode form.
 std::string decodeName(Bytes name, Bytes extra, std::uint16_t flags) {
     constexpr std::size_t versionAndChecksum = 5;
     if (asText(name).find('\0') != std::string_view::npos) {
-        fail("has an entry whose name holds a zero");
+        failForEntry(printable(name), "has a zero in its name");
     }
     if (isUtf8(asText(name))) {
         return std::string(asText(name));
     }
     if ((flags & zip::kUtf8Flag) != 0) {
-        fail("has an entry whose name is not valid UTF-8");
+        failForEntry(printable(name), "has a name that is not valid UTF-8");
     }
     const std::optional<Bytes> unicode = extraField(extra, zip::kUnicodePathExtra);
     if (unicode && unicode->size() > versionAndChecksum && (*unicode)[0] == 1 &&

@@ -340,15 +340,15 @@ TEST_F(QuilletFileWriterTest, RefusesPartsThatCouldNotBeReadBack) {
     refused(u"/word/_rels/document.xml.rels", "reserved for relationships");
     refused(u"/a/[0].piece", "reserved for pieces");
     refused(u"/[trash]/a.txt", "the trash");
-    refused(u"/\xD800", "");
+    refused(u"/\xD800", "part \"/\xEF\xBF\xBD\" Cannot encode text as UTF-8: unpaired surrogate");
     refused(std::u16string(u"/").append(70'000, u'a'), "too long a name");
-    refused(u"/a\uFFFF", "has a character that XML cannot hold");
+    refused(u"/a\uFFFF", "part \"/a\uFFFF\" has a character that XML cannot hold");
     expectRefused(packageOf({part(u"/a.txt"), part(u"/A.TXT")}),
                   "part \"/A.TXT\" has the name of another part");
     expectRefused(packageOf({part(u"/a b"), part(u"/a%20b")}), "has the name of another part");
     expectRefused(packageOf({part(u"/a", "", u"")}), "part \"/a\" has no content type");
     expectRefused(packageOf({part(u"/a", "", u"a/\u0001")}),
-                  "has a character that XML cannot hold");
+                  "part \"/a\" has a character that XML cannot hold");
 }
 
 TEST_F(QuilletFileWriterTest, RefusesRelationshipsThatCouldNotBeReadBack) {
@@ -362,7 +362,7 @@ TEST_F(QuilletFileWriterTest, RefusesRelationshipsThatCouldNotBeReadBack) {
     refused({{u"t", u"x", u"r", 1}, {u"t", u"y", u"r", 1}},
             "has two relationships of the id \"r\"");
     refused({{u"t", u"\u0007", u"r", 1}}, "has a character that XML cannot hold");
-    refused({{u"t", u"\xDC00", u"r", 1}}, "");
+    refused({{u"t", u"\xDC00", u"r", 1}}, "Cannot encode text as UTF-8: unpaired surrogate");
 }
 
 TEST_F(QuilletFileWriterTest, RefusesMoreThanReadersAccept) {

@@ -131,7 +131,8 @@ TEST_F(ZipArchiveTest, PrefersTheUnicodeNameMadeForTheOtherName) {
 TEST_F(ZipArchiveTest, RefusesANameThatIsNotTheUtf8ItClaims) {
     ZipEntry entry{"m\x82", "x"};
     entry.flags = 1 << 11;
-    expectRefusedAtOpening(buildZip({entry}), "name is not valid UTF-8");
+    expectRefusedAtOpening(buildZip({entry}),
+                           "entry \"m\xEF\xBF\xBD\" has a name that is not valid UTF-8");
 }
 
 TEST_F(ZipArchiveTest, ToleratesABrokenExtraField) {
