@@ -69,6 +69,7 @@ function(project_test name)
   target_include_directories(${target} PRIVATE "${PROJECT_SOURCE_DIR}")
   target_compile_definitions(${target} PRIVATE PROJECT_SOURCE_ROOT="${PROJECT_SOURCE_DIR}")
   target_link_libraries(${target} PRIVATE ${arg_LINKS} GTest::gmock GTest::gtest_main)
-  gtest_discover_tests(${target} TEST_PREFIX "${name}." DISCOVERY_TIMEOUT 60
+  # Without the values of parameters, which may be addresses and differ from run to run.
+  gtest_discover_tests(${target} TEST_PREFIX "${name}." NO_PRETTY_VALUES DISCOVERY_TIMEOUT 60
                        PROPERTIES TIMEOUT 600)
 endfunction()
