@@ -9,6 +9,7 @@
 #include "json/serialize.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/package/quillet_file_package.h"
+#include "platform/package/quillet_file_reader.h"
 #include "serialization/serialization.h"
 #include "tests/support/temporary_directory.h"
 
@@ -206,6 +207,23 @@ TEST_F(PackageDocumentWriting, TakesForExternalWhatBeginsWithTheWord) {
     EXPECT_EQ(storedMode("external"), 1);
     EXPECT_EQ(storedMode(" External"), 1);
     EXPECT_EQ(storedMode("Extern"), 1);
+}
+
+TEST_F(PackageDocumentWriting, StoresTheModesOfThePackagesAndOfItsPartsRelationships) {
+    const std::string both =
+        R"([{"relationshipId":"in","relationshipType":"t","target":"/a.txt","targetMode":""},)"
+        R"({"relationshipId":"out","relationshipType":"t","target":"/a.txt","targetMode":"External"}])";
+    ASSERT_TRUE(write(R"({"parts":[{"partUri":"/a.txt","contentType":"text/plain","content":"",)"
+                      R"("relationship":)" +
+                      both + R"(}],"relationships":)" + both + "}"));
+    const QuilletFilePackage package =
+        platform::package::QuilletFileReader(to_ustring(path.string())).read();
+    ASSERT_EQ(package.getParts().size(), 1u);
+    for (const auto& stored : {package.getRelationships(), package.getParts()[0].relationships}) {
+        ASSERT_EQ(stored.size(), 2u);
+        EXPECT_EQ(stored[0].targetMode, 1);
+        EXPECT_EQ(stored[1].targetMode, 0);
+    }
 }
 
 TEST_F(PackageDocumentWriting, TakesEveryRelationshipForExternalWhereInternalOnesAreNotAllowed) {
