@@ -31,7 +31,7 @@ struct DeliveryQueue::State {
 
     std::mutex mutex;  // guards what follows
     std::condition_variable changed;
-    std::deque<QueuedMessage> messages;
+    std::deque<QueuedMessage> messages;  // of the closing thread alone once closed
     bool closed = false;
 };
 
@@ -64,17 +64,18 @@ void DeliveryQueue::push(QueuedMessage message) {
 }
 
 void DeliveryQueue::close() {
-    std::deque<QueuedMessage> dropped;
     {
         const std::lock_guard lock(state_->mutex);
         if (state_->closed) {
             return;
         }
         state_->closed = true;
-        dropped.swap(state_->messages);
     }
     state_->changed.notify_all();
-    dropped.clear();
+    // Nobody else touches the messages of a closed queue, and what their senders want released may
+    // take locks of its own. (Another deque to move them to would take memory, as few would expect;
+    // this must not fail.)
+    state_->messages.clear();
     state_->handler.revoke();
     for (std::thread& thread : threads_) {
         if (thread.get_id() == std::this_thread::get_id()) {
