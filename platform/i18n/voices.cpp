@@ -59,7 +59,19 @@ std::string uchardetGuess(std::string_view bytes) {
     return charsetOfUchardet(uchardet_get_charset(detector.get()));
 }
 
+namespace {
+
+// Throws std::bad_alloc unless `bytes` can be had. They are given back at once, to where the
+// thread's next allocations of smaller pieces come from.
+void proveMemory(std::size_t bytes) {
+    ::operator delete(::operator new(bytes));
+}
+
+}  // namespace
+
 std::vector<std::string> icuGuesses(std::string_view bytes) {
+    // ICU's detector breaks the heap when an allocation of its own fails; all take some 20 KB.
+    proveMemory(std::size_t{64} * 1024);
     UErrorCode error = U_ZERO_ERROR;
     const std::unique_ptr<UCharsetDetector, CloseUcsdet> detector(ucsdet_open(&error));
     ucsdet_setText(detector.get(), bytes.data(), static_cast<std::int32_t>(bytes.size()), &error);
