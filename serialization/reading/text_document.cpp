@@ -1,10 +1,12 @@
 // Reads text files: bytes, detected charset, UTF-16, and back to the file's own charset.
 
 #include <algorithm>
+#include <cerrno>
 #include <exception>
 #include <filesystem>
 #include <fstream>
 #include <iostream>
+#include <new>
 #include <system_error>
 #include <utility>
 
@@ -95,6 +97,11 @@ std::string Serialization::readFileBytes(std::u16string path) const {
     }
     std::ifstream file(nativePath, std::ios_base::in);
     if (!file.is_open()) {
+        if (errno == ENOMEM) {
+            // The stream had no memory. That says nothing of the file, which must not pass for
+            // empty.
+            throw std::bad_alloc();
+        }
         return {};
     }
     const std::uintmax_t size = std::filesystem::file_size(nativePath, notExaminable);
