@@ -1,42 +1,18 @@
-// What the loaded bundle does when the buffer of a message cannot be allocated. This program has a
-// malloc of its own, which the bundle calls too and which fails when told to.
+// What the loaded bundle does when memory runs out.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include <atomic>
-#include <cstddef>
 #include <string>
 #include <vector>
 
+#include "tests/support/failing_malloc.h"
 #include "tests/support/running_bundle.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
 
-// The allocations of `failingSize` bytes fail once `allocationsToSpare` of them were made.
-std::atomic<std::size_t> failingSize = 0;
-std::atomic<int> allocationsToSpare = 0;
-
-void failAllocationsOf(std::size_t size, int spared = 0) {
-    allocationsToSpare = spared;
-    failingSize = size;
-}
-
-}  // namespace
-
-extern "C" void* __libc_malloc(std::size_t size);
-
-// Visible, or clang would keep it from the bundle, which is another object.
-extern "C" [[gnu::visibility("default")]] void* malloc(std::size_t size) {
-    if (size != 0 && size == failingSize && allocationsToSpare-- <= 0) {
-        return nullptr;
-    }
-    return __libc_malloc(size);
-}
-
-namespace {
-
+using test::failAllocationsOf;
 using test::kReadRequests;
 using test::kWriteRequests;
 using test::Message;

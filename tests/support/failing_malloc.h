@@ -1,0 +1,35 @@
+// A malloc that fails when told to, for programs that link failing_malloc.cpp. The libraries that
+// such a program loads call it too.
+#pragma once
+
+#include <cstddef>
+
+namespace test {
+
+/// Makes the allocations of `size` bytes fail once `spared` of them were made; none for size 0.
+void failAllocationsOf(std::size_t size, int spared = 0);
+
+/// Which allocations fail.
+enum class Failing { one, allFromThere };
+
+/// Makes the allocation `index`, counted from 0 and from this call on, fail, or it and all that
+/// follow. Threads with a SparedThread neither fail nor count.
+void failAllocation(long index, Failing which);
+
+/// Keeps what the libraries that are loaded now, with `name` in their path, allocate from failing
+/// and from being counted; nullptr ends that. To be called while nothing fails.
+void spareLibraries(const char* name);
+
+/// Ends what failAllocation began, and returns how many allocations it counted.
+long stopFailing();
+
+/// Keeps the calling thread's allocations from failing and from being counted, while it lives.
+class SparedThread {
+public:
+    SparedThread();
+    SparedThread(const SparedThread&) = delete;
+    SparedThread& operator=(const SparedThread&) = delete;
+    ~SparedThread();
+};
+
+}  // namespace test
