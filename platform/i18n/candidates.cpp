@@ -114,6 +114,9 @@ Candidate::Fit Candidate::fit(std::string_view bytes) const {
         });
         return {fits, fits ? charset_ : std::string()};
     }
+    if (openCharset(charset_, true)->keeps(bytes)) {
+        return {true, charset_};
+    }
     const std::optional<std::u16string> text = decode(bytes);
     if (!text) {
         return {false, {}};

@@ -53,6 +53,10 @@ std::unique_ptr<Charset> makeCharset(const std::string& name, bool strict) {
 }  // namespace
 
 std::unique_ptr<Charset> openCharset(std::string_view name, bool strict) {
+    if (name == "UTF-8") {
+        // Every path, name and key is in it, and looking names up takes longer than most of these.
+        return makeUtf8("UTF-8", strict);
+    }
     std::unique_ptr<Charset> charset = makeCharset(std::string(name), strict);
     if (!charset) {
         throwUnknownCharset(name);

@@ -22,6 +22,13 @@ public:
     /// The bytes of `text`. What the charset cannot hold throws std::runtime_error when the charset
     /// was opened strict, else becomes the charset's replacement.
     virtual std::string encode(std::u16string_view text) = 0;
+
+    /// Whether `bytes` are known to decode strictly and to be what their text encodes to, without
+    /// converting them, which takes several times as long. False where only converting can tell.
+    virtual bool keeps(std::string_view bytes) {
+        static_cast<void>(bytes);
+        return false;
+    }
 };
 
 /// Opens the charset that `name` means. Throws std::runtime_error naming it when it is not known.

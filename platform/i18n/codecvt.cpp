@@ -39,6 +39,10 @@ std::string to_string(std::u16string_view text, codecvt_ustring_to_string& conve
     return text.empty() ? std::string() : converter.do_convert(text.data(), text.size());
 }
 
+bool comesBackUnchanged(std::string_view bytes, const std::string& charset) {
+    return detail::openCharset(charset, true)->keeps(bytes);
+}
+
 std::u16string to_ustring(std::string_view utf8) {
     return detail::openCharset("UTF-8", true)->decode(utf8);
 }

@@ -58,6 +58,11 @@ std::u16string to_ustring(std::string_view bytes, codecvt_string_to_ustring& con
 /// `text` encoded with `converter`; empty text stays empty.
 std::string to_string(std::u16string_view text, codecvt_ustring_to_string& converter);
 
+/// Whether `bytes` are known to be valid in `charset` and to come back as they are when they are
+/// decoded and encoded again. It is found without converting them, so it may be false of bytes that
+/// do come back. Throws std::runtime_error when the charset is unknown. Linear in their number.
+bool comesBackUnchanged(std::string_view bytes, const std::string& charset);
+
 /// Strict UTF-8 to UTF-16. Throws std::runtime_error naming the byte offset of malformed input.
 std::u16string to_ustring(std::string_view utf8);
 

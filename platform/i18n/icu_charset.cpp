@@ -3,17 +3,21 @@
 
 #include <unicode/ucnv.h>
 #include <unicode/ucnv_err.h>
+#include <unicode/uset.h>
 #include <unicode/utf16.h>
 
 #include <algorithm>
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <map>
+#include <mutex>
 #include <new>
 #include <optional>
 #include <utility>
 
 #include "platform/i18n/conversion_error.h"
+#include "platform/i18n/kept_codes.h"
 
 namespace platform::i18n::detail {
 
@@ -106,10 +110,38 @@ bool isAsciiCompatible(UConverter* converter) {
            });
 }
 
+// Whether a character's code is the same in every text. It is not where sequences of escapes or
+// shifts change the meaning of bytes, and where two characters in a row have a code of their own.
+bool hasFixedCodes(UConverter* converter) {
+    constexpr std::array fixed = {UCNV_SBCS, UCNV_DBCS, UCNV_MBCS, UCNV_LATIN_1, UCNV_US_ASCII};
+    if (std::find(fixed.begin(), fixed.end(), ucnv_getType(converter)) == fixed.end()) {
+        return false;
+    }
+    const std::unique_ptr<USet, void (*)(USet*)> characters(uset_openEmpty(), uset_close);
+    UErrorCode error = U_ZERO_ERROR;
+    ucnv_getUnicodeSet(converter, characters.get(), UCNV_ROUNDTRIP_SET, &error);
+    return U_SUCCESS(error) && !uset_hasStrings(characters.get());
+}
+
+// What is known of the codes of a converter; null where they are not fixed. One for all the
+// charsets that the converter is opened for, alive as long as the program.
+KeptCodes* keptCodesOf(UConverter* converter) {
+    static std::mutex mutex;
+    static std::map<std::string, std::unique_ptr<KeptCodes>> known;  // guarded by mutex
+    UErrorCode error = U_ZERO_ERROR;
+    const std::string name = ucnv_getName(converter, &error);
+    const std::lock_guard lock(mutex);
+    const auto [found, isNew] = known.try_emplace(name);
+    if (isNew && hasFixedCodes(converter)) {
+        found->second = std::make_unique<KeptCodes>();
+    }
+    return found->second.get();
+}
+
 class IcuCharset final : public Charset {
 public:
     IcuCharset(std::string name, Converter converter, bool strict)
-        : name_(std::move(name)), converter_(std::move(converter)) {
+        : name_(std::move(name)), converter_(std::move(converter)), strict_(strict) {
         if (isAsciiCompatible(converter_.get())) {
             controls_.emplace(converter_.get());
         }
@@ -171,6 +203,11 @@ public:
         return bytes;
     }
 
+    bool keeps(std::string_view bytes) override {
+        KeptCodes* const codes = strict_ ? keptCodesOf(converter_.get()) : nullptr;
+        return codes != nullptr && codes->holdAll(bytes, *this);
+    }
+
 private:
     void encodePiece(const char16_t* position, const char16_t* end, std::size_t offset, bool isLast,
                      std::string& bytes) {
@@ -227,6 +264,7 @@ private:
 
     std::string name_;
     Converter converter_;
+    bool strict_;
     std::optional<ControlCodes> controls_;
 };
 

@@ -58,8 +58,7 @@ private:
     void takeRareBytes() {
         done_ = 0;
         for (std::size_t i = 0; i < bytes_.size(); ++i) {
-            if (isBeyondAscii(bytes_[i]) && i >= done_ &&
-                occurrences(bytes_[i]) < wantedOccurrences) {
+            if (isRare_[static_cast<unsigned char>(bytes_[i])] && i >= done_) {
                 take(i, i + 1, wordSearch);
             }
         }
@@ -74,7 +73,8 @@ private:
             return;
         }
         for (const char byte : bytes_.substr(first, last - first)) {
-            ++occurrences(byte);
+            const auto value = static_cast<unsigned char>(byte);
+            isRare_[value] = isBeyondAscii(byte) && ++occurrences_[value] < wantedOccurrences;
         }
         sample_ += bytes_.substr(first, last - first);
         sample_ += '\n';
@@ -101,11 +101,15 @@ private:
         return limit == bytes_.size() ? limit : std::string_view::npos;
     }
 
-    int& occurrences(char byte) { return occurrences_[static_cast<unsigned char>(byte)]; }
-
     std::string_view bytes_;
     std::string sample_;
     std::array<int, 256> occurrences_{};
+    // Whether the sample wants more of a byte. All those beyond ASCII are rare at first.
+    std::array<bool, 256> isRare_ = [] {
+        std::array<bool, 256> rare{};
+        std::fill(rare.begin() + 0x80, rare.end(), true);
+        return rare;
+    }();
     // The end of the last piece taken, which is a boundary.
     std::size_t done_ = 0;
 };

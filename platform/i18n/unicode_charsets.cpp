@@ -2,6 +2,7 @@
 // and is slower on the one charset that nearly every file is in.
 #include "platform/i18n/unicode_charsets.h"
 
+#include <simdjson.h>
 #include <unicode/utf16.h>
 #include <unicode/utf8.h>
 
@@ -75,6 +76,11 @@ public:
             appendUtf8(bytes, character);
         }
         return bytes;
+    }
+
+    // Every character has one form in UTF-8.
+    bool keeps(std::string_view bytes) override {
+        return simdjson::validate_utf8(bytes.data(), bytes.size());
     }
 
 private:
@@ -202,6 +208,19 @@ public:
             storeUnit<2>(bytes.data() + 2 * i, paired[i], order);
         }
         return bytes;
+    }
+
+    // Text without surrogates; whether those of other text are paired is left to the conversion.
+    bool keeps(std::string_view bytes) override {
+        if (order_ == ByteOrder::fromMark || bytes.size() % 2 != 0) {
+            return false;
+        }
+        const std::size_t highByte = order_ == ByteOrder::big ? 0 : 1;
+        bool surrogates = false;
+        for (std::size_t i = highByte; i < bytes.size(); i += 2) {
+            surrogates |= (static_cast<unsigned char>(bytes[i]) & 0xF8U) == 0xD8;
+        }
+        return !surrogates;
     }
 
 private:

@@ -33,7 +33,10 @@ double bitsPerByte(const Form& form, std::string_view bytes) {
 
 bool isWhole(const Form& form, std::string_view bytes) {
     try {
-        openCharset(form.name, true)->decode(bytes);
+        const std::unique_ptr<Charset> opened = openCharset(form.name, true);
+        if (!opened->keeps(bytes)) {
+            opened->decode(bytes);
+        }
         return true;
     } catch (const std::runtime_error&) {
         return false;

@@ -22,6 +22,7 @@ using platform::filesystem::exists;
 using platform::filesystem::make_native_access_form_with_cleanup;
 using platform::i18n::codecvt_string_to_ustring;
 using platform::i18n::codecvt_ustring_to_string;
+using platform::i18n::comesBackUnchanged;
 using platform::i18n::detect_charset;
 using platform::i18n::to_string;
 using platform::i18n::to_ustring;
@@ -29,6 +30,52 @@ using platform::i18n::to_ustring;
 namespace {
 
 constexpr char16_t kByteOrderMark = u'\uFEFF';
+
+// Conversion tables of the IBM family turn byte 1A, the end-of-file mark of DOS texts, into U+001C.
+// A text that came through one gets its mark back.
+constexpr const char* kCharsetOfDos = "Shift_JIS";
+constexpr char kEndOfDosText = 0x1A;
+constexpr char kEndOfDosTextOfIbm = 0x1C;
+
+/// The byte-order mark in `charset`; empty where there is none.
+std::string markIn(const std::string& charset) {
+    try {
+        codecvt_ustring_to_string converter(charset, true);
+        return converter.do_convert(&kByteOrderMark, 1);
+    } catch (const std::runtime_error&) {
+        return {};
+    }
+}
+
+std::string detectedCharset(const std::string& bytes) {
+    return detect_charset(bytes.data(), bytes.size(), std::cout, u"<unknown>");
+}
+
+std::u16string decode(const std::string& bytes, const std::string& charset) {
+    codecvt_string_to_ustring converter(charset, true);
+    std::u16string text = to_ustring(bytes, converter);
+    if (!text.empty() && text.front() == kByteOrderMark) {
+        text.erase(0, 1);
+    }
+    if (charset == kCharsetOfDos) {
+        std::replace(text.begin(), text.end(), char16_t{kEndOfDosTextOfIbm},
+                     char16_t{kEndOfDosText});
+    }
+    return text;
+}
+
+/// What the text of `bytes` is in `charset` when decoding and encoding would change no character:
+/// the same as encoding what `decode` gives.
+std::string cleaned(std::string bytes, const std::string& charset) {
+    if (const std::string mark = markIn(charset); !mark.empty() && bytes.starts_with(mark)) {
+        bytes.erase(0, mark.size());
+    }
+    if (charset == kCharsetOfDos) {
+        // Neither is a half of any other character.
+        std::replace(bytes.begin(), bytes.end(), kEndOfDosTextOfIbm, kEndOfDosText);
+    }
+    return bytes;
+}
 
 /// Everything that `file` still holds, which is probably `expectedSize` bytes.
 /// Throws std::ios_base::failure on an input error.
@@ -67,26 +114,21 @@ json::Object Serialization::readTextDocument(std::u16string path) const {
 }
 
 std::string Serialization::readTextFileContent(std::u16string path) const {
-    std::string charset;
-    const std::u16string text = readTextFile(std::move(path), charset);
+    std::string bytes = readFileBytes(std::move(path));
+    const std::string charset = detectedCharset(bytes);
+    if (comesBackUnchanged(bytes, charset)) {
+        // As good as every file, so that a large one is not held in UTF-16 too.
+        return cleaned(std::move(bytes), charset);
+    }
+    const std::u16string text = decode(bytes, charset);
     codecvt_ustring_to_string converter(charset, true);
     return to_string(text, converter);
 }
 
 std::u16string Serialization::readTextFile(std::u16string path, std::string& charset) const {
     const std::string bytes = readFileBytes(std::move(path));
-    charset = detect_charset(bytes.data(), bytes.size(), std::cout, u"<unknown>");
-    codecvt_string_to_ustring converter(charset, true);
-    std::u16string text = to_ustring(bytes, converter);
-    if (!text.empty() && text.front() == kByteOrderMark) {
-        text.erase(0, 1);
-    }
-    if (charset == "Shift_JIS") {
-        // Conversion tables of the IBM family turn byte 1A, the end-of-file mark of DOS texts, into
-        // U+001C. A text that came through one gets its mark back.
-        std::replace(text.begin(), text.end(), u'\u001C', u'\u001A');
-    }
-    return text;
+    charset = detectedCharset(bytes);
+    return decode(bytes, charset);
 }
 
 std::string Serialization::readFileBytes(std::u16string path) const {

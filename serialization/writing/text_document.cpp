@@ -1,5 +1,6 @@
 // Writes text files. The text arrives in the charset that the request names and is decoded and
 // encoded again, so that what is not valid in that charset is refused before the file is touched.
+// Where that is known to change nothing, it is left out.
 
 #include <exception>
 #include <fstream>
@@ -14,10 +15,32 @@ namespace EditorServices {
 using platform::filesystem::make_native_access_form_with_cleanup;
 using platform::i18n::codecvt_string_to_ustring;
 using platform::i18n::codecvt_ustring_to_string;
+using platform::i18n::comesBackUnchanged;
+
+namespace {
+
+/// Writes what `makeBytes` returns over the file at `path`, which is opened and so truncated first.
+/// Returns whether it could be opened: clients have always been told only that.
+template <typename MakeBytes>
+bool overwrite(const std::u16string& path, MakeBytes makeBytes) {
+    std::ofstream file(make_native_access_form_with_cleanup(path), std::ios_base::out);
+    const bool opened = file.is_open();
+    if (opened) {
+        const std::string& bytes = makeBytes();
+        file.write(bytes.data(), static_cast<std::streamsize>(bytes.size()));
+    }
+    file.close();
+    return opened;
+}
+
+}  // namespace
 
 bool Serialization::writeTextDocument(std::u16string path, std::string text,
                                       std::string charset) const {
     try {
+        if (comesBackUnchanged(text, charset)) {
+            return overwrite(path, [&]() -> const std::string& { return text; });
+        }
         codecvt_string_to_ustring converter(charset, true);
         std::u16string decoded;
         if (!text.empty()) {
@@ -31,19 +54,14 @@ bool Serialization::writeTextDocument(std::u16string path, std::string text,
 
 bool Serialization::writeTextFileContent(std::u16string path, std::u16string text,
                                          std::string charset) const {
-    std::ofstream file(make_native_access_form_with_cleanup(path), std::ios_base::out);
-    const bool opened = file.is_open();
-    if (opened) {
+    std::string bytes;
+    return overwrite(path, [&]() -> const std::string& {
         codecvt_ustring_to_string converter(charset, true);
-        std::string bytes;
         if (!text.empty()) {
             bytes = converter.do_convert(text.data(), text.size());
         }
-        file.write(bytes.data(), static_cast<std::streamsize>(bytes.size()));
-    }
-    file.close();
-    // Clients have always been told only whether the file could be opened.
-    return opened;
+        return bytes;
+    });
 }
 
 }  // namespace EditorServices

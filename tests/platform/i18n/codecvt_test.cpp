@@ -339,6 +339,85 @@ TEST(Converters, LeaveEmptyTextEmpty) {
     }
 }
 
+// Whether the bytes come back when they are in fact decoded and encoded again.
+bool roundTrips(std::string_view bytes, const std::string& charset) {
+    try {
+        return encode(charset, decode(charset, bytes)) == bytes;
+    } catch (const std::runtime_error&) {
+        return false;
+    }
+}
+
+TEST(ComesBackUnchanged, IsTrueOfEveryCodeThatConvertingGivesBackAndOfNoOther) {
+    for (const std::string charset : {"UTF-8", "Shift_JIS", "EUC-KR", "GBK", "Big5", "EUC-JP",
+                                      "windows-1251", "windows-1252", "KOI8-R", "ISO-8859-1"}) {
+        for (unsigned first = 0; first < 0x100; ++first) {
+            const std::string one(1, static_cast<char>(first));
+            EXPECT_EQ(comesBackUnchanged(one, charset), roundTrips(one, charset))
+                << charset << ' ' << first;
+            for (unsigned second = 0; second < 0x100; ++second) {
+                const std::string two{one.front(), static_cast<char>(second)};
+                EXPECT_EQ(comesBackUnchanged(two, charset), roundTrips(two, charset))
+                    << charset << ' ' << first << ' ' << second;
+            }
+        }
+    }
+}
+
+TEST(ComesBackUnchanged, IsNeverTrueOfBytesThatConvertingChanges) {
+    std::mt19937 random(11);
+    std::size_t unchanged = 0;
+    for (const std::string& charset : allNames()) {
+        if (!isKnown(charset)) {
+            continue;
+        }
+        for (int i = 0; i < 60; ++i) {
+            std::string bytes(random() % 12, '\0');
+            const bool mostlyAscii = random() % 2 == 0;
+            for (char& byte : bytes) {
+                byte = static_cast<char>(mostlyAscii && random() % 4 != 0 ? random() % 0x5F + 0x20
+                                                                          : random());
+            }
+            if (comesBackUnchanged(bytes, charset)) {
+                ++unchanged;
+                EXPECT_TRUE(roundTrips(bytes, charset))
+                    << charset << ' ' << ::testing::PrintToString(bytes);
+            }
+        }
+    }
+    EXPECT_GT(unchanged, 1000u);
+}
+
+TEST(ComesBackUnchanged, IsTrueOfTextInTheUsualCharsets) {
+    for (const auto& [language, charset, iconvName] : {std::tuple{"ja", "Shift_JIS", "CP932"},
+                                                       {"ja", "EUC-JP", "EUC-JP"},
+                                                       {"ja", "UTF-16LE", "UTF-16LE"},
+                                                       {"ja", "UTF-16BE", "UTF-16BE"},
+                                                       {"zh-Hans", "GB18030", "GB18030"},
+                                                       {"zh-Hant", "Big5", "BIG5"},
+                                                       {"ko", "EUC-KR", "CP949"},
+                                                       {"ru", "windows-1251", "CP1251"},
+                                                       {"ru", "KOI8-R", "KOI8-R"},
+                                                       {"de", "ISO-8859-1", "ISO-8859-1"}}) {
+        const auto bytes = testing::iconvEncode(iconvName, testing::corpusText(language));
+        ASSERT_TRUE(bytes) << charset;
+        EXPECT_TRUE(comesBackUnchanged(*bytes, charset)) << charset;
+    }
+}
+
+TEST(ComesBackUnchanged, IsFalseOfHalvesOfCharacters) {
+    EXPECT_FALSE(comesBackUnchanged("\x82\xA0\x82"sv, "Shift_JIS"));
+    EXPECT_FALSE(comesBackUnchanged("\xE3\x81"sv, "UTF-8"));
+    EXPECT_FALSE(comesBackUnchanged("a\0b"sv, "UTF-16LE"));
+    EXPECT_FALSE(comesBackUnchanged("\0\xD8"sv, "UTF-16LE"));
+    EXPECT_FALSE(comesBackUnchanged("\xDC\0"sv, "UTF-16BE"));
+}
+
+TEST(ComesBackUnchanged, RefusesUnknownCharsets) {
+    EXPECT_THAT([] { comesBackUnchanged("", "no-such-charset"); },
+                ThrowsMessage<std::runtime_error>(HasSubstr("no-such-charset")));
+}
+
 TEST(Utf8, KeepsTheByteOrderMarkAsTextBothWays) {
     EXPECT_EQ(decode("UTF-8",
                      "\xEF\xBB\xBF"

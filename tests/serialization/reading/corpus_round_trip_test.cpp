@@ -2,7 +2,9 @@
 
 #include <gtest/gtest.h>
 
+#include <array>
 #include <optional>
+#include <random>
 #include <string>
 
 #include "platform/i18n/codecvt.h"
@@ -13,6 +15,8 @@
 namespace EditorServices {
 namespace {
 
+using platform::i18n::codecvt_ustring_to_string;
+using platform::i18n::to_string;
 using platform::i18n::to_ustring;
 using test::readFile;
 using test::writeFile;
@@ -57,6 +61,25 @@ TEST_F(CorpusRoundTrip, GivesTheBytesOfEveryLine) {
                 expectSameBytes("", *bytes);
             }
         }
+    }
+}
+
+// However the text gets from the file to the answer: what readTextFile decodes is what counts.
+TEST_F(CorpusRoundTrip, AnswersWithWhatTheDecodedTextIsInTheFilesCharset) {
+    std::mt19937 random(23);
+    const std::u16string file = to_ustring(path.string());
+    constexpr std::array marks{"", "\xEF\xBB\xBF", "\xFF\xFE", "\xFE\xFF", "\x84\x31\x95\x33"};
+    constexpr std::array damages{"", "\x1C", "\x1A", "\x87\x90", "\xFF", "\xE2\x80"};
+    for (const CorpusEntry& entry : corpusEntries()) {
+        std::string bytes = iconvEncode(entry.iconvName, corpusText(entry.language)).value();
+        bytes.insert(0, marks.at(random() % marks.size()));
+        bytes.insert(random() % bytes.size(), damages.at(random() % damages.size()));
+        writeFile(path, bytes);
+        std::string charset;
+        const std::u16string text = service.readTextFile(file, charset);
+        codecvt_ustring_to_string converter(charset, true);
+        EXPECT_TRUE(service.readTextFileContent(file) == to_string(text, converter))
+            << entry.language << " in " << entry.charset << ", read as " << charset;
     }
 }
 
