@@ -92,3 +92,37 @@ run_tests() {
         --no-tests=error "$@" |
         grep --line-buffered -vE '^ +Start +[0-9]+: |^ *[0-9]+/[0-9]+ Test +#[0-9]+: .* Passed '
 }
+
+# run_fuzz_targets SECONDS [TARGET...]: runs the fuzz targets of build/fuzz, or those named, for that
+# long each, as many at a time as there are processors. They start from the inputs in fuzz/corpus; what
+# they find new is kept in build/fuzz/corpus, for the next time. Prints the log of those that fail.
+run_fuzz_targets() {
+    local seconds=$1
+    local -a targets=("${@:2}")
+    if ((${#targets[@]} == 0)); then
+        mapfile -t targets < <(cd "$root/build/fuzz/bin" && printf '%s\n' *_fuzz | sed 's/_fuzz$//')
+    fi
+    step "fuzzing for $seconds s each: ${targets[*]}"
+    export root
+    export -f run_fuzz_target step
+    printf '%s\n' "${targets[@]}" |
+        xargs -P "$(nproc)" -I{} bash -c 'run_fuzz_target "$1" "$2"' fuzz {} "$seconds"
+}
+
+# run_fuzz_target NAME SECONDS
+run_fuzz_target() {
+    local name=$1 seconds=$2 folder="$root/build/fuzz"
+    local found="$folder/corpus/$name" log="$folder/$name.log"
+    local -a options=(-max_total_time="$seconds" -timeout=60 -rss_limit_mb=4096
+        -artifact_prefix="$folder/$name-")
+    [[ ! -f $root/fuzz/$name.dict ]] || options+=(-dict="$root/fuzz/$name.dict")
+    mkdir -p "$found"
+    if "$folder/bin/${name}_fuzz" "${options[@]}" "$found" "$root/fuzz/corpus/$name" \
+        >"$log" 2>&1; then
+        step "$name: $(grep -a '^Done ' "$log")"
+    else
+        tail -n 100 "$log" >&2
+        step "$name failed; its input is in build/fuzz"
+        return 1
+    fi
+}
