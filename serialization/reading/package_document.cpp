@@ -1,6 +1,7 @@
 // Reads document packages into the document JSON.
 
 #include <exception>
+#include <string_view>
 #include <utility>
 
 #include "platform/base64/base64.h"
@@ -90,17 +91,20 @@ json::Object Serialization::relationshipToJson(
 
 std::string Serialization::encodePartContent(std::vector<std::uint8_t> bytes,
                                              const std::string& contentType) const {
-    std::string text(bytes.begin(), bytes.end());
+    const std::string_view text(reinterpret_cast<const char*>(bytes.data()), bytes.size());
     if (!contentType.starts_with(imagePrefix)) {
-        return text;
+        return std::string(text);
     }
-    const std::string prefix = dataUriPrefix + contentType + ";base64,";
-    if (text.starts_with(prefix)) {
+    std::string dataUri = dataUriPrefix + contentType + ";base64,";
+    if (text.starts_with(dataUri)) {
         // Stored as a data URI by someone; encoding it once more would hide the image.
-        return text;
+        return std::string(text);
     }
-    const DataBuffer encoded = platform::base64encode(DataBuffer::copyOf(text));
-    return prefix + std::string(encoded.view());
+    DataBuffer image = DataBuffer::copyOf(text);
+    bytes = {};
+    const DataBuffer encoded = platform::base64encode(std::exchange(image, {}));
+    dataUri.reserve(dataUri.size() + encoded.length());
+    return dataUri.append(encoded.view());
 }
 
 }  // namespace EditorServices

@@ -12,8 +12,7 @@
 namespace EditorServices {
 
 using platform::DataBuffer;
-using platform::i18n::codecvt_string_to_ustring;
-using platform::i18n::codecvt_ustring_to_string;
+using platform::i18n::comesBackUnchanged;
 using platform::i18n::to_string;
 using platform::i18n::to_ustring;
 using platform::package::QuilletFilePackage;
@@ -23,6 +22,57 @@ namespace {
 
 std::vector<std::uint8_t> toBytes(std::string_view text) {
     return {text.begin(), text.end()};
+}
+
+void append(std::vector<std::uint8_t>& bytes, std::string_view text) {
+    bytes.insert(bytes.end(), text.begin(), text.end());
+}
+
+/// Whether a character that begins with `byte` in UTF-8 may be one that a package's text must not
+/// contain: a control code, or of U+0080 to U+00BF, U+2000 to U+2FFF or U+F000 to U+FFFF.
+constexpr bool isSuspect(char byte) {
+    const auto value = static_cast<unsigned char>(byte);
+    return (value < 0x20 && value != '\t' && value != '\n' && value != '\r') || value == 0x7F ||
+           value == 0xC2 || value == 0xE2 || value == 0xEF;
+}
+
+/// The place of the first suspect byte of `text` from `from` on; its size if there is none. Whole
+/// blocks without one, as nearly all are, take the compiler's vector instructions.
+std::size_t findSuspect(std::string_view text, std::size_t from) {
+    constexpr std::size_t blockSize = 64;
+    for (; text.size() - from >= blockSize; from += blockSize) {
+        bool found = false;
+        for (std::size_t i = 0; i < blockSize; ++i) {
+            found |= isSuspect(text[from + i]);
+        }
+        if (found) {
+            break;
+        }
+    }
+    while (from < text.size() && !isSuspect(text[from])) {
+        ++from;
+    }
+    return from;
+}
+
+struct Character {
+    char16_t unit;
+    std::size_t length;  // in bytes
+};
+
+/// The character that begins with the suspect byte at `at` of valid UTF-8.
+Character characterAt(std::string_view text, std::size_t at) {
+    const auto bits = [&](std::size_t i, unsigned mask) {
+        return static_cast<unsigned char>(text[at + i]) & mask;
+    };
+    if (bits(0, 0x80U) == 0) {
+        return {static_cast<char16_t>(bits(0, 0x7FU)), 1};
+    }
+    if (bits(0, 0x20U) == 0) {
+        return {static_cast<char16_t>(bits(0, 0x1FU) << 6U | bits(1, 0x3FU)), 2};
+    }
+    return {static_cast<char16_t>(bits(0, 0x0FU) << 12U | bits(1, 0x3FU) << 6U | bits(2, 0x3FU)),
+            3};
 }
 
 }  // namespace
@@ -108,16 +158,27 @@ std::vector<std::uint8_t> Serialization::decodePartContent(std::string content,
     return toBytes(content);
 }
 
+// The rule is about UTF-16 code units, but those that it replaces are few and easily told by their
+// UTF-8, and the way to UTF-16 and back takes many times longer than to look for them.
 std::vector<std::uint8_t> Serialization::cleanTextToUtf8(std::string text) const {
-    codecvt_string_to_ustring decoder("UTF-8", true);
-    std::u16string units = to_ustring(text, decoder);
-    for (char16_t& unit : units) {
-        if (isDisallowedControl(unit) || isNonCharacter(unit) || isZeroWidthSpace(unit)) {
-            unit = replacementChar;
-        }
+    if (!comesBackUnchanged(text, "UTF-8")) {
+        static_cast<void>(to_ustring(text));  // throws, and says where
     }
-    codecvt_ustring_to_string encoder("UTF-8", true);
-    return toBytes(to_string(units, encoder));
+    const std::string replacement = to_string(std::u16string_view(&replacementChar, 1));
+    std::vector<std::uint8_t> cleaned;
+    cleaned.reserve(text.size());
+    std::size_t done = 0;
+    for (std::size_t at = findSuspect(text, 0); at < text.size(); at = findSuspect(text, at)) {
+        const auto [unit, length] = characterAt(text, at);
+        if (isDisallowedControl(unit) || isNonCharacter(unit) || isZeroWidthSpace(unit)) {
+            append(cleaned, std::string_view(text).substr(done, at - done));
+            append(cleaned, replacement);
+            done = at + length;
+        }
+        at += length;
+    }
+    append(cleaned, std::string_view(text).substr(done));
+    return cleaned;
 }
 
 }  // namespace EditorServices

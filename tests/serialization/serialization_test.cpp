@@ -6,10 +6,12 @@
 #include <algorithm>
 #include <cstdint>
 #include <memory>
+#include <random>
 #include <string>
 #include <type_traits>
 #include <vector>
 
+#include "platform/i18n/codecvt.h"
 #include "platform/messaging/transport.h"
 
 namespace EditorServices {
@@ -111,6 +113,43 @@ TEST_F(SerializationTest, CleanedTextKeepsEveryOtherCodeUnit) {
     for (const std::string kept : {"\t", "\n", "\r", " ", "\xC2\xA0", "\xEF\xBF\xBD",
                                    "\xF0\x9F\x98\x80", "\xE2\x80\x8A", "\xE2\x80\x8C", ""}) {
         EXPECT_EQ(clean(service, kept), kept);
+    }
+}
+
+/// The rule as it is put: on UTF-16, code unit by code unit.
+std::string cleanedByUnits(const Serialization& service, const std::u16string& text) {
+    std::u16string units = text;
+    for (char16_t& unit : units) {
+        const bool disallowed = (unit <= 0x1F && unit != 9 && unit != 10 && unit != 13) ||
+                                (unit >= 0x7F && unit <= 0x9F) || unit >= 0xFFFE || unit == 0x200B;
+        unit = disallowed ? service.replacementChar : unit;
+    }
+    return platform::i18n::to_string(units);
+}
+
+TEST_F(SerializationTest, CleaningIsTheSameForEveryCodeUnitAmongOthers) {
+    for (const std::u16string around : {u"", u"ab", u"\u20AC", u"\xD83D\xDE00"}) {
+        for (unsigned unit = 0; unit <= 0xFFFF; ++unit) {
+            if (unit < 0xD800 || unit > 0xDFFF) {
+                const std::u16string text = around + static_cast<char16_t>(unit) + around;
+                ASSERT_EQ(clean(service, platform::i18n::to_string(text)),
+                          cleanedByUnits(service, text))
+                    << unit;
+            }
+        }
+    }
+}
+
+TEST_F(SerializationTest, CleaningIsTheSameAtEveryPlaceOfLongText) {
+    std::mt19937 random(5);
+    const std::u16string_view rare =
+        u"\x1F\t\x7F\x85\u00A0\u2009\u200B\u20AC\uFFFD\uFFFE\uFFFF\uF000";
+    for (int i = 0; i < 2000; ++i) {
+        std::u16string text(random() % 300, u'x');
+        for (std::size_t count = random() % 4; count > 0 && !text.empty(); --count) {
+            text[random() % text.size()] = rare[random() % rare.size()];
+        }
+        ASSERT_EQ(clean(service, platform::i18n::to_string(text)), cleanedByUnits(service, text));
     }
 }
 
