@@ -19,13 +19,16 @@
 #include "package_test_support.h"
 #include "platform/package/quillet_file_reader.h"
 #include "platform/package/quillet_file_writer.h"
-#include "system_call_supervisor.h"
+#include "tests/support/system_call_supervisor.h"
 
 namespace testing_package {
 namespace {
 
 using platform::package::QuilletFileReader;
 using platform::package::QuilletFileWriter;
+using test::callsOf;
+using test::canSupervise;
+using test::supervise;
 using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::IsEmpty;

@@ -4,7 +4,7 @@
 #include <functional>
 #include <vector>
 
-namespace testing_package {
+namespace test {
 
 /// Whether this system lets a process supervise its own system calls.
 bool canSupervise();
@@ -19,4 +19,4 @@ void supervise(const std::function<void()>& work,
 /// The numbers of the system calls that `work` makes.
 std::vector<int> callsOf(const std::function<void()>& work);
 
-}  // namespace testing_package
+}  // namespace test

@@ -1,6 +1,6 @@
 // The kernel's seccomp filters can hand system calls of a thread to a supervisor, who answers for
 // them or lets them continue. The filter here concerns only the thread that installs it.
-#include "system_call_supervisor.h"
+#include "tests/support/system_call_supervisor.h"
 
 #include <linux/filter.h>
 #include <linux/seccomp.h>
@@ -18,7 +18,7 @@
 #include <stdexcept>
 #include <thread>
 
-namespace testing_package {
+namespace test {
 namespace {
 
 // What allocators, locks and the end of a thread need. Failing those is not about files.
@@ -113,4 +113,4 @@ std::vector<int> callsOf(const std::function<void()>& work) {
     return calls;
 }
 
-}  // namespace testing_package
+}  // namespace test
