@@ -6,6 +6,7 @@
 #   lib/<"installpath" of the bundle's manifest>
 #   lib/cmake/EditorSerialization/
 #   include/editor_serialization/
+#   share/editor-serialization/nats/    configurations for nats-server
 
 include(CMakePackageConfigHelpers)
 
@@ -41,6 +42,9 @@ write_basic_package_version_file(
 install(FILES ${package_files} DESTINATION "${package_folder}")
 install(EXPORT EditorSerializationTargets
   NAMESPACE EditorSerialization:: DESTINATION "${package_folder}")
+
+install(DIRECTORY "${PROJECT_SOURCE_DIR}/packaging/nats"
+  DESTINATION "${CMAKE_INSTALL_DATADIR}/editor-serialization")
 
 set(CPACK_GENERATOR TGZ DEB)
 set(CPACK_PACKAGE_NAME editor-serialization)
