@@ -14,6 +14,7 @@
 #include <optional>
 #include <ostream>
 #include <stdexcept>
+#include <string>
 #include <vector>
 
 #include "platform/i18n/charset.h"
@@ -153,6 +154,11 @@ std::string findCharset(std::string_view bytes) {
 
 std::string detect_charset(const char* data, std::size_t length, std::ostream& diagnostics,
                            std::u16string_view sourceName) {
+    if (length > maxTextLength) {
+        throw std::runtime_error("The text is too large: " + std::to_string(length) +
+                                 " bytes, at most " + std::to_string(maxTextLength) +
+                                 " are accepted");
+    }
     const std::string charset = findCharset({data, length});
     if (!charset.empty()) {
         return charset;

@@ -8,11 +8,16 @@
 
 namespace platform::i18n {
 
+/// The longest text in bytes that detect_charset takes: 1 GiB. What becomes of a longer one, in
+/// UTF-16 and escaped for a message, does not fit the memory of most machines.
+inline constexpr std::size_t maxTextLength = std::size_t{1} << 30;
+
 /// The charset of the `length` bytes at `data`, by its IANA preferred name ("UTF-8", "Shift_JIS",
 /// "windows-1251"); always one that both converters accept and in which all the bytes decode
 /// strictly. A byte-order mark decides; empty, ASCII and valid UTF-8 input is "UTF-8"; what fits
 /// nothing is "ISO-8859-1", which holds every byte, and only then one line that names `sourceName`
-/// is written to `diagnostics`. Linear in `length`.
+/// is written to `diagnostics`. Throws std::runtime_error when `length` is above maxTextLength.
+/// Linear in `length`.
 std::string detect_charset(const char* data, std::size_t length, std::ostream& diagnostics,
                            std::u16string_view sourceName);
 

@@ -7,6 +7,7 @@
 #include <future>
 #include <random>
 #include <sstream>
+#include <stdexcept>
 #include <vector>
 
 #include "platform/i18n/candidates.h"
@@ -273,6 +274,15 @@ TEST(DetectCharset, MayBeCalledFromManyThreads) {
     for (std::size_t i = 0; i < answers.size(); ++i) {
         EXPECT_EQ(answers[i].get(), i % 2 == 0 ? "KOI8-R" : "EUC-JP");
     }
+}
+
+TEST(DetectCharset, RefusesTextThatIsTooLargeBeforeItLooksAtIt) {
+    // Nobody may read these bytes: there are none behind the first.
+    const char first = 'a';
+    std::ostringstream diagnostics;
+    EXPECT_THAT([&] { detect_charset(&first, maxTextLength + 1, diagnostics, u"text"); },
+                ::testing::ThrowsMessage<std::runtime_error>(
+                    "The text is too large: 1073741825 bytes, at most 1073741824 are accepted"));
 }
 
 TEST(LegacyCandidates, OpenInBothConvertersAndAreMadeForSomeLanguage) {
