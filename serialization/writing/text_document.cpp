@@ -3,7 +3,9 @@
 // Where that is known to change nothing, it is left out.
 
 #include <exception>
+#include <filesystem>
 #include <fstream>
+#include <system_error>
 #include <utility>
 
 #include "platform/filesystem/filesystem.h"
@@ -23,7 +25,13 @@ namespace {
 /// Returns whether it could be opened: clients have always been told only that.
 template <typename MakeBytes>
 bool overwrite(const std::u16string& path, MakeBytes makeBytes) {
-    std::ofstream file(make_native_access_form_with_cleanup(path), std::ios_base::out);
+    const std::string nativePath = make_native_access_form_with_cleanup(path);
+    std::error_code notExaminable;
+    if (std::filesystem::is_fifo(nativePath, notExaminable)) {
+        // Opening a pipe waits for someone to read it, who might never come.
+        return false;
+    }
+    std::ofstream file(nativePath, std::ios_base::out);
     const bool opened = file.is_open();
     if (opened) {
         const std::string& bytes = makeBytes();

@@ -1,4 +1,5 @@
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 
 #include <filesystem>
 #include <string>
@@ -85,6 +86,11 @@ TEST_F(TextDocumentWriting, ToAPathWithAZeroIsRefusedAndTouchesNothing) {
     cut += u'\0';
     EXPECT_FALSE(service.writeTextDocument(cut, "new", "UTF-8"));
     EXPECT_EQ(readFile(path), "old");
+}
+
+TEST_F(TextDocumentWriting, ToAPipeIsRefusedRatherThanWaitForAReader) {
+    ASSERT_EQ(::mkfifo(path.c_str(), 0600), 0);
+    EXPECT_FALSE(service.writeTextDocument(to_ustring(path.string()), "text", "UTF-8"));
 }
 
 TEST_F(TextDocumentWriting, IsDoneOnceTheFileCouldBeOpenedWhateverTheDeviceSays) {
