@@ -7,6 +7,7 @@
 #include <CLI/CLI.hpp>
 #include <chrono>
 #include <csignal>
+#include <cstdint>
 #include <exception>
 #include <filesystem>
 #include <iostream>
@@ -16,6 +17,7 @@
 #include "host/bundle_location.h"
 #include "host/exit_status.h"
 #include "host/file_descriptor.h"
+#include "host/memory_limit.h"
 #include "host/read_command.h"
 #include "host/standard_streams.h"
 #include "host/stdio_command.h"
@@ -27,6 +29,7 @@ constexpr const char* programName = "serialization_host";
 
 struct CommandLine {
     std::string logLevel = "warning";
+    std::uint64_t memoryLimit = LIMIT_MEMORY ? host::defaultMemoryLimit() : 0;
     std::filesystem::path bundle;
     host::ReadOptions read;
     host::StdioOptions stdio;
@@ -86,6 +89,11 @@ void declare(CLI::App& app, CommandLine& line) {
                    "What to tell on standard error (default: " + line.logLevel + ")")
         ->type_name("LEVEL")
         ->check(CLI::IsMember({"trace", "debug", "info", "warning", "error", "critical", "off"}));
+    app.add_option("--memory-limit", line.memoryLimit,
+                   "The most memory to take, in bytes or with a unit such as GB; what needs more "
+                   "fails (default: three quarters of the machine's; 0: no limit)")
+        ->type_name("SIZE")
+        ->transform(CLI::AsSizeValue(false));
     app.require_subcommand(1);
     app.fallthrough();
     declareRead(*app.add_subcommand("read", "Read files and print the response for each on a line"),
@@ -143,6 +151,9 @@ int runCommandLine(int argc, char** argv) {
         return explain(app, error, output.get());
     }
     setUpLogging(line.logLevel);
+    if (line.memoryLimit != 0) {
+        host::limitMemory(line.memoryLimit);
+    }
     return run(app, line, output.get());
 }
 
