@@ -13,6 +13,7 @@
 // White space may come after each of "{" "[" ":" ",", and before ":" "," "]" "}".
 #include "json/parser.h"
 
+#include <algorithm>
 #include <array>
 #include <charconv>
 #include <exception>
@@ -22,8 +23,9 @@
 #include <system_error>
 #include <utility>
 
-#include "json/byte_scan.h"
 #include "json/conversions.h"
+#include "json/string_kernels.h"
+#include "json/text_memory.h"
 #include "platform/i18n/ascii.h"
 
 namespace json {
@@ -60,8 +62,8 @@ Status parseUnit(Input& input, char16_t& unit) {
 }
 
 /// Parses what follows "\u": the digits of one unit, and after a high surrogate a second escape,
-/// whatever its unit.
-Status parseUnicodeEscape(Input& input, std::string& text) {
+/// whatever its unit. Writes the character to `out`, in no more bytes than it has read.
+Status parseUnicodeEscape(Input& input, char*& out) {
     std::array<char16_t, 2> units{};
     std::size_t count = 1;
     if (const Status status = parseUnit(input, units[0]); status != Status::success)
@@ -76,44 +78,54 @@ Status parseUnicodeEscape(Input& input, std::string& text) {
             return status;
         count = 2;
     }
-    text += u16_to_u8({units.data(), count});
+    const std::string character = u16_to_u8({units.data(), count});
+    out = std::copy(character.begin(), character.end(), out);
     return Status::success;
 }
 
-/// The character that an escape letter other than "u" stands for, or NUL for a letter that is none.
-char escapedCharacter(char letter) {
-    switch (letter) {
-        case '"':
-        case '/':
-        case '\\':
-            return letter;
-        case 'b':
-            return '\b';
-        case 'f':
-            return '\f';
-        case 'n':
-            return '\n';
-        case 'r':
-            return '\r';
-        case 't':
-            return '\t';
-        default:
-            return '\0';
+/// Parses string content with escapes up to `end`, which is within the input, and writes what it
+/// stands for to `out`. `outEnd` is as the kernel wants it.
+Status parseContent(Input& input, const char* end, char*& out, char* outEnd) {
+    const detail::StringKernels& kernels = detail::stringKernels();
+    for (;;) {
+        const auto copied = kernels.unescape(input.position, end, out, outEnd);
+        input.position = copied.in;
+        out = copied.out;
+        if (input.position == end)
+            return Status::success;
+        // The kernel leaves "\u" and all that is no escape.
+        ++input.position;
+        if (atEnd(input))
+            return Status::endOfInput;
+        if (!at(input, 'u'))
+            return Status::badEscape;
+        ++input.position;
+        if (const Status status = parseUnicodeEscape(input, out); status != Status::success)
+            return status;
     }
 }
 
-/// Parses what follows a backslash.
-Status parseEscape(Input& input, std::string& text) {
+/// Parses a string, of which the opening quote is there. After a fault `text` is undefined.
+Status parseQuoted(Input& input, std::string& text) {
+    const char* const start = ++input.position;
+    const detail::StringExtent extent = detail::stringKernels().measure(start, input.end);
+    const char* const end = extent.end;
+    Status status = Status::success;
+    if (extent.escapes == 0) {
+        text.assign(start, end);
+        input.position = end;
+    } else {
+        const std::size_t bound = static_cast<std::size_t>(end - start) - extent.escapes;
+        detail::overwrite(text, bound, [&](char* memory) {
+            char* out = memory;
+            status = parseContent(input, end, out, memory + bound);
+            return static_cast<std::size_t>(out - memory);
+        });
+    }
+    if (status != Status::success)
+        return status;
     if (atEnd(input))
         return Status::endOfInput;
-    if (*input.position == 'u') {
-        ++input.position;
-        return parseUnicodeEscape(input, text);
-    }
-    const char c = escapedCharacter(*input.position);
-    if (c == '\0')
-        return Status::badEscape;
-    text += c;
     ++input.position;
     return Status::success;
 }
@@ -320,7 +332,7 @@ Status TreeParser::startValue(Value& value) {
         return Status::endOfInput;
     switch (*input.position) {
         case '"':
-            return parseString(input, value.emplace<std::string>());
+            return parseQuoted(input, value.emplace<std::string>());
         case '-':
         case '0':
         case '1':
@@ -522,21 +534,11 @@ Status parseString(Input& input, std::string& target) {
         return Status::endOfInput;
     if (!at(input, '"'))
         return Status::notString;
-    ++input.position;
     std::string text;
-    for (;;) {
-        const char* const run = input.position;
-        input.position = detail::findFirst<detail::QuoteOrBackslash>(run, input.end);
-        text.append(run, input.position);
-        if (atEnd(input))
-            return Status::endOfInput;
-        if (*input.position++ == '"') {
-            target = std::move(text);
-            return Status::success;
-        }
-        if (const Status status = parseEscape(input, text); status != Status::success)
-            return status;
-    }
+    const Status status = parseQuoted(input, text);
+    if (status == Status::success)
+        target = std::move(text);
+    return status;
 }
 
 Status parseNumber(Input& input, double& target) {

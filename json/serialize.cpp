@@ -1,157 +1,221 @@
 // Writes a tree of values by walking it with a stack of its own, so that no depth can exhaust the
-// thread's.
+// thread's. The memory for the text is had at once, by an estimate of its length.
 #include "json/serialize.h"
 
+#include <algorithm>
 #include <charconv>
 #include <cmath>
 #include <iterator>
 #include <stack>
 #include <string_view>
 #include <type_traits>
-#include <utility>
 #include <variant>
 
-#include "json/byte_scan.h"
+#include "json/string_kernels.h"
+#include "json/text_memory.h"
 
 namespace json {
 namespace {
 
-void writeEscaped(std::string& out, char c) {
-    constexpr std::string_view hexadecimal = "0123456789abcdef";
-    switch (c) {
-        case '"':
-            out += "\\\"";
-            return;
-        case '\\':
-            out += "\\\\";
-            return;
-        case '\b':
-            out += "\\b";
-            return;
-        case '\f':
-            out += "\\f";
-            return;
-        case '\n':
-            out += "\\n";
-            return;
-        case '\r':
-            out += "\\r";
-            return;
-        case '\t':
-            out += "\\t";
-            return;
-        default:
-            out += "\\u00";
-            out += hexadecimal[static_cast<unsigned char>(c) >> 4];
-            out += hexadecimal[static_cast<unsigned char>(c) & 0xF];
-    }
-}
+// ---- Walking the tree ----
 
-void write(std::string& out, const std::string& text) {
-    out += '"';
-    const char* position = text.data();
-    const char* const end = position + text.size();
-    for (;;) {
-        const char* const special = detail::findFirst<detail::NeedsEscape>(position, end);
-        out.append(position, special);
-        if (special == end)
-            break;
-        writeEscaped(out, *special);
-        position = special + 1;
-    }
-    out += '"';
-}
-
-void write(std::string& out, Undefined) {
-    out += "null";
-}
-
-void write(std::string& out, Null) {
-    out += "null";
-}
-
-void write(std::string& out, bool value) {
-    out += value ? "true" : "false";
-}
-
-template <typename Number>
-requires std::is_arithmetic_v<Number>
-void write(std::string& out, Number number) {
-    if constexpr (std::is_floating_point_v<Number>) {
-        if (!std::isfinite(number)) {
-            write(out, Null());
-            return;
-        }
-    }
-    char text[32];
-    const auto result = std::to_chars(std::begin(text), std::end(text), number);
-    out.append(text, result.ptr);
-}
-
-class TreeWriter {
+/// Hands the parts of a tree to `Visitor` in the order of the text: `open`, `close`, `comma`,
+/// `key`, and `leaf` with what is held by each value that is no container.
+template <typename Visitor>
+class TreeWalk {
 public:
-    std::string write(const Value& root) {
+    explicit TreeWalk(Visitor& target) : visitor(target) {}
+
+    void walk(const Value& root) {
         start(root);
         while (!open.empty())
-            std::visit([this](auto& container) { continueContainer(container); }, open.top());
-        return std::move(out);
+            std::visit([this](auto& container) { this->goOn(container); }, open.top());
     }
 
 private:
-    /// An array or object of which the elements before `next` have been written.
+    /// An array or object of which the elements before `next` have been visited.
     template <typename Container>
     struct Open {
         const Container* container;
         typename Container::const_iterator next;
     };
 
-    /// Writes a value whole, or the opening of an array or object.
+    template <typename Container>
+    static constexpr bool isArray = std::is_same_v<Container, Array>;
+
+    /// Visits a value whole, or the opening of an array or object.
     void start(const Value& value) {
-        value.visit([this](const auto& held) { start(held); });
-    }
-
-    void start(const Array& array) {
-        out += '[';
-        open.emplace(Open<Array>{&array, array.begin()});
-    }
-
-    void start(const Object& object) {
-        out += '{';
-        open.emplace(Open<Object>{&object, object.begin()});
+        value.visit([this](const auto& held) {
+            using Held = std::remove_cvref_t<decltype(held)>;
+            if constexpr (isArray<Held> || std::is_same_v<Held, Object>) {
+                visitor.open(isArray<Held> ? '[' : '{');
+                open.emplace(Open<Held>{&held, held.begin()});
+            } else {
+                visitor.leaf(held);
+            }
+        });
     }
 
     void start(const Object::value_type& member) {
-        json::write(out, member.first);
-        out += ':';
+        visitor.key(member.first);
         start(member.second);
     }
 
-    template <HeldType Leaf>
-    void start(const Leaf& leaf) {
-        json::write(out, leaf);
-    }
-
-    /// Writes the start of the next element, or the closing after the last.
+    /// Visits elements up to the first that is itself left open, or the closing after the last.
     template <typename Container>
-    void continueContainer(Open<Container>& current) {
-        if (current.next == current.container->end()) {
-            out += std::is_same_v<Container, Array> ? ']' : '}';
-            open.pop();
-            return;
+    void goOn(Open<Container>& current) {
+        const std::size_t depth = open.size();
+        while (current.next != current.container->end()) {
+            if (current.next != current.container->begin())
+                visitor.comma();
+            start(*current.next++);
+            if (open.size() != depth)
+                return;
         }
-        if (current.next != current.container->begin())
-            out += ',';
-        start(*current.next++);
+        visitor.close(isArray<Container> ? ']' : '}');
+        open.pop();
     }
 
-    std::string out;
+    Visitor& visitor;
     std::stack<std::variant<Open<Array>, Open<Object>>> open;
+};
+
+// ---- Estimating the length ----
+
+/// Adds up about how long the text of a tree gets.
+class Estimate {
+public:
+    void open(char) { ++length; }
+    void close(char) { ++length; }
+    void comma() { ++length; }
+
+    void key(const std::string& name) {
+        leaf(name);
+        ++length;
+    }
+
+    void leaf(const std::string& text) { length += text.size() + escapesOf(text) + 2; }
+
+    template <typename Leaf>
+    void leaf(const Leaf&) {
+        constexpr std::size_t usualNumber = 12;
+        length += usualNumber;
+    }
+
+    // Some more than nothing, since what is written last wants room for the longest that it could
+    // be.
+    std::size_t length = 64;
+
+private:
+    /// The number of bytes that need an escape; of a long text about that, by samples of it.
+    static std::size_t escapesOf(const std::string& text) {
+        constexpr std::size_t samples = 4;
+        constexpr std::size_t sampleSize = 1024;
+        const auto count = [&text](std::size_t at, std::size_t size) {
+            return detail::stringKernels().countEscapes(text.data() + at, text.data() + at + size);
+        };
+        if (text.size() <= samples * sampleSize)
+            return count(0, text.size());
+        std::size_t escapes = 0;
+        for (std::size_t i = 0; i < samples; ++i)
+            escapes += count((text.size() - sampleSize) / (samples - 1) * i, sampleSize);
+        constexpr std::size_t margin = 32;
+        return text.size() / (samples * sampleSize) * escapes + text.size() / margin;
+    }
+};
+
+// ---- Writing ----
+
+class Writer {
+public:
+    /// `memory` gets the text; it is enlarged where `estimate` turns out too low.
+    Writer(std::string& memory, std::size_t estimate) : text(memory) { enlarge(estimate); }
+
+    void open(char c) { put(c); }
+    void close(char c) { put(c); }
+    void comma() { put(','); }
+
+    void key(const std::string& name) {
+        leaf(name);
+        put(':');
+    }
+
+    void leaf(Undefined) { put("null"); }
+    void leaf(Null) { put("null"); }
+    void leaf(bool value) { put(value ? "true" : "false"); }
+
+    void leaf(const std::string& string) {
+        put('"');
+        const char* in = string.data();
+        const char* const last = in + string.size();
+        for (;;) {
+            const auto copied = detail::stringKernels().escape(in, last, position, end);
+            in = copied.in;
+            position = copied.out;
+            if (in == last)
+                break;
+            require(detail::maxEscapeLength);
+        }
+        put('"');
+    }
+
+    template <typename Number>
+    requires std::is_arithmetic_v<Number>
+    void leaf(Number number) {
+        if constexpr (std::is_floating_point_v<Number>) {
+            if (!std::isfinite(number))
+                return leaf(Null());
+        }
+        constexpr std::ptrdiff_t longestNumber = 32;
+        require(longestNumber);
+        position = std::to_chars(position, end, number).ptr;
+    }
+
+    /// Ends the text.
+    void finish() { text.resize(length()); }
+
+private:
+    std::size_t length() const { return static_cast<std::size_t>(position - text.data()); }
+
+    void put(char c) {
+        require(1);
+        *position++ = c;
+    }
+
+    void put(std::string_view literal) {
+        require(std::ssize(literal));
+        position = std::copy(literal.begin(), literal.end(), position);
+    }
+
+    /// Makes room for `count` more bytes.
+    void require(std::ptrdiff_t count) {
+        if (end - position < count)
+            enlarge(static_cast<std::size_t>(count));
+    }
+
+    void enlarge(std::size_t count) {
+        const std::size_t used = end == nullptr ? 0 : length();
+        const std::size_t size = used + std::max(count, used / 2);
+        detail::overwrite(text, size, [size](char*) { return size; });
+        position = text.data() + used;
+        end = text.data() + text.size();
+    }
+
+    std::string& text;
+    char* position = nullptr;
+    char* end = nullptr;  // of the memory
 };
 
 }  // namespace
 
 std::string serialize(const Value& value) {
-    return TreeWriter().write(value);
+    Estimate estimate;
+    TreeWalk(estimate).walk(value);
+    std::string text;
+    Writer writer(text, estimate.length);
+    TreeWalk(writer).walk(value);
+    writer.finish();
+    return text;
 }
 
 }  // namespace json

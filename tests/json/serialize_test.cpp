@@ -63,6 +63,24 @@ TEST(Serialize, EscapesAtEveryPlaceOfALongString) {
     }
 }
 
+TEST(Serialize, WritesTextsThatAreFarLongerThanTheirFirstBytesSuggest) {
+    const std::string plain(100'000, 'a');
+    const std::string controls(100'000, '\1');
+    std::string escaped;
+    for (std::size_t i = 0; i < controls.size(); ++i)
+        escaped += "\\u0001";
+    EXPECT_EQ(serialize(controls), '"' + escaped + '"');
+    EXPECT_EQ(serialize(plain + controls + plain), '"' + plain + escaped + plain + '"');
+    EXPECT_EQ(serialize(Array{controls, plain}), "[\"" + escaped + "\",\"" + plain + "\"]");
+
+    // Longer than the usual number, and many of them.
+    const double number = -1.2345678901234567e-308;
+    std::string numbers = "[-1.2345678901234567e-308";
+    for (int i = 1; i < 1000; ++i)
+        numbers += ",-1.2345678901234567e-308";
+    EXPECT_EQ(serialize(Array(1000, number)), numbers + "]");
+}
+
 TEST(Serialize, EscapesKeysAsStrings) {
     EXPECT_EQ(serialize(Object{{"a\"\n", true}}), R"({"a\"\n":true})");
 }
