@@ -9,6 +9,7 @@ pkg_check_modules(libdeflate REQUIRED IMPORTED_TARGET libdeflate)
 find_package(pugixml REQUIRED)
 find_package(OpenSSL REQUIRED COMPONENTS Crypto)
 find_package(CLI11 REQUIRED)
+pkg_check_modules(libnats REQUIRED IMPORTED_TARGET libnats)
 find_package(spdlog REQUIRED)
 
 # The real bundle framework is used where it is installed; framework/ stands in for it elsewhere.
