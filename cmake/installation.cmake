@@ -22,6 +22,7 @@ foreach(header IN ITEMS
     platform/data_buffer.h
     platform/messaging/in_process_bus.h
     platform/messaging/message_service.h
+    platform/messaging/nats/nats_bus.h
     platform/messaging/transport.h)
   cmake_path(GET header PARENT_PATH folder)
   install(FILES "${PROJECT_SOURCE_DIR}/${header}" DESTINATION "${header_folder}/${folder}")

@@ -5,16 +5,15 @@
 
 #include <algorithm>
 #include <condition_variable>
-#include <exception>
 #include <mutex>
 #include <stdexcept>
-#include <thread>
-#include <type_traits>
 #include <unordered_map>
 #include <utility>
 
 #include "platform/messaging/delivery_queue.h"
+#include "platform/messaging/delivery_threads.h"
 #include "platform/messaging/log.h"
+#include "platform/messaging/resolved.h"
 #include "platform/messaging/revocable_function.h"
 
 namespace platform::messaging {
@@ -94,24 +93,6 @@ private:
 
 using ObserverFunction = RevocableFunction<std::string_view, const JsonMessage&>;
 
-// The resolved future of what `make` returns or throws.
-template <typename Make>
-auto resolved(Make&& make) {
-    using Result = std::invoke_result_t<Make>;
-    futures::Promise<Result> promise;
-    try {
-        if constexpr (std::is_void_v<Result>) {
-            make();
-            promise.setValue();
-        } else {
-            promise.setValue(make());
-        }
-    } catch (...) {
-        promise.setException(std::current_exception());
-    }
-    return promise.getFuture();
-}
-
 template <typename T>
 void eraseFrom(std::vector<std::shared_ptr<T>>& list, const std::shared_ptr<T>& item) {
     list.erase(std::remove(list.begin(), list.end(), item), list.end());
@@ -140,7 +121,6 @@ private:
     using Queues = std::vector<std::shared_ptr<DeliveryQueue>>;
     using Observers = std::vector<std::shared_ptr<ObserverFunction>>;
 
-    std::size_t threadsFor(const std::string& channel) const;
     Queues queuesOf(const std::string& channel);
     Observers observers();
 
@@ -158,7 +138,9 @@ public:
                         MessageHandler handler)
         : core_(std::move(core)),
           channel_(channel),
-          queue_(std::make_shared<DeliveryQueue>(std::move(handler), core_->threadsFor(channel))) {}
+          queue_(std::make_shared<DeliveryQueue>(
+              std::move(handler), deliveryThreadCount(channel, core_->options_.concurrentChannels,
+                                                      core_->options_.concurrency))) {}
 
     void begin() {
         const std::lock_guard lock(core_->mutex_);
@@ -274,16 +256,6 @@ void InProcessBus::Core::publish(std::string_view clientName, const std::string&
     for (const auto& queue : queues) {
         queue->push({message, queued, busy});
     }
-}
-
-std::size_t InProcessBus::Core::threadsFor(const std::string& channel) const {
-    const auto& concurrent = options_.concurrentChannels;
-    if (std::find(concurrent.begin(), concurrent.end(), channel) == concurrent.end()) {
-        return 1;
-    }
-    return options_.concurrency != 0
-               ? options_.concurrency
-               : std::max<std::size_t>(2, std::thread::hardware_concurrency());
 }
 
 InProcessBus::Core::Queues InProcessBus::Core::queuesOf(const std::string& channel) {

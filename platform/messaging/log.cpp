@@ -16,17 +16,17 @@ std::shared_ptr<spdlog::logger> findOrCreateLogger() {
     return logger ? logger : spdlog::stderr_logger_mt("messaging");
 }
 
-spdlog::logger& logger() {
-    // Never destroyed: delivery threads may outlive the static objects of a process that exits.
-    static const auto& instance = *new std::shared_ptr<spdlog::logger>(findOrCreateLogger());
-    return *instance;
-}
-
 void logError(std::string_view callback, std::string_view channel, std::string_view reason) {
     logger().error("The {} of channel \"{}\" failed: {}", callback, channel, reason);
 }
 
 }  // namespace
+
+spdlog::logger& logger() {
+    // Never destroyed: delivery threads may outlive the static objects of a process that exits.
+    static const auto& instance = *new std::shared_ptr<spdlog::logger>(findOrCreateLogger());
+    return *instance;
+}
 
 void logFailure(std::string_view callback, std::string_view channel) noexcept {
     try {

@@ -1,9 +1,15 @@
 // The messaging library's log.
 #pragma once
 
+#include <spdlog/fwd.h>
+
 #include <string_view>
 
 namespace platform::messaging {
+
+/// The logger "messaging": one of that name that exists already, or else one that writes to
+/// standard error. Valid for as long as the process lives.
+spdlog::logger& logger();
 
 /// Logs the exception that is being handled as the failure of `callback` ("handler", "observer")
 /// with a message on `channel`. To be called in a catch block.

@@ -22,17 +22,23 @@ class JsonMessage {
 public:
     JsonMessage(std::shared_ptr<const std::string> channel,
                 std::shared_ptr<const DataBuffer> payload)
-        : channel_(std::move(channel)), payload_(std::move(payload)) {}
+        : channel_(std::move(channel)), payload_(payload->view()), owner_(std::move(payload)) {}
+
+    /// A message of bytes that are valid as long as `owner` lives.
+    JsonMessage(std::shared_ptr<const std::string> channel, std::string_view payload,
+                std::shared_ptr<const void> owner)
+        : channel_(std::move(channel)), payload_(payload), owner_(std::move(owner)) {}
 
     /// The channel on which the message was published.
     std::string_view channel() const noexcept { return *channel_; }
 
     /// The message's bytes. Valid as long as a copy of the message lives.
-    std::string_view payload() const noexcept { return payload_->view(); }
+    std::string_view payload() const noexcept { return payload_; }
 
 private:
     std::shared_ptr<const std::string> channel_;
-    std::shared_ptr<const DataBuffer> payload_;
+    std::string_view payload_;
+    std::shared_ptr<const void> owner_;
 };
 
 using MessageHandler = std::function<void(const JsonMessage&)>;

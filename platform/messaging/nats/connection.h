@@ -1,0 +1,50 @@
+// Connections to NATS servers.
+#pragma once
+
+#include <cstdint>
+#include <string>
+
+#include "platform/messaging/nats/handles.h"
+#include "platform/messaging/nats/nats_bus.h"
+
+namespace platform::messaging::nats {
+
+/// Is told of what happens to connections, on a thread of libnats. Must not throw.
+class ConnectionEvents {
+public:
+    ConnectionEvents() = default;
+    ConnectionEvents(const ConnectionEvents&) = delete;
+    ConnectionEvents& operator=(const ConnectionEvents&) = delete;
+    virtual ~ConnectionEvents() = default;
+
+    /// `reason`: what libnats knows of it.
+    virtual void onDisconnected(const std::string& reason) = 0;
+    virtual void onReconnected(const std::string& server) = 0;
+
+    /// The connection is given up for good.
+    virtual void onClosed(const std::string& reason) = 0;
+
+    /// A server refused something, or messages are dropped: then `subscription` tells where, which
+    /// may be gone by now and must not be used but for comparison.
+    virtual void onError(natsStatus status, const std::string& reason,
+                         const natsSubscription* subscription) = 0;
+};
+
+/// Connects to one of the servers, waiting for its welcome, and tries each once. From then on
+/// libnats restores the connection until a server refuses it. `listener`: the number under which
+/// the events are registered. Throws NatsError.
+ConnectionHandle openConnection(const NatsOptions& options, const std::string& name,
+                                std::uintptr_t listener);
+
+/// The server that `connection` is connected to, without what a URL may hold in secrets.
+std::string serverOf(natsConnection* connection);
+
+/// The URLs without user names, passwords and tokens, for people to read.
+std::string withoutSecrets(const std::vector<std::string>& urls);
+
+/// Registers `events` for the connections that are opened with the number returned, until
+/// `forget`. What a late event of a closed connection concerns may thus be gone.
+std::uintptr_t listen(const std::weak_ptr<ConnectionEvents>& events);
+void forget(std::uintptr_t listener);
+
+}  // namespace platform::messaging::nats

@@ -1,0 +1,105 @@
+// The message bus past the process: channels are subjects of NATS servers.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "futures/future.h"
+#include "platform/messaging/message_service.h"
+
+namespace platform::messaging {
+
+/// The servers of a bus, how it identifies itself to them, and how it delivers.
+struct NatsOptions {
+    /// URLs, such as "nats://127.0.0.1:4222"; tried in random order. One that begins with "tls://"
+    /// turns TLS on. Servers of the same cluster are learned from those that are reached.
+    std::vector<std::string> servers;
+
+    /// What the servers ask for; empty: not used. The file holds a user's JWT and seed.
+    std::string credentialsFile;
+    std::string token;
+    std::string user;
+    std::string password;
+
+    struct Tls {
+        bool enabled = false;
+
+        /// PEM files. Without authorities of one's own the system's count; certificate and key are
+        /// this client's own, for servers that ask for them.
+        std::string caFile;
+        std::string certificateFile;
+        std::string keyFile;
+    };
+    Tls tls;
+
+    /// How long the first `connect` goes on trying when no server can be reached; zero: each server
+    /// is tried once.
+    std::chrono::milliseconds connectTimeout{0};
+
+    /// The queue group that subscriptions on `queueChannels` join, so that each message goes to one
+    /// member of the group; empty: none.
+    std::string queueGroup;
+    std::vector<std::string> queueChannels;
+
+    /// As those of InProcessBusOptions.
+    std::vector<std::string> concurrentChannels;
+    std::size_t concurrency = 0;
+
+    /// Bound on the payload bytes that wait in the process for the handler of one subscription. A
+    /// message past it is dropped and the log tells of it.
+    std::size_t maxPendingBytes = std::size_t{256} << 20;
+
+    /// Bound on the bytes that are published while no server is reached, and sent when one is. The
+    /// message that takes them past it is still taken.
+    std::size_t maxUnsentBytes = std::size_t{64} << 20;
+};
+
+/// A bus over NATS servers: channels are subjects, verbatim. Messages are delivered at most once.
+///
+/// Each subscription has threads of its own, which are started by `subscribe`; all other threads
+/// come from the first `connect`. The futures of the operations are resolved when they are
+/// returned.
+///
+/// When the connection is lost, another is made to the same server or the next one, for as long as
+/// it takes, and the subscriptions are made again. A publish future holds an exception when the
+/// channel is no valid subject (white space, empty), when the message is larger than the server
+/// takes, and when it cannot be sent; it does not tell whether anyone got the message.
+///
+/// Losses of the connection, dropped messages, messages that were not published and failures of
+/// handlers are logged to spdlog's logger "messaging", as by InProcessBus.
+class [[gnu::visibility("default")]] NatsBus {
+public:
+    /// A bus that is not connected yet. Does not touch the network.
+    static std::shared_ptr<NatsBus> create(NatsOptions options);
+
+    NatsBus(const NatsBus&) = delete;
+    NatsBus& operator=(const NatsBus&) = delete;
+
+    /// Clients and subscriptions work on.
+    ~NatsBus();
+
+    /// A client of the bus. The first call connects to a server, under the name `clientName`;
+    /// later clients share that connection. The future holds an exception when no server can be
+    /// reached, or one refuses the connection.
+    futures::Future<std::shared_ptr<MessageService>> connect(const std::string& clientName);
+
+    /// True while the connection to a server stands.
+    bool isConnected() const;
+
+    /// Ends the bus in good order: unsubscribes at the server, has the handlers finish the messages
+    /// that were taken, sends what they published, and closes the connection. Returns false when
+    /// that took longer than `timeout`, and what was left is given up. From then on every operation
+    /// fails. Also ends a `connect` that is still trying. Must not be called from a handler.
+    bool drain(std::chrono::milliseconds timeout);
+
+private:
+    class [[gnu::visibility("hidden")]] Core;
+    [[gnu::visibility("hidden")]] explicit NatsBus(std::shared_ptr<Core> core);
+
+    std::shared_ptr<Core> core_;
+};
+
+}  // namespace platform::messaging

@@ -1,0 +1,161 @@
+// The delivery threads take turns: one waits in libnats while the others run the handler or queue
+// up behind it. A message thus wakes one thread, the one that handles it.
+#include "platform/messaging/nats/nats_source.h"
+
+#include <spdlog/logger.h>
+
+#include <algorithm>
+#include <limits>
+#include <string_view>
+#include <utility>
+
+#include "platform/messaging/log.h"
+#include "platform/messaging/nats/subject.h"
+
+namespace platform::messaging::nats {
+namespace {
+
+// libnats wants some time limit.
+constexpr std::int64_t oneHourInMilliseconds = 3'600'000;
+
+QueuedMessage makeMessage(std::shared_ptr<const std::string> channel, natsMsg* received) {
+    const std::shared_ptr<natsMsg> owner(received, Destroy());
+    const std::string_view payload(natsMsg_GetData(received),
+                                   static_cast<std::size_t>(natsMsg_GetDataLength(received)));
+    return {JsonMessage(std::move(channel), payload, owner), nullptr, nullptr};
+}
+
+}  // namespace
+
+NatsSource::NatsSource(const std::string& channel, std::string queueGroup,
+                       std::size_t maxPendingBytes, std::size_t threads)
+    : channel_(std::make_shared<const std::string>(channel)),
+      queueGroup_(std::move(queueGroup)),
+      maxPendingBytes_(static_cast<int>(
+          std::clamp<std::size_t>(maxPendingBytes, 1, std::numeric_limits<int>::max()))),
+      threads_(threads) {}
+
+void NatsSource::attach(natsConnection* connection) {
+    natsSubscription* made = nullptr;
+    check(queueGroup_.empty() ? natsConnection_SubscribeSync(&made, connection, channel_->c_str())
+                              : natsConnection_QueueSubscribeSync(
+                                    &made, connection, channel_->c_str(), queueGroup_.c_str()),
+          "Cannot subscribe channel \"" + printable(*channel_) + "\"");
+    SubscriptionHandle subscription(made, Destroy());
+    natsSubscription_SetPendingLimits(made, -1, maxPendingBytes_);
+    {
+        const std::lock_guard lock(mutex_);
+        if (!finishing_) {
+            subscription_.swap(subscription);
+            loggedDrops_ = 0;
+        }
+    }
+    changed_.notify_all();
+}
+
+std::optional<QueuedMessage> NatsSource::next() {
+    const std::lock_guard turn(taking_);
+    while (const SubscriptionHandle subscription = waitForSubscription()) {
+        natsMsg* message = nullptr;
+        switch (natsSubscription_NextMsg(&message, subscription.get(), oneHourInMilliseconds)) {
+            case NATS_OK:
+                return makeMessage(channel_, message);
+            case NATS_TIMEOUT:
+            case NATS_NO_RESPONDERS:  // a message that says no more than that
+                break;
+            case NATS_SLOW_CONSUMER:
+                reportDropped(subscription.get());
+                break;
+            default:  // it ended, or was drained, or its connection is closed
+                detach(subscription);
+        }
+    }
+    return std::nullopt;
+}
+
+SubscriptionHandle NatsSource::waitForSubscription() {
+    std::unique_lock lock(mutex_);
+    changed_.wait(lock, [this] { return subscription_ || finishing_; });
+    if (!subscription_) {
+        ++finishedThreads_;
+        changed_.notify_all();
+    }
+    return subscription_;
+}
+
+void NatsSource::detach(const SubscriptionHandle& subscription) {
+    const std::lock_guard lock(mutex_);
+    if (subscription_ == subscription) {
+        subscription_.reset();
+    }
+}
+
+void NatsSource::end() {
+    SubscriptionHandle subscription;  // let go without the mutex
+    {
+        const std::lock_guard lock(mutex_);
+        finishing_ = true;
+        logDropped(std::chrono::seconds(0));
+        subscription.swap(subscription_);
+    }
+    changed_.notify_all();
+    if (subscription) {
+        natsSubscription_Unsubscribe(subscription.get());
+    }
+}
+
+void NatsSource::drain(bool connected) {
+    SubscriptionHandle subscription;
+    {
+        const std::lock_guard lock(mutex_);
+        finishing_ = true;
+        logDropped(std::chrono::seconds(0));
+        subscription = subscription_;
+    }
+    changed_.notify_all();
+    if (!subscription) {
+        return;
+    }
+    // Draining asks the server, which takes seconds to fail when there is none.
+    int waiting = 0;
+    if (!connected &&
+        (natsSubscription_GetPending(subscription.get(), &waiting, nullptr) != NATS_OK ||
+         waiting == 0)) {
+        natsSubscription_Unsubscribe(subscription.get());
+    } else {
+        // Without a time limit of its own, past which it would drop messages.
+        natsSubscription_DrainTimeout(subscription.get(), -1);
+    }
+}
+
+bool NatsSource::waitUntilDrained(std::chrono::steady_clock::time_point deadline) {
+    std::unique_lock lock(mutex_);
+    return changed_.wait_until(lock, deadline, [this] { return finishedThreads_ == threads_; });
+}
+
+bool NatsSource::reportDropped(const natsSubscription* subscription) {
+    const std::lock_guard lock(mutex_);
+    if (subscription_.get() != subscription) {
+        return false;
+    }
+    logDropped(std::chrono::seconds(1));  // a flood of messages shall not be one of lines
+    return true;
+}
+
+// The mutex is held.
+void NatsSource::logDropped(std::chrono::steady_clock::duration minimalGap) {
+    std::int64_t dropped = 0;
+    const auto now = std::chrono::steady_clock::now();
+    if (natsSubscription_GetDropped(subscription_.get(), &dropped) != NATS_OK ||
+        dropped == loggedDrops_ || now < lastDropLog_ + minimalGap) {
+        return;
+    }
+    loggedDrops_ = dropped;
+    lastDropLog_ = now;
+    logger().error(
+        "Slow consumer: the messages on channel \"{}\" come faster than they are handled, and {} "
+        "bytes may wait; {} messages have been dropped so far.",
+        printable(*channel_), maxPendingBytes_, dropped);
+}
+
+}  // namespace platform::messaging::nats

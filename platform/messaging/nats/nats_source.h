@@ -1,0 +1,65 @@
+// A subscription at a NATS server, as the source of its delivery threads.
+#pragma once
+
+#include <chrono>
+#include <condition_variable>
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+
+#include "platform/messaging/delivery_threads.h"
+#include "platform/messaging/nats/handles.h"
+
+namespace platform::messaging::nats {
+
+/// Takes the messages of a channel straight from libnats, on the delivery threads themselves. It
+/// outlives connections: each new one is made known with `attach`.
+class NatsSource final : public MessageSource {
+public:
+    /// `threads`: how many threads call `next`.
+    NatsSource(const std::string& channel, std::string queueGroup, std::size_t maxPendingBytes,
+               std::size_t threads);
+
+    /// Subscribes on `connection`, in the place of an earlier one that is closed. Nothing happens
+    /// after `end` or `drain`. Throws NatsError.
+    void attach(natsConnection* connection);
+
+    std::optional<QueuedMessage> next() override;
+    void end() override;
+
+    /// Unsubscribes at the server, and has `next` return none once the messages that were taken are
+    /// handed out. Does not wait.
+    void drain(bool connected);
+
+    /// Waits until all threads have been told that there are no more messages, by which they have
+    /// finished those that they had. Returns false when `deadline` comes first.
+    bool waitUntilDrained(std::chrono::steady_clock::time_point deadline);
+
+    /// Logs that messages were dropped when `subscription` is this source's; returns whether it is.
+    bool reportDropped(const natsSubscription* subscription);
+
+private:
+    SubscriptionHandle waitForSubscription();
+    void detach(const SubscriptionHandle& subscription);
+    void logDropped(std::chrono::steady_clock::duration minimalGap);
+
+    const std::shared_ptr<const std::string> channel_;
+    const std::string queueGroup_;
+    const int maxPendingBytes_;
+    const std::size_t threads_;
+
+    std::mutex taking_;  // held by the one thread that waits for a message
+
+    std::mutex mutex_;  // guards what follows
+    std::condition_variable changed_;
+    SubscriptionHandle subscription_;  // none: between connections, or when there is no more
+    bool finishing_ = false;           // no other subscription will come
+    std::size_t finishedThreads_ = 0;
+    std::int64_t loggedDrops_ = 0;  // of the subscription that stands
+    std::chrono::steady_clock::time_point lastDropLog_;
+};
+
+}  // namespace platform::messaging::nats

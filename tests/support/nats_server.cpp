@@ -1,0 +1,133 @@
+#include "tests/support/nats_server.h"
+
+#include <arpa/inet.h>
+#include <fcntl.h>
+#include <netinet/in.h>
+#include <signal.h>
+#include <sys/prctl.h>
+#include <sys/socket.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <chrono>
+#include <fstream>
+#include <iterator>
+#include <stdexcept>
+#include <system_error>
+#include <thread>
+
+#include "host/file_descriptor.h"
+
+namespace test {
+namespace {
+
+sockaddr_in loopback(int port) {
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    address.sin_port = htons(static_cast<std::uint16_t>(port));
+    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    return address;
+}
+
+host::FileDescriptor makeSocket() {
+    host::FileDescriptor made(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    if (made.get() < 0) {
+        throw std::system_error(errno, std::generic_category(), "no socket can be made");
+    }
+    return made;
+}
+
+bool takesConnections(int port) {
+    const host::FileDescriptor probe = makeSocket();
+    const sockaddr_in address = loopback(port);
+    return ::connect(probe.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
+}
+
+}  // namespace
+
+int freePort() {
+    const host::FileDescriptor probe = makeSocket();
+    sockaddr_in address = loopback(0);
+    socklen_t size = sizeof address;
+    if (::bind(probe.get(), reinterpret_cast<const sockaddr*>(&address), size) != 0 ||
+        ::getsockname(probe.get(), reinterpret_cast<sockaddr*>(&address), &size) != 0) {
+        throw std::system_error(errno, std::generic_category(), "no port is free");
+    }
+    return ntohs(address.sin_port);
+}
+
+NatsServer::NatsServer(const std::string& configuration)
+    : configuration_(configuration), port_(freePort()) {
+    start();
+}
+
+NatsServer::~NatsServer() {
+    kill();
+}
+
+void NatsServer::start() {
+    const std::string file = folder_ / "server.conf";
+    const std::string log = folder_ / "log";
+    std::ofstream(file) << "listen: \"127.0.0.1:" << port_ << "\"\n" << configuration_ << '\n';
+    const pid_t parent = ::getpid();
+    id_ = ::fork();
+    if (id_ < 0) {
+        throw std::system_error(errno, std::generic_category(), "nats-server cannot be started");
+    }
+    if (id_ == 0) {
+        // Only what is safe after a fork of a program with threads.
+        ::prctl(PR_SET_PDEATHSIG, SIGKILL);
+        if (::getppid() != parent) {
+            ::_exit(1);
+        }
+        ::execlp("nats-server", "nats-server", "-c", file.c_str(), "-l", log.c_str(), nullptr);
+        ::execl("/usr/sbin/nats-server", "nats-server", "-c", file.c_str(), "-l", log.c_str(),
+                nullptr);
+        ::_exit(127);
+    }
+    waitUntilReady();
+}
+
+void NatsServer::startWith(const std::string& configuration) {
+    configuration_ = configuration;
+    start();
+}
+
+void NatsServer::waitUntilReady() {
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
+    while (!takesConnections(port_)) {
+        int status = 0;
+        if (::waitpid(id_, &status, WNOHANG) == id_) {
+            id_ = -1;
+            throw std::runtime_error("nats-server ended at once: " + log());
+        }
+        if (std::chrono::steady_clock::now() > deadline) {
+            throw std::runtime_error("nats-server takes no connections: " + log());
+        }
+        std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    }
+}
+
+void NatsServer::kill() {
+    if (isRunning()) {
+        ::kill(id_, SIGKILL);
+        ::waitpid(id_, nullptr, 0);
+        id_ = -1;
+    }
+}
+
+void NatsServer::pause() {
+    ::kill(id_, SIGSTOP);
+}
+
+void NatsServer::resume() {
+    ::kill(id_, SIGCONT);
+}
+
+std::string NatsServer::log() const {
+    std::ifstream file(folder_ / "log");
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+}  // namespace test
