@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <array>
 #include <stdexcept>
+#include <utility>
 
 #include "platform/i18n/charset.h"
 
@@ -96,15 +97,13 @@ std::optional<std::u16string> Candidate::decode(std::string_view bytes) const {
             return std::nullopt;
         }
     }
-    std::u16string text;
-    text.reserve(bytes.size());
-    for (const char byte : bytes) {
-        text += table_[static_cast<unsigned char>(byte)];
-        if (text.back() == unusedByte) {
-            return std::nullopt;
-        }
+    std::u16string text(bytes.size(), u'\0');
+    bool unused = false;
+    for (std::size_t i = 0; i < bytes.size(); ++i) {
+        text[i] = table_[static_cast<unsigned char>(bytes[i])];
+        unused |= text[i] == unusedByte;
     }
-    return text;
+    return unused ? std::nullopt : std::optional(std::move(text));
 }
 
 Candidate::Fit Candidate::fit(std::string_view bytes) const {

@@ -112,16 +112,17 @@ bool isDamagedUtf8(std::string_view sample) {
 std::string legacyCharset(std::string_view bytes) {
     const std::string sample = detail::charsetSample(bytes);
     const std::optional<detail::UnicodeGuess> unicode = detail::unmarkedUnicode(bytes);
-    const auto ranking = isBinary(sample) || isDamagedUtf8(sample)
-                             ? std::vector<detail::RankedCandidate>()
-                             : detail::rankedCandidates(sample, bytes);
-    if (unicode &&
-        (ranking.empty() ||
-         unicode->bitsPerByte < ranking.front().cost / static_cast<double>(sample.size()))) {
+    if (isBinary(sample) || isDamagedUtf8(sample)) {
+        return unicode ? unicode->charset : std::string();
+    }
+    detail::Ranking ranking(sample, bytes);
+    const detail::Candidate* candidate = ranking.next();
+    if (unicode && (candidate == nullptr ||
+                    unicode->bitsPerByte < ranking.cost() / static_cast<double>(sample.size()))) {
         return unicode->charset;
     }
-    for (const detail::RankedCandidate& ranked : ranking) {
-        const detail::Candidate::Fit fit = ranked.candidate->fit(bytes);
+    for (; candidate != nullptr; candidate = ranking.next()) {
+        const detail::Candidate::Fit fit = candidate->fit(bytes);
         // Where the right charset would not give the bytes back, no other is right either.
         if (fit.decodes) {
             return fit.charset;

@@ -10,10 +10,12 @@
 
 #include <algorithm>
 #include <array>
+#include <bit>
 #include <cmath>
 #include <cstdint>
 #include <limits>
 #include <string>
+#include <utility>
 
 #include "platform/i18n/language_tables.h"
 #include "platform/i18n/symbol_cost.h"
@@ -57,6 +59,68 @@ char16_t folded(char16_t c) {
     return static_cast<char16_t>(u_tolower(c));
 }
 
+enum class Case : std::uint8_t { none, small, capital };
+
+Case caseOf(char16_t c) {
+    if (u_isULowercase(c)) {
+        return Case::small;
+    }
+    return u_isUUppercase(c) ? Case::capital : Case::none;
+}
+
+struct CharacterTraits {
+    char16_t folded;
+    bool isWordCharacter;
+    Case letterCase;
+};
+
+CharacterTraits findTraits(char16_t c) {
+    return {folded(c), isWordCharacter(c), caseOf(c)};
+}
+
+// The traits of a character; those of alphabets, which all charsets of single bytes are made of,
+// from a table.
+CharacterTraits traitsOf(char16_t c) {
+    static const auto table = [] {
+        std::array<CharacterTraits, alphabetLimit> made{};
+        for (std::size_t i = 0; i < made.size(); ++i) {
+            made[i] = findTraits(static_cast<char16_t>(i));
+        }
+        return made;
+    }();
+    return c < table.size() ? table[c] : findTraits(c);
+}
+
+// Two neighbours in words, and how often they are that.
+struct Pair {
+    char16_t before;
+    char16_t current;
+    std::uint32_t count;
+};
+
+// The pairs of neighbours in `words`, which are closed by `wordEnd` each.
+std::vector<Pair> pairsIn(std::u16string_view words) {
+    std::vector<Pair> pairs;
+    // Places in `pairs`, counted from one, by a hash of the pair.
+    std::vector<std::uint32_t> places(std::bit_ceil(2 * words.size() + 1));
+    const std::size_t mask = places.size() - 1;
+    char16_t before = wordEnd;
+    for (const char16_t current : words) {
+        std::size_t slot = (before * std::size_t{0x9E3B} ^ current * std::size_t{0x85EB}) & mask;
+        while (places[slot] != 0 && (pairs[places[slot] - 1].before != before ||
+                                     pairs[places[slot] - 1].current != current)) {
+            slot = (slot + 1) & mask;
+        }
+        if (places[slot] == 0) {
+            pairs.push_back({before, current, 0});
+            places[slot] = static_cast<std::uint32_t>(pairs.size());
+        }
+        ++pairs[places[slot] - 1].count;
+        before = current;
+    }
+    return pairs;
+}
+
 }  // namespace
 
 class Language {
@@ -65,8 +129,9 @@ public:
     virtual bool isWritableWith(std::u16string_view repertoire) const = 0;
     virtual bool isLatin() const = 0;
 
-    // The cost of runs of word characters, folded, each run closed by `wordEnd`.
-    virtual double costOfWords(std::u16string_view words) const = 0;
+    // The cost of runs of word characters, folded, each run closed by `wordEnd`; `pairs` are those
+    // in them.
+    virtual double costOfWords(std::u16string_view words, const std::vector<Pair>& pairs) const = 0;
 };
 
 namespace {
@@ -100,24 +165,24 @@ public:
 
     bool isLatin() const override { return table_.alphabet.front() == u'a'; }
 
-    double costOfWords(std::u16string_view words) const override {
+    double costOfWords(std::u16string_view, const std::vector<Pair>& pairs) const override {
         std::uint64_t quarterBits = 0;
-        std::size_t previous = 0;
-        char16_t before = wordEnd;
-        for (const char16_t c : words) {
-            const std::size_t current = c < alphabetLimit ? index_[c] : 0;
-            if (current == 0 && c != wordEnd) {
-                quarterBits += 4U * static_cast<unsigned>(foreignCost(c, before));
+        for (const Pair& pair : pairs) {
+            const std::size_t current = indexOf(pair.current);
+            std::uint64_t cost = static_cast<std::uint64_t>(
+                table_.costs[indexOf(pair.before) * size_ + current] - '0');
+            if (current == 0 && pair.current != wordEnd) {
+                cost += 4U * static_cast<unsigned>(foreignCost(pair.current, pair.before));
             }
-            quarterBits +=
-                static_cast<std::uint64_t>(table_.costs[previous * size_ + current] - '0');
-            previous = current;
-            before = c;
+            quarterBits += pair.count * cost;
         }
         return static_cast<double>(quarterBits) / 4;
     }
 
 private:
+    // The place of a letter in the alphabet, from one; zero for what is not in it.
+    std::size_t indexOf(char16_t c) const { return c < alphabetLimit ? index_[c] : 0; }
+
     int foreignCost(char16_t letter, char16_t before) const {
         if (letter < 0x0250 && isLatin()) {
             // Those of Latin-1 turn up in borrowed words and in names everywhere.
@@ -154,7 +219,7 @@ public:
     bool isWritableWith(std::u16string_view) const override { return true; }
     bool isLatin() const override { return false; }
 
-    double costOfWords(std::u16string_view words) const override {
+    double costOfWords(std::u16string_view words, const std::vector<Pair>&) const override {
         std::uint64_t halfBits = 0;
         for (std::size_t i = 0; i < words.size(); ++i) {
             const char16_t before = i == 0 ? wordEnd : words[i - 1];
@@ -237,28 +302,36 @@ const Languages& languages() {
     return known;
 }
 
+}  // namespace
+
 // What is the same in every language: the words, and the cost of everything between them.
-class Dissection {
+class TextCost::Dissection {
 public:
-    explicit Dissection(std::u16string_view text) : text_(text) {
-        words_.reserve(text.size());
-        std::size_t position = 0;
-        while (position < text_.size()) {
-            const std::size_t end = endOfRun(position);
-            if (end == position) {
-                cost_ += costOfAscii(text_[position]);
-                ++position;
-            } else if (isAsciiRun(position, end)) {
-                cost_ += bitsPerAscii * static_cast<double>(end - position);
-                position = end;
+    explicit Dissection(std::u16string text) : text_(std::move(text)) {}
+
+    // Goes on by `characters`, to the end of the run that is there.
+    void advance(std::size_t characters) {
+        const std::size_t limit = position_ + std::min(characters, text_.size() - position_);
+        while (position_ < limit) {
+            const std::size_t end = endOfRun(position_);
+            if (end == position_) {
+                cost_ += costOfAscii(text_[position_]);
+                ++position_;
+            } else if (isAsciiRun(position_, end)) {
+                cost_ += bitsPerAscii * static_cast<double>(end - position_);
+                position_ = end;
             } else {
-                dissectRun(position, end);
-                position = end;
+                dissectRun(position_, end);
+                position_ = end;
             }
         }
     }
 
-    std::u16string_view words() const { return words_; }
+    bool isAtEnd() const { return position_ == text_.size(); }
+
+    // The words since the last call, each closed by `wordEnd`.
+    std::u16string takeWords() { return std::exchange(words_, {}); }
+
     double cost() const { return cost_; }
 
 private:
@@ -287,7 +360,8 @@ private:
         bool previousTwoCapital = false;
         for (std::size_t i = begin; i < end; ++i) {
             const char16_t c = text_[i];
-            if (!isWordCharacter(c)) {
+            const CharacterTraits traits = traitsOf(c);
+            if (!traits.isWordCharacter) {
                 if (!words_.empty() && words_.back() != wordEnd) {
                     words_ += wordEnd;
                 }
@@ -296,8 +370,8 @@ private:
                 previousTwoCapital = false;
                 continue;
             }
-            words_ += folded(c);
-            const Case current = caseOf(c);
+            words_ += traits.folded;
+            const Case current = traits.letterCase;
             cost_ += costOfCase(previous, previousTwoCapital, current);
             previousTwoCapital = previous == Case::capital && current == Case::capital;
             previous = current;
@@ -305,15 +379,6 @@ private:
         if (!words_.empty() && words_.back() != wordEnd) {
             words_ += wordEnd;
         }
-    }
-
-    enum class Case { none, small, capital };
-
-    static Case caseOf(char16_t c) {
-        if (u_isULowercase(c)) {
-            return Case::small;
-        }
-        return u_isUUppercase(c) ? Case::capital : Case::none;
     }
 
     static double costOfCase(Case previous, bool previousTwoCapital, Case current) {
@@ -329,12 +394,11 @@ private:
         return wanted < text_.size() ? text_[wanted] : u'\0';
     }
 
-    std::u16string_view text_;
+    std::u16string text_;
+    std::size_t position_ = 0;
     std::u16string words_;
     double cost_ = 0;
 };
-
-}  // namespace
 
 const std::vector<const Language*>& alphabeticLanguages() {
     return languages().alphabeticList;
@@ -396,10 +460,11 @@ Surroundings::Surroundings(std::string_view sample) {
     constexpr double weight = 0.5;
     constexpr double bound = 12;
     const AsciiWords found = asciiWords(sample);
+    const std::vector<Pair> pairs = pairsIn(found.words);
     double cheapest = std::numeric_limits<double>::infinity();
     for (const Language* language : alphabeticLanguages()) {
         if (language->isLatin()) {
-            costs_[language] = weight * language->costOfWords(found.words);
+            costs_[language] = weight * language->costOfWords(found.words, pairs);
             cheapest = std::min(cheapest, costs_[language]);
         }
     }
@@ -415,15 +480,39 @@ double Surroundings::cost(const Language& language) const {
     return costs_.at(&language);
 }
 
-double costInBits(std::u16string_view text, const std::vector<const Language*>& candidates,
-                  const Surroundings& surroundings) {
-    const Dissection dissection(text);
-    double cheapest = std::numeric_limits<double>::infinity();
-    for (const Language* language : candidates) {
-        cheapest = std::min(
-            cheapest, language->costOfWords(dissection.words()) + surroundings.cost(*language));
+TextCost::TextCost(std::u16string text, const std::vector<const Language*>& languages,
+                   const Surroundings& surroundings)
+    : dissection_(std::make_unique<Dissection>(std::move(text))) {
+    costs_.reserve(languages.size());
+    for (const Language* language : languages) {
+        costs_.push_back({language, surroundings.cost(*language), 0});
     }
-    return dissection.cost() + cheapest;
+}
+
+TextCost::TextCost(TextCost&&) noexcept = default;
+TextCost& TextCost::operator=(TextCost&&) noexcept = default;
+TextCost::~TextCost() = default;
+
+void TextCost::lookFurther(std::size_t characters) {
+    dissection_->advance(characters);
+    const std::u16string words = dissection_->takeWords();
+    const std::vector<Pair> pairs = pairsIn(words);
+    for (LanguageCost& cost : costs_) {
+        // The costs of words are whole quarters of a bit, so the sum does not depend on the pieces.
+        cost.words += cost.language->costOfWords(words, pairs);
+    }
+}
+
+double TextCost::bits() const {
+    double cheapest = std::numeric_limits<double>::infinity();
+    for (const LanguageCost& cost : costs_) {
+        cheapest = std::min(cheapest, cost.words + cost.surroundings);
+    }
+    return dissection_->cost() + cheapest;
+}
+
+bool TextCost::isWhole() const {
+    return dissection_->isAtEnd();
 }
 
 }  // namespace platform::i18n::detail

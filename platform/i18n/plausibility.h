@@ -3,13 +3,16 @@
 // was written in.
 #pragma once
 
+#include <cstddef>
 #include <map>
+#include <memory>
+#include <string>
 #include <string_view>
 #include <vector>
 
 namespace platform::i18n::detail {
 
-/// The known languages. Opaque to callers, who only hand some of them to `costInBits`.
+/// The known languages. Opaque to callers, who only hand some of them to `TextCost`.
 class Language;
 
 /// All known languages whose letters are written with an alphabet. Lives as long as the program.
@@ -38,10 +41,38 @@ private:
     std::map<const Language*, double> costs_;
 };
 
-/// The cost of `text` in the one of `languages` that makes it cheapest in its surroundings. Costs
-/// of different texts compare when the texts come from the same bytes. Linear in the size of the
-/// text and the number of languages.
-double costInBits(std::u16string_view text, const std::vector<const Language*>& languages,
-                  const Surroundings& surroundings);
+/// The cost of a text in the one of some languages that makes it cheapest in its surroundings,
+/// found piece by piece from the beginning: often a piece is enough to see that it will be too
+/// much. Costs of different texts compare when the texts come from the same bytes.
+class TextCost {
+public:
+    TextCost(std::u16string text, const std::vector<const Language*>& languages,
+             const Surroundings& surroundings);
+    TextCost(TextCost&&) noexcept;
+    TextCost& operator=(TextCost&&) noexcept;
+    ~TextCost();
+
+    /// Looks at `characters` more, and at the rest of the run of letters that they end in. Linear
+    /// in their number and that of the languages.
+    void lookFurther(std::size_t characters);
+
+    /// The bits that all that has been looked at costs: the cost of the text or, as long as it is
+    /// not whole, no more than that.
+    double bits() const;
+
+    /// Whether all of the text has been looked at.
+    bool isWhole() const;
+
+private:
+    class Dissection;
+    struct LanguageCost {
+        const Language* language;
+        double surroundings;
+        double words;
+    };
+
+    std::unique_ptr<Dissection> dissection_;
+    std::vector<LanguageCost> costs_;
+};
 
 }  // namespace platform::i18n::detail

@@ -5,6 +5,9 @@
 
 #include <unicode/uchar.h>
 
+#include <array>
+#include <cstddef>
+#include <cstdint>
 #include <string_view>
 
 namespace platform::i18n::detail {
@@ -57,8 +60,45 @@ bool isBlank(char16_t character) {
     return character <= u' ';
 }
 
+// What a character costs that is no text at all; zero for others.
+int costOfNonText(char16_t character) {
+    switch (u_charType(character)) {
+        case U_UNASSIGNED:
+            return unassignedCost;
+        case U_CONTROL_CHAR:
+            return controlCost;
+        case U_PRIVATE_USE_CHAR:
+            return privateUseCost;
+        default:
+            return character == 0xFFFD ? unassignedCost : 0;
+    }
+}
+
+struct SignTraits {
+    std::uint8_t nonTextCost;
+    std::uint8_t commonness;
+    bool isLetter;
+};
+
+SignTraits findTraits(char16_t character) {
+    return {static_cast<std::uint8_t>(costOfNonText(character)),
+            static_cast<std::uint8_t>(commonness(character)), u_isalpha(character) != 0};
+}
+
+// The traits of a character; those of alphabets and of the signs around them from a table.
+SignTraits traitsOf(char16_t character) {
+    static const auto table = [] {
+        std::array<SignTraits, 0x2600> made{};
+        for (std::size_t i = 0; i < made.size(); ++i) {
+            made[i] = findTraits(static_cast<char16_t>(i));
+        }
+        return made;
+    }();
+    return character < table.size() ? table[character] : findTraits(character);
+}
+
 bool isLetter(char16_t character) {
-    return u_isalpha(character) != 0;
+    return traitsOf(character).isLetter;
 }
 
 // Signs that stand inside words.
@@ -106,18 +146,9 @@ bool isMisplaced(char16_t sign, Neighbours neighbours) {
 }  // namespace
 
 int symbolCost(char16_t sign, Neighbours neighbours) {
-    switch (u_charType(sign)) {
-        case U_UNASSIGNED:
-            return unassignedCost;
-        case U_CONTROL_CHAR:
-            return controlCost;
-        case U_PRIVATE_USE_CHAR:
-            return privateUseCost;
-        default:
-            break;
-    }
-    if (sign == 0xFFFD) {
-        return unassignedCost;
+    const SignTraits traits = traitsOf(sign);
+    if (traits.nonTextCost != 0) {
+        return traits.nonTextCost;
     }
     if (sign == neighbours.before && isOrnament(sign)) {
         return repeatedCost;
@@ -134,7 +165,7 @@ int symbolCost(char16_t sign, Neighbours neighbours) {
     if (sign == 0x00A4) {
         return currencySignCost;
     }
-    return commonness(sign) + (isMisplaced(sign, neighbours) ? misplacedCost : 0);
+    return traits.commonness + (isMisplaced(sign, neighbours) ? misplacedCost : 0);
 }
 
 }  // namespace platform::i18n::detail

@@ -24,11 +24,17 @@ struct Form {
     std::size_t unitSize;
 };
 
-// The bits that each byte of the beginning costs in this form; a lot when it is malformed.
-double bitsPerByte(const Form& form, std::string_view bytes) {
+// The bits that each byte of the beginning costs in this form, a lot when it is malformed; no less
+// than `limit` when it is found to cost more than that.
+double bitsPerByte(const Form& form, std::string_view bytes, double limit) {
+    constexpr std::size_t piece = 64;
     const std::string_view sample = bytes.substr(0, sampleSize);
-    const std::u16string text = openCharset(form.name, false)->decode(sample);
-    return costInBits(text, allLanguages(), Surroundings("")) / static_cast<double>(sample.size());
+    const auto size = static_cast<double>(sample.size());
+    TextCost cost(openCharset(form.name, false)->decode(sample), allLanguages(), Surroundings(""));
+    while (!cost.isWhole() && cost.bits() / size < limit) {
+        cost.lookFurther(piece);
+    }
+    return cost.bits() / size;
 }
 
 bool isWhole(const Form& form, std::string_view bytes) {
@@ -52,7 +58,7 @@ std::optional<UnicodeGuess> unmarkedUnicode(std::string_view bytes) {
     double bestCost = plausibleBitsPerByte;
     for (const Form& form : forms) {
         if (bytes.size() % form.unitSize == 0) {
-            const double cost = bitsPerByte(form, bytes);
+            const double cost = bitsPerByte(form, bytes, bestCost);
             if (cost < bestCost) {
                 best = &form;
                 bestCost = cost;
