@@ -164,6 +164,9 @@ NatsBus::Core::~Core() {
 
 std::shared_ptr<MessageService> NatsBus::Core::connect(const std::string& clientName) {
     const std::lock_guard lock(connecting_);
+    if (isStopping()) {
+        throw std::runtime_error(closedText);
+    }
     if (!keeper_.joinable()) {
         if (listener_ == 0) {
             listener_ = nats::listen(weak_from_this());
@@ -382,6 +385,7 @@ void NatsBus::Core::onReconnected(const std::string& server) {
 }
 
 void NatsBus::Core::onClosed(const std::string& reason) {
+    // Having locked, as isStopping does: the keeper saw that it is closed, or waits by now.
     if (!isStopping()) {
         logger().warn("NATS has ended the connection: {}.", reason);
     }

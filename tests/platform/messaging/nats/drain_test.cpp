@@ -1,0 +1,149 @@
+// How a worker leaves: it finishes what it took, and nothing new comes to it.
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <future>
+#include <latch>
+#include <string>
+
+#include "tests/platform/messaging/nats/bus_at_server.h"
+
+namespace platform::messaging {
+namespace {
+
+using testing::ElementsAre;
+using testing::HasSubstr;
+
+NatsOptions workerOf(const test::NatsServer& server, std::size_t concurrency) {
+    NatsOptions options = optionsFor(server);
+    options.queueGroup = "workers";
+    options.queueChannels = {"requests"};
+    options.concurrentChannels = {"requests"};
+    options.concurrency = concurrency;
+    return options;
+}
+
+class NatsDrain : public testing::TestWithParam<std::size_t> {};
+
+TEST_P(NatsDrain, FinishesWhatWasTakenAndLeavesTheRestToOthers) {
+    const test::NatsServer server;
+    BusAtServer worker(workerOf(server, GetParam()));
+    BusAtServer client(server);
+    std::latch started(static_cast<std::ptrdiff_t>(GetParam()));
+    std::latch release(1);
+    const auto requests = worker.subscribe("requests", [&](const JsonMessage& m) {
+        if (m.payload() == "blocking") {
+            started.count_down();
+        }
+        release.wait();
+        worker.publish("answers", "done " + textOf(m));
+    });
+    Inbox<std::string> answers;
+    const auto subscription = client.collect("answers", answers);
+    for (std::size_t i = 0; i < GetParam(); ++i) {
+        client.publish("requests", "blocking");
+    }
+    started.wait();
+    client.publish("requests", "waiting");
+    client.publish("requests", "waiting too");
+    // These two have reached the worker when one that came behind them has.
+    Inbox<std::string> marks;
+    const auto mark = worker.collect("mark", marks);
+    client.publish("mark", "x");
+    marks.waitFor(1);
+    std::future<bool> drained =
+        std::async(std::launch::async, [&] { return worker.bus->drain(std::chrono::seconds(60)); });
+    // Once the first is unsubscribed, all goes to the second.
+    BusAtServer second(workerOf(server, 1));
+    Inbox<std::string> ofSecond;
+    const auto others = second.collect("requests", ofSecond);
+    EXPECT_TRUE(waitUntil([&] {
+        const std::size_t before = ofSecond.items().size();
+        for (int i = 0; i < 20; ++i) {
+            client.publish("requests", "late");
+        }
+        return ofSecond.waitFor(before + 20, std::chrono::milliseconds(50)).size() >= before + 20;
+    }));
+    release.count_down();
+    EXPECT_TRUE(drained.get());
+    const auto all = answers.waitFor(GetParam() + 2);
+    EXPECT_EQ(std::count(all.begin(), all.end(), "done blocking"), GetParam());
+    EXPECT_EQ(std::count(all.begin(), all.end(), "done waiting"), 1);
+    EXPECT_EQ(std::count(all.begin(), all.end(), "done waiting too"), 1);
+}
+
+INSTANTIATE_TEST_SUITE_P(Threads, NatsDrain, testing::Values(1, 3),
+                         testing::PrintToStringParamName());
+
+TEST(NatsDrainEnd, HasTheServerHaveWhatWasPublished) {
+    const test::NatsServer server("max_payload: 64MB\nmax_pending: 256MB");
+    BusAtServer client(server);
+    Inbox<std::size_t> sizes;
+    const auto subscription =
+        client.subscribe("x", [&](const JsonMessage& m) { sizes.add(m.payload().size()); });
+    {
+        BusAtServer worker(server);
+        worker.publish("x", std::string(20'000'000, 'x'));
+        worker.publish("x", "y");
+        EXPECT_TRUE(worker.bus->drain(kPatience));
+    }
+    EXPECT_THAT(sizes.waitFor(2), ElementsAre(20'000'000U, 1U));
+}
+
+TEST(NatsDrainEnd, AfterwardsEveryOperationFails) {
+    BusLog& log = BusLog::start();
+    const test::NatsServer server;
+    BusAtServer bus(server);
+    EXPECT_TRUE(bus.bus->drain(kPatience));
+    EXPECT_FALSE(bus.bus->isConnected());
+    EXPECT_THAT(failureOf([&] { bus.publish("x", "1"); }), HasSubstr("has been closed"));
+    EXPECT_THAT(failureOf([&] { bus.subscribe("x", [](const JsonMessage&) {}); }),
+                HasSubstr("has been closed"));
+    EXPECT_THAT(failureOf([&] { bus.bus->connect("client").get(); }), HasSubstr("has been closed"));
+    EXPECT_TRUE(bus.bus->drain(kPatience)) << "a second time has nothing to do";
+    EXPECT_EQ(log.count("lost"), 0) << "it was not lost";
+}
+
+TEST(NatsDrainEnd, GivesUpWhenTheTimeIsOver) {
+    const test::NatsServer server;
+    BusAtServer bus(server);
+    std::latch started(1);
+    std::latch release(1);
+    auto subscription = bus.subscribe("x", [&](const JsonMessage&) {
+        started.count_down();
+        release.wait();
+    });
+    bus.publish("x", "1");
+    started.wait();
+    EXPECT_FALSE(bus.bus->drain(std::chrono::milliseconds(20)));
+    release.count_down();
+}
+
+TEST(NatsDrainEnd, DoesNotWaitForAServerThatIsGone) {
+    BusLog& log = BusLog::start();
+    test::NatsServer server;
+    BusAtServer bus(server);
+    const auto subscription = bus.subscribe("x", [](const JsonMessage&) {});
+    server.kill();
+    EXPECT_TRUE(log.waitFor("is lost"));
+    const auto before = std::chrono::steady_clock::now();
+    EXPECT_TRUE(bus.bus->drain(std::chrono::hours(1)));
+    EXPECT_LT(std::chrono::steady_clock::now() - before, std::chrono::minutes(1));
+}
+
+TEST(NatsDrainEnd, EndsAConnectThatIsStillTrying) {
+    BusLog& log = BusLog::start();
+    NatsOptions options;
+    options.servers = {"nats://127.0.0.1:" + std::to_string(test::freePort())};
+    options.connectTimeout = std::chrono::hours(1);
+    const auto bus = NatsBus::create(options);
+    std::future<std::string> failure = std::async(
+        std::launch::async, [&] { return failureOf([&] { bus->connect("client").get(); }); });
+    EXPECT_TRUE(log.waitFor("Trying again"));
+    EXPECT_TRUE(bus->drain(kPatience));
+    EXPECT_THAT(failure.get(), HasSubstr("has been closed"));
+}
+
+}  // namespace
+}  // namespace platform::messaging
