@@ -271,6 +271,7 @@ std::shared_ptr<Subscription> NatsBus::Core::subscribe(const std::string& channe
         deliveryThreadCount(channel, options_.concurrentChannels, options_.concurrency);
     const bool queued = contains(options_.queueChannels, channel);
     auto source = std::make_shared<NatsSource>(channel, queued ? options_.queueGroup : "",
+                                               options_.maxPendingMessages,
                                                options_.maxPendingBytes, threads);
     auto subscription = std::make_shared<ChannelSubscription>(shared_from_this(), source,
                                                               std::move(handler), threads);
@@ -399,11 +400,8 @@ void NatsBus::Core::onError(natsStatus status, const std::string& reason,
         return;
     }
     const std::lock_guard lock(sourcesMutex_);
-    for (const auto& source : sources_) {
-        if (source->reportDropped(subscription)) {
-            return;
-        }
-    }
+    std::any_of(sources_.begin(), sources_.end(),
+                [&](const auto& source) { return source->reportDropped(subscription); });
 }
 
 NatsBus::NatsBus(std::shared_ptr<Core> core) : core_(std::move(core)) {}

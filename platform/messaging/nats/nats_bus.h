@@ -48,8 +48,10 @@ struct NatsOptions {
     std::vector<std::string> concurrentChannels;
     std::size_t concurrency = 0;
 
-    /// Bound on the payload bytes that wait in the process for the handler of one subscription. A
-    /// message past it is dropped and the log tells of it.
+    /// Bounds on the messages and on their payload bytes that wait in the process for the handler
+    /// of one subscription. A message past one of them is dropped and the log tells of it. The
+    /// bound on messages is also one on how long a flood of small ones keeps the others waiting.
+    std::size_t maxPendingMessages = 8192;
     std::size_t maxPendingBytes = std::size_t{256} << 20;
 
     /// Bound on the bytes that are published while no server is reached, and sent when one is. The

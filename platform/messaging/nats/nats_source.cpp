@@ -25,14 +25,20 @@ QueuedMessage makeMessage(std::shared_ptr<const std::string> channel, natsMsg* r
     return {JsonMessage(std::move(channel), payload, owner), nullptr, nullptr};
 }
 
+// `bound` as the library takes limits.
+int asLimit(std::size_t bound) {
+    return static_cast<int>(std::clamp<std::size_t>(bound, 1, std::numeric_limits<int>::max()));
+}
+
 }  // namespace
 
 NatsSource::NatsSource(const std::string& channel, std::string queueGroup,
-                       std::size_t maxPendingBytes, std::size_t threads)
+                       std::size_t maxPendingMessages, std::size_t maxPendingBytes,
+                       std::size_t threads)
     : channel_(std::make_shared<const std::string>(channel)),
       queueGroup_(std::move(queueGroup)),
-      maxPendingBytes_(static_cast<int>(
-          std::clamp<std::size_t>(maxPendingBytes, 1, std::numeric_limits<int>::max()))),
+      maxPendingMessages_(asLimit(maxPendingMessages)),
+      maxPendingBytes_(asLimit(maxPendingBytes)),
       threads_(threads) {}
 
 void NatsSource::attach(natsConnection* connection) {
@@ -42,7 +48,7 @@ void NatsSource::attach(natsConnection* connection) {
                                     &made, connection, channel_->c_str(), queueGroup_.c_str()),
           "Cannot subscribe channel \"" + printable(*channel_) + "\"");
     SubscriptionHandle subscription(made, Destroy());
-    natsSubscription_SetPendingLimits(made, -1, maxPendingBytes_);
+    natsSubscription_SetPendingLimits(made, maxPendingMessages_, maxPendingBytes_);
     {
         const std::lock_guard lock(mutex_);
         if (!finishing_) {
@@ -154,8 +160,8 @@ void NatsSource::logDropped(std::chrono::steady_clock::duration minimalGap) {
     lastDropLog_ = now;
     logger().error(
         "Slow consumer: the messages on channel \"{}\" come faster than they are handled, and {} "
-        "bytes may wait; {} messages have been dropped so far.",
-        printable(*channel_), maxPendingBytes_, dropped);
+        "of them or {} bytes may wait; {} messages have been dropped so far.",
+        printable(*channel_), maxPendingMessages_, maxPendingBytes_, dropped);
 }
 
 }  // namespace platform::messaging::nats

@@ -20,8 +20,8 @@ namespace platform::messaging::nats {
 class NatsSource final : public MessageSource {
 public:
     /// `threads`: how many threads call `next`.
-    NatsSource(const std::string& channel, std::string queueGroup, std::size_t maxPendingBytes,
-               std::size_t threads);
+    NatsSource(const std::string& channel, std::string queueGroup, std::size_t maxPendingMessages,
+               std::size_t maxPendingBytes, std::size_t threads);
 
     /// Subscribes on `connection`, in the place of an earlier one that is closed. Nothing happens
     /// after `end` or `drain`. Throws NatsError.
@@ -48,6 +48,7 @@ private:
 
     const std::shared_ptr<const std::string> channel_;
     const std::string queueGroup_;
+    const int maxPendingMessages_;
     const int maxPendingBytes_;
     const std::size_t threads_;
 

@@ -124,11 +124,19 @@ TEST(NatsPublish, TellsWhatTheServerDoesNotPermit) {
     EXPECT_THAT(texts.waitFor(1), ElementsAre("y"));
 }
 
-TEST(NatsPublish, DropsAndLogsWhatIsTooMuchForASlowHandler) {
+struct PendingBounds {
+    std::size_t messages;
+    std::size_t bytes;
+};
+
+class PendingBound : public testing::TestWithParam<PendingBounds> {};
+
+TEST_P(PendingBound, DropsAndLogsWhatIsTooMuchForASlowHandler) {
     BusLog& log = BusLog::start();
     const test::NatsServer server;
     NatsOptions options = optionsFor(server);
-    options.maxPendingBytes = 1000;
+    options.maxPendingMessages = GetParam().messages;
+    options.maxPendingBytes = GetParam().bytes;
     BusAtServer bus(options);
     std::latch started(1);
     std::latch release(1);
@@ -148,7 +156,9 @@ TEST(NatsPublish, DropsAndLogsWhatIsTooMuchForASlowHandler) {
     }
     EXPECT_TRUE(
         log.waitFor("Slow consumer: the messages on channel \"/slow\" come faster than "
-                    "they are handled, and 1000 bytes may wait"));
+                    "they are handled, and " +
+                    std::to_string(GetParam().messages) + " of them or " +
+                    std::to_string(GetParam().bytes) + " bytes may wait"));
     Inbox<std::string> after;
     const auto other = publisher.collect("/slow", after);
     publisher.publish("/slow", "x");
@@ -160,6 +170,9 @@ TEST(NatsPublish, DropsAndLogsWhatIsTooMuchForASlowHandler) {
     EXPECT_EQ(texts.waitFor(7).back(), "again");
     EXPECT_TRUE(log.waitFor("messages have been dropped so far"));
 }
+
+INSTANTIATE_TEST_SUITE_P(NatsPublish, PendingBound,
+                         testing::Values(PendingBounds{8192, 1000}, PendingBounds{5, 1 << 20}));
 
 TEST(NatsPublish, CarriesALargeDocumentByteForByte) {
     const test::NatsServer server("max_payload: 64MB\nmax_pending: 256MB");
