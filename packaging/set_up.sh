@@ -53,6 +53,34 @@ install_packages() {
         apt-get install -y --no-install-recommends $missing
 }
 
+# install_commands FILE: installs the Debian packages of those of the commands named in FILE that are
+# missing, wherever else they might have come from.
+install_commands() {
+    local command package missing
+    missing=$(sed 's/#.*//' "$1" | while read -r command package; do
+        [[ -z $command ]] || command -v "$command" >/dev/null || printf '%s\n' "$package"
+    done)
+    if [[ -n $missing ]]; then
+        install_packages <(printf '%s\n' "$missing")
+    fi
+}
+
+# install_node_packages FOLDER: installs what FOLDER's package-lock.json names, unless it has been.
+install_node_packages() {
+    local installed="$1/node_modules/.package-lock.json"
+    if [[ ! $installed -nt $1/package-lock.json ]]; then
+        step "installing the npm packages of ${1#"$root/"}"
+        (cd "$1" && quietly npm npm ci)
+    fi
+}
+
+# install_all: installs all that building, running and testing the project needs.
+install_all() {
+    install_packages "$root/packaging/debian-packages.txt"
+    install_commands "$root/packaging/debian-commands.txt"
+    install_node_packages "$root/web"
+}
+
 # build NAME [CMAKE-ARGUMENT...] [-- TARGET...]: builds the targets, or all, in build/NAME, which is
 # configured by the preset NAME unless arguments are given. Says nothing when there is nothing to do.
 build() {
