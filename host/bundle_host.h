@@ -9,23 +9,12 @@
 #include <string>
 
 #include "framework/bundle_runner.h"
+#include "host/channels.h"
 #include "platform/data_buffer.h"
 #include "platform/messaging/in_process_bus.h"
 #include "platform/messaging/message_service.h"
 
 namespace host {
-
-/// The channel on which the bundle takes read requests.
-inline constexpr const char* readRequestChannel = "/zpr/service/readRequest_cpp";
-
-/// What precedes the "rtcId" of a read request in the channel of its response.
-inline constexpr const char* readResponsePrefix = "/zpr/service/readResponse/";
-
-/// The channel on which the bundle takes write requests.
-inline constexpr const char* writeRequestChannel = "/zpr/service/writeRequest_cpp";
-
-/// What precedes the "rtcId" of a write request in the channel of its response.
-inline constexpr const char* writeResponsePrefix = "/zpr/service/writeResponse/";
 
 /// A message bus with the bundle as a client, and the host as another. One per process, since the
 /// bundle finds the bus through the process's transport.

@@ -7,15 +7,21 @@
 
 namespace host {
 
+namespace {
+
+std::filesystem::path programFolder() {
+    return std::filesystem::read_symlink("/proc/self/exe").parent_path();
+}
+
+}  // namespace
+
 std::filesystem::path findBundle() {
-    const std::filesystem::path programFolder =
-        std::filesystem::read_symlink("/proc/self/exe").parent_path();
     // From the program's folder, the bundle's folder in a build tree and in an installation.
     const std::array<std::filesystem::path, 2> bundleFolders = {"../lib", INSTALLED_BUNDLE_FOLDER};
     std::string places;
     for (const std::filesystem::path& folder : bundleFolders) {
         const std::filesystem::path bundle =
-            (programFolder / folder / BUNDLE_FILE_NAME).lexically_normal();
+            (programFolder() / folder / BUNDLE_FILE_NAME).lexically_normal();
         std::error_code ignored;
         if (std::filesystem::exists(bundle, ignored)) {
             return bundle;
@@ -25,6 +31,16 @@ std::filesystem::path findBundle() {
         }
     }
     throw std::runtime_error("there is no bundle at " + places + "; name one with --bundle");
+}
+
+std::filesystem::path findWebFolder() {
+    const std::filesystem::path folder = (programFolder() / WEB_FOLDER).lexically_normal();
+    std::error_code ignored;
+    if (!std::filesystem::exists(folder / "index.html", ignored)) {
+        throw std::runtime_error("there is no web page in " + folder.string() +
+                                 "; name a folder with --web, or serve none with --no-web");
+    }
+    return std::filesystem::canonical(folder);
 }
 
 }  // namespace host

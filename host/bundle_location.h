@@ -1,4 +1,4 @@
-// Where the host finds its bundle.
+// Where the host finds what belongs to it.
 #pragma once
 
 #include <filesystem>
@@ -9,5 +9,9 @@ namespace host {
 /// in a build tree and where it is installed. Throws std::runtime_error that names the places
 /// looked at when there is none.
 std::filesystem::path findBundle();
+
+/// The folder of the web page that belongs to the program. Throws std::runtime_error that names the
+/// place looked at when there is none.
+std::filesystem::path findWebFolder();
 
 }  // namespace host

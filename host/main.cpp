@@ -10,15 +10,19 @@
 #include <cstdint>
 #include <exception>
 #include <filesystem>
+#include <functional>
 #include <iostream>
 #include <sstream>
+#include <stdexcept>
 #include <string>
 
 #include "host/bundle_location.h"
 #include "host/exit_status.h"
 #include "host/file_descriptor.h"
 #include "host/memory_limit.h"
+#include "host/nats_configuration.h"
 #include "host/read_command.h"
+#include "host/serve_command.h"
 #include "host/standard_streams.h"
 #include "host/stdio_command.h"
 #include "host/write_command.h"
@@ -32,6 +36,7 @@ struct CommandLine {
     std::uint64_t memoryLimit = LIMIT_MEMORY ? host::defaultMemoryLimit() : 0;
     std::filesystem::path bundle;
     host::ReadOptions read;
+    host::ServeOptions serve;
     host::StdioOptions stdio;
     host::WriteOptions write;
 };
@@ -53,6 +58,138 @@ void declareRead(CLI::App& command, host::ReadOptions& options) {
                     "text/plain)")
         ->type_name("TYPE");
     declareTimeout(command, options.timeout);
+}
+
+// A check of an option's value, which says what `isValid` finds wrong.
+CLI::Validator check(const std::string& type,
+                     const std::function<std::string(std::string&)>& fault) {
+    return CLI::Validator(fault, type);
+}
+
+std::string faultOfServerUrl(const std::string& url) {
+    // Command lines can be seen by every user of the machine.
+    return url.find('@') == std::string::npos
+               ? ""
+               : "a URL of --nats may hold no user and password; there are --nats-user and "
+                 "--nats-password-file, --nats-token-file and --creds";
+}
+
+void declareOwnServer(CLI::App& command, host::NatsServerOptions& options, CLI::Option& others) {
+    command
+        .add_option("--port", options.port,
+                    "The port of the host's own message server (default: any that is free)")
+        ->excludes(&others);
+    command
+        .add_option("--websocket-port", options.webSocketPort,
+                    "Its port for browsers (default: any that is free)")
+        ->excludes(&others);
+    command
+        .add_option("--allow-origin", options.allowedOrigins,
+                    "The origin of other web pages that may connect, such as http://localhost:3000")
+        ->type_name("ORIGIN")
+        ->allow_extra_args(false)
+        ->excludes(&others)
+        ->check(check("ORIGIN", [](const std::string& origin) {
+            return host::isOrigin(origin) ? ""
+                                          : "\"" + origin +
+                                                "\" is no origin such as "
+                                                "http://localhost:3000";
+        }));
+    command
+        .add_option("--nats-server", options.program,
+                    "The program of the server (default: nats-server, where programs are)")
+        ->type_name("PATH")
+        ->excludes(&others);
+}
+
+CLI::Option& declareOtherServers(CLI::App& command, host::OtherServers& options) {
+    CLI::Option& servers =
+        *command
+             .add_option("--nats", options.urls,
+                         "Message servers to work for, in place of one of the host's own")
+             ->type_name("URL,...")
+             ->delimiter(',')
+             ->allow_extra_args(false)
+             ->check(check("URL", faultOfServerUrl));
+    const auto declareFile = [&](const std::string& name, std::filesystem::path& file,
+                                 const std::string& description) {
+        return command.add_option(name, file, description)
+            ->type_name("FILE")
+            ->check(CLI::ExistingFile)
+            ->needs(&servers);
+    };
+    declareFile("--creds", options.credentialsFile, "The credentials to show them");
+    declareFile("--nats-token-file", options.tokenFile, "Holds the token to show them");
+    CLI::Option* const user =
+        command.add_option("--nats-user", options.user, "The user to be there")
+            ->type_name("NAME")
+            ->needs(&servers);
+    user->needs(
+        declareFile("--nats-password-file", options.passwordFile, "Holds the password of that user")
+            ->needs(user));
+    declareFile("--tls-ca", options.caFile,
+                "The authorities to trust, in PEM (default: the system's)");
+    CLI::Option* const certificate =
+        declareFile("--tls-cert", options.certificateFile, "The host's own certificate, in PEM");
+    certificate->needs(
+        declareFile("--tls-key", options.keyFile, "Its key, in PEM")->needs(certificate));
+    command
+        .add_option("--group", options.group,
+                    "The group of workers that share the requests (default: " + options.group + ")")
+        ->type_name("NAME")
+        ->needs(&servers);
+    return servers;
+}
+
+void declareWeb(CLI::App& command, host::WebOptions& options) {
+    CLI::Option* const none = command.add_flag("!--no-web", options.isServed, "Serve no web page");
+    command
+        .add_option("--web", options.folder,
+                    "The folder to serve to browsers (default: a page that reads documents)")
+        ->type_name("DIR")
+        ->check(CLI::ExistingDirectory)
+        ->excludes(none);
+    command
+        .add_option_function<std::string>(
+            "--listen",
+            [&options](const std::string& text) {
+                try {
+                    options.address = host::ListenAddress::parse(text);
+                } catch (const std::invalid_argument& error) {
+                    throw CLI::ValidationError("--listen", error.what());
+                }
+            },
+            "Where browsers find it (default: 127.0.0.1:8080)")
+        ->type_name("HOST:PORT")
+        ->excludes(none);
+}
+
+// The host's own server can let pages of one origin of each host in, the web page's included.
+void requireDistinctHosts(const host::ServeOptions& options) {
+    std::vector<std::string> origins = options.ownServer.allowedOrigins;
+    if (options.web.isServed) {
+        origins.push_back(options.web.address.origin());
+    }
+    if (const std::string host = host::commonHost(origins); !host.empty()) {
+        throw CLI::ValidationError("--allow-origin",
+                                   "only one origin of the host " + host +
+                                       " can be let in, that of the web page included");
+    }
+}
+
+void declareServe(CLI::App& command, host::ServeOptions& options) {
+    command
+        .add_option("--root", options.roots,
+                    "A folder that clients may use; may be given several times (default: all)")
+        ->type_name("DIR")
+        ->allow_extra_args(false)
+        ->check(CLI::ExistingDirectory);
+    command.add_flag("!--no-confinement", options.isConfined,
+                     "Go without the kernel's help to keep clients to the folders of --root");
+    declareWeb(command, options.web);
+    declareOwnServer(command, options.ownServer,
+                     declareOtherServers(command, options.otherServers));
+    command.final_callback([&options] { requireDistinctHosts(options); });
 }
 
 void declareStdio(CLI::App& command, host::StdioOptions& options) {
@@ -98,6 +235,8 @@ void declare(CLI::App& app, CommandLine& line) {
     app.fallthrough();
     declareRead(*app.add_subcommand("read", "Read files and print the response for each on a line"),
                 line.read);
+    declareServe(*app.add_subcommand("serve", "Serve browsers and other programs, over NATS"),
+                 line.serve);
     declareStdio(*app.add_subcommand("stdio", "Carry framed messages on standard input and output"),
                  line.stdio);
     declareWrite(*app.add_subcommand(
@@ -116,6 +255,10 @@ int run(CLI::App& app, CommandLine& line, int output) {
     if (app.got_subcommand("read")) {
         line.read.bundle = bundle;
         return host::runRead(line.read, output);
+    }
+    if (app.got_subcommand("serve")) {
+        line.serve.bundle = bundle;
+        return host::runServe(line.serve, output);
     }
     if (app.got_subcommand("write")) {
         line.write.bundle = bundle;

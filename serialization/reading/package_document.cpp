@@ -104,8 +104,7 @@ std::string Serialization::encodePartContent(std::vector<std::uint8_t> bytes,
     bytes = {};
     const DataBuffer encoded = platform::base64encode(std::exchange(image, {}));
     dataUri.reserve(dataUri.size() + encoded.length());
-    dataUri += encoded.view();
-    return dataUri;
+    return dataUri.append(encoded.view());
 }
 
 }  // namespace EditorServices

@@ -1,0 +1,108 @@
+// Programs that the tests run: hosts, message servers, other test programs.
+import { spawn } from "node:child_process";
+import { mkdtempSync, rmSync } from "node:fs";
+import { tmpdir } from "node:os";
+import { join } from "node:path";
+import { setTimeout as sleep } from "node:timers/promises";
+
+export const HOST = process.env.SERIALIZATION_HOST;
+if (!HOST) {
+  throw new Error("SERIALIZATION_HOST has to name the program to test");
+}
+
+// Under the sanitizers, programs are many times slower and get less to do.
+export const IS_SANITIZED = Boolean(process.env.IS_SANITIZED);
+
+export const ROOT = new URL("../../", import.meta.url).pathname;
+
+// A new folder, which is removed when the test is over. Not below the system's folder of temporary
+// files directly, since programs may look after their own files there.
+export function temporaryFolder(test) {
+  const folder = mkdtempSync(join(tmpdir(), "serve-test-"));
+  test.after(() => rmSync(folder, { recursive: true, force: true }));
+  return folder;
+}
+
+// Waits until `condition` returns something that counts as true, and returns that.
+export async function waitFor(what, condition, seconds = 60) {
+  const latest = Date.now() + seconds * 1000;
+  for (;;) {
+    const result = await condition();
+    if (result) {
+      return result;
+    }
+    if (Date.now() > latest) {
+      throw new Error(`gave up waiting for ${what}`);
+    }
+    await sleep(10);
+  }
+}
+
+export class Program {
+  constructor(test, command, options = {}) {
+    // A test program among them shall report to people, not to the runner of this one.
+    const { NODE_TEST_CONTEXT, ...env } = process.env;
+    this.process = spawn(command[0], command.slice(1), {
+      stdio: ["ignore", "pipe", "pipe"],
+      env,
+      ...options,
+    });
+    this.output = "";
+    this.errors = "";
+    this.process.stdout.setEncoding("utf8").on("data", (text) => (this.output += text));
+    this.process.stderr.setEncoding("utf8").on("data", (text) => (this.errors += text));
+    // Resolves to the exit status, or to the name of the signal that ended the program.
+    this.end = new Promise((resolve, reject) => {
+      this.process.once("error", reject);
+      this.process.once("close", (status, signal) => {
+        this.hasEnded = true;
+        resolve(status ?? signal);
+      });
+    });
+    test.after(() => this.kill());
+  }
+
+  get id() {
+    return this.process.pid;
+  }
+
+  signal(name) {
+    this.process.kill(name);
+  }
+
+  async kill() {
+    this.signal("SIGKILL");
+    await this.end;
+  }
+
+  async waitForOutput(pattern) {
+    return waitFor(`${pattern} in the output of ${this.process.spawnargs.join(" ")}`, () => {
+      const match = this.output.match(pattern);
+      if (!match && this.hasEnded) {
+        throw new Error(`the program has ended: ${this.errors}`);
+      }
+      return match;
+    });
+  }
+}
+
+// A host that serves, and how to reach it.
+export class Host extends Program {
+  // Its own server, without a web page unless `args` ask for one.
+  static async start(test, args, options) {
+    const web = args.includes("--web") || args.includes("--listen") ? [] : ["--no-web"];
+    const host = new Host(test, [HOST, "--log-level", "info", "serve", ...web, ...args], options);
+    await host.waitForOutput(/^websocket: .*\n/m);
+    host.page = host.output.match(/^page: (.*)$/m)?.[1];
+    host.nats = host.output.match(/^nats: (.*)$/m)[1];
+    host.webSocket = host.output.match(/^websocket: (.*)$/m)[1];
+    return host;
+  }
+
+  // The process of the host's message server.
+  async serverId() {
+    const { readFileSync } = await import("node:fs");
+    const ids = readFileSync(`/proc/${this.id}/task/${this.id}/children`, "utf8");
+    return ids;
+  }
+}
