@@ -6,7 +6,9 @@
 #   lib/<"installpath" of the bundle's manifest>
 #   lib/cmake/EditorSerialization/
 #   include/editor_serialization/
+#   lib/systemd/system/                 the program as a service
 #   share/editor-serialization/nats/    configurations for nats-server
+#   share/editor-serialization/systemd/ how nats-server's service takes one of them
 
 include(CMakePackageConfigHelpers)
 
@@ -46,6 +48,12 @@ install(EXPORT EditorSerializationTargets
 
 install(DIRECTORY "${PROJECT_SOURCE_DIR}/packaging/nats"
   DESTINATION "${CMAKE_INSTALL_DATADIR}/editor-serialization")
+install(FILES "${PROJECT_SOURCE_DIR}/packaging/systemd/serialization-host@.service"
+  DESTINATION lib/systemd/system)
+install(FILES "${PROJECT_SOURCE_DIR}/packaging/systemd/nats-server-editor.conf"
+  DESTINATION "${CMAKE_INSTALL_DATADIR}/editor-serialization/systemd")
+install(FILES "${PROJECT_SOURCE_DIR}/docs/deployment.md" "${PROJECT_SOURCE_DIR}/docs/protocol.md"
+  DESTINATION "${CMAKE_INSTALL_DATADIR}/doc/editor-serialization")
 
 set(CPACK_GENERATOR TGZ DEB)
 set(CPACK_PACKAGE_NAME editor-serialization)

@@ -15,6 +15,8 @@ set(CMAKE_LIBRARY_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/lib")
 
 option(EDITOR_SERIALIZATION_WARNINGS_AS_ERRORS "Treat compiler warnings as errors" ON)
 set(EDITOR_SERIALIZATION_SANITIZERS "" CACHE STRING "Sanitizers to build with, as for -fsanitize=")
+# 1 or 0; generator expressions cannot take the list, for its commas.
+string(COMPARE NOTEQUAL "${EDITOR_SERIALIZATION_SANITIZERS}" "" EDITOR_SERIALIZATION_IS_SANITIZED)
 
 add_compile_options(-Wall -Wextra -Wpedantic -Wconversion -Wshadow)
 if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU" AND CMAKE_CXX_COMPILER_VERSION VERSION_LESS 13)

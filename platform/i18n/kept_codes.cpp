@@ -2,6 +2,7 @@
 
 #include <unicode/utf16.h>
 
+#include <cstddef>
 #include <stdexcept>
 #include <string>
 
@@ -10,6 +11,10 @@ namespace platform::i18n::detail {
 namespace {
 
 constexpr auto relaxed = std::memory_order_relaxed;
+
+std::size_t placeOf(std::uint8_t first, std::uint8_t second) {
+    return std::size_t{first} << 8U | second;
+}
 
 bool isOneCharacter(const std::u16string& text) {
     return text.size() == 1 ||
@@ -32,7 +37,7 @@ bool KeptCodes::holdAll(std::string_view bytes, Charset& charset) {
             return false;
         }
         const auto second = static_cast<std::uint8_t>(bytes[i]);
-        kind = pairs_[byte << 8U | second].load(relaxed);
+        kind = pairs_[placeOf(byte, second)].load(relaxed);
         if (kind == unknown) {
             kind = kindOfPair(byte, second, charset);
         }
@@ -66,7 +71,7 @@ KeptCodes::Kind KeptCodes::kindOfPair(std::uint8_t first, std::uint8_t second, C
     } catch (const std::runtime_error&) {
         // malformed, or the beginning of a longer code
     }
-    pairs_[static_cast<std::size_t>(first) << 8U | second].store(kind, relaxed);
+    pairs_[placeOf(first, second)].store(kind, relaxed);
     return kind;
 }
 

@@ -34,13 +34,16 @@ public:
     }
 
     void end() override {
-        std::deque<QueuedMessage> dropped;  // destroyed without the mutex
         {
             const std::lock_guard lock(mutex_);
+            if (ended_) {
+                return;
+            }
             ended_ = true;
-            dropped.swap(messages_);
+            dropped_.swap(messages_);
         }
         changed_.notify_all();
+        dropped_.clear();
     }
 
 private:
@@ -48,6 +51,10 @@ private:
     std::condition_variable changed_;
     std::deque<QueuedMessage> messages_;
     bool ended_ = false;
+
+    // What was left at the end, to be destroyed without the mutex. Made with the queue, because
+    // even an empty one takes memory, and a queue has to end where there is none.
+    std::deque<QueuedMessage> dropped_;
 };
 
 DeliveryQueue::DeliveryQueue(MessageHandler handler, std::size_t threads)

@@ -104,7 +104,8 @@ std::string Serialization::encodePartContent(std::vector<std::uint8_t> bytes,
     bytes = {};
     const DataBuffer encoded = platform::base64encode(std::exchange(image, {}));
     dataUri.reserve(dataUri.size() + encoded.length());
-    return dataUri.append(encoded.view());
+    dataUri += encoded.view();
+    return dataUri;
 }
 
 }  // namespace EditorServices

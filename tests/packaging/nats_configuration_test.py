@@ -155,9 +155,7 @@ class Permissions:
             self.assertEqual(json.load(answer)["max_payload"], LARGEST)
 
 
-class OneMachine(Permissions, WithServer):
-    origins = ("http://127.0.0.1:8080", "http://localhost:8080")
-
+class OneMachineServer(WithServer):
     @classmethod
     def start(cls):
         client, websocket, monitoring = nats_server.free_ports(3)
@@ -167,6 +165,24 @@ class OneMachine(Permissions, WithServer):
             '"127.0.0.1:8222"': f'"127.0.0.1:{monitoring}"',
         })
         return Server(cls.folder, "one-machine.conf", client, websocket, monitoring)
+
+
+class OneMachine(Permissions, OneMachineServer):
+    origins = ("http://127.0.0.1:8080", "http://localhost:8080")
+
+
+class ChangeOfUsers(OneMachineServer):
+    def test_is_taken_over_while_the_server_runs(self):
+        ada = self.connect("ada")
+        users = self.folder / "users.conf"
+        users.write_text(users.read_text().replace("ben", "eve"))
+        self.server.reload()
+        eve = Client(self.server, options={"user": "eve", "pass": "ben's"})
+        self.addCleanup(eve.close)
+        self.assertEqual(eve.subscribe(READ_RESPONSE + "eve.>"), [])
+        with self.assertRaisesRegex(Refused, "Authorization Violation"):
+            self.connect("ben")
+        self.assertEqual(ada.publish(READ_REQUESTS), [])
 
 
 def network_replacements(folder, client, websocket, monitoring):

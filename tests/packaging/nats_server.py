@@ -6,6 +6,7 @@ import json
 import os
 import pathlib
 import shutil
+import signal
 import socket
 import ssl
 import subprocess
@@ -72,11 +73,15 @@ class Server:
         self.log = folder / "log"
         with open(self.log, "wb") as log:
             self.process = subprocess.Popen(command, stdout=log, stderr=log)
-        self.wait_until_ready()
+        self.wait_until_it_says("Server is ready")
 
-    def wait_until_ready(self):
+    def reload(self):
+        self.process.send_signal(signal.SIGHUP)
+        self.wait_until_it_says("Reloaded server configuration")
+
+    def wait_until_it_says(self, text):
         deadline = time.monotonic() + PATIENCE
-        while "Server is ready" not in self.log.read_text():
+        while text not in self.log.read_text():
             if self.process.poll() is not None or time.monotonic() > deadline:
                 raise RuntimeError("no server: " + self.log.read_text())
             time.sleep(0.02)

@@ -400,8 +400,11 @@ void NatsBus::Core::onError(natsStatus status, const std::string& reason,
         return;
     }
     const std::lock_guard lock(sourcesMutex_);
-    std::any_of(sources_.begin(), sources_.end(),
-                [&](const auto& source) { return source->reportDropped(subscription); });
+    for (const auto& source : sources_) {
+        if (source->reportDropped(subscription)) {
+            return;
+        }
+    }
 }
 
 NatsBus::NatsBus(std::shared_ptr<Core> core) : core_(std::move(core)) {}

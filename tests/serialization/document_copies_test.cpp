@@ -1,0 +1,203 @@
+// How often documents are held in memory while the loaded bundle answers requests: the allocations
+// that are as large as documents are counted, and the most bytes that were in use at one time.
+//
+// The figures are those that were reached. One that is exceeded means a new copy of the document on
+// the way; one that is undercut is to be lowered here.
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <mutex>
+#include <string>
+#include <string_view>
+#include <utility>
+
+#include "framework/bundle_runner.h"
+#include "json/parser.h"
+#include "json/serialize.h"
+#include "json/value.h"
+#include "platform/data_buffer.h"
+#include "platform/messaging/in_process_bus.h"
+#include "platform/messaging/transport.h"
+#include "tests/support/counting_malloc.h"
+#include "tests/support/temporary_directory.h"
+
+namespace {
+
+using platform::DataBuffer;
+using platform::messaging::JsonMessage;
+using test::Allocations;
+using testing::SizeIs;
+
+constexpr std::size_t kMegabyte = 1'000'000;
+
+/// `size` bytes of the lines of an XML text.
+std::string xmlText(std::size_t size) {
+    std::string text = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<text>\n";
+    for (std::size_t i = 0; text.size() < size; ++i) {
+        text += "<p n=\"" + std::to_string(i) + "\">It rained on " + std::to_string(i * i % 365) +
+                " days of the year.</p>\n";
+    }
+    return text.append("</text>");
+}
+
+/// `size` bytes that cannot be deflated.
+std::string noise(std::size_t size) {
+    std::string bytes(size, '\0');
+    std::uint64_t state = 88172645463325252U;
+    for (char& byte : bytes) {
+        state ^= state << 13U;
+        state ^= state >> 7U;
+        state ^= state << 17U;
+        byte = static_cast<char>(state >> 32U);
+    }
+    return bytes;
+}
+
+class DocumentCopies : public testing::Test {
+protected:
+    DocumentCopies() {
+        using namespace platform::messaging;
+        setTransport([this](const std::string& clientName, const MessageServiceOptions&) {
+            return bus->connect(clientName);
+        });
+        runner = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
+        client = bus->connect("client").get();
+        observation = bus->observe([this](std::string_view, const JsonMessage& message) {
+            const std::lock_guard lock(mutex);
+            answer = message.payload().substr(0, 100);
+            answerSize = message.payload().size();
+        });
+        // What is made once and stays is none of a document's copies.
+        read("text/plain", writeTextFile("\x82\xA0\x82\xA2 Shift_JIS"));
+        write(textRequest("x", "Shift_JIS"));
+    }
+
+    std::string writeTextFile(std::string_view bytes) {
+        test::writeFile(folder / "text.txt", bytes);
+        return (folder / "text.txt").string();
+    }
+
+    /// What a read of the file at `path` allocates, up to the end of its answer.
+    Allocations read(const char* contentType, const std::string& path) {
+        DataBuffer request = DataBuffer::copyOf(json::serialize(json::Value(
+            json::Object{{"rtcId", "1"}, {"contentType", contentType}, {"filePath", path}})));
+        test::beginAccount();
+        client->publish("/zpr/service/readRequest_cpp", std::move(request)).get();
+        bus->waitUntilIdle();
+        return test::endAccount();
+    }
+
+    /// What a write of the document in `request` allocates, the request itself among it.
+    Allocations write(const std::string& request) {
+        test::beginAccount();
+        client->publish("/zpr/service/writeRequest_cpp", DataBuffer::copyOf(request)).get();
+        bus->waitUntilIdle();
+        return test::endAccount();
+    }
+
+    std::string textRequest(std::string text, const char* charset) const {
+        return json::serialize(
+            json::Value(json::Object{{"rtcId", "1"},
+                                     {"contentType", "text/plain"},
+                                     {"filePath", (folder / "text.txt").string()},
+                                     {"encoding", charset},
+                                     {"content", std::move(text)}}));
+    }
+
+    /// A package of a text of 8 MB and four images of 3 MB.
+    std::string packageRequest() const {
+        const std::string image = noise(3 * kMegabyte);
+        json::Array parts{json::Object{{"partUri", "/text.xml"},
+                                       {"contentType", "application/xml"},
+                                       {"content", xmlText(8 * kMegabyte)},
+                                       {"relationship", json::Null()}}};
+        for (int i = 0; i < 4; ++i) {
+            parts.push_back(json::Object{{"partUri", "/image" + std::to_string(i) + ".png"},
+                                         {"contentType", "image/png"},
+                                         // No data URI, so that it need not be base64.
+                                         {"content", image},
+                                         {"relationship", json::Null()}});
+        }
+        return json::serialize(
+            json::Value(json::Object{{"rtcId", "1"},
+                                     {"contentType", "text/xml"},
+                                     {"filePath", packagePath()},
+                                     {"content", json::Object{{"parts", std::move(parts)},
+                                                              {"relationships", json::Array()}}}}));
+    }
+
+    std::string packagePath() const { return (folder / "package.docx").string(); }
+
+    double timesTheAnswer(const Allocations& allocations) const {
+        return static_cast<double>(allocations.peak) / static_cast<double>(answerSize);
+    }
+
+    test::TemporaryDirectory folder;
+    std::shared_ptr<platform::messaging::InProcessBus> bus =
+        platform::messaging::InProcessBus::create();
+    std::mutex mutex;
+    std::string answer;
+    std::size_t answerSize = 0;
+    std::shared_ptr<platform::messaging::MessageService> client;
+    std::shared_ptr<platform::messaging::Subscription> observation;
+    std::unique_ptr<framework::BundleRunner> runner;
+};
+
+// The file's bytes, the text of the answer, and the message.
+TEST_F(DocumentCopies, OfAUtf8TextThatIsRead) {
+    const std::string path = writeTextFile(xmlText(8 * kMegabyte));
+    const Allocations allocations = read("text/plain", path);
+    ASSERT_GT(answerSize, 8 * kMegabyte);
+    EXPECT_THAT(allocations.large, SizeIs(3));
+    EXPECT_LE(timesTheAnswer(allocations), 2.05);
+}
+
+// The same; the sample by which the charset is told is small.
+TEST_F(DocumentCopies, OfATextInALegacyCharsetThatIsRead) {
+    std::string text;
+    while (text.size() < 8 * kMegabyte) {
+        text +=
+            "\x82\xB1\x82\xEA\x82\xCD\x93\xFA\x96\x7B\x8C\xEA\x82\xCC\x95\xB6\x8F\xCD\x81\x42 "
+            "text\n";
+    }
+    const Allocations allocations = read("text/plain", writeTextFile(text));
+    ASSERT_GT(answerSize, 8 * kMegabyte);
+    EXPECT_THAT(allocations.large, SizeIs(3));
+    EXPECT_LE(timesTheAnswer(allocations), 2.05);
+}
+
+// The request and the text in it.
+TEST_F(DocumentCopies, OfATextThatIsWritten) {
+    for (const char* charset : {"UTF-8", "Shift_JIS"}) {
+        const std::string request = textRequest(xmlText(8 * kMegabyte), charset);
+        const Allocations allocations = write(request);
+        EXPECT_EQ(answer, "true");
+        EXPECT_THAT(allocations.large, SizeIs(2)) << charset;
+        EXPECT_LE(static_cast<double>(allocations.peak) / static_cast<double>(request.size()), 1.97)
+            << charset;
+    }
+}
+
+// Of each part its bytes, of the request each text and the whole; and room for what is deflated.
+TEST_F(DocumentCopies, OfAPackageThatIsWritten) {
+    const std::string request = packageRequest();
+    const Allocations allocations = write(request);
+    EXPECT_EQ(answer, "true");
+    EXPECT_THAT(allocations.large, SizeIs(1 + 5 + 5 + 1));
+    EXPECT_LE(static_cast<double>(allocations.peak) / static_cast<double>(request.size()), 2.25);
+}
+
+// Of each part its bytes and its content; of an image also a buffer, its base64 and that as a data
+// URI; the answer's text and the message.
+TEST_F(DocumentCopies, OfAPackageThatIsRead) {
+    write(packageRequest());
+    ASSERT_EQ(answer, "true");
+    const Allocations allocations = read("text/xml", packagePath());
+    ASSERT_GT(answerSize, 24 * kMegabyte);
+    EXPECT_THAT(allocations.large, SizeIs(2 + 4 * 4 + 2));
+    EXPECT_LE(timesTheAnswer(allocations), 2.05);
+}
+
+}  // namespace
