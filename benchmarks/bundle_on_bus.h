@@ -28,6 +28,7 @@ public:
         using namespace platform::messaging;
         InProcessBusOptions options;
         options.maxQueuedBytes = std::size_t{1} << 32U;
+        options.concurrentChannels = {readRequests};
         bus_ = InProcessBus::create(std::move(options));
         setTransport([bus = bus_](const std::string& clientName, const MessageServiceOptions&) {
             return bus->connect(clientName);
