@@ -5,6 +5,7 @@
 #include <stdlib.h>
 
 #include <charconv>
+#include <cstdint>
 #include <system_error>
 
 #include "platform/i18n/ascii.h"
@@ -35,6 +36,38 @@ double convertOutOfRange(std::string_view text) {
     return strtod_l(std::string(text).c_str(), nullptr, cLocale);
 }
 
+/// Converts a number of few digits: an integer that a double holds exactly, multiplied or divided
+/// by a power of ten that it holds exactly too, is rounded once, and so correctly. Returns whether
+/// `text` is one.
+bool convertShort(std::string_view text, double& value) {
+    constexpr std::size_t maxDigits = 15;
+    constexpr double powersOfTen[] = {1e0, 1e1, 1e2,  1e3,  1e4,  1e5,  1e6,  1e7,
+                                      1e8, 1e9, 1e10, 1e11, 1e12, 1e13, 1e14, 1e15};
+    const bool negative = text.starts_with('-');
+    const std::string_view number = text.substr(negative ? 1 : 0);
+    if (number.size() > maxDigits)
+        return false;
+    std::uint64_t digits = 0;
+    std::size_t i = 0;
+    const auto readDigits = [&] {
+        const std::size_t start = i;
+        for (; i < number.size() && platform::i18n::isdigit_ascii(number[i]); ++i)
+            digits = digits * 10 + static_cast<std::uint64_t>(number[i] - '0');
+        return i - start;
+    };
+    readDigits();
+    std::size_t fraction = 0;
+    if (i < number.size() && number[i] == '.') {
+        ++i;
+        fraction = readDigits();
+    }
+    if (i != number.size())
+        return false;
+    const double magnitude = static_cast<double>(digits) / powersOfTen[fraction];
+    value = negative ? -magnitude : magnitude;
+    return true;
+}
+
 }  // namespace
 
 double string_to_double(std::string_view text) {
@@ -43,6 +76,8 @@ double string_to_double(std::string_view text) {
     if (text.size() == sign || !platform::i18n::isdigit_ascii(text[sign]))
         return 0;
     double value = 0;
+    if (convertShort(text, value))
+        return value;
     const auto result = std::from_chars(text.data(), text.data() + text.size(), value);
     return result.ec == std::errc::result_out_of_range ? convertOutOfRange(text) : value;
 }

@@ -16,16 +16,20 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
+#include <cstring>
 #include <exception>
 #include <forward_list>
 #include <limits>
 #include <stack>
 #include <system_error>
+#include <type_traits>
 #include <utility>
+#include <vector>
 
 #include "json/conversions.h"
 #include "json/string_kernels.h"
 #include "json/text_memory.h"
+#include "json/word_bytes.h"
 #include "platform/i18n/ascii.h"
 
 namespace json {
@@ -44,6 +48,13 @@ bool at(const Input& input, char c) {
 
 std::string_view rest(const Input& input) {
     return {input.position, input.end};
+}
+
+/// As skipWhitespace, but quicker where there is none, which is usual.
+void skipAnyWhitespace(Input& input) {
+    const bool mayBeAny = !atEnd(input) && (*input.position <= ' ' || *input.position == '/');
+    if (mayBeAny)
+        skipWhitespace(input);
 }
 
 // ---- Strings ----
@@ -108,6 +119,19 @@ Status parseContent(Input& input, const char* end, char*& out, char* outEnd) {
 /// Parses a string, of which the opening quote is there. After a fault `text` is undefined.
 Status parseQuoted(Input& input, std::string& text) {
     const char* const start = ++input.position;
+    if (input.end - start >= detail::shortLength) {
+        // Most strings other than documents, and nearly all keys.
+        const std::ptrdiff_t length = detail::lengthOfShort(start);
+        if (length < detail::shortLength) {
+            // A copy of a fixed length, of which the rest is cut off.
+            detail::overwrite(text, detail::shortLength - 1, [&](char* memory) {
+                std::memcpy(memory, start, detail::shortLength - 1);
+                return static_cast<std::size_t>(length);
+            });
+            input.position += length + 1;
+            return Status::success;
+        }
+    }
     const detail::StringExtent extent = detail::stringKernels().measure(start, input.end);
     const char* const end = extent.end;
     Status status = Status::success;
@@ -215,7 +239,7 @@ Status readIntegers(Input& input, Take take) {
     if (!at(input, '['))
         return Status::notArray;
     ++input.position;
-    skipWhitespace(input);
+    skipAnyWhitespace(input);
     if (at(input, ']')) {
         ++input.position;
         return Status::success;
@@ -229,7 +253,7 @@ Status readIntegers(Input& input, Take take) {
         if (atNonInteger(input))
             return Status::badTypedElement;
         take(integer);
-        skipWhitespace(input);
+        skipAnyWhitespace(input);
         if (atEnd(input))
             return Status::endOfInput;
         if (atNonInteger(input))
@@ -240,7 +264,7 @@ Status readIntegers(Input& input, Take take) {
         ++input.position;
         if (separator == ']')
             return Status::success;
-        skipWhitespace(input);
+        skipAnyWhitespace(input);
     }
 }
 
@@ -281,8 +305,8 @@ public:
     Status parse(Value& root) {
         Status status = startValue(root);
         while (status == Status::success && !open.empty()) {
-            status = open.top().value->is<Array>() ? continueArray(open.top())
-                                                   : continueObject(open.top());
+            OpenContainer& innermost = open.top();
+            status = innermost.isArray ? continueArray(innermost) : continueObject(innermost);
         }
         return status;
     }
@@ -292,9 +316,11 @@ private:
     /// first, to where the first element begins.
     struct OpenContainer {
         Value* value;
+        bool isArray;
         bool hasElements = false;
 
         // The rest is for objects.
+        bool inOrder = true;       // each key so far comes behind the one before
         bool dropsMember = false;  // the value of the latest member is the front of `dropped`
         bool dataChecked = false;  // `data` is known to be an array of integers
         IntegerType type = IntegerType::none;  // what the latest "kqtype" that names a type names
@@ -323,7 +349,8 @@ private:
     Status closeObject(OpenContainer& container);
 
     Input& input;
-    std::stack<OpenContainer> open;    // from the outermost to the innermost
+    std::stack<OpenContainer, std::vector<OpenContainer>>
+        open;                          // from the outermost to the innermost
     std::forward_list<Value> dropped;  // values of members whose key was there, the innermost first
 };
 
@@ -372,19 +399,19 @@ Status TreeParser::startLiteral(std::string_view literal, Value meaning, Value& 
 template <typename Container>
 Status TreeParser::startContainer(Value& value, char closing) {
     ++input.position;
-    skipWhitespace(input);
+    skipAnyWhitespace(input);
     if (atEnd(input))
         return Status::endOfInput;
     value.emplace<Container>();
     if (*input.position == closing)
         ++input.position;
     else
-        open.push({.value = &value});
+        open.push({.value = &value, .isArray = std::is_same_v<Container, Array>});
     return Status::success;
 }
 
 Status TreeParser::skipSeparator(char closing, Status fault, bool& closed) {
-    skipWhitespace(input);
+    skipAnyWhitespace(input);
     if (atEnd(input))
         return Status::endOfInput;
     closed = *input.position == closing;
@@ -392,7 +419,7 @@ Status TreeParser::skipSeparator(char closing, Status fault, bool& closed) {
         return fault;
     ++input.position;
     if (!closed)
-        skipWhitespace(input);
+        skipAnyWhitespace(input);
     return Status::success;
 }
 
@@ -408,7 +435,12 @@ Status TreeParser::continueArray(OpenContainer& container) {
         }
     }
     container.hasElements = true;
-    return startValue(container.value->get<Array>().emplace_back());
+    Array& array = container.value->get<Array>();
+    // After one element, which needs little memory, comes room for several.
+    constexpr std::size_t usualCapacity = 4;
+    if (array.size() == 1)
+        array.reserve(usualCapacity);
+    return startValue(array.emplace_back());
 }
 
 Status TreeParser::continueObject(OpenContainer& container) {
@@ -427,8 +459,9 @@ Status TreeParser::continueObject(OpenContainer& container) {
     std::string key;
     if (const Status status = parseKey(key); status != Status::success)
         return status;
-    const bool isType = key == "kqtype";
-    const bool isData = key == "kqdata";
+    const bool mayBeTyped = key.starts_with("kq");
+    const bool isType = mayBeTyped && key == "kqtype";
+    const bool isData = mayBeTyped && key == "kqdata";
     Value& value = memberValue(container, std::move(key));
     if (isData)
         return startData(container, value);
@@ -440,15 +473,19 @@ Status TreeParser::continueObject(OpenContainer& container) {
 
 /// Parses the key of a member and moves to where its value begins.
 Status TreeParser::parseKey(std::string& key) {
-    if (const Status status = parseString(input, key); status != Status::success)
+    if (atEnd(input))
+        return Status::endOfInput;
+    if (!at(input, '"'))
+        return Status::notString;
+    if (const Status status = parseQuoted(input, key); status != Status::success)
         return status;
-    skipWhitespace(input);
+    skipAnyWhitespace(input);
     if (atEnd(input))
         return Status::endOfInput;
     if (!at(input, ':'))
         return Status::noColon;
     ++input.position;
-    skipWhitespace(input);
+    skipAnyWhitespace(input);
     return atEnd(input) ? Status::endOfInput : Status::success;
 }
 
@@ -457,9 +494,13 @@ Status TreeParser::parseKey(std::string& key) {
 Value& TreeParser::memberValue(OpenContainer& container, std::string key) {
     Object& object = container.value->get<Object>();
     const std::size_t size = object.size();
-    const auto member = object.try_emplace(object.end(), std::move(key));
-    if (object.size() > size)
+    // In order, a member is put behind the last without a search.
+    const auto member = container.inOrder ? object.try_emplace(object.end(), std::move(key))
+                                          : object.emplace(std::move(key), Undefined()).first;
+    if (object.size() > size) {
+        container.inOrder = container.inOrder && std::next(member) == object.end();
         return member->second;
+    }
     container.dropsMember = true;
     return dropped.emplace_front();
 }

@@ -1,7 +1,6 @@
 // The kernels that every machine can run, and the choice among all.
 #include "json/string_kernels.h"
 
-#include <array>
 #include <cstdint>
 #include <vector>
 
@@ -10,6 +9,7 @@
 #endif
 
 #include "json/string_kernel_loops.h"
+#include "json/word_bytes.h"
 
 namespace json::detail {
 
@@ -27,29 +27,19 @@ public:
     void store(char* out) const { __builtin_memcpy(out, words, sizeof words); }
 
     Mask backslashes() const {
-        return maskOf([](std::uint64_t word) { return zeros(word ^ repeated('\\')); });
+        return maskOf([](std::uint64_t word) { return zeroBytes(word ^ repeated('\\')); });
     }
     Mask quotes() const {
-        return maskOf([](std::uint64_t word) { return zeros(word ^ repeated('"')); });
+        return maskOf([](std::uint64_t word) { return zeroBytes(word ^ repeated('"')); });
     }
     Mask specials() const {
         return maskOf([](std::uint64_t word) {
-            return zeros(word ^ repeated('\\')) | zeros(word ^ repeated('"')) |
-                   zeros(word & repeated(0xE0));
+            return zeroBytes(word ^ repeated('\\')) | zeroBytes(word ^ repeated('"')) |
+                   zeroBytes(word & repeated(0xE0));
         });
     }
 
 private:
-    static constexpr std::uint64_t repeated(std::uint8_t byte) {
-        return 0x0101'0101'0101'0101u * byte;
-    }
-
-    /// The highest bit of each byte that is zero.
-    static constexpr std::uint64_t zeros(std::uint64_t word) {
-        constexpr std::uint64_t low = repeated(0x7F);
-        return ~(((word & low) + low) | word | low);
-    }
-
     template <typename Find>
     Mask maskOf(Find find) const {
         Mask mask = 0;

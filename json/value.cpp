@@ -71,6 +71,9 @@ void copyTree(const Value& source, Value& target) {
 /// trees.
 constexpr int recursiveLevels = 32;
 
+/// How many destructors of values that hold others run on this thread, each within the one before.
+thread_local int runningDestructors = 0;
+
 Value& first(Value& container) {
     return container.is<Array>() ? container.get<Array>().front()
                                  : container.get<Object>().begin()->second;
@@ -119,28 +122,6 @@ void unwind(Value& root) noexcept {
     }
 }
 
-/// Empties each container within `container`, so that it can be destroyed without further
-/// recursion.
-void releaseWithin(Value& container, int levels) noexcept {
-    const auto release = [levels](Value& element) noexcept {
-        if (!element.holdsElements())
-            return;
-        if (levels > 0) {
-            releaseWithin(element, levels - 1);
-            element.emplace<Undefined>();
-        } else {
-            unwind(element);
-        }
-    };
-    if (container.is<Array>()) {
-        for (Value& element : container.get<Array>())
-            release(element);
-    } else {
-        for (auto& [key, element] : container.get<Object>())
-            release(element);
-    }
-}
-
 // ---- Comparing ----
 
 using Comparison = std::pair<const Value*, const Value*>;
@@ -180,7 +161,13 @@ Value::Value(const Value& other) : storage(other.holdsElements() ? Storage() : o
 }
 
 void Value::releaseElements() noexcept {
-    releaseWithin(*this, recursiveLevels);
+    if (runningDestructors == recursiveLevels) {
+        unwind(*this);
+        return;
+    }
+    ++runningDestructors;
+    storage.emplace<Undefined>();
+    --runningDestructors;
 }
 
 void Value::throwInvalidConversion(char const* target) const {

@@ -25,6 +25,23 @@ TEST(StringToDouble, ReadsNumbersAsJsonWritesThem) {
     EXPECT_EQ(string_to_double("9007199254740993"), 9007199254740992.0);
 }
 
+TEST(StringToDouble, ReadsShortNumbersAsTheCLibraryDoes) {
+    std::mt19937 random(1);
+    for (int i = 0; i < 200000; ++i) {
+        std::string text = random() % 2 == 0 ? "-" : "";
+        const std::size_t digits = 1 + random() % 18;
+        const std::size_t point = random() % 20;
+        for (std::size_t d = 0; d < digits; ++d) {
+            if (d == point && d != 0)
+                text += '.';
+            text += static_cast<char>('0' + random() % 10);
+        }
+        ASSERT_EQ(std::bit_cast<std::uint64_t>(string_to_double(text)),
+                  std::bit_cast<std::uint64_t>(std::strtod(text.c_str(), nullptr)))
+            << text;
+    }
+}
+
 TEST(StringToDouble, KeepsTheSignOfZero) {
     EXPECT_TRUE(std::signbit(string_to_double("-0")));
     EXPECT_TRUE(std::signbit(string_to_double("-0.0e5")));
