@@ -15,6 +15,7 @@
 #include <utility>
 
 #include "framework/bundle_runner.h"
+#include "futures/future.h"
 #include "host/bundle_location.h"
 #include "host/channels.h"
 #include "host/confinement.h"
@@ -22,6 +23,7 @@
 #include "host/private_folder.h"
 #include "host/standard_streams.h"
 #include "host/stop_signals.h"
+#include "host/unsent_answers.h"
 #include "platform/messaging/nats/nats_bus.h"
 #include "platform/messaging/transport.h"
 
@@ -255,7 +257,10 @@ int runServe(const ServeOptions& options, int output) {
     }
     platform::messaging::setTransport(
         [bus](const std::string& name, const platform::messaging::MessageServiceOptions&) {
-            return bus->connect(name);
+            // The bus is connected, so that this is no waiting.
+            futures::Promise<std::shared_ptr<platform::messaging::MessageService>> client;
+            client.setValue(tellingWhatIsNotSent(bus->connect(name).get()));
+            return client.getFuture();
         });
     const framework::BundleRunner bundle(options.bundle);
     tellHowToConnect(web.get(), server.get(), output);

@@ -62,9 +62,10 @@ private:
 
 TEST_F(UnsentAnswers, AreReplacedByTheReason) {
     auto future = publish(readAnswers, std::string(301, 'x'));
-    EXPECT_THAT(received(),
-                ElementsAre(MatchesRegex(
-                    R"(\{"exception":"Message of 301 bytes on .* was not accepted.*","status":false\})")));
+    EXPECT_THAT(
+        received(),
+        ElementsAre(MatchesRegex(
+            R"(\{"exception":"Message of 301 bytes on .* was not accepted.*","status":false\})")));
     EXPECT_THROW(future.get(), std::runtime_error);
 }
 

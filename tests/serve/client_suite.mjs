@@ -134,6 +134,16 @@ test("a large document is written and read byte for byte", async (t) => {
   assert.ok(answer.parts[0].content === image.content);
 });
 
+test("a document that is larger than the server takes is told of", async (t) => {
+  const client = await connected(t);
+  const file = join(target.folder, "too large.txt");
+  writeFileSync(file, "x".repeat(65 * 2 ** 20));
+  const answer = await client.read(file);
+  assert.equal(answer.status, false);
+  assert.match(answer.exception, /68157465 bytes.*67108864/s);
+  assert.equal((await client.read(example("library-notice.shift_jis.txt"))).status, true);
+});
+
 test("a program with a plain socket is served", async (t) => {
   const file = example("market-list.utf-8.txt");
   const client = await RawClient.connect(target.nats);
