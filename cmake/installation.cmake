@@ -7,6 +7,7 @@
 #   lib/cmake/EditorSerialization/
 #   include/editor_serialization/
 #   lib/systemd/system/                 the program as a service
+#   share/editor-serialization/web/     the page that the program serves to browsers
 #   share/editor-serialization/nats/    configurations for nats-server
 #   share/editor-serialization/systemd/ how nats-server's service takes one of them
 
@@ -14,6 +15,16 @@ include(CMakePackageConfigHelpers)
 
 install(TARGETS serialization_host)
 install(TARGETS com_vorplanex_serialization LIBRARY DESTINATION "${BUNDLE_INSTALL_FOLDER}")
+
+# The page, and of what npm has installed for it what it loads.
+install(DIRECTORY "${PROJECT_SOURCE_DIR}/web/" DESTINATION "${WEB_INSTALL_FOLDER}"
+  FILES_MATCHING PATTERN "*.html" PATTERN "*.css" PATTERN "*.js" PATTERN "*.svg"
+  PATTERN node_modules EXCLUDE)
+set(page_library node_modules/nats.ws)
+install(FILES "${PROJECT_SOURCE_DIR}/web/${page_library}/esm/nats.js"
+  DESTINATION "${WEB_INSTALL_FOLDER}/${page_library}/esm" OPTIONAL)
+install(FILES "${PROJECT_SOURCE_DIR}/web/${page_library}/LICENSE"
+  DESTINATION "${WEB_INSTALL_FOLDER}/${page_library}" OPTIONAL)
 
 set(header_folder "${CMAKE_INSTALL_INCLUDEDIR}/editor_serialization")
 install(TARGETS editor_futures editor_messaging EXPORT EditorSerializationTargets

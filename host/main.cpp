@@ -145,7 +145,8 @@ void declareWeb(CLI::App& command, host::WebOptions& options) {
     CLI::Option* const none = command.add_flag("!--no-web", options.isServed, "Serve no web page");
     command
         .add_option("--web", options.folder,
-                    "The folder to serve to browsers (default: a page that reads documents)")
+                    "The folder to serve to browsers (default: a page that reads documents; none "
+                    "with --nats)")
         ->type_name("DIR")
         ->check(CLI::ExistingDirectory)
         ->excludes(none);
@@ -189,7 +190,14 @@ void declareServe(CLI::App& command, host::ServeOptions& options) {
     declareWeb(command, options.web);
     declareOwnServer(command, options.ownServer,
                      declareOtherServers(command, options.otherServers));
-    command.final_callback([&options] { requireDistinctHosts(options); });
+    command.final_callback([&command, &options] {
+        // A worker among others need not be where browsers go.
+        if (!options.otherServers.urls.empty() && command.count("--web") == 0 &&
+            command.count("--listen") == 0) {
+            options.web.isServed = false;
+        }
+        requireDistinctHosts(options);
+    });
 }
 
 void declareStdio(CLI::App& command, host::StdioOptions& options) {

@@ -32,11 +32,11 @@ using Clock = std::chrono::steady_clock;
 
 // What one client can use.
 constexpr std::size_t largestHead = 16 * 1024;  // of a request: its line and headers
-constexpr std::chrono::seconds longestHead{5};
+constexpr std::chrono::seconds longestHead{3};
 constexpr std::chrono::seconds longestAnswer{60};
 
 // What all of them can.
-constexpr std::size_t threads = 4;
+constexpr std::size_t threads = 16;
 constexpr std::ptrdiff_t mostConnections = 64;
 
 // Pages run their own scripts and no others, stand in no frame of another site's, and connect to

@@ -1,11 +1,46 @@
 // A host with a message server of its own, from its start to its end.
 import assert from "node:assert/strict";
-import { copyFileSync, existsSync, readFileSync, readdirSync, writeFileSync } from "node:fs";
+import {
+  existsSync,
+  mkdirSync,
+  readFileSync,
+  readdirSync,
+  statSync,
+  symlinkSync,
+  writeFileSync,
+} from "node:fs";
+import { createServer } from "node:net";
 import { join } from "node:path";
 import { test } from "node:test";
+import { setTimeout as sleep } from "node:timers/promises";
 
-import { Client } from "./client.mjs";
-import { Host, HOST, IS_SANITIZED, Program, ROOT, temporaryFolder, waitFor } from "./processes.mjs";
+import { Client, READ_REQUEST, encode, parseUrl } from "./client.mjs";
+import {
+  HOST,
+  Host,
+  IS_SANITIZED,
+  Program,
+  ROOT,
+  isRunning,
+  temporaryFolder,
+  waitFor,
+} from "./processes.mjs";
+import { RawClient } from "./raw_client.mjs";
+
+const UNRESPONSIVE_BUNDLE = process.env.UNRESPONSIVE_BUNDLE;
+
+async function connected(test, host, options) {
+  const client = await Client.connect(host.webSocket, options);
+  test.after(() => client.close());
+  return client;
+}
+
+// A host whose message server's files are in a folder of the test's.
+async function hostWithRuntimeFolder(test, args) {
+  const folder = temporaryFolder(test);
+  const host = await Host.start(test, args, { XDG_RUNTIME_DIR: folder });
+  return { host, folder };
+}
 
 test("it serves what any server with workers does", async (t) => {
   const folder = temporaryFolder(t);
@@ -17,4 +52,166 @@ test("it serves what any server with workers does", async (t) => {
     ...(IS_SANITIZED ? ["--megabytes", "5", "--connections", "200"] : []),
   ]);
   assert.equal(await suite.end, 0, `${suite.output}\n${suite.errors}\n${host.errors}`);
+});
+
+test("its password is in nobody's sight", async (t) => {
+  const { host, folder } = await hostWithRuntimeFolder(t, ["--listen", "127.0.0.1:0"]);
+  const { password } = parseUrl(host.webSocket);
+  assert.match(password, /^[0-9a-f]{64}$/);
+  const client = await connected(t, host);
+  await client.read("/no/such/file");
+  await fetch(host.page);
+  for (const id of [host.id, host.serverId()]) {
+    assert.ok(!readFileSync(`/proc/${id}/cmdline`, "latin1").includes(password));
+    assert.ok(!readFileSync(`/proc/${id}/environ`, "latin1").includes(password));
+  }
+  assert.ok(!host.errors.includes(password));
+  const [name, ...others] = readdirSync(folder);
+  assert.deepEqual(others, []);
+  assert.equal(statSync(join(folder, name)).mode & 0o777, 0o700);
+  for (const file of readdirSync(join(folder, name))) {
+    assert.equal(statSync(join(folder, name, file)).mode & 0o077, 0, file);
+  }
+});
+
+test("its password is another each time", async (t) => {
+  const hosts = [await Host.start(t, []), await Host.start(t, [])];
+  const [one, other] = hosts.map((host) => parseUrl(host.nats).password);
+  assert.notEqual(one, other);
+});
+
+test("it takes the ports that it is told to", async (t) => {
+  const other = createServer().listen(0, "127.0.0.1");
+  await new Promise((resolve) => other.once("listening", resolve));
+  const { port } = other.address();
+  const refused = new Program(t, [HOST, "serve", "--no-web", "--port", `${port}`]);
+  assert.equal(await refused.end, 1);
+  assert.match(refused.errors, /nats-server does not start .*address already in use/);
+  other.close();
+  const host = await Host.start(t, ["--port", `${port}`]);
+  assert.equal(parseUrl(host.nats).port, port);
+});
+
+test("a page of an allowed origin connects, and of no other", async (t) => {
+  const host = await Host.start(t, [
+    ...["--listen", "127.0.0.1:0", "--allow-origin", "http://localhost:3000"],
+    ...["--allow-origin", "https://example.org"],
+  ]);
+  for (const origin of [new URL(host.page).origin, "http://localhost:3000", "https://example.org"]) {
+    (await RawClient.open(host.webSocket, { origin })).close();
+  }
+  for (const origin of ["http://localhost:3001", "http://example.org", "http://127.0.0.1:1"]) {
+    await assert.rejects(RawClient.open(host.webSocket, { origin }), /403 Forbidden/, origin);
+  }
+});
+
+test("a message server that is killed is started again, and clients go on", async (t) => {
+  const host = await Host.start(t, []);
+  const client = await connected(t, host, { maxReconnectAttempts: -1, reconnectTimeWait: 50 });
+  for (let count = 1; count <= 3; ++count) {
+    const id = host.serverId();
+    process.kill(id, "SIGKILL");
+    const answer = await client.read("/no/such/file", "text/plain", { seconds: 1, tries: 30 });
+    assert.equal(answer.status, false);
+    assert.notEqual(host.serverId(), id);
+  }
+  assert.match(host.errors, /nats-server has ended \(signal 9\) and is started again/);
+  assert.match(host.errors, /Connected to NATS again/);
+});
+
+for (const signal of ["SIGTERM", "SIGINT"]) {
+  test(`${signal} has it finish what it has taken`, async (t) => {
+    const { host, folder } = await hostWithRuntimeFolder(t, []);
+    const serverId = host.serverId();
+    const documents = temporaryFolder(t);
+    const file = join(documents, "large.txt");
+    writeFileSync(file, "x".repeat(IS_SANITIZED ? 2_000_000 : 20_000_000));
+    const client = await connected(t, host, { reconnect: false });
+    const answers = Array.from({ length: 5 }, () => client.read(file));
+    await client.connection.flush(); // The server has passed the requests on.
+    host.signal(signal);
+    for (const answer of await Promise.all(answers)) {
+      assert.equal(answer.data.length, statSync(file).size);
+    }
+    assert.equal(await host.end, 0, host.errors);
+    assert.ok(!isRunning(serverId));
+    assert.deepEqual(readdirSync(folder), []);
+  });
+}
+
+test("a second signal ends it at once", async (t) => {
+  const { host, folder } = await hostWithRuntimeFolder(t, ["--bundle", UNRESPONSIVE_BUNDLE]);
+  const serverId = host.serverId();
+  const client = await connected(t, host, { reconnect: false });
+  client.connection.publish(READ_REQUEST, encode("stuck"));
+  await client.connection.flush();
+  await sleep(100);
+  host.signal("SIGTERM");
+  await waitFor("the first signal", () => host.errors.includes("asked to by signal 15"));
+  await sleep(200);
+  assert.ok(!host.hasEnded);
+  host.signal("SIGTERM");
+  assert.equal(await host.end, 1);
+  assert.deepEqual(readdirSync(folder), []);
+  await waitFor("the server's end", () => !isRunning(serverId), 5);
+});
+
+test("its message server goes with it when it is killed", async (t) => {
+  const host = await Host.start(t, []);
+  const serverId = host.serverId();
+  assert.ok(isRunning(serverId));
+  host.signal("SIGKILL");
+  await host.end;
+  await waitFor("the server's end", () => !isRunning(serverId), 5);
+});
+
+test("clients get to no file outside of its roots", async (t) => {
+  const folder = temporaryFolder(t);
+  const [inside, outside] = [join(folder, "inside"), join(folder, "outside")];
+  for (const name of [inside, outside]) {
+    mkdirSync(name);
+    writeFileSync(join(name, "file.txt"), "text\n");
+  }
+  symlinkSync(outside, join(inside, "link"));
+  const host = await Host.start(t, ["--root", inside]);
+  const client = await connected(t, host);
+  assert.equal((await client.read(join(inside, "file.txt"))).data, "text\n");
+  assert.equal(await client.write(join(inside, "new.txt"), "new\n"), true);
+  const paths = [
+    join(outside, "file.txt"),
+    `${inside}/../outside/file.txt`,
+    `${inside}/link/file.txt`,
+    `/proc/self/root${outside}/file.txt`,
+    `/proc/self/cwd/../../../../../../../../..${outside}/file.txt`,
+    "/etc/hostname",
+    "/proc/self/environ",
+  ];
+  for (const path of paths) {
+    assert.deepEqual(await client.read(path), { data: "", status: true }, path);
+    assert.equal(await client.write(path, "changed\n"), false, path);
+  }
+  assert.equal(await client.write(join(outside, "new.txt"), "new\n"), false);
+  assert.ok(!existsSync(join(outside, "new.txt")));
+  assert.equal(readFileSync(join(outside, "file.txt"), "utf8"), "text\n");
+  const document = { parts: [], relationships: [] };
+  const more = { contentType: "text/xml" };
+  assert.equal(await client.write(join(outside, "new.docx"), document, more), false);
+  assert.equal(await client.write(join(inside, "new.docx"), document, more), true);
+});
+
+test("its server's files are closed to clients, and still open to the server", async (t) => {
+  const inside = temporaryFolder(t);
+  const { host, folder } = await hostWithRuntimeFolder(t, ["--root", inside]);
+  const [name] = readdirSync(folder);
+  const client = await connected(t, host, { maxReconnectAttempts: -1, reconnectTimeWait: 50 });
+  assert.deepEqual(await client.read(join(folder, name, "nats-server.conf")), {
+    data: "",
+    status: true,
+  });
+  process.kill(host.serverId(), "SIGKILL");
+  const answer = await client.read("/no/such/file", "text/plain", { seconds: 1, tries: 30 });
+  assert.equal(answer.status, false);
+  host.signal("SIGTERM");
+  assert.equal(await host.end, 0);
+  assert.deepEqual(readdirSync(folder), []);
 });

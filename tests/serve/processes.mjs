@@ -1,6 +1,7 @@
 // Programs that the tests run: hosts, message servers, other test programs.
+import assert from "node:assert/strict";
 import { spawn } from "node:child_process";
-import { mkdtempSync, rmSync } from "node:fs";
+import { mkdtempSync, readFileSync, readdirSync, rmSync } from "node:fs";
 import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { setTimeout as sleep } from "node:timers/promises";
@@ -38,14 +39,22 @@ export async function waitFor(what, condition, seconds = 60) {
   }
 }
 
+export function isRunning(id) {
+  try {
+    // Of a process that has ended and was not collected, no command line is left.
+    return readFileSync(`/proc/${id}/cmdline`).length > 0;
+  } catch {
+    return false;
+  }
+}
+
 export class Program {
-  constructor(test, command, options = {}) {
+  constructor(test, command, environment = {}) {
     // A test program among them shall report to people, not to the runner of this one.
     const { NODE_TEST_CONTEXT, ...env } = process.env;
     this.process = spawn(command[0], command.slice(1), {
       stdio: ["ignore", "pipe", "pipe"],
-      env,
-      ...options,
+      env: { ...env, ...environment },
     });
     this.output = "";
     this.errors = "";
@@ -89,9 +98,9 @@ export class Program {
 // A host that serves, and how to reach it.
 export class Host extends Program {
   // Its own server, without a web page unless `args` ask for one.
-  static async start(test, args, options) {
+  static async start(test, args, environment) {
     const web = args.includes("--web") || args.includes("--listen") ? [] : ["--no-web"];
-    const host = new Host(test, [HOST, "--log-level", "info", "serve", ...web, ...args], options);
+    const host = new Host(test, [HOST, "--log-level", "info", "serve", ...web, ...args], environment);
     await host.waitForOutput(/^websocket: .*\n/m);
     host.page = host.output.match(/^page: (.*)$/m)?.[1];
     host.nats = host.output.match(/^nats: (.*)$/m)[1];
@@ -100,9 +109,11 @@ export class Host extends Program {
   }
 
   // The process of the host's message server.
-  async serverId() {
-    const { readFileSync } = await import("node:fs");
-    const ids = readFileSync(`/proc/${this.id}/task/${this.id}/children`, "utf8");
-    return ids;
+  serverId() {
+    const children = readdirSync(`/proc/${this.id}/task`).flatMap((thread) =>
+      readFileSync(`/proc/${this.id}/task/${thread}/children`, "utf8").split(" ").filter(Boolean),
+    );
+    assert.equal(children.length, 1);
+    return Number(children[0]);
   }
 }
