@@ -35,6 +35,7 @@
 #include "benchmarks/bundle_on_bus.h"
 #include "benchmarks/peer_process.h"
 #include "benchmarks/scratch_folder.h"
+#include "host/freed_memory.h"
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "json/value.h"
@@ -346,6 +347,7 @@ void addSmallRequests() {
 }  // namespace benchmarks
 
 int main(int argc, char** argv) {
+    host::keepFreedMemory();
     benchmark::Initialize(&argc, argv);
     if (benchmark::ReportUnrecognizedArguments(argc, argv)) {
         return 1;

@@ -15,6 +15,7 @@
 
 #include "benchmarks/bundle_on_bus.h"
 #include "benchmarks/scratch_folder.h"
+#include "host/freed_memory.h"
 #include "json/serialize.h"
 #include "json/value.h"
 
@@ -205,6 +206,7 @@ void addRequests() {
 }  // namespace benchmarks
 
 int main(int argc, char** argv) {
+    host::keepFreedMemory();
     benchmark::Initialize(&argc, argv);
     if (benchmark::ReportUnrecognizedArguments(argc, argv)) {
         return 1;

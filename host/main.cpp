@@ -19,6 +19,7 @@
 #include "host/bundle_location.h"
 #include "host/exit_status.h"
 #include "host/file_descriptor.h"
+#include "host/freed_memory.h"
 #include "host/memory_limit.h"
 #include "host/nats_configuration.h"
 #include "host/read_command.h"
@@ -302,6 +303,7 @@ int runCommandLine(int argc, char** argv) {
         return explain(app, error, output.get());
     }
     setUpLogging(line.logLevel);
+    host::keepFreedMemory();
     if (line.memoryLimit != 0) {
         host::limitMemory(line.memoryLimit);
     }
