@@ -4,9 +4,13 @@
 
 #include <algorithm>
 #include <cstddef>
+#include <cstdlib>
+#include <memory>
 #include <mutex>
+#include <new>
 #include <optional>
 #include <stdexcept>
+#include <string>
 #include <string_view>
 #include <utility>
 
@@ -26,53 +30,93 @@ using platform::messaging::JsonMessage;
 
 constexpr const char* packageContentType = "text/xml";
 
-std::string readToEnd(int input) {
-    constexpr std::size_t piece = 64 * 1024;
-    std::string content;
-    for (std::size_t length = 0;;) {
-        content.resize(std::max(length * 2, piece));
-        const std::size_t count = readSome(input, content.data() + length, content.size() - length);
-        length += count;
-        if (count == 0) {
-            content.resize(length);
-            return content;
+struct Free {
+    void operator()(char* memory) const noexcept { std::free(memory); }
+};
+
+// All that the standard input holds. Grows without copies where the system can move memory.
+class Content {
+public:
+    explicit Content(int input) {
+        constexpr std::size_t smallestRoom = 64 * 1024;
+        for (std::size_t room = 0;;) {
+            if (length_ == room) {
+                room = std::max(room * 2, smallestRoom);
+                grow(room);
+            }
+            const std::size_t count = readSome(input, memory_.get() + length_, room - length_);
+            if (count == 0) {
+                return;
+            }
+            length_ += count;
         }
     }
-}
 
-// The JSON of a document package, as a read request is answered with it, or nothing.
-std::optional<json::Object> packageIn(std::string_view content) {
-    json::Object document = json::parse(content);
-    if (document["parts"].is<json::Array>() && document["relationships"].is<json::Array>()) {
-        return document;
+    std::string_view text() const { return {memory_.get(), length_}; }
+
+private:
+    void grow(std::size_t size) {
+        char* const grown = static_cast<char*>(std::realloc(memory_.get(), size));
+        if (grown == nullptr) {
+            throw std::bad_alloc();
+        }
+        static_cast<void>(memory_.release());
+        memory_.reset(grown);
+    }
+
+    std::unique_ptr<char, Free> memory_;
+    std::size_t length_ = 0;
+};
+
+// The text of the document package that `content` begins with, as a read request is answered with
+// it; or nothing.
+std::optional<std::string_view> packageIn(std::string_view content) {
+    json::Input input{content.data(), content.data() + content.size()};
+    json::Object document;
+    if (json::parseObject(input, document) == json::Status::success &&
+        document["parts"].is<json::Array>() && document["relationships"].is<json::Array>()) {
+        return content.substr(0, static_cast<std::size_t>(input.position - content.data()));
     }
     return std::nullopt;
 }
 
-platform::DataBuffer requestFor(const WriteOptions& options, std::string content) {
+// The text of `request` with a last member "content" of the JSON text `content`. The package, which
+// may be large, becomes part of the request as it stands.
+platform::DataBuffer withContent(json::Object request, std::string_view content) {
+    std::string begin = json::serialize(std::move(request));
+    begin.back() = ',';
+    begin += "\"content\":";
+    platform::DataBuffer text(begin.size() + content.size() + 1);
+    char* end = std::copy(begin.begin(), begin.end(), text.data());
+    end = std::copy(content.begin(), content.end(), end);
+    *end = '}';
+    text.setLength(text.capacity());
+    return text;
+}
+
+platform::DataBuffer requestFor(const WriteOptions& options, const Content& content) {
     json::Object request{{"rtcId", "0"}, {"filePath", options.file}};
     const bool mayBePackage =
         options.contentType.empty() || options.contentType == packageContentType;
-    if (std::optional<json::Object> document = mayBePackage ? packageIn(content) : std::nullopt) {
+    if (const auto document = mayBePackage ? packageIn(content.text()) : std::nullopt) {
         request["contentType"] = packageContentType;
-        request["content"] = std::move(*document);
-        content = {};
-    } else if (options.contentType == packageContentType) {
+        return withContent(std::move(request), *document);
+    }
+    if (options.contentType == packageContentType) {
         throw std::runtime_error(
             "The content is no document package: JSON with the arrays \"parts\" "
             "and \"relationships\" is expected");
-    } else {
-        request["contentType"] = options.contentType.empty() ? "text/plain" : options.contentType;
-        request["content"] = std::move(content);
-        request["encoding"] = options.encoding;
     }
-    return platform::DataBuffer::copyOf(json::serialize(std::move(request)));
+    request["contentType"] = options.contentType.empty() ? "text/plain" : options.contentType;
+    request["encoding"] = options.encoding;
+    return withContent(std::move(request),
+                       json::serialize(json::Value(std::string(content.text()))));
 }
 
 }  // namespace
 
 int runWrite(const WriteOptions& options, int input, int output) {
-    platform::DataBuffer request = requestFor(options, readToEnd(input));
+    platform::DataBuffer request = requestFor(options, Content(input));
     std::mutex mutex;
     std::optional<JsonMessage> answer;  // guarded by mutex
     BundleHost host(options.bundle, request.length(), [&](const JsonMessage& message) {
