@@ -21,6 +21,7 @@ function(project_bundle target)
   target_include_directories(${target} PRIVATE "${PROJECT_SOURCE_DIR}")
   target_compile_definitions(${target} PRIVATE US_BUNDLE_NAME=${arg_NAME})
   target_link_libraries(${target} PRIVATE EditorSerialization::framework_headers ${arg_LINKS})
+  project_hardening(${target})
   target_link_options(${target} PRIVATE "LINKER:--version-script=${exports}")
   if(NOT EDITOR_SERIALIZATION_SANITIZERS)
     # The sanitizers' own functions are found in the host.

@@ -195,9 +195,7 @@ def network_replacements(folder, client, websocket, monitoring):
     }
 
 
-class Network(Permissions, WithServer):
-    origins = ("https://editor.example.org",)
-
+class NetworkServer(WithServer):
     @classmethod
     def start(cls):
         nats_server.make_certificates(cls.folder)
@@ -205,6 +203,10 @@ class Network(Permissions, WithServer):
         ports = nats_server.free_ports(3)
         nats_server.write_configuration(cls.folder, network_replacements(cls.folder, *ports))
         return Server(cls.folder, "network.conf", *ports)
+
+
+class Network(Permissions, NetworkServer):
+    origins = ("https://editor.example.org",)
 
     def test_nobody_gets_in_unencrypted(self):
         with self.assertRaises(Refused):

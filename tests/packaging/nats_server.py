@@ -100,6 +100,7 @@ class Client:
 
     def __init__(self, server, user=None, password=None, context=None, options=None):
         self.messages = []
+        self.subscriptions = 0
         self.socket = socket.create_connection(("127.0.0.1", server.client_port), PATIENCE)
         self.socket.setsockopt(socket.IPPROTO_TCP, socket.TCP_NODELAY, 1)
         self.file = self.socket.makefile("rb")
@@ -156,7 +157,8 @@ class Client:
         return self.settle()
 
     def subscribe(self, channel, group=""):
-        self.send(f"SUB {channel} {group} 1\r\n".encode())
+        self.subscriptions += 1
+        self.send(f"SUB {channel} {group} {self.subscriptions}\r\n".encode())
         return self.settle()
 
     def wait_for_message(self):

@@ -1,0 +1,115 @@
+#!/usr/bin/env python3
+"""Runs the host as a worker of servers with the packaged configurations.
+
+Usage: worker_test.py PROGRAM"""
+
+import json
+import subprocess
+import sys
+import time
+import unittest
+
+import nats_server
+from nats_configuration_test import (NOTIFICATIONS, READ_REQUESTS, READ_RESPONSE, WRITE_REQUESTS,
+                                     WRITE_RESPONSE, NetworkServer, OneMachineServer)
+from nats_server import Client
+
+PROGRAM = sys.argv[1]
+
+
+class Worker:
+    """A worker keeps to its folder, and its answers reach who asked."""
+
+    @classmethod
+    def setUpClass(cls):
+        super().setUpClass()
+        password = cls.folder / "password"
+        password.write_text(nats_server.PASSWORDS["worker"] + "\n")
+        cls.documents = cls.folder / "documents"
+        cls.documents.mkdir()
+        (cls.documents / "text").write_text("inside")
+        (cls.folder / "text").write_text("outside")
+        scheme = "tls" if cls.context else "nats"
+        authority = ["--tls-ca", str(cls.folder / "ca.crt")] if cls.context else []
+        worker = subprocess.Popen(
+            [PROGRAM, "serve", "--no-web", "--root", str(cls.documents),
+             "--nats", f"{scheme}://localhost:{cls.server.client_port}",
+             "--nats-user", "worker", "--nats-password-file", str(password), *authority])
+        cls.addClassCleanup(cls.stop, worker)
+        cls.wait_until_it_answers()
+
+    @classmethod
+    def wait_until_it_answers(cls):
+        """A request that no worker takes is lost, so it is sent again and again."""
+        ada = Client(cls.server, "ada", context=cls.context)
+        ada.subscribe(READ_RESPONSE + "ada.0")
+        request = json.dumps({"rtcId": "ada.0", "contentType": "", "filePath": ""}).encode()
+        deadline = time.monotonic() + nats_server.PATIENCE
+        while not ada.messages:
+            assert time.monotonic() < deadline, "no answer"
+            ada.publish(READ_REQUESTS, request)
+            time.sleep(0.05)
+            ada.settle()
+        ada.close()
+
+    @staticmethod
+    def stop(worker):
+        worker.terminate()
+        status = worker.wait(nats_server.PATIENCE)
+        assert status == 0, f"the worker ended with {status}"
+
+    def setUp(self):
+        self.ada = self.connect("ada")
+        for channel in (READ_RESPONSE + "ada.1", WRITE_RESPONSE + "ada.1", NOTIFICATIONS):
+            self.assertEqual(self.ada.subscribe(channel), [])
+
+    def request(self, channel, **keys):
+        request = {"rtcId": "ada.1", "contentType": "text/plain"} | keys
+        self.assertEqual(self.ada.publish(channel, json.dumps(request).encode()), [])
+
+    def read(self, path):
+        self.request(READ_REQUESTS, filePath=str(path))
+        return self.ada.wait_for_message()
+
+    def write(self, path):
+        self.request(WRITE_REQUESTS, filePath=str(path), content="new", encoding="UTF-8")
+        return [self.ada.wait_for_message(), self.ada.wait_for_message()]
+
+    def test_reads_below_its_root(self):
+        self.assertEqual(self.read(self.documents / "text"),
+                         (READ_RESPONSE + "ada.1", b'{"data":"inside","status":true}'))
+
+    def test_takes_what_is_outside_for_what_may_not_be_opened(self):
+        for path in (self.folder / "text", self.documents / "../text"):
+            self.assertEqual(self.read(path),
+                             (READ_RESPONSE + "ada.1", b'{"data":"","status":true}'))
+
+    def test_writes_below_its_root_and_tells_of_it(self):
+        path = self.documents / "new"
+        notification, answer = self.write(path)
+        self.assertEqual(notification[0], NOTIFICATIONS)
+        self.assertEqual(json.loads(notification[1]), {"filePath": str(path),
+                                                       "isExistingFile": False})
+        self.assertEqual(answer, (WRITE_RESPONSE + "ada.1", b"true"))
+        self.assertEqual(path.read_text(), "new")
+
+    def test_writes_nothing_outside(self):
+        for name in ("text", "new"):
+            self.assertEqual(self.write(self.folder / name)[1],
+                             (WRITE_RESPONSE + "ada.1", b"false"))
+        self.assertEqual((self.folder / "text").read_text(), "outside")
+        self.assertFalse((self.folder / "new").exists())
+
+
+class OnOneMachine(Worker, OneMachineServer):
+    pass
+
+
+class OnANetwork(Worker, NetworkServer):
+    pass
+
+
+if __name__ == "__main__":
+    tests = unittest.TestSuite(unittest.defaultTestLoader.loadTestsFromTestCase(case)
+                               for case in (OnOneMachine, OnANetwork))
+    sys.exit(not unittest.TextTestRunner(verbosity=2).run(tests).wasSuccessful())
