@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # Checks that programs and shared libraries have the protections that they are to be shipped with.
 # Usage: hardening.sh FILE...
-set -uo pipefail
+set -u
 failures=0
 
 # has FILE WHAT PATTERN COMMAND...: the output of COMMAND, which is about FILE, holds PATTERN.

@@ -68,11 +68,14 @@ class Server:
         self.client_port = client_port
         self.websocket_port = websocket_port
         self.monitoring_port = monitoring_port
-        command = [server_program(), "-c", str(folder / file)]
-        subprocess.run([*command, "-t"], check=True, capture_output=True)
+        self.command = [server_program(), "-c", str(folder / file)]
+        subprocess.run([*self.command, "-t"], check=True, capture_output=True)
         self.log = folder / "log"
+        self.start()
+
+    def start(self):
         with open(self.log, "wb") as log:
-            self.process = subprocess.Popen(command, stdout=log, stderr=log)
+            self.process = subprocess.Popen(self.command, stdout=log, stderr=log)
         self.wait_until_it_says("Server is ready")
 
     def reload(self):

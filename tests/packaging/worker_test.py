@@ -101,6 +101,17 @@ class Worker:
         self.assertFalse((self.folder / "new").exists())
 
 
+class AfterALostServer(Worker, OneMachineServer):
+    """The worker connects again, and is kept to its folder as before."""
+
+    @classmethod
+    def setUpClass(cls):
+        super().setUpClass()
+        cls.server.kill()
+        cls.server.start()
+        cls.wait_until_it_answers()
+
+
 class OnOneMachine(Worker, OneMachineServer):
     pass
 
@@ -111,5 +122,5 @@ class OnANetwork(Worker, NetworkServer):
 
 if __name__ == "__main__":
     tests = unittest.TestSuite(unittest.defaultTestLoader.loadTestsFromTestCase(case)
-                               for case in (OnOneMachine, OnANetwork))
+                               for case in (OnOneMachine, OnANetwork, AfterALostServer))
     sys.exit(not unittest.TextTestRunner(verbosity=2).run(tests).wasSuccessful())
