@@ -32,7 +32,7 @@ class Worker:
         scheme = "tls" if cls.context else "nats"
         authority = ["--tls-ca", str(cls.folder / "ca.crt")] if cls.context else []
         worker = subprocess.Popen(
-            [PROGRAM, "serve", "--no-web", "--root", str(cls.documents),
+            [PROGRAM, "serve", "--root", str(cls.documents),
              "--nats", f"{scheme}://localhost:{cls.server.client_port}",
              "--nats-user", "worker", "--nats-password-file", str(password), *authority])
         cls.addClassCleanup(cls.stop, worker)
