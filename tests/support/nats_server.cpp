@@ -1,13 +1,8 @@
 #include "tests/support/nats_server.h"
 
 #include <arpa/inet.h>
-#include <fcntl.h>
 #include <netinet/in.h>
-#include <signal.h>
-#include <sys/prctl.h>
 #include <sys/socket.h>
-#include <sys/wait.h>
-#include <unistd.h>
 
 #include <cerrno>
 #include <chrono>
@@ -62,30 +57,11 @@ NatsServer::NatsServer(const std::string& configuration)
     start();
 }
 
-NatsServer::~NatsServer() {
-    kill();
-}
-
 void NatsServer::start() {
     const std::string file = folder_ / "server.conf";
     const std::string log = folder_ / "log";
     std::ofstream(file) << "listen: \"127.0.0.1:" << port_ << "\"\n" << configuration_ << '\n';
-    const pid_t parent = ::getpid();
-    id_ = ::fork();
-    if (id_ < 0) {
-        throw std::system_error(errno, std::generic_category(), "nats-server cannot be started");
-    }
-    if (id_ == 0) {
-        // Only what is safe after a fork of a program with threads.
-        ::prctl(PR_SET_PDEATHSIG, SIGKILL);
-        if (::getppid() != parent) {
-            ::_exit(1);
-        }
-        ::execlp("nats-server", "nats-server", "-c", file.c_str(), "-l", log.c_str(), nullptr);
-        ::execl("/usr/sbin/nats-server", "nats-server", "-c", file.c_str(), "-l", log.c_str(),
-                nullptr);
-        ::_exit(127);
-    }
+    process_.emplace(std::vector<std::string>{"nats-server", "-c", file, "-l", log});
     waitUntilReady();
 }
 
@@ -97,9 +73,7 @@ void NatsServer::startWith(const std::string& configuration) {
 void NatsServer::waitUntilReady() {
     const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
     while (!takesConnections(port_)) {
-        int status = 0;
-        if (::waitpid(id_, &status, WNOHANG) == id_) {
-            id_ = -1;
+        if (process_->hasEnded()) {
             throw std::runtime_error("nats-server ended at once: " + log());
         }
         if (std::chrono::steady_clock::now() > deadline) {
@@ -110,19 +84,7 @@ void NatsServer::waitUntilReady() {
 }
 
 void NatsServer::kill() {
-    if (isRunning()) {
-        ::kill(id_, SIGKILL);
-        ::waitpid(id_, nullptr, 0);
-        id_ = -1;
-    }
-}
-
-void NatsServer::pause() {
-    ::kill(id_, SIGSTOP);
-}
-
-void NatsServer::resume() {
-    ::kill(id_, SIGCONT);
+    process_.reset();
 }
 
 std::string NatsServer::log() const {

@@ -1,10 +1,10 @@
 // A real nats-server for a test, on free ports of the loopback interface, with a folder of its own.
 #pragma once
 
-#include <sys/types.h>
-
+#include <optional>
 #include <string>
 
+#include "tests/support/child_process.h"
 #include "tests/support/temporary_directory.h"
 
 namespace test {
@@ -19,7 +19,7 @@ public:
 
     NatsServer(const NatsServer&) = delete;
     NatsServer& operator=(const NatsServer&) = delete;
-    ~NatsServer();
+    ~NatsServer() = default;
 
     /// Ends it with SIGKILL.
     void kill();
@@ -27,14 +27,8 @@ public:
     /// Starts it again, on the same port.
     void start();
 
-    /// Has it stop, as a hung server would, and go on.
-    void pause();
-    void resume();
-
     /// As `start`, with another configuration.
     void startWith(const std::string& configuration);
-
-    bool isRunning() const { return id_ > 0; }
 
     int port() const { return port_; }
     std::string url() const { return "nats://127.0.0.1:" + std::to_string(port_); }
@@ -48,7 +42,7 @@ private:
     TemporaryDirectory folder_;
     std::string configuration_;
     int port_;
-    pid_t id_ = -1;
+    std::optional<ChildProcess> process_;
 };
 
 /// A port of the loopback interface that nothing listens on.

@@ -1,0 +1,40 @@
+// A program that runs beside a test and ends with it at the latest.
+#pragma once
+
+#include <sys/types.h>
+
+#include <string>
+#include <vector>
+
+namespace test {
+
+/// A running program. Killed with this object, and when the thread that started it ends.
+class ChildProcess {
+public:
+    /// Starts `command`: a program, which is looked for in the search path and in /usr/sbin, and
+    /// its arguments. Throws std::system_error when there can be no other process; a program that
+    /// is not found is one that has ended.
+    explicit ChildProcess(std::vector<std::string> command);
+
+    ChildProcess(ChildProcess&& other) noexcept;
+    ChildProcess& operator=(ChildProcess&& other) noexcept;
+    ChildProcess(const ChildProcess&) = delete;
+    ChildProcess& operator=(const ChildProcess&) = delete;
+    ~ChildProcess();
+
+    /// Ends it with SIGKILL.
+    void kill();
+
+    void signal(int number) const;
+
+    /// Waits for its end; returns its exit status, or minus the number of the signal that ended it.
+    int wait();
+
+    /// Looks whether it has ended, without waiting.
+    bool hasEnded();
+
+private:
+    pid_t id_ = -1;  // -1: it has ended
+};
+
+}  // namespace test
