@@ -165,7 +165,56 @@ std::string withoutSecrets(std::string_view url) {
     return std::string(url.substr(0, start)) + std::string(url.substr(at + 1));
 }
 
+// How long a server may take to show that nothing more of a subscription is under way.
+constexpr std::int64_t releaseTimeout = 1'000;
+
 }  // namespace
+
+Connection::~Connection() {
+    natsConnection_Destroy(connection_);
+    for (natsSubscription* subscription : released_) {
+        natsSubscription_Destroy(subscription);
+    }
+}
+
+bool Connection::isClosed() const {
+    return natsConnection_IsClosed(connection_);
+}
+
+bool Connection::isConnected() const {
+    return natsConnection_Status(connection_) == NATS_CONN_STATUS_CONNECTED;
+}
+
+SubscriptionHandle Connection::own(natsSubscription* subscription) {
+    return {subscription, [connection = shared_from_this()](natsSubscription* ended) {
+                connection->release(ended);
+            }};
+}
+
+// The thread of libnats 3.4 that reads from the server may still have its hands on a subscription
+// that has been unsubscribed. It has not when it has come to the answer to a later ping; where
+// there is none, the subscription is kept until there is, or until that thread has ended.
+void Connection::release(natsSubscription* subscription) {
+    natsSubscription_Unsubscribe(subscription);
+    std::vector<natsSubscription*> candidates;
+    {
+        const std::lock_guard lock(mutex_);
+        released_.push_back(subscription);
+        candidates = released_;
+    }
+    if (!isConnected() || natsConnection_FlushTimeout(connection_, releaseTimeout) != NATS_OK) {
+        return;
+    }
+    for (natsSubscription* candidate : candidates) {
+        {
+            const std::lock_guard lock(mutex_);
+            if (std::erase(released_, candidate) == 0) {
+                continue;  // another thread has seen to it
+            }
+        }
+        natsSubscription_Destroy(candidate);
+    }
+}
 
 ConnectionHandle openConnection(const NatsOptions& options, const std::string& name,
                                 std::uintptr_t listener) {
@@ -180,7 +229,7 @@ ConnectionHandle openConnection(const NatsOptions& options, const std::string& n
     natsConnection* connection = nullptr;
     check(natsConnection_Connect(&connection, made.get()),
           "Cannot connect to NATS at " + withoutSecrets(options.servers));
-    return {connection, Destroy()};
+    return std::make_shared<Connection>(connection);
 }
 
 std::string serverOf(natsConnection* connection) {

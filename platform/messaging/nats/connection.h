@@ -2,12 +2,47 @@
 #pragma once
 
 #include <cstdint>
+#include <memory>
+#include <mutex>
 #include <string>
+#include <vector>
 
 #include "platform/messaging/nats/handles.h"
 #include "platform/messaging/nats/nats_bus.h"
 
 namespace platform::messaging::nats {
+
+/// A connection, which is closed with this object.
+class Connection : public std::enable_shared_from_this<Connection> {
+public:
+    explicit Connection(natsConnection* connection) : connection_(connection) {}
+    Connection(const Connection&) = delete;
+    Connection& operator=(const Connection&) = delete;
+    ~Connection();
+
+    natsConnection* get() const noexcept { return connection_; }
+
+    bool isClosed() const;
+
+    /// True while a server is connected.
+    bool isConnected() const;
+
+    /// The owner of a subscription on this connection, which it keeps open. At its end the
+    /// subscription is unsubscribed.
+    std::shared_ptr<natsSubscription> own(natsSubscription* subscription);
+
+private:
+    void release(natsSubscription* subscription);
+
+    natsConnection* const connection_;
+
+    std::mutex mutex_;  // guards what follows
+    std::vector<natsSubscription*> released_;
+};
+
+// Shared, since a call that has begun may go on while another thread lets go.
+using ConnectionHandle = std::shared_ptr<Connection>;
+using SubscriptionHandle = std::shared_ptr<natsSubscription>;
 
 /// Is told of what happens to connections, on a thread of libnats. Must not throw.
 class ConnectionEvents {

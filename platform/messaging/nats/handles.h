@@ -12,23 +12,9 @@ namespace platform::messaging::nats {
 struct Destroy {
     void operator()(natsOptions* options) const noexcept { natsOptions_Destroy(options); }
     void operator()(natsMsg* message) const noexcept { natsMsg_Destroy(message); }
-
-    /// Closes the connection.
-    void operator()(natsConnection* connection) const noexcept {
-        natsConnection_Destroy(connection);
-    }
-
-    /// Unsubscribes.
-    void operator()(natsSubscription* subscription) const noexcept {
-        natsSubscription_Destroy(subscription);
-    }
 };
 
 using OptionsHandle = std::unique_ptr<natsOptions, Destroy>;
-
-// Shared, since a call that has begun may go on while another thread lets go.
-using ConnectionHandle = std::shared_ptr<natsConnection>;
-using SubscriptionHandle = std::shared_ptr<natsSubscription>;
 
 /// A failure that libnats reports.
 class NatsError : public std::runtime_error {

@@ -90,7 +90,7 @@ private:
     ConnectionHandle connection();
     void attach(NatsSource& source);
     void send(const std::string& channel, const DataBuffer& payload);
-    bool flush(natsConnection& connection, Clock::time_point deadline);
+    bool flush(const nats::Connection& connection, Clock::time_point deadline);
     bool isStopping();
 
     const NatsOptions options_;
@@ -172,7 +172,7 @@ std::shared_ptr<MessageService> NatsBus::Core::connect(const std::string& client
             listener_ = nats::listen(weak_from_this());
         }
         ConnectionHandle made = connectPatiently(clientName);
-        logger().info("Connected to NATS at {}.", nats::serverOf(made.get()));
+        logger().info("Connected to NATS at {}.", nats::serverOf(made->get()));
         {
             const std::lock_guard stateLock(mutex_);
             connection_.swap(made);
@@ -209,8 +209,7 @@ void NatsBus::Core::keepConnected(const std::string& name) {
     for (;;) {
         {
             std::unique_lock lock(mutex_);
-            changed_.wait(
-                lock, [this] { return stopping_ || natsConnection_IsClosed(connection_.get()); });
+            changed_.wait(lock, [this] { return stopping_ || connection_->isClosed(); });
             if (stopping_) {
                 return;
             }
@@ -223,7 +222,7 @@ void NatsBus::Core::reconnect(const std::string& name) {
     for (auto delay = firstRetryDelay; pause(delay); delay = nextDelay(delay)) {
         try {
             ConnectionHandle made = nats::openConnection(options_, name, listener_);
-            const std::string server = nats::serverOf(made.get());
+            const std::string server = nats::serverOf(made->get());
             const std::lock_guard sourcesLock(sourcesMutex_);
             {
                 const std::lock_guard lock(mutex_);
@@ -252,7 +251,7 @@ ConnectionHandle NatsBus::Core::connection() {
 // next one.
 void NatsBus::Core::attach(NatsSource& source) {
     try {
-        source.attach(connection().get());
+        source.attach(connection());
     } catch (const NatsError& error) {
         if (error.status() != NATS_CONNECTION_CLOSED) {
             throw;
@@ -285,7 +284,7 @@ std::shared_ptr<Subscription> NatsBus::Core::subscribe(const std::string& channe
     }
     // Not before the server has it can others publish to it. Without a server there is nobody.
     if (isConnected()) {
-        natsConnection_FlushTimeout(connection().get(), subscribeTimeout);
+        natsConnection_FlushTimeout(connection()->get(), subscribeTimeout);
     }
     return subscription;
 }
@@ -305,22 +304,22 @@ void NatsBus::Core::publish(const std::string& channel, const DataBuffer& payloa
 void NatsBus::Core::send(const std::string& channel, const DataBuffer& payload) {
     nats::requireSubject(channel);
     const ConnectionHandle connection = this->connection();
-    const std::int64_t limit = natsConnection_GetMaxPayload(connection.get());
+    const std::int64_t limit = natsConnection_GetMaxPayload(connection->get());
     if (std::cmp_greater(payload.length(), limit)) {
         throw std::runtime_error("The server takes messages of up to " + std::to_string(limit) +
                                  " bytes.");
     }
     const natsStatus status = natsConnection_Publish(
-        connection.get(), channel.c_str(), payload.data(), static_cast<int>(payload.length()));
+        connection->get(), channel.c_str(), payload.data(), static_cast<int>(payload.length()));
     if (status == NATS_INSUFFICIENT_BUFFER) {
         throw std::runtime_error("No server is connected, and as much as may wait for one does.");
     }
     if (status == NATS_TIMEOUT) {
         // The server has a part of the message and would take what comes next for the rest.
-        natsConnection_Close(connection.get());
+        natsConnection_Close(connection->get());
     }
     nats::check(status, "The message could not be sent");
-    if (natsConnection_Status(connection.get()) != NATS_CONN_STATUS_CONNECTED) {
+    if (!connection->isConnected()) {
         unsent_ = true;
     }
 }
@@ -332,7 +331,7 @@ bool NatsBus::Core::isStopping() {
 
 bool NatsBus::Core::isConnected() {
     const std::lock_guard lock(mutex_);
-    return connection_ && natsConnection_Status(connection_.get()) == NATS_CONN_STATUS_CONNECTED;
+    return connection_ && connection_->isConnected();
 }
 
 bool NatsBus::Core::drain(std::chrono::milliseconds timeout) {
@@ -361,17 +360,17 @@ bool NatsBus::Core::drain(std::chrono::milliseconds timeout) {
     }
     if (connection) {
         finished = flush(*connection, deadline) && finished;
-        natsConnection_Close(connection.get());
+        natsConnection_Close(connection->get());
     }
     return finished;
 }
 
 // Waits until the server has what was published.
-bool NatsBus::Core::flush(natsConnection& connection, Clock::time_point deadline) {
-    if (natsConnection_Status(&connection) != NATS_CONN_STATUS_CONNECTED && !unsent_) {
+bool NatsBus::Core::flush(const nats::Connection& connection, Clock::time_point deadline) {
+    if (!connection.isConnected() && !unsent_) {
         return true;
     }
-    return natsConnection_FlushTimeout(&connection, millisecondsUntil(deadline)) == NATS_OK;
+    return natsConnection_FlushTimeout(connection.get(), millisecondsUntil(deadline)) == NATS_OK;
 }
 
 void NatsBus::Core::onDisconnected(const std::string& reason) {

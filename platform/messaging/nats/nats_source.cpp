@@ -10,6 +10,7 @@
 #include <utility>
 
 #include "platform/messaging/log.h"
+#include "platform/messaging/nats/handles.h"
 #include "platform/messaging/nats/subject.h"
 
 namespace platform::messaging::nats {
@@ -41,13 +42,14 @@ NatsSource::NatsSource(const std::string& channel, std::string queueGroup,
       maxPendingBytes_(asLimit(maxPendingBytes)),
       threads_(threads) {}
 
-void NatsSource::attach(natsConnection* connection) {
+void NatsSource::attach(const ConnectionHandle& connection) {
     natsSubscription* made = nullptr;
-    check(queueGroup_.empty() ? natsConnection_SubscribeSync(&made, connection, channel_->c_str())
-                              : natsConnection_QueueSubscribeSync(
-                                    &made, connection, channel_->c_str(), queueGroup_.c_str()),
+    check(queueGroup_.empty()
+              ? natsConnection_SubscribeSync(&made, connection->get(), channel_->c_str())
+              : natsConnection_QueueSubscribeSync(&made, connection->get(), channel_->c_str(),
+                                                  queueGroup_.c_str()),
           "Cannot subscribe channel \"" + printable(*channel_) + "\"");
-    SubscriptionHandle subscription(made, Destroy());
+    SubscriptionHandle subscription = connection->own(made);
     natsSubscription_SetPendingLimits(made, maxPendingMessages_, maxPendingBytes_);
     {
         const std::lock_guard lock(mutex_);

@@ -11,7 +11,7 @@
 #include <string>
 
 #include "platform/messaging/delivery_threads.h"
-#include "platform/messaging/nats/handles.h"
+#include "platform/messaging/nats/connection.h"
 
 namespace platform::messaging::nats {
 
@@ -25,7 +25,7 @@ public:
 
     /// Subscribes on `connection`, in the place of an earlier one that is closed. Nothing happens
     /// after `end` or `drain`. Throws NatsError.
-    void attach(natsConnection* connection);
+    void attach(const ConnectionHandle& connection);
 
     std::optional<QueuedMessage> next() override;
     void end() override;

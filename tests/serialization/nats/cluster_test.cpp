@@ -100,10 +100,12 @@ private:
     std::string ask(Try&& attempt) {
         const Clock::time_point start = Clock::now();
         ++asked_;
-        std::optional<std::string> answer = attempt(500ms);
+        auto patience = 500ms;
+        std::optional<std::string> answer = attempt(patience);
         while (!answer && Clock::now() < start + kPatience) {
             ++askedAgain_;
-            answer = attempt(500ms);
+            patience *= 2;  // for what takes long on a machine that is busy
+            answer = attempt(patience);
         }
         longest_ = std::max(longest_, millisecondsSince(start));
         return answer.value_or("no answer");
@@ -195,15 +197,19 @@ TEST(NatsCluster, AWorkerThatIsKilledWhileItSavesLeavesTheOldDocumentOrTheNewOne
     const NatsServer server("max_payload: 64MB\nmax_pending: 256MB");
     const TemporaryDirectory folder;
     const std::string document = folder / "a.docx";
-    const std::size_t size = 8'000'000;
+    const std::size_t size = 5'000'000;
     std::vector<std::string> versions = {noise(size, 1), noise(size, 2)};
     PatientClient client({server.url()}, "anna");
     NatsClient hasty({server.url()}, "hasty");
     ChildProcess worker = startWorker({server.url()});
     ASSERT_EQ(client.write(writePackage(document, versions[0])), "true");
-    const Clock::time_point start = Clock::now();
-    ASSERT_EQ(client.write(writePackage(document, versions[0])), "true");
-    const auto usual = std::chrono::duration_cast<std::chrono::microseconds>(Clock::now() - start);
+    auto usual = std::chrono::microseconds::max();
+    for (int i = 0; i < 3; ++i) {
+        const Clock::time_point start = Clock::now();
+        ASSERT_EQ(client.write(writePackage(document, versions[0])), "true");
+        usual = std::min(
+            usual, std::chrono::duration_cast<std::chrono::microseconds>(Clock::now() - start));
+    }
     int kept = 0;
     int replaced = 0;
     const int rounds = UNDER_SANITIZERS ? 4 : 8;
@@ -216,6 +222,7 @@ TEST(NatsCluster, AWorkerThatIsKilledWhileItSavesLeavesTheOldDocumentOrTheNewOne
             hasty.write(writePackage(document, versions[1]),
                         std::chrono::ceil<std::chrono::milliseconds>(2 * usual));
         killer.join();
+        hasty.flush();  // so that the request does not come to the next worker
         worker = startWorker({server.url()});
         const std::string now = client.read(fileRequest(document, "text/xml"));
         const bool isNew = now == packageAnswer(versions[1]);
