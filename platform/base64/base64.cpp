@@ -1,11 +1,6 @@
-// Base64 on OpenSSL's block functions. They convert whole groups (three bytes, four characters),
-// take lengths as int, and write behind what they report: the encoder a terminating zero, the
-// decoder the last group's zeros. The decoder moreover drops white space and '-' at the ends of a
-// block and reads '=' anywhere as a zero bit. So text goes to it in chunks of a fixed size from
-// which white space and padding have been taken, and the number of bytes that come back is checked.
+// Base64 around the kernels, which convert whole groups: the last group's padding, white space, and
+// what is no base64.
 #include "platform/base64/base64.h"
-
-#include <openssl/evp.h>
 
 #include <algorithm>
 #include <array>
@@ -13,25 +8,16 @@
 #include <stdexcept>
 #include <string>
 
+#include "platform/base64/kernels.h"
 #include "platform/i18n/ascii.h"
 
 namespace platform {
 namespace {
 
-constexpr std::size_t kBytesPerGroup = 3;
-constexpr std::size_t kCharactersPerGroup = 4;
-constexpr std::size_t kGroupsPerChunk = 8'192;
-constexpr std::size_t kBytesPerChunk = kGroupsPerChunk * kBytesPerGroup;
+using base64::bytesPerGroup;
+using base64::charactersPerGroup;
 
-using Chunk = std::array<char, kGroupsPerChunk * kCharactersPerGroup>;
-
-unsigned char* asBytes(char* data) {
-    return reinterpret_cast<unsigned char*>(data);
-}
-
-const unsigned char* asBytes(const char* data) {
-    return reinterpret_cast<const unsigned char*>(data);
-}
+using Group = std::array<char, charactersPerGroup>;
 
 bool isInAlphabet(char c) {
     return (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') || (c >= '0' && c <= '9') || c == '+' ||
@@ -42,30 +28,18 @@ bool isInAlphabet(char c) {
     throw std::runtime_error("invalid base64: " + what + " at offset " + std::to_string(offset));
 }
 
-[[noreturn]] void failAtFirstStranger(std::string_view text, std::size_t offset) {
-    while (isInAlphabet(text[offset]) || i18n::isspace_ascii(text[offset])) {
-        ++offset;
+// Reads the characters of a group from `text`, from `at` on, over white space. Returns how many
+// there are before the text ends, and moves `at` behind the last of them, or to the end.
+std::size_t readGroup(std::string_view text, std::size_t& at, Group& group) {
+    std::size_t count = 0;
+    for (; at < text.size() && count < group.size(); ++at) {
+        if (isInAlphabet(text[at])) {
+            group[count++] = text[at];
+        } else if (!i18n::isspace_ascii(text[at])) {
+            fail("a character outside the alphabet", at);
+        }
     }
-    fail("a character outside the alphabet", offset);
-}
-
-// Decodes `groups`, which are at most a chunk. Returns whether they are nothing but whole groups of
-// the alphabet's characters; if not, what is behind `bytes` is undefined.
-bool decodeGroups(std::string_view groups, char* bytes) {
-    return EVP_DecodeBlock(asBytes(bytes), asBytes(groups.data()),
-                           static_cast<int>(groups.size())) ==
-           static_cast<int>(groups.size() / kCharactersPerGroup * kBytesPerGroup);
-}
-
-// Copies what is no white space from `text`, from `at` on, until `chunk` is full or the text ends.
-// Returns how much that is, and moves `at` behind it.
-std::size_t gather(std::string_view text, std::size_t& at, Chunk& chunk) {
-    std::size_t filled = 0;
-    for (; at < text.size() && filled < chunk.size(); ++at) {
-        chunk[filled] = text[at];
-        filled += i18n::isspace_ascii(text[at]) ? 0 : 1;
-    }
-    return filled;
+    return count;
 }
 
 // Checks the text from its first '=' on, before which the last group has `leftOver` characters.
@@ -78,61 +52,67 @@ void checkPadding(std::string_view text, std::size_t start, std::size_t leftOver
             fail("data behind the padding", i);
         }
     }
-    const std::size_t missing = leftOver == 0 ? 0 : kCharactersPerGroup - leftOver;
+    const std::size_t missing = leftOver == 0 ? 0 : charactersPerGroup - leftOver;
     if (count != 0 && count != missing) {
         fail("wrong padding", start);
     }
 }
 
+// Decodes the last group, of which `count` characters are there, and returns how many bytes it has.
+std::size_t decodeIncomplete(Group group, std::size_t count, std::size_t end, char* bytes) {
+    if (count == 1) {
+        fail("a single left-over character before the end", end);
+    }
+    std::fill(group.begin() + static_cast<std::ptrdiff_t>(count), group.end(), 'A');
+    std::array<char, bytesPerGroup> decoded{};
+    base64::plainKernels.decode(group.data(), 1, decoded.data());
+    const std::size_t length = count - 1;
+    if (std::any_of(decoded.begin() + static_cast<std::ptrdiff_t>(length), decoded.end(),
+                    [](char byte) { return byte != 0; })) {
+        fail("left-over bits that are not zero before the end", end);
+    }
+    std::copy_n(decoded.begin(), length, bytes);
+    return length;
+}
+
 }  // namespace
 
 DataBuffer base64encode(const DataBuffer& bytes) {
-    if (bytes.empty()) {
-        return {};
+    const std::size_t groups = bytes.length() / bytesPerGroup;
+    const std::size_t leftOver = bytes.length() % bytesPerGroup;
+    DataBuffer text((groups + (leftOver == 0 ? 0 : 1)) * charactersPerGroup);
+    base64::kernels().encode(bytes.data(), groups, text.data());
+    if (leftOver != 0) {
+        std::array<char, bytesPerGroup> last{};
+        std::copy_n(bytes.data() + groups * bytesPerGroup, leftOver, last.begin());
+        char* const end = text.data() + text.capacity();
+        base64::plainKernels.encode(last.data(), 1, end - charactersPerGroup);
+        std::fill_n(end - (bytesPerGroup - leftOver), bytesPerGroup - leftOver, '=');
     }
-    const std::size_t groups = (bytes.length() + kBytesPerGroup - 1) / kBytesPerGroup;
-    DataBuffer text(groups * kCharactersPerGroup + 1);  // one for the encoder's zero
-    std::size_t length = 0;
-    for (std::size_t at = 0; at < bytes.length(); at += kBytesPerChunk) {
-        const std::size_t count = std::min(kBytesPerChunk, bytes.length() - at);
-        length += static_cast<std::size_t>(EVP_EncodeBlock(
-            asBytes(text.data() + length), asBytes(bytes.data() + at), static_cast<int>(count)));
-    }
-    text.setLength(length);
+    text.setLength(text.capacity());
     return text;
 }
 
 DataBuffer base64decode(std::string_view text) {
     const std::size_t end = std::min(text.find('='), text.size());
-    DataBuffer bytes((end + kCharactersPerGroup - 1) / kCharactersPerGroup * kBytesPerGroup);
-    Chunk chunk{};
+    DataBuffer bytes((end + charactersPerGroup - 1) / charactersPerGroup * bytesPerGroup);
     std::size_t length = 0;
-    std::size_t leftOver = 0;  // characters of an incomplete group, which only the last chunk has
+    std::size_t leftOver = 0;  // characters of an incomplete group
     for (std::size_t at = 0; at < end;) {
-        // Most text is nothing but groups and is decoded from where it stands.
-        const std::size_t whole =
-            std::min(chunk.size(), (end - at) / kCharactersPerGroup * kCharactersPerGroup);
-        if (whole != 0 && decodeGroups(text.substr(at, whole), bytes.data() + length)) {
-            at += whole;
-            length += whole / kCharactersPerGroup * kBytesPerGroup;
-            continue;
-        }
-        const std::size_t chunkStart = at;
-        const std::size_t filled = gather(text.substr(0, end), at, chunk);
-        leftOver = filled % kCharactersPerGroup;
-        if (leftOver == 1) {
-            fail("a single left-over character before the end", end);
-        }
-        const std::size_t added = leftOver == 0 ? 0 : kCharactersPerGroup - leftOver;
-        std::fill_n(chunk.begin() + static_cast<std::ptrdiff_t>(filled), added, 'A');
-        if (!decodeGroups({chunk.data(), filled + added}, bytes.data() + length)) {
-            failAtFirstStranger(text, chunkStart);
-        }
-        length += (filled + added) / kCharactersPerGroup * kBytesPerGroup;
-        for (std::size_t i = 0; i < added; ++i) {
-            if (bytes.data()[--length] != 0) {
-                fail("left-over bits that are not zero before the end", end);
-            }
+        // Most text is nothing but groups; what comes between them is stepped over a group at a
+        // time.
+        const std::size_t groups = base64::kernels().decode(
+            text.data() + at, (end - at) / charactersPerGroup, bytes.data() + length);
+        at += groups * charactersPerGroup;
+        length += groups * bytesPerGroup;
+        Group group{};
+        const std::size_t count = readGroup(text.substr(0, end), at, group);
+        if (count == group.size()) {
+            base64::plainKernels.decode(group.data(), 1, bytes.data() + length);
+            length += bytesPerGroup;
+        } else if (count != 0) {
+            leftOver = count;
+            length += decodeIncomplete(group, count, end, bytes.data() + length);
         }
     }
     checkPadding(text, end, leftOver);
