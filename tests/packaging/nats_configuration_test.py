@@ -4,6 +4,7 @@
 import json
 import pathlib
 import socket
+import ssl
 import tempfile
 import time
 import unittest
@@ -212,6 +213,18 @@ class Network(Permissions, NetworkServer):
         with self.assertRaises(Refused):
             Client(self.server, "ada")
         self.assertNotIn("101", open_websocket(self.server, self.origins[0]))
+
+
+class ChangeOfCertificate(NetworkServer):
+    def test_is_taken_over_while_the_server_runs(self):
+        nats_server.make_certificates(self.folder)
+        self.server.reload()
+        new_context = nats_server.client_context(self.folder)
+        ada = Client(self.server, "ada", context=new_context)
+        self.addCleanup(ada.close)
+        self.assertIn("101", open_websocket(self.server, None, new_context))
+        with self.assertRaises(ssl.SSLError):
+            Client(self.server, "ada", context=self.context)
 
 
 class Cluster(unittest.TestCase):
