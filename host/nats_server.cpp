@@ -98,6 +98,16 @@ std::optional<std::uint16_t> portIn(const std::string& text, const std::string& 
     return static_cast<std::uint16_t>(std::stoul(match[1]));
 }
 
+std::vector<std::filesystem::path> portsFilesIn(const std::filesystem::path& folder) {
+    std::vector<std::filesystem::path> files;
+    for (const auto& entry : std::filesystem::directory_iterator(folder)) {
+        if (entry.path().extension() == ".ports") {
+            files.push_back(entry.path());
+        }
+    }
+    return files;
+}
+
 void writePrivateFile(const std::filesystem::path& file, std::string_view text) {
     const FileDescriptor to(
         ::open(file.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, S_IRUSR | S_IWUSR));
@@ -260,6 +270,7 @@ void NatsServer::supervise(std::promise<void> ready) {
 // Runs the server until it ends and tells how it ended; nothing when it has been stopped.
 std::optional<std::string> NatsServer::live(const std::function<void()>& whenReady) {
     try {
+        removePortsFiles();
         const std::filesystem::path file = folder_.path() / "nats-server.conf";
         writePrivateFile(file, configurationText(configuration_));
         Life life(program_, file, stop_.get());
@@ -285,14 +296,17 @@ std::optional<std::string> NatsServer::live(const std::function<void()>& whenRea
     }
 }
 
-// Looks for the file in which a server that is ready tells its ports, and takes it away, so that
-// the next one's is not mistaken for it. Returns whether there was one.
+// What servers that were killed have left, so that it is not taken for what the next one says.
+void NatsServer::removePortsFiles() const {
+    for (const std::filesystem::path& file : portsFilesIn(folder_.path())) {
+        std::filesystem::remove(file);
+    }
+}
+
+// Looks for the file in which a server that is ready tells its ports. Returns whether there is one.
 bool NatsServer::findPorts() {
-    for (const auto& entry : std::filesystem::directory_iterator(folder_.path())) {
-        if (entry.path().extension() != ".ports") {
-            continue;
-        }
-        std::ifstream file(entry.path());
+    for (const std::filesystem::path& path : portsFilesIn(folder_.path())) {
+        std::ifstream file(path);
         const std::string text(std::istreambuf_iterator<char>(file), {});
         const std::optional<std::uint16_t> port = portIn(text, "nats");
         const std::optional<std::uint16_t> webSocketPort = portIn(text, "ws");
@@ -303,7 +317,6 @@ bool NatsServer::findPorts() {
             configuration_.port = *port;
             configuration_.webSocketPort = *webSocketPort;
         }
-        std::filesystem::remove(entry.path());
         return true;
     }
     return false;

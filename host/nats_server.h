@@ -56,6 +56,7 @@ private:
 
     void supervise(std::promise<void> ready);
     std::optional<std::string> live(const std::function<void()>& whenReady);
+    void removePortsFiles() const;
     bool findPorts();
 
     std::filesystem::path program_;

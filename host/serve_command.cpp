@@ -214,9 +214,6 @@ std::filesystem::path webFolderOf(const WebOptions& options) {
 
 std::unique_ptr<NatsServer> startOwnServer(const ServeOptions& options, const WebServer* web,
                                            const PrivateFolder& folder) {
-    if (!options.otherServers.urls.empty()) {
-        return nullptr;
-    }
     NatsServerOptions own = options.ownServer;
     if (web != nullptr) {
         own.allowedOrigins.push_back(web->origin());
@@ -228,15 +225,23 @@ std::unique_ptr<NatsServer> startOwnServer(const ServeOptions& options, const We
 
 int runServe(const ServeOptions& options, int output) {
     blockStopSignals();
-    const PrivateFolder folder;
-    const StopSignals signals([&folder] { folder.remove(); });
+    std::optional<PrivateFolder> folder;
+    if (options.otherServers.urls.empty()) {
+        folder.emplace();
+    }
+    const StopSignals signals([&folder] {
+        if (folder) {
+            folder->remove();
+        }
+    });
 
     const std::filesystem::path webFolder = webFolderOf(options.web);
     const std::optional<Confinements> confinements = confinementsOf(options, webFolder);
     // The web page's origin is part of the server's configuration.
     const std::unique_ptr<WebServer> web =
         webFolder.empty() ? nullptr : std::make_unique<WebServer>(webFolder, options.web.address);
-    std::unique_ptr<NatsServer> server = startOwnServer(options, web.get(), folder);
+    std::unique_ptr<NatsServer> server =
+        folder ? startOwnServer(options, web.get(), *folder) : nullptr;
     const std::shared_ptr<NatsBus> bus =
         makeBus(server ? connectionTo(*server) : connectionTo(options.otherServers));
     if (!connect(*bus, confinements ? &confinements->network : nullptr, signals.first())) {

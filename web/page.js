@@ -15,6 +15,7 @@ const answerArea = document.querySelector("#answer");
 const changesArea = document.querySelector("#changes");
 
 let client = null;
+let shownText = null; // the bytes of the text that is shown
 
 function element(name, properties = {}, ...children) {
   const made = Object.assign(document.createElement(name), properties);
@@ -46,9 +47,13 @@ function parse(data) {
   return JSON.parse(pieces.join(""));
 }
 
-// The text that bytes from a file most likely are: UTF-8 if they can be, else a Western charset.
-function decode(characters) {
+// The text that bytes from a file are: in `charset`, or else in UTF-8 if they can be, or in a
+// Western charset.
+function decode(characters, charset = "") {
   const bytes = bytesOf(characters);
+  if (charset) {
+    return new TextDecoder(charset).decode(bytes);
+  }
   try {
     return new TextDecoder("utf-8", { fatal: true }).decode(bytes);
   } catch {
@@ -135,8 +140,9 @@ class Client {
   }
 }
 
-function showText(answer) {
-  answerArea.replaceChildren(element("pre", {}, shown(decode(answer.data))));
+function showText() {
+  const text = decode(shownText, requestForm.charset.value);
+  answerArea.replaceChildren(element("pre", {}, shown(text)));
 }
 
 function partBody(part) {
@@ -175,7 +181,8 @@ function showAnswer(path, answer) {
   } else if (answer.data === "") {
     showError(`${path} is empty, or may not be opened.`);
   } else {
-    showText(answer);
+    shownText = answer.data;
+    showText();
   }
 }
 
@@ -223,6 +230,8 @@ connectionForm.addEventListener("submit", (event) => {
   open(Object.fromEntries(new FormData(connectionForm)));
 });
 
+requestForm.charset.addEventListener("change", () => shownText === null || showText());
+
 requestForm.addEventListener("submit", async (event) => {
   event.preventDefault();
   const { path, kind } = Object.fromEntries(new FormData(requestForm));
@@ -230,6 +239,7 @@ requestForm.addEventListener("submit", async (event) => {
     showError("Not connected to a server, so there is nobody to ask.");
     return;
   }
+  shownText = null;
   const isDocument = /\.(docx|xlsx|pptx|docm|xlsm|pptm)$/i.test(path);
   answerArea.replaceChildren(element("p", {}, `Reading ${path} ...`));
   try {

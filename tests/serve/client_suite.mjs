@@ -160,7 +160,7 @@ test("a program with a plain socket is served", async (t) => {
 });
 
 test("many clients are served at once", async (t) => {
-  const file = example("server.log");
+  const file = example("market-list.utf-8.txt");
   const data = readFileSync(file, "latin1");
   const clients = await Promise.all(
     Array.from({ length: Number(target.connections) }, () => connected(t)),

@@ -38,7 +38,7 @@ async function connected(test, host, options) {
 // A host whose message server's files are in a folder of the test's.
 async function hostWithRuntimeFolder(test, args) {
   const folder = temporaryFolder(test);
-  const host = await Host.start(test, args, { XDG_RUNTIME_DIR: folder });
+  const host = await Host.start(test, args, folder);
   return { host, folder };
 }
 
@@ -69,9 +69,7 @@ test("its password is in nobody's sight", async (t) => {
   const [name, ...others] = readdirSync(folder);
   assert.deepEqual(others, []);
   assert.equal(statSync(join(folder, name)).mode & 0o777, 0o700);
-  for (const file of readdirSync(join(folder, name))) {
-    assert.equal(statSync(join(folder, name, file)).mode & 0o077, 0, file);
-  }
+  assert.equal(statSync(join(folder, name, "nats-server.conf")).mode & 0o777, 0o600);
 });
 
 test("its password is another each time", async (t) => {

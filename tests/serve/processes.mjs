@@ -6,18 +6,15 @@ import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { setTimeout as sleep } from "node:timers/promises";
 
+// The program to test.
 export const HOST = process.env.SERIALIZATION_HOST;
-if (!HOST) {
-  throw new Error("SERIALIZATION_HOST has to name the program to test");
-}
 
 // Under the sanitizers, programs are many times slower and get less to do.
 export const IS_SANITIZED = Boolean(process.env.IS_SANITIZED);
 
 export const ROOT = new URL("../../", import.meta.url).pathname;
 
-// A new folder, which is removed when the test is over. Not below the system's folder of temporary
-// files directly, since programs may look after their own files there.
+// A new folder, which is removed when the test is over.
 export function temporaryFolder(test) {
   const folder = mkdtempSync(join(tmpdir(), "serve-test-"));
   test.after(() => rmSync(folder, { recursive: true, force: true }));
@@ -97,8 +94,10 @@ export class Program {
 
 // A host that serves, and how to reach it.
 export class Host extends Program {
-  // Its own server, without a web page unless `args` ask for one.
-  static async start(test, args, environment) {
+  // One with a server of its own, whose files are in a folder below `folder`, and without a web page
+  // unless `args` ask for one.
+  static async start(test, args, folder = temporaryFolder(test)) {
+    const environment = { XDG_RUNTIME_DIR: folder };
     const web = args.includes("--web") || args.includes("--listen") ? [] : ["--no-web"];
     const host = new Host(test, [HOST, "--log-level", "info", "serve", ...web, ...args], environment);
     await host.waitForOutput(/^websocket: .*\n/m);
