@@ -40,9 +40,8 @@ using StoredValue = std::conditional_t<std::is_void_v<T>, std::monostate, T>;
 /// with std::make_shared and lives as long as a future, a promise or a running continuation holds
 /// it.
 ///
-/// No callback is called, and no continuation destroyed, while the mutex is held, so these may use
-/// any future, this one included. Only the making of a continuation, which copies or moves the
-/// callback into it, is under the mutex.
+/// No callback is called, and no continuation made or destroyed, while the mutex is held, so these
+/// may use any future, this one included.
 template <typename T>
 class SharedFutureState : public std::enable_shared_from_this<SharedFutureState<T>> {
 public:
@@ -122,13 +121,18 @@ public:
     /// continuation is attached already.
     template <typename MakeContinuation>
     void attach(MakeContinuation&& make) {
-        std::unique_lock lock(mutex);
-        if (valueReturned || continuation) {
-            throw std::runtime_error(
-                "Future already has returned it's value or has an associated continuation.");
+        // The outcome is reserved first, so that nobody else takes it meanwhile.
+        reserveOutcome();
+        std::unique_ptr<ContinuationBase<T>> made;
+        try {
+            made = std::forward<MakeContinuation>(make)();
+        } catch (...) {
+            const std::lock_guard lock(mutex);
+            valueReturned = false;
+            throw;
         }
-        continuation = std::forward<MakeContinuation>(make)();
-        valueReturned = true;
+        std::unique_lock lock(mutex);
+        continuation = std::move(made);
         if (status != FutureStatus::pending) {
             resolve(std::move(lock));
         }
@@ -141,9 +145,18 @@ public:
     std::unique_ptr<ContinuationBase<T>> continuation;
     FutureStatus status = FutureStatus::pending;
     bool futureRetrieved = false;
-    bool valueReturned = false;  // the outcome was taken, or a continuation attached to take it
+    bool valueReturned = false;  // the outcome was taken, or is a continuation's to take
 
 private:
+    void reserveOutcome() {
+        const std::lock_guard lock(mutex);
+        if (valueReturned || continuation) {
+            throw std::runtime_error(
+                "Future already has returned it's value or has an associated continuation.");
+        }
+        valueReturned = true;
+    }
+
     void settle(FutureStatus outcomeStatus, std::unique_ptr<Outcome> outcome) {
         std::unique_lock lock(mutex);
         if (status == FutureStatus::cancelled) {

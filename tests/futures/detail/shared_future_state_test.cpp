@@ -139,6 +139,36 @@ TEST(SharedFutureState, RunsItsContinuationUnlockedDetachedAndWithClearFlags) {
     EXPECT_EQ(ends, 1);
 }
 
+TEST(SharedFutureState, HasItsContinuationMadeUnlockedWhileNobodyElseCanTakeTheOutcome) {
+    const auto state = std::make_shared<SharedFutureState<int>>();
+    int runs = 0;
+    state->attach([&] {
+        EXPECT_TRUE(isUnlocked(state->mutex));
+        EXPECT_THAT([&] { state->takeOutcome(); },
+                    failsWith("Future already returned it's value or has an associated "
+                              "continuation."));
+        EXPECT_THAT([&] { state->attach([] { return nullptr; }); },
+                    failsWith("Future already has returned it's value or has an associated "
+                              "continuation."));
+        return std::make_unique<Probe>([&](const Probe::State&) { ++runs; }, [] {});
+    });
+    EXPECT_EQ(runs, 0);
+    state->setValue(1);
+    EXPECT_EQ(runs, 1);
+}
+
+TEST(SharedFutureState, RunsAtOnceAContinuationDuringWhoseMakingItWasResolved) {
+    const auto state = std::make_shared<SharedFutureState<int>>();
+    int runs = 0;
+    state->attach([&] {
+        state->setValue(1);
+        return std::make_unique<Probe>([&](const Probe::State&) { ++runs; }, [] {});
+    });
+    EXPECT_EQ(runs, 1);
+    EXPECT_EQ(state->continuation, nullptr);
+    EXPECT_EQ(state->takeOutcome(), 1);
+}
+
 TEST(SharedFutureState, LeavesItsFlagsAloneWithoutContinuation) {
     const auto state = std::make_shared<SharedFutureState<int>>();
     state->markFutureRetrieved();
