@@ -44,8 +44,8 @@ int confinementVersion();
 /// Three things are beyond the kernel's means. Files outside can still be seen to exist and their
 /// sizes, times and permissions be read, but no content and no folder's list. Their permissions,
 /// owners and times could be changed by a program that did such things by path, as ours does not.
-/// And a pipe that the process holds open can be opened again as /proc/self/fd/N, so for what
-/// clients must not reach use sockets or eventfd, which cannot.
+/// And a pipe that the process holds open can be opened again as /proc/self/fd/N. The bundle reads
+/// and writes no pipes, and sockets and eventfd cannot be opened like that.
 class Confinement {
 public:
     /// Opens what is granted; confines nothing yet. `version` is that of a kernel whose confinement
