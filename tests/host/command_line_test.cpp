@@ -132,6 +132,15 @@ TEST(Installation, HoldsAllThatTheProgramNeeds) {
         {folder / "bin/serialization_host", "read", PROJECT_SOURCE_ROOT "/examples/empty.txt"});
     EXPECT_EQ(outcome.status, 0) << outcome.errors;
     EXPECT_EQ(outcome.output, "{\"data\":\"\",\"status\":true}\n");
+    const std::filesystem::path web = folder / "bin" / INSTALLED_WEB_FOLDER;
+    for (const char* file : {"index.html", "page.js", "style.css", "icon.svg"}) {
+        EXPECT_TRUE(std::filesystem::exists(web / file)) << file;
+    }
+    // What npm installs is there when npm has been run.
+    const char* const library = "node_modules/nats.ws/esm/nats.js";
+    EXPECT_EQ(std::filesystem::exists(web / library),
+              std::filesystem::exists(std::filesystem::path(PROJECT_SOURCE_ROOT "/web") / library));
+    EXPECT_FALSE(std::filesystem::exists(web / "node_modules/ws"));
 }
 
 TEST(StandardOutput, CarriesNothingThatALibraryPrints) {
