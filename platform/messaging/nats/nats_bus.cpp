@@ -10,6 +10,7 @@
 #include <condition_variable>
 #include <cstdint>
 #include <exception>
+#include <limits>
 #include <mutex>
 #include <stdexcept>
 #include <thread>
@@ -99,8 +100,9 @@ private:
     std::uintptr_t listener_ = 0;
     std::thread keeper_;
 
-    // Messages that libnats holds until there is a server again.
+    // Whether libnats holds messages until there is a server again.
     std::atomic<bool> unsent_ = false;
+    std::atomic<bool> disconnected_ = false;
 
     std::mutex sourcesMutex_;  // guards what follows; locked before mutex_
     std::vector<std::shared_ptr<NatsSource>> sources_;
@@ -231,6 +233,7 @@ void NatsBus::Core::reconnect(const std::string& name) {
             for (const auto& source : sources_) {
                 attach(*source);
             }
+            disconnected_ = false;
             logger().warn("Connected to NATS again, at {}.", server);
             return;
         } catch (const std::exception& error) {
@@ -304,13 +307,16 @@ void NatsBus::Core::publish(const std::string& channel, const DataBuffer& payloa
 void NatsBus::Core::send(const std::string& channel, const DataBuffer& payload) {
     nats::requireSubject(channel);
     const ConnectionHandle connection = this->connection();
-    const std::int64_t limit = natsConnection_GetMaxPayload(connection->get());
-    if (std::cmp_greater(payload.length(), limit)) {
-        throw std::runtime_error("The server takes messages of up to " + std::to_string(limit) +
-                                 " bytes.");
+    if (std::cmp_greater(payload.length(), std::numeric_limits<int>::max())) {
+        throw std::runtime_error("NATS takes messages of less than 2 GiB.");
     }
     const natsStatus status = natsConnection_Publish(
         connection->get(), channel.c_str(), payload.data(), static_cast<int>(payload.length()));
+    if (status == NATS_MAX_PAYLOAD) {
+        throw std::runtime_error("The server takes messages of up to " +
+                                 std::to_string(natsConnection_GetMaxPayload(connection->get())) +
+                                 " bytes.");
+    }
     if (status == NATS_INSUFFICIENT_BUFFER) {
         throw std::runtime_error("No server is connected, and as much as may wait for one does.");
     }
@@ -319,7 +325,8 @@ void NatsBus::Core::send(const std::string& channel, const DataBuffer& payload) 
         natsConnection_Close(connection->get());
     }
     nats::check(status, "The message could not be sent");
-    if (!connection->isConnected()) {
+    // Not asked of libnats, whose lock the threads that send and receive contend for.
+    if (disconnected_) {
         unsent_ = true;
     }
 }
@@ -374,12 +381,14 @@ bool NatsBus::Core::flush(const nats::Connection& connection, Clock::time_point 
 }
 
 void NatsBus::Core::onDisconnected(const std::string& reason) {
+    disconnected_ = true;
     if (!isStopping()) {
         logger().warn("The connection to NATS is lost: {}.", reason);
     }
 }
 
 void NatsBus::Core::onReconnected(const std::string& server) {
+    disconnected_ = false;
     unsent_ = false;
     logger().warn("Connected to NATS again, at {}.", server);
 }
