@@ -133,6 +133,17 @@ SECTIONS = {
             Growth("write a package of parts of 1 KB", "µs per part"),
             Growth("read texts of 10 KB at once", "µs per request"),
         ]),
+    "nats": Section(
+        programs=[[str(BUILD / "bin" / "nats_benchmark"), REPETITIONS]],
+        order=("what", "who"),
+        ours="bundle",
+        rows=[
+            Row("small read", "µs per request", [Ratio(0.9, ("echo",), "90 % of the echo")]),
+            Row("small read", "ms until the answer", []),
+            Row("small read", "ms at most, of 99 in 100", []),
+            Row("read of 10 MB", "MB/s", []),
+            Row("read of 10 MB", "ms until the answer", []),
+        ]),
 }
 
 # ---- Running ----
