@@ -5,9 +5,9 @@
 namespace host {
 
 void keepFreedMemory() {
-    // The largest that the C library takes. What is larger comes from the system and goes back to
-    // it every time.
-    constexpr int largestKept = 32 << 20;
+    // What is larger comes from the system and goes back to it every time. The C library would take
+    // more, but of large documents too much would then be kept while others are made.
+    constexpr int largestKept = 12 << 20;
     ::mallopt(M_MMAP_THRESHOLD, largestKept);
     ::mallopt(M_TRIM_THRESHOLD, static_cast<int>(keptMemory));
 }

@@ -6,7 +6,7 @@
 namespace host {
 
 /// What a thread that answers requests keeps at most.
-inline constexpr std::size_t keptMemory = std::size_t{64} << 20U;
+inline constexpr std::size_t keptMemory = std::size_t{32} << 20U;
 
 /// Has the C library keep freed memory for the requests to come, about `keptMemory` for each thread
 /// that answers them. By default it returns most of it to the system, which then has to find and

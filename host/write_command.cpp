@@ -1,5 +1,6 @@
 #include "host/write_command.h"
 
+#include <malloc.h>
 #include <spdlog/spdlog.h>
 
 #include <algorithm>
@@ -117,6 +118,8 @@ platform::DataBuffer requestFor(const WriteOptions& options, const Content& cont
 
 int runWrite(const WriteOptions& options, int input, int output) {
     platform::DataBuffer request = requestFor(options, Content(input));
+    // What the look at the content took, the threads that answer the request cannot use.
+    ::malloc_trim(0);
     std::mutex mutex;
     std::optional<JsonMessage> answer;  // guarded by mutex
     BundleHost host(options.bundle, request.length(), [&](const JsonMessage& message) {

@@ -12,7 +12,7 @@ namespace {
 // The pages that the thread is given by the system while it takes, uses and frees a document's
 // memory.
 long pagesForADocument() {
-    constexpr std::size_t size = std::size_t{20} << 20U;
+    constexpr std::size_t size = std::size_t{11} << 20U;
     rusage before{};
     rusage after{};
     ::getrusage(RUSAGE_THREAD, &before);
