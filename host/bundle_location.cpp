@@ -34,7 +34,8 @@ std::filesystem::path findBundle() {
 }
 
 std::filesystem::path findWebFolder() {
-    const std::filesystem::path folder = (programFolder() / INSTALLED_WEB_FOLDER).lexically_normal();
+    const std::filesystem::path folder =
+        (programFolder() / INSTALLED_WEB_FOLDER).lexically_normal();
     std::error_code ignored;
     if (!std::filesystem::exists(folder / "index.html", ignored)) {
         throw std::runtime_error("there is no web page in " + folder.string() +
