@@ -1,8 +1,9 @@
 // The kernels that every machine can run, and the choice among all.
 #include "json/string_kernels.h"
 
+#include <array>
+#include <cstddef>
 #include <cstdint>
-#include <vector>
 
 #ifdef __SSE2__
 #include <emmintrin.h>
@@ -107,24 +108,33 @@ constexpr StringKernels sse2Kernels = kernelsOf<Sse2Block>("SSE2");
 
 #endif
 
-std::vector<const StringKernels*> findRunnable() {
-    std::vector<const StringKernels*> kernels{&wordKernels};
+/// Held without memory from the heap, which may be exhausted when they are first asked for.
+struct RunnableKernels {
+    std::array<const StringKernels*, 3> kernels{};
+    std::size_t count = 0;
+
+    void add(const StringKernels& added) { kernels[count++] = &added; }
+};
+
+RunnableKernels findRunnable() {
+    RunnableKernels runnable;
+    runnable.add(wordKernels);
 #ifdef __SSE2__
-    kernels.push_back(&sse2Kernels);
+    runnable.add(sse2Kernels);
 #endif
 #ifdef HAS_AVX2_KERNELS
     if (__builtin_cpu_supports("avx2") && __builtin_cpu_supports("bmi") &&
         __builtin_cpu_supports("popcnt"))
-        kernels.push_back(&avx2StringKernels);
+        runnable.add(avx2StringKernels);
 #endif
-    return kernels;
+    return runnable;
 }
 
 }  // namespace
 
 std::span<const StringKernels* const> runnableStringKernels() {
-    static const std::vector<const StringKernels*> kernels = findRunnable();
-    return kernels;
+    static const RunnableKernels runnable = findRunnable();
+    return {runnable.kernels.data(), runnable.count};
 }
 
 const StringKernels& stringKernels() {

@@ -72,7 +72,9 @@ void copyTree(const Value& source, Value& target) {
 constexpr int recursiveLevels = 32;
 
 /// How many destructors of values that hold others run on this thread, each within the one before.
-thread_local int runningDestructors = 0;
+/// It is part of the memory that each thread is begun with: glibc would otherwise allocate it when
+/// a thread first comes here, and end the process if it could not.
+[[gnu::tls_model("initial-exec")]] thread_local int runningDestructors = 0;
 
 Value& first(Value& container) {
     return container.is<Array>() ? container.get<Array>().front()

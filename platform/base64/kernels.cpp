@@ -2,9 +2,9 @@
 #include "platform/base64/kernels.h"
 
 #include <array>
+#include <cstddef>
 #include <cstdint>
 #include <string_view>
-#include <vector>
 
 namespace platform::base64 {
 
@@ -63,14 +63,23 @@ std::size_t decode(const char* text, std::size_t groups, char* bytes) {
     return groups;
 }
 
-std::vector<const Kernels*> findRunnable() {
-    std::vector<const Kernels*> found{&plainKernels};
+// Held without memory from the heap, which may be exhausted when they are first asked for.
+struct RunnableKernels {
+    std::array<const Kernels*, 2> kernels{};
+    std::size_t count = 0;
+
+    void add(const Kernels& added) { kernels[count++] = &added; }
+};
+
+RunnableKernels findRunnable() {
+    RunnableKernels runnable;
+    runnable.add(plainKernels);
 #ifdef HAS_AVX2_KERNELS
     if (__builtin_cpu_supports("avx2")) {
-        found.push_back(&avx2Kernels);
+        runnable.add(avx2Kernels);
     }
 #endif
-    return found;
+    return runnable;
 }
 
 }  // namespace
@@ -78,8 +87,8 @@ std::vector<const Kernels*> findRunnable() {
 constexpr Kernels plainKernels = {"plain", encode, decode};
 
 std::span<const Kernels* const> runnableKernels() {
-    static const std::vector<const Kernels*> runnable = findRunnable();
-    return runnable;
+    static const RunnableKernels runnable = findRunnable();
+    return {runnable.kernels.data(), runnable.count};
 }
 
 const Kernels& kernels() {
