@@ -26,6 +26,7 @@
 
 #include "host/child_process.h"
 #include "host/standard_streams.h"
+#include "platform/messaging/nats/client_backlog.h"
 
 namespace host {
 
@@ -37,6 +38,11 @@ using std::chrono::milliseconds;
 // How long the server may take to be ready, and to end when it is asked to.
 constexpr milliseconds longestStart{30'000};
 constexpr milliseconds longestStop{5'000};
+
+// How long its clients may take to read what it has for them before it is stopped, and how often to
+// look whether they have.
+constexpr milliseconds longestDelivery{10'000};
+constexpr milliseconds deliveryInterval{10};
 
 constexpr milliseconds forever{-1};
 
@@ -106,6 +112,34 @@ std::vector<std::filesystem::path> portsFilesIn(const std::filesystem::path& fol
         }
     }
     return files;
+}
+
+// "0100007F:1F90", as the system writes an address and port.
+std::uint16_t portOfAddress(const std::string& address) {
+    return static_cast<std::uint16_t>(
+        std::stoul(address.substr(address.rfind(':') + 1), nullptr, 16));
+}
+
+// Whether the system holds bytes of connections to these ports of the loopback interface, which one
+// end has sent and the other has not read.
+bool hasBytesUnderWay(const std::array<std::uint16_t, 2>& ports) {
+    const auto isOne = [&](const std::string& address) {
+        return std::find(ports.begin(), ports.end(), portOfAddress(address)) != ports.end();
+    };
+    std::ifstream table("/proc/self/net/tcp");
+    std::string line;
+    std::getline(table, line);  // The names of the columns.
+    while (std::getline(table, line)) {
+        std::istringstream columns(line);
+        std::string index, local, remote, state, queues;
+        columns >> index >> local >> remote >> state >> queues;
+        constexpr const char* established = "01";
+        if (state == established && queues != "00000000:00000000" &&
+            (isOne(local) || isOne(remote))) {
+            return true;
+        }
+    }
+    return false;
 }
 
 void writePrivateFile(const std::filesystem::path& file, std::string_view text) {
@@ -228,6 +262,14 @@ NatsServer::NatsServer(NatsServerOptions options, const PrivateFolder& folder)
     }
 }
 
+platform::messaging::NatsOptions NatsServer::workerConnection() const {
+    platform::messaging::NatsOptions options;
+    options.servers = {"nats://" + address()};
+    options.user = configuration_.users.worker.user;
+    options.password = configuration_.users.worker.password;
+    return options;
+}
+
 NatsServer::~NatsServer() {
     ::eventfd_write(stop_.get(), 1);
     supervisor_.join();
@@ -287,12 +329,33 @@ std::optional<std::string> NatsServer::live(const std::function<void()>& whenRea
             state = life.follow(forever);
         }
         if (state == Life::State::isToStop) {
+            waitForClients();
             life.end();
             return std::nullopt;
         }
         return life.collect();
     } catch (const std::exception& error) {
         return error.what();
+    }
+}
+
+// Waits until clients have what they were sent: a server that is stopped drops what it has not
+// sent, and what it has sent is lost with the connection when a client sends something just then.
+void NatsServer::waitForClients() const {
+    const Clock::time_point latest = Clock::now() + longestDelivery;
+    try {
+        bool isDone =
+            platform::messaging::waitForClientBacklog(workerConnection(), longestDelivery);
+        while (isDone && hasBytesUnderWay({configuration_.port, configuration_.webSocketPort})) {
+            isDone = Clock::now() < latest;
+            std::this_thread::sleep_for(deliveryInterval);
+        }
+        if (!isDone) {
+            spdlog::warn("clients have not taken their answers after {} s and do not get them",
+                         longestDelivery.count() / 1000);
+        }
+    } catch (const std::exception& error) {
+        spdlog::warn("clients may not get their last answers: {}", error.what());
     }
 }
 

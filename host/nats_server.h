@@ -18,6 +18,7 @@
 #include "host/file_descriptor.h"
 #include "host/nats_configuration.h"
 #include "host/private_folder.h"
+#include "platform/messaging/nats/nats_bus.h"
 
 namespace host {
 
@@ -28,8 +29,8 @@ struct NatsServerOptions {
     std::vector<std::string> allowedOrigins;  ///< As in NatsConfiguration.
 };
 
-/// A supervised nats-server. It is stopped at the end of this object's life, and dies with the host
-/// however that ends.
+/// A supervised nats-server. It is stopped at the end of this object's life, when its clients have
+/// taken what it holds for them or some seconds are over, and dies with the host however that ends.
 class NatsServer {
 public:
     /// Starts the server, with its files in `folder`, and waits until it takes connections. Throws
@@ -51,11 +52,15 @@ public:
 
     const NatsUsers& users() const noexcept { return configuration_.users; }
 
+    /// How the host itself connects.
+    platform::messaging::NatsOptions workerConnection() const;
+
 private:
     class Life;
 
     void supervise(std::promise<void> ready);
     std::optional<std::string> live(const std::function<void()>& whenReady);
+    void waitForClients() const;
     void removePortsFiles() const;
     bool findPorts();
 

@@ -76,14 +76,6 @@ NatsOptions connectionTo(const OtherServers& servers) {
     return options;
 }
 
-NatsOptions connectionTo(const NatsServer& server) {
-    NatsOptions options;
-    options.servers = {"nats://" + server.address()};
-    options.user = server.users().worker.user;
-    options.password = server.users().worker.password;
-    return options;
-}
-
 std::shared_ptr<NatsBus> makeBus(NatsOptions options) {
     options.connectTimeout = longestConnect;
     // Counting them takes files that the threads which ask may not be allowed to open.
@@ -243,7 +235,7 @@ int runServe(const ServeOptions& options, int output) {
     std::unique_ptr<NatsServer> server =
         folder ? startOwnServer(options, web.get(), *folder) : nullptr;
     const std::shared_ptr<NatsBus> bus =
-        makeBus(server ? connectionTo(*server) : connectionTo(options.otherServers));
+        makeBus(server ? server->workerConnection() : connectionTo(options.otherServers));
     if (!connect(*bus, confinements ? &confinements->network : nullptr, signals.first())) {
         return exitDone;
     }

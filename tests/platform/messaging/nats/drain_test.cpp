@@ -2,11 +2,21 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <netinet/in.h>
+#include <sys/socket.h>
+#include <unistd.h>
 
+#include <array>
+#include <cstddef>
+#include <cstdint>
 #include <future>
+#include <iterator>
 #include <latch>
 #include <string>
+#include <string_view>
 
+#include "host/file_descriptor.h"
+#include "platform/messaging/nats/client_backlog.h"
 #include "tests/platform/messaging/nats/bus_at_server.h"
 
 namespace platform::messaging {
@@ -89,6 +99,62 @@ TEST(NatsDrainEnd, HasTheServerHaveWhatWasPublished) {
         EXPECT_TRUE(worker.bus->drain(kPatience));
     }
     EXPECT_THAT(sizes.waitFor(2), ElementsAre(20'000'000U, 1U));
+}
+
+/// A client that subscribes "x" and reads only when it is told to.
+class SilentClient {
+public:
+    explicit SilentClient(int port) : socket_(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
+        sockaddr_in address{};
+        address.sin_family = AF_INET;
+        address.sin_port = htons(static_cast<std::uint16_t>(port));
+        address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        EXPECT_EQ(::connect(socket_.get(), reinterpret_cast<sockaddr*>(&address), sizeof address),
+                  0);
+        constexpr std::string_view hello = "CONNECT {\"verbose\":false}\r\nSUB x 1\r\nPING\r\n";
+        EXPECT_EQ(::write(socket_.get(), hello.data(), hello.size()), std::ssize(hello));
+        std::string answer;
+        while (!answer.ends_with("PONG\r\n") && readSome(answer)) {
+        }
+    }
+
+    /// Reads until `count` bytes have come.
+    void read(std::size_t count) const {
+        std::string all;
+        while (all.size() < count && readSome(all)) {
+        }
+        EXPECT_GE(all.size(), count);
+    }
+
+private:
+    bool readSome(std::string& text) const {
+        std::array<char, 65536> chunk;
+        const ssize_t count = ::read(socket_.get(), chunk.data(), chunk.size());
+        text.append(chunk.data(), count > 0 ? static_cast<std::size_t>(count) : 0);
+        return count > 0;
+    }
+
+    host::FileDescriptor socket_;
+};
+
+TEST(NatsClientBacklog, IsWaitedFor) {
+    const test::NatsServer server("max_payload: 64MB\nmax_pending: 256MB\nwrite_deadline: \"60s\"");
+    const SilentClient client(server.port());
+    BusAtServer worker(server);
+    worker.publish("x", std::string(20'000'000, 'x'));
+    EXPECT_TRUE(worker.bus->drain(kPatience));
+    EXPECT_FALSE(waitForClientBacklog(optionsFor(server), std::chrono::milliseconds(100)));
+    std::future<bool> sent = std::async(
+        std::launch::async, [&] { return waitForClientBacklog(optionsFor(server), kPatience); });
+    client.read(20'000'000);
+    EXPECT_TRUE(sent.get());
+}
+
+TEST(NatsClientBacklog, OfAServerThatIsGoneIsAFailure) {
+    test::NatsServer server;
+    server.kill();
+    EXPECT_THAT(failureOf([&] { waitForClientBacklog(optionsFor(server), kPatience); }),
+                HasSubstr("No server available"));
 }
 
 TEST(NatsDrainEnd, AfterwardsEveryOperationFails) {
