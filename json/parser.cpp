@@ -330,7 +330,8 @@ private:
 
     /// Parses a value whole, or the opening of an array or object that is not empty.
     Status startValue(Value& value);
-    Status startLiteral(std::string_view literal, Value meaning, Value& value);
+    template <HeldType T>
+    Status startLiteral(std::string_view literal, T meaning, Value& value);
     template <typename Container>
     Status startContainer(Value& value, char closing);
 
@@ -387,12 +388,13 @@ Status TreeParser::startValue(Value& value) {
     }
 }
 
-Status TreeParser::startLiteral(std::string_view literal, Value meaning, Value& value) {
+template <HeldType T>
+Status TreeParser::startLiteral(std::string_view literal, T meaning, Value& value) {
     // Whatever is wrong with the literal, no attempt has moved: it counts as a string that is none.
     const Status status = parseLiteral(input, literal, Status::notString);
     if (status != Status::success)
         return Status::notString;
-    value = std::move(meaning);
+    value.emplace<T>() = meaning;
     return status;
 }
 

@@ -10,6 +10,7 @@
 #include <string_view>
 #include <type_traits>
 #include <variant>
+#include <vector>
 
 #include "json/string_kernels.h"
 #include "json/text_memory.h"
@@ -20,7 +21,7 @@ namespace {
 // ---- Walking the tree ----
 
 /// Hands the parts of a tree to `Visitor` in the order of the text: `open`, `close`, `comma`,
-/// `key`, and `leaf` with what is held by each value that is no container.
+/// `key`, and `leaf` with what is held by each value that is no container; until it is `done`.
 template <typename Visitor>
 class TreeWalk {
 public:
@@ -28,7 +29,7 @@ public:
 
     void walk(const Value& root) {
         start(root);
-        while (!open.empty())
+        while (!open.empty() && !visitor.done())
             std::visit([this](auto& container) { this->goOn(container); }, open.top());
     }
 
@@ -69,7 +70,7 @@ private:
             if (current.next != current.container->begin())
                 visitor.comma();
             start(*current.next++);
-            if (open.size() != depth)
+            if (open.size() != depth || visitor.done())
                 return;
         }
         visitor.close(isArray<Container> ? ']' : '}');
@@ -77,14 +78,38 @@ private:
     }
 
     Visitor& visitor;
-    std::stack<std::variant<Open<Array>, Open<Object>>> open;
+    using AnyOpen = std::variant<Open<Array>, Open<Object>>;
+    std::stack<AnyOpen, std::vector<AnyOpen>> open;  // from the outermost to the innermost
 };
 
 // ---- Estimating the length ----
 
-/// Adds up about how long the text of a tree gets.
+/// The number of bytes that need an escape; of a long text about that, by samples of it.
+std::size_t estimateEscapes(const std::string& text) {
+    constexpr std::size_t samples = 4;
+    constexpr std::size_t sampleSize = 1024;
+    const auto count = [&text](std::size_t at, std::size_t size) {
+        return detail::stringKernels().countEscapes(text.data() + at, text.data() + at + size);
+    };
+    if (text.size() <= samples * sampleSize)
+        return count(0, text.size());
+    std::size_t escapes = 0;
+    for (std::size_t i = 0; i < samples; ++i)
+        escapes += count((text.size() - sampleSize) / (samples - 1) * i, sampleSize);
+    constexpr std::size_t margin = 32;
+    return text.size() / (samples * sampleSize) * escapes + text.size() / margin;
+}
+
+/// Adds up about how long the text of a tree gets. Gives up on a tree of many small values: to go
+/// through it twice takes longer than to enlarge the memory now and then.
 class Estimate {
 public:
+    bool done() const {
+        constexpr std::size_t few = 256;
+        constexpr std::size_t smallValue = 64;
+        return values > few && length < values * smallValue;
+    }
+
     void open(char) { ++length; }
     void close(char) { ++length; }
     void comma() { ++length; }
@@ -94,12 +119,12 @@ public:
         ++length;
     }
 
-    void leaf(const std::string& text) { length += text.size() + escapesOf(text) + 2; }
+    void leaf(const std::string& text) { add(text.size() + estimateEscapes(text) + 2); }
 
     template <typename Leaf>
     void leaf(const Leaf&) {
         constexpr std::size_t usualNumber = 12;
-        length += usualNumber;
+        add(usualNumber);
     }
 
     // Some more than nothing, since what is written last wants room for the longest that it could
@@ -107,21 +132,12 @@ public:
     std::size_t length = 64;
 
 private:
-    /// The number of bytes that need an escape; of a long text about that, by samples of it.
-    static std::size_t escapesOf(const std::string& text) {
-        constexpr std::size_t samples = 4;
-        constexpr std::size_t sampleSize = 1024;
-        const auto count = [&text](std::size_t at, std::size_t size) {
-            return detail::stringKernels().countEscapes(text.data() + at, text.data() + at + size);
-        };
-        if (text.size() <= samples * sampleSize)
-            return count(0, text.size());
-        std::size_t escapes = 0;
-        for (std::size_t i = 0; i < samples; ++i)
-            escapes += count((text.size() - sampleSize) / (samples - 1) * i, sampleSize);
-        constexpr std::size_t margin = 32;
-        return text.size() / (samples * sampleSize) * escapes + text.size() / margin;
+    void add(std::size_t count) {
+        length += count;
+        ++values;
     }
+
+    std::size_t values = 0;
 };
 
 // ---- Writing ----
@@ -130,6 +146,8 @@ class Writer {
 public:
     /// `memory` gets the text; it is enlarged where `estimate` turns out too low.
     Writer(std::string& memory, std::size_t estimate) : text(memory) { enlarge(estimate); }
+
+    static bool done() { return false; }
 
     void open(char c) { put(c); }
     void close(char c) { put(c); }
@@ -148,8 +166,10 @@ public:
         put('"');
         const char* in = string.data();
         const char* const last = in + string.size();
+        if (end - position < std::ssize(string))
+            require(std::ssize(string) + static_cast<std::ptrdiff_t>(estimateEscapes(string)));
         for (;;) {
-            const auto copied = detail::stringKernels().escape(in, last, position, end);
+            const auto copied = kernels.escape(in, last, position, end);
             in = copied.in;
             position = copied.out;
             if (in == last)
@@ -201,6 +221,7 @@ private:
         end = text.data() + text.size();
     }
 
+    const detail::StringKernels& kernels = detail::stringKernels();
     std::string& text;
     char* position = nullptr;
     char* end = nullptr;  // of the memory

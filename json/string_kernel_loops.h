@@ -85,6 +85,23 @@ inline const Escape& escapeOf(char c) {
     return escapeTable.escapes[indexOf(c)];
 }
 
+using Word = unsigned long;
+constexpr std::ptrdiff_t wordSize = 8;
+static_assert(sizeof(Word) == wordSize);
+
+/// Whether the eight bytes at `in` need no escape.
+inline bool arePlain(const char* in) {
+    constexpr Word ones = 0x0101'0101'0101'0101;
+    Word word;
+    __builtin_memcpy(&word, in, sizeof word);
+    const Word backslash = word ^ (ones * '\\');
+    const Word quote = word ^ (ones * '"');
+    // A byte's subtraction borrows where the byte is smaller.
+    const Word borrows = ((word - ones * 0x20) & ~word) | ((backslash - ones) & ~backslash) |
+                         ((quote - ones) & ~quote);
+    return (borrows & (ones * 0x80)) == 0;
+}
+
 template <typename Block>
 StringExtent measure(const char* in, const char* end) {
     std::size_t escapes = 0;
@@ -188,6 +205,12 @@ Copied escape(const char* in, const char* end, char* out, char* outEnd) {
         in = next;
     }
     while (in != end && outEnd - out >= maxEscapeLength) {
+        if (end - in >= wordSize && outEnd - out >= wordSize && arePlain(in)) {
+            __builtin_memcpy(out, in, sizeof(Word));
+            in += wordSize;
+            out += wordSize;
+            continue;
+        }
         const Escape& text = escapeOf(*in);
         if (text.length == 0) {
             *out++ = *in++;
@@ -205,6 +228,8 @@ std::size_t countEscapes(const char* in, const char* end) {
     std::size_t escapes = 0;
     for (; end - in >= blockSize; in += blockSize)
         escapes += count(Block(in).specials());
+    while (end - in >= wordSize && arePlain(in))
+        in += wordSize;
     for (; in != end; ++in)
         escapes += escapeOf(*in).length != 0 ? 1 : 0;
     return escapes;

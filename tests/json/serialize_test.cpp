@@ -7,6 +7,7 @@
 #include <cmath>
 #include <cstdint>
 #include <limits>
+#include <string>
 
 #include "json/parser.h"
 #include "tests/json/random_json.h"
@@ -79,6 +80,21 @@ TEST(Serialize, WritesTextsThatAreFarLongerThanTheirFirstBytesSuggest) {
     for (int i = 1; i < 1000; ++i)
         numbers += ",-1.2345678901234567e-308";
     EXPECT_EQ(serialize(Array(1000, number)), numbers + "]");
+}
+
+TEST(Serialize, WritesManySmallValuesAndALongTextBehindThem) {
+    Array array;
+    std::string expected = "[";
+    for (long number = 0; number < 10'000; ++number) {
+        array.emplace_back(Object{{"n", number}});
+        expected += "{\"n\":" + std::to_string(number) + "},";
+    }
+    array.emplace_back(std::string(100'000, '\x01'));
+    array.emplace_back("end");
+    expected += '"';
+    for (int i = 0; i < 100'000; ++i)
+        expected += "\\u0001";
+    EXPECT_EQ(serialize(array), expected + "\",\"end\"]");
 }
 
 TEST(Serialize, EscapesKeysAsStrings) {
