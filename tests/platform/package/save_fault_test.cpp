@@ -11,9 +11,11 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <functional>
 #include <map>
 #include <random>
 #include <stdexcept>
+#include <string>
 #include <system_error>
 
 #include "package_test_support.h"
@@ -66,6 +68,17 @@ protected:
         writer.close(false);
     }
 
+    // Makes a save of which `decide` fails calls, and counts these.
+    void superviseSave(std::string& error, const std::function<int(int, int)>& decide) {
+        supervise(saving(error), [&](int call, int index) {
+            const int decided = decide(call, index);
+            faults_ += decided != 0 ? 1 : 0;
+            return decided;
+        });
+    }
+
+    void TearDown() override { RecordProperty("faults", std::to_string(faults_)); }
+
     // The work of one save, which notes the error that it ends with.
     std::function<void()> saving(std::string& error) {
         return [this, &error] {
@@ -116,6 +129,7 @@ protected:
     QuilletFilePackage package_ = newDocument();
     std::string new_;
     std::u16string path_;
+    int faults_ = 0;
 };
 
 TEST_F(SaveFaultTest, SyncsTheContentBeforeTheRenameAndTheFolderAfterIt) {
@@ -140,7 +154,7 @@ TEST_F(SaveFaultTest, LeavesTheOldDocumentOrTheNewOneWhicheverCallFails) {
                          std::to_string(error));
             placeOldDocument();
             std::string thrown;
-            supervise(saving(thrown), [&](int, int index) { return index == failing ? error : 0; });
+            superviseSave(thrown, [&](int, int index) { return index == failing ? error : 0; });
             const bool mustBeOld = !thrown.empty() && failing <= rename;
             EXPECT_EQ(folder_.bytesOf("a.docx"), mustBeOld ? "old" : new_);
             EXPECT_THAT(folder_.names(), ElementsAre("a.docx", "link"));
@@ -172,7 +186,7 @@ TEST_F(SaveFaultTest, LeavesTheOldDocumentWhenTheDiskStaysFull) {
         }
         placeOldDocument();
         std::string thrown;
-        supervise(saving(thrown), [&](int call, int index) {
+        superviseSave(thrown, [&](int call, int index) {
             return index >= first && (call == SYS_write || call == SYS_fsync) ? ENOSPC : 0;
         });
         EXPECT_THAT(thrown, HasSubstr("No space left on device"));
@@ -191,7 +205,7 @@ TEST_F(SaveFaultTest, LeavesNothingWhereThereWasNoDocumentWhicheverCallFails) {
         for (const int error : {ENOSPC, EIO, EACCES}) {
             SCOPED_TRACE("call " + std::to_string(failing) + ", errno " + std::to_string(error));
             std::filesystem::remove(folder_.path() / "a.docx");
-            supervise(saving(thrown), [&](int, int index) { return index == failing ? error : 0; });
+            superviseSave(thrown, [&](int, int index) { return index == failing ? error : 0; });
             if (!thrown.empty() && failing <= rename) {
                 EXPECT_THAT(folder_.names(), IsEmpty());
             } else {
@@ -213,16 +227,18 @@ TEST_F(SaveFaultTest, NeverOpensTheDocumentToOthersWhicheverCallFails) {
                              bytes16(16) + bytes16(6) + bytes32(none) + bytes16(32) + bytes16(0) +
                              bytes32(none);
     const std::string path = (folder_.path() / "a.docx").string();
-    // With a list more calls are made; the first that does not come ends the loop.
-    for (int failing = 0, count = failing + 1; failing < count; ++failing) {
+    // With a list more calls are made; the first fault that does not come ends the loop.
+    bool isMade = true;
+    int failing = 0;
+    for (; isMade; ++failing) {
         placeOldDocument();
         if (::setxattr(path.c_str(), name, list.data(), list.size(), 0) != 0) {
             GTEST_SKIP() << "this file system has no access control lists";
         }
-        count = 0;
+        isMade = false;
         std::string thrown;
-        supervise(saving(thrown), [&](int, int index) {
-            count = index + 1;
+        superviseSave(thrown, [&](int, int index) {
+            isMade = isMade || index == failing;
             return index == failing ? EIO : 0;
         });
         std::string found(list.size(), '\0');
@@ -231,6 +247,7 @@ TEST_F(SaveFaultTest, NeverOpensTheDocumentToOthersWhicheverCallFails) {
             << failing;
         EXPECT_EQ(found, list) << failing;
     }
+    EXPECT_GT(failing, static_cast<int>(calls.size()));
 }
 
 TEST_F(SaveFaultTest, LeavesTheOldDocumentOrTheNewOneWhenItIsKilledAtAnyCall) {
@@ -238,6 +255,7 @@ TEST_F(SaveFaultTest, LeavesTheOldDocumentOrTheNewOneWhenItIsKilledAtAnyCall) {
     const int rename = positionOfRename(calls);
     for (int last = 0; last < static_cast<int>(calls.size()); ++last) {
         placeOldDocument();
+        ++faults_;
         const pid_t child = ::fork();
         if (child == 0) {
             std::string thrown;
