@@ -205,7 +205,9 @@ TEST_P(AllocationFaults, OfAStartEndItInAnOrderlyWay) {
         spared = std::make_unique<test::SparedThread>();
         other.reset();
         EXPECT_EQ(bundle.read(path, "text/plain").size(), 1u);
+        faults += failing < allocations ? 1 : 0;
     }
+    RecordProperty("faults", std::to_string(faults));
     EXPECT_GT(failed, 5);
     RunningBundle another;
     EXPECT_EQ(another.read(path, "text/plain").size(), 1u);

@@ -96,6 +96,7 @@ protected:
         const std::vector<int> calls = test::callsOf([&] { handle(handler, text); });
         const std::size_t descriptors = openDescriptors();
         ASSERT_GT(calls.size(), 3u);
+        int faults = 0;
         for (int failing = 0; failing < static_cast<int>(calls.size()); ++failing) {
             for (const int error : kErrors) {
                 SCOPED_TRACE("call " + std::to_string(failing) + ", system call " +
@@ -103,7 +104,10 @@ protected:
                              std::to_string(error));
                 prepare();
                 test::supervise([&] { handle(handler, text); },
-                                [&](int, int index) { return index == failing ? error : 0; });
+                                [&](int, int index) {
+                                    faults += index == failing ? 1 : 0;
+                                    return index == failing ? error : 0;
+                                });
                 check(published);
                 ASSERT_FALSE(HasFailure());
             }
@@ -112,6 +116,7 @@ protected:
         const auto closes =
             static_cast<std::size_t>(std::count(calls.begin(), calls.end(), SYS_close));
         EXPECT_EQ(openDescriptors(), descriptors + closes * kErrors.size());
+        RecordProperty("faults", std::to_string(faults));
     }
 
     std::set<std::string> names() const {
