@@ -1,0 +1,58 @@
+#include "platform/data_buffer.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <utility>
+
+namespace platform {
+namespace {
+
+TEST(DataBuffer, OfNoBytesHasNoStorage) {
+    for (const DataBuffer& buffer : {DataBuffer(), DataBuffer(0), DataBuffer::copyOf("")}) {
+        EXPECT_EQ(buffer.data(), nullptr);
+        EXPECT_EQ(buffer.capacity(), 0U);
+        EXPECT_TRUE(buffer.empty());
+        EXPECT_EQ(buffer.view(), "");
+    }
+}
+
+TEST(DataBuffer, CopiesExactlyTheBytes) {
+    const std::string bytes("a\0b\xFF", 4);
+    const DataBuffer buffer = DataBuffer::copyOf(bytes);
+    EXPECT_EQ(buffer.view(), bytes);
+    EXPECT_EQ(buffer.length(), 4U);
+    EXPECT_EQ(buffer.capacity(), 4U);
+    EXPECT_NE(buffer.data(), bytes.data());
+}
+
+TEST(DataBuffer, HasNoneOfItsBytesInUseAtFirst) {
+    DataBuffer buffer(3);
+    EXPECT_EQ(buffer.capacity(), 3U);
+    EXPECT_TRUE(buffer.empty());
+    buffer.data()[0] = 'x';
+    buffer.setLength(1);
+    EXPECT_EQ(buffer.view(), "x");
+}
+
+TEST(DataBuffer, GivesItsStorageAwayWhenItIsMoved) {
+    DataBuffer first = DataBuffer::copyOf("text");
+    const char* const storage = first.data();
+    DataBuffer second(std::move(first));
+    EXPECT_EQ(second.data(), storage);
+    EXPECT_EQ(second.view(), "text");
+    // NOLINTNEXTLINE(bugprone-use-after-move)
+    EXPECT_EQ(first.data(), nullptr);
+    EXPECT_EQ(first.capacity(), 0U);
+    EXPECT_TRUE(first.empty());
+
+    first = DataBuffer::copyOf("other");
+    first = std::move(second);
+    EXPECT_EQ(first.data(), storage);
+    EXPECT_EQ(first.capacity(), 4U);
+    // NOLINTNEXTLINE(bugprone-use-after-move)
+    EXPECT_TRUE(second.empty());
+}
+
+}  // namespace
+}  // namespace platform
