@@ -123,8 +123,8 @@ public:
     std::u16string readTextFile(std::u16string path, std::string& charset) const;
 
     /// The bytes of the file at `path`; none when it cannot be opened or is no regular file, whose
-    /// end might never come. Throws std::runtime_error when reading fails half-way, since a part of
-    /// a document must not pass for the whole.
+    /// end might never come. Throws std::runtime_error when the file is larger than a text may be,
+    /// and when reading fails half-way, since a part of a document must not pass for the whole.
     std::string readFileBytes(std::u16string path) const;
 
     // Reading a document package.

@@ -153,13 +153,17 @@ std::string findCharset(std::string_view bytes) {
 
 }  // namespace
 
-std::string detect_charset(const char* data, std::size_t length, std::ostream& diagnostics,
-                           std::u16string_view sourceName) {
+void requireTextLength(std::uintmax_t length) {
     if (length > maxTextLength) {
         throw std::runtime_error("The text is too large: " + std::to_string(length) +
                                  " bytes, at most " + std::to_string(maxTextLength) +
                                  " are accepted");
     }
+}
+
+std::string detect_charset(const char* data, std::size_t length, std::ostream& diagnostics,
+                           std::u16string_view sourceName) {
+    requireTextLength(length);
     const std::string charset = findCharset({data, length});
     if (!charset.empty()) {
         return charset;

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <iosfwd>
 #include <string>
 #include <string_view>
@@ -11,6 +12,9 @@ namespace platform::i18n {
 /// The longest text in bytes that detect_charset takes: 1 GiB. What becomes of a longer one, in
 /// UTF-16 and escaped for a message, does not fit the memory of most machines.
 inline constexpr std::size_t maxTextLength = std::size_t{1} << 30;
+
+/// Throws std::runtime_error, which names both lengths, when `length` is above maxTextLength.
+void requireTextLength(std::uintmax_t length);
 
 /// The charset of the `length` bytes at `data`, by its IANA preferred name ("UTF-8", "Shift_JIS",
 /// "windows-1251"); always one that both converters accept and in which all the bytes decode

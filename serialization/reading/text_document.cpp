@@ -24,6 +24,7 @@ using platform::i18n::codecvt_string_to_ustring;
 using platform::i18n::codecvt_ustring_to_string;
 using platform::i18n::comesBackUnchanged;
 using platform::i18n::detect_charset;
+using platform::i18n::requireTextLength;
 using platform::i18n::to_string;
 using platform::i18n::to_ustring;
 
@@ -78,7 +79,7 @@ std::string cleaned(std::string bytes, const std::string& charset) {
 }
 
 /// Everything that `file` still holds, which is probably `expectedSize` bytes.
-/// Throws std::ios_base::failure on an input error.
+/// Throws std::ios_base::failure on an input error, and as soon as it is more than a text may have.
 std::string readToEnd(std::ifstream& file, std::size_t expectedSize) {
     constexpr std::size_t kSmallestPiece = 4096;
     std::string bytes;
@@ -88,6 +89,7 @@ std::string readToEnd(std::ifstream& file, std::size_t expectedSize) {
     file.exceptions(std::ios_base::badbit);
     while (file.read(bytes.data() + length, static_cast<std::streamsize>(bytes.size() - length))) {
         length = bytes.size();
+        requireTextLength(length);
         bytes.resize(bytes.size() * 2);
     }
     bytes.resize(length + static_cast<std::size_t>(file.gcount()));
@@ -146,8 +148,13 @@ std::string Serialization::readFileBytes(std::u16string path) const {
         }
         return {};
     }
-    const std::uintmax_t size = std::filesystem::file_size(nativePath, notExaminable);
-    return readToEnd(file, notExaminable ? 0 : static_cast<std::size_t>(size));
+    std::uintmax_t size = std::filesystem::file_size(nativePath, notExaminable);
+    if (notExaminable) {
+        size = 0;
+    }
+    // Before memory is taken for a file that no text is made of.
+    requireTextLength(size);
+    return readToEnd(file, static_cast<std::size_t>(size));
 }
 
 }  // namespace EditorServices

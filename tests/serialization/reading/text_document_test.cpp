@@ -4,6 +4,8 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <cstdint>
+#include <filesystem>
 #include <initializer_list>
 #include <string>
 
@@ -159,6 +161,15 @@ TEST_F(TextDocumentReading, NeverWaitsForAPipeNorReadsADevice) {
     ASSERT_EQ(::mkfifo((folder / "pipe").c_str(), 0600), 0);
     EXPECT_EQ(resultOf(to_ustring((folder / "pipe").string())), R"({"data":"","status":true})");
     EXPECT_EQ(resultOf(u"/dev/zero"), R"({"data":"","status":true})");
+}
+
+TEST_F(TextDocumentReading, AnswersAFileThatIsTooLargeBeforeItReadsIt) {
+    // More than any machine has memory for, and no room on disk.
+    test::writeFile(folder / "sparse", "");
+    std::filesystem::resize_file(folder / "sparse", std::uintmax_t{1} << 40);
+    EXPECT_EQ(resultOf(to_ustring((folder / "sparse").string())),
+              R"({"exception":"The text is too large: 1099511627776 bytes, )"
+              R"(at most 1073741824 are accepted","status":false})");
 }
 
 TEST_F(TextDocumentReading, AnswersWhatStoppedTheReadingHalfWay) {
