@@ -1,6 +1,8 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <cstdint>
+#include <filesystem>
 #include <string>
 #include <vector>
 
@@ -49,6 +51,14 @@ TEST_F(PackageDocumentReading, AnswersWhyAFileIsNoPackage) {
     writeFile(folder / "file", "no archive at all");
     const json::Object result = service.readPackageDocument(to_ustring((folder / "file").string()));
     EXPECT_EQ(result.size(), 2u);
+    EXPECT_FALSE(result.at("status").get<bool>());
+    EXPECT_THAT(result.at("exception").get<std::string>(), testing::HasSubstr("not a zip archive"));
+}
+
+TEST_F(PackageDocumentReading, LooksForAPackageOnlyAtTheEndOfAFileThatNoMemoryHolds) {
+    writeFile(folder / "file", "");
+    std::filesystem::resize_file(folder / "file", std::uintmax_t{1} << 40);
+    const json::Object result = service.readPackageDocument(to_ustring((folder / "file").string()));
     EXPECT_FALSE(result.at("status").get<bool>());
     EXPECT_THAT(result.at("exception").get<std::string>(), testing::HasSubstr("not a zip archive"));
 }
