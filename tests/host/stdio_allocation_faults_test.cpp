@@ -29,7 +29,7 @@ private:
 
 TEST_P(StdioAllocationFaults, EndItInAnOrderlyWay) {
     long faults = 0;
-    for (long failing = 0, allocations = 1; failing < allocations; ++failing) {
+    for (long failing = 0, allocations = 1; failing <= allocations; ++failing) {
         SCOPED_TRACE("allocation " + std::to_string(failing));
         const std::size_t descriptors = test::openDescriptors();
         const Outcome outcome = run([&](const auto& command) {

@@ -86,7 +86,7 @@ protected:
         const std::vector<Message> whole = bundle.send(channel, request);
         ASSERT_FALSE(whole.empty());
         const std::size_t descriptors = openDescriptors();
-        for (long failing = 0, allocations = 1; failing < allocations; ++failing) {
+        for (long failing = 0, allocations = 1; failing <= allocations; ++failing) {
             SCOPED_TRACE("allocation " + std::to_string(failing));
             prepare();
             test::failAllocation(failing, GetParam());
@@ -191,7 +191,7 @@ TEST_P(AllocationFaults, OfAPackagesWriteLeaveTheOldPackageOrTheNewOne) {
 TEST_P(AllocationFaults, OfAStartEndItInAnOrderlyWay) {
     std::unique_ptr<test::SparedThread> spared = std::make_unique<test::SparedThread>();
     long failed = 0;
-    for (long failing = 0, allocations = 1; failing < allocations; ++failing) {
+    for (long failing = 0, allocations = 1; failing <= allocations; ++failing) {
         SCOPED_TRACE("allocation " + std::to_string(failing));
         std::unique_ptr<framework::BundleRunner> other;
         spared.reset();
