@@ -1,13 +1,13 @@
 // Reads text files: bytes, detected charset, UTF-16, and back to the file's own charset.
 
+#include <sys/stat.h>
+
 #include <algorithm>
 #include <cerrno>
 #include <exception>
-#include <filesystem>
 #include <fstream>
 #include <iostream>
 #include <new>
-#include <system_error>
 #include <utility>
 
 #include "platform/filesystem/filesystem.h"
@@ -135,8 +135,8 @@ std::u16string Serialization::readTextFile(std::u16string path, std::string& cha
 
 std::string Serialization::readFileBytes(std::u16string path) const {
     const std::string nativePath = make_native_access_form_with_cleanup(path);
-    std::error_code notExaminable;
-    if (!std::filesystem::is_regular_file(nativePath, notExaminable)) {
+    struct stat examined = {};
+    if (::stat(nativePath.c_str(), &examined) != 0 || !S_ISREG(examined.st_mode)) {
         return {};
     }
     std::ifstream file(nativePath, std::ios_base::in);
@@ -148,13 +148,10 @@ std::string Serialization::readFileBytes(std::u16string path) const {
         }
         return {};
     }
-    std::uintmax_t size = std::filesystem::file_size(nativePath, notExaminable);
-    if (notExaminable) {
-        size = 0;
-    }
     // Before memory is taken for a file that no text is made of.
+    const auto size = static_cast<std::size_t>(examined.st_size);
     requireTextLength(size);
-    return readToEnd(file, static_cast<std::size_t>(size));
+    return readToEnd(file, size);
 }
 
 }  // namespace EditorServices
