@@ -72,8 +72,12 @@ std::string cleaned(std::string bytes, const std::string& charset) {
         bytes.erase(0, mark.size());
     }
     if (charset == kCharsetOfDos) {
-        // Neither is a half of any other character.
-        std::replace(bytes.begin(), bytes.end(), kEndOfDosTextOfIbm, kEndOfDosText);
+        // Neither is a half of any other character. Hardly a text has one, and find() sees that
+        // soonest.
+        for (std::size_t at = bytes.find(kEndOfDosTextOfIbm); at != std::string::npos;
+             at = bytes.find(kEndOfDosTextOfIbm, at + 1)) {
+            bytes[at] = kEndOfDosText;
+        }
     }
     return bytes;
 }
