@@ -88,6 +88,7 @@ private:
     void keepConnected(const std::string& name);
     void reconnect(const std::string& name);
     bool pause(std::chrono::milliseconds delay);
+    void use(ConnectionHandle& made);
     ConnectionHandle connection();
     void attach(NatsSource& source);
     void send(const std::string& channel, const DataBuffer& payload);
@@ -175,10 +176,7 @@ std::shared_ptr<MessageService> NatsBus::Core::connect(const std::string& client
         }
         ConnectionHandle made = connectPatiently(clientName);
         logger().info("Connected to NATS at {}.", nats::serverOf(made->get()));
-        {
-            const std::lock_guard stateLock(mutex_);
-            connection_.swap(made);
-        }
+        use(made);
         keeper_ = std::thread([this, clientName] { keepConnected(clientName); });
     }
     return std::make_shared<Client>(shared_from_this());
@@ -226,10 +224,7 @@ void NatsBus::Core::reconnect(const std::string& name) {
             ConnectionHandle made = nats::openConnection(options_, name, listener_);
             const std::string server = nats::serverOf(made->get());
             const std::lock_guard sourcesLock(sourcesMutex_);
-            {
-                const std::lock_guard lock(mutex_);
-                connection_.swap(made);
-            }
+            use(made);
             for (const auto& source : sources_) {
                 attach(*source);
             }
@@ -237,9 +232,20 @@ void NatsBus::Core::reconnect(const std::string& name) {
             logger().warn("Connected to NATS again, at {}.", server);
             return;
         } catch (const std::exception& error) {
-            logger().warn("{} Trying again.", error.what());
+            if (!isStopping()) {
+                logger().warn("{} Trying again.", error.what());
+            }
         }
     }
+}
+
+// Puts `made` in the place of the connection that there was, unless the bus has ended meanwhile.
+void NatsBus::Core::use(ConnectionHandle& made) {
+    const std::lock_guard lock(mutex_);
+    if (stopping_) {
+        throw std::runtime_error(closedText);
+    }
+    connection_.swap(made);
 }
 
 ConnectionHandle NatsBus::Core::connection() {
