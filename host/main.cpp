@@ -1,4 +1,5 @@
 // serialization_host: loads the bundle and gives it a message bus.
+#include <spdlog/logger.h>
 #include <spdlog/sinks/stdout_color_sinks.h>
 #include <spdlog/spdlog.h>
 
@@ -7,11 +8,13 @@
 #include <CLI/CLI.hpp>
 #include <chrono>
 #include <csignal>
+#include <cstddef>
 #include <cstdint>
 #include <exception>
 #include <filesystem>
 #include <functional>
 #include <iostream>
+#include <memory>
 #include <sstream>
 #include <stdexcept>
 #include <string>
@@ -20,6 +23,7 @@
 #include "host/exit_status.h"
 #include "host/file_descriptor.h"
 #include "host/freed_memory.h"
+#include "host/limiting_sink.h"
 #include "host/memory_limit.h"
 #include "host/nats_configuration.h"
 #include "host/read_command.h"
@@ -253,8 +257,17 @@ void declare(CLI::App& app, CommandLine& line) {
                  line.write);
 }
 
+// The lines that each logger may log of each level in that time. It is more than a person reads,
+// and not so much that whoever sends wrong messages without end can fill the disk.
+constexpr std::size_t mostLogLines = 100;
+constexpr std::chrono::seconds logPeriod{10};
+
 void setUpLogging(const std::string& level) {
-    spdlog::set_default_logger(spdlog::stderr_color_mt(programName));
+    const auto sink = std::make_shared<host::LimitingSink>(
+        std::make_shared<spdlog::sinks::stderr_color_sink_mt>(), mostLogLines, logPeriod);
+    spdlog::set_default_logger(std::make_shared<spdlog::logger>(programName, sink));
+    // The one that the messaging library takes.
+    spdlog::register_logger(std::make_shared<spdlog::logger>("messaging", sink));
     spdlog::set_pattern("%^%n: %l:%$ %v");
     spdlog::set_level(spdlog::level::from_str(level));
 }
@@ -307,7 +320,9 @@ int runCommandLine(int argc, char** argv) {
     if (line.memoryLimit != 0) {
         host::limitMemory(line.memoryLimit);
     }
-    return run(app, line, output.get());
+    const int status = run(app, line, output.get());
+    spdlog::default_logger()->flush();  // It may have lines to tell of that it left out.
+    return status;
 }
 
 }  // namespace

@@ -266,6 +266,7 @@ int runServe(const ServeOptions& options, int output) {
         spdlog::error("requests that were taken have not been done after {} s and are given up",
                       longestDrain.count());
         server.reset();
+        spdlog::default_logger()->flush();
         std::_Exit(exitRequestFailed);  // The bundle's end would wait for them.
     }
     return exitDone;

@@ -7,6 +7,7 @@
 #include <future>
 #include <optional>
 #include <random>
+#include <sstream>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -148,6 +149,33 @@ TEST_F(StdioCommand, LeavesOutAMessageWhoseChannelWouldBreakTheFraming) {
     EXPECT_EQ(outcome.status, 0);
     EXPECT_THAT(messagesIn(outcome.output), ElementsAre(success("good", "text")));
     EXPECT_THAT(outcome.errors, HasSubstr("a message is left out"));
+}
+
+TEST_F(StdioCommand, DoesNotFillTheLogWithWhatItDoesNotUnderstand) {
+    std::string input;
+    for (int i = 0; i < 1000; ++i) {
+        input += framed(readRequests, "no request");
+    }
+    const Outcome outcome = test::run(command_, input + framedReadRequest("good", file_));
+    EXPECT_EQ(outcome.status, 0);
+    EXPECT_THAT(messagesIn(outcome.output), ElementsAre(success("good", "text")));
+    // Each is logged or counted.
+    std::size_t logged = 0;
+    std::size_t leftOut = 0;
+    std::istringstream lines(outcome.errors);
+    for (std::string line; std::getline(lines, line);) {
+        constexpr std::string_view count =
+            "messaging: error: lines like these that were left out: ";
+        if (line.starts_with(count)) {
+            leftOut += std::stoul(line.substr(count.size()));
+        } else {
+            EXPECT_THAT(line, HasSubstr("The handler of channel"));
+            ++logged;
+        }
+    }
+    EXPECT_EQ(logged + leftOut, 1000U);
+    EXPECT_GE(logged, 100U);
+    EXPECT_GT(leftOut, 0U);
 }
 
 TEST_F(StdioCommand, CarriesLargeMessagesBothWays) {
