@@ -24,7 +24,7 @@ constexpr const char* clientName = "serialization_host";
 
 // What may wait for the bundle while the next message is taken in: enough to keep the bundle busy.
 // A larger message waits until nothing else does.
-constexpr std::size_t usualQueuedBytes = 16 * 1024 * 1024;
+constexpr std::size_t usualQueuedBytes = std::size_t{16} * 1024 * 1024;
 constexpr std::size_t mostQueuedMessages = 4096;
 
 // A bus on which createMessageService makes its clients from now on.

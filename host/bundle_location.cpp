@@ -20,7 +20,7 @@ std::filesystem::path findBundle() {
     const std::array<std::filesystem::path, 2> bundleFolders = {"../lib", INSTALLED_BUNDLE_FOLDER};
     std::string places;
     for (const std::filesystem::path& folder : bundleFolders) {
-        const std::filesystem::path bundle =
+        std::filesystem::path bundle =
             (programFolder() / folder / BUNDLE_FILE_NAME).lexically_normal();
         std::error_code ignored;
         if (std::filesystem::exists(bundle, ignored)) {

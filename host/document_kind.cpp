@@ -46,7 +46,7 @@ constexpr std::size_t directoryEndSize = 22;
 constexpr std::size_t largeEndSize = 56;
 constexpr std::size_t locatorSize = 20;
 // What is looked at of a directory; documents have a hundredth of it.
-constexpr std::uint64_t mostOfADirectory = 16 * 1024 * 1024;
+constexpr std::uint64_t mostOfADirectory = std::uint64_t{16} * 1024 * 1024;
 constexpr std::size_t longestComment = 0xFFFF;
 // Content types are themselves an item of the package, whole or in pieces below this name.
 constexpr std::string_view contentTypesName = "[content_types].xml";

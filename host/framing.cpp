@@ -14,9 +14,9 @@ constexpr std::string_view channelHeader = "Channel";
 constexpr std::string_view lengthHeader = "Content-Length";
 constexpr std::string_view blanks = " \t";
 constexpr int endOfInput = -1;
-constexpr std::size_t bufferSize = 64 * 1024;
+constexpr std::size_t bufferSize = std::size_t{64} * 1024;
 // A payload's storage starts at this size at most, and doubles as its bytes come.
-constexpr std::size_t firstPayloadPiece = 1024 * 1024;
+constexpr std::size_t firstPayloadPiece = std::size_t{1024} * 1024;
 
 char lowerAscii(char c) {
     return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;

@@ -25,7 +25,7 @@
 namespace host {
 
 /// The longest header line of a frame in bytes, the line's end not counted.
-inline constexpr std::size_t maxHeaderLine = 64 * 1024;
+inline constexpr std::size_t maxHeaderLine = std::size_t{64} * 1024;
 
 /// One message with the channel that it goes to or came from.
 struct Frame {

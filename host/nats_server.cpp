@@ -207,7 +207,7 @@ private:
 
     // Logs what the server has said; false when it has ended.
     bool passOn() {
-        std::array<char, 4096> chunk;
+        std::array<char, 4096> chunk{};
         const std::size_t count = readSome(process_.output(), chunk.data(), chunk.size());
         said_.append(chunk.data(), count);
         for (std::size_t end = said_.find('\n'); end != std::string::npos; end = said_.find('\n')) {

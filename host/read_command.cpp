@@ -30,7 +30,7 @@ using platform::messaging::JsonMessage;
 // processor busy, few enough that their responses fit in memory.
 constexpr std::size_t batchSize = 16;
 
-constexpr std::size_t largestRequest = 16 * 1024 * 1024;
+constexpr std::size_t largestRequest = std::size_t{16} * 1024 * 1024;
 
 // The responses that have come, by the "rtcId" of their requests.
 class Responses {

@@ -19,7 +19,7 @@ namespace host {
 namespace {
 
 // A file is held in memory while it is sent.
-constexpr off_t largestFile = 64 * 1024 * 1024;
+constexpr off_t largestFile = off_t{64} * 1024 * 1024;
 
 // No link is followed, and the open waits for nobody at the other end of a pipe.
 constexpr int openFlags = O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK;

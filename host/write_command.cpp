@@ -39,7 +39,7 @@ struct Free {
 class Content {
 public:
     explicit Content(int input) {
-        constexpr std::size_t smallestRoom = 64 * 1024;
+        constexpr std::size_t smallestRoom = std::size_t{64} * 1024;
         for (std::size_t room = 0;;) {
             if (length_ == room) {
                 room = std::max(room * 2, smallestRoom);

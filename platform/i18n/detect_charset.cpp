@@ -164,7 +164,7 @@ void requireTextLength(std::uintmax_t length) {
 std::string detect_charset(const char* data, std::size_t length, std::ostream& diagnostics,
                            std::u16string_view sourceName) {
     requireTextLength(length);
-    const std::string charset = findCharset({data, length});
+    std::string charset = findCharset({data, length});
     if (!charset.empty()) {
         return charset;
     }

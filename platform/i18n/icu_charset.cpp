@@ -160,7 +160,7 @@ public:
     std::u16string decode(std::string_view bytes) override {
         std::u16string text;
         text.reserve(bytes.size());
-        std::array<char16_t, pieceSize> piece;
+        std::array<char16_t, pieceSize> piece;  // NOLINT(*-member-init): filled before it is read
         const char* const end = bytes.data() + bytes.size();
         const char* position = bytes.data();
         ucnv_resetToUnicode(converter_.get());
@@ -171,7 +171,7 @@ public:
             char16_t* out = piece.data();
             UErrorCode error = U_ZERO_ERROR;
             ucnv_toUnicode(converter_.get(), &out, piece.data() + piece.size(), &position, limit,
-                           nullptr, limit == end, &error);
+                           nullptr, static_cast<UBool>(limit == end), &error);
             if (U_FAILURE(error) && error != U_BUFFER_OVERFLOW_ERROR) {
                 failDecoding(error, static_cast<std::size_t>(position - bytes.data()));
             }
@@ -187,7 +187,7 @@ public:
     std::string encode(std::u16string_view text) override {
         std::string bytes;
         bytes.reserve(text.size());
-        std::array<char16_t, pieceSize> piece;
+        std::array<char16_t, pieceSize> piece;  // NOLINT(*-member-init): filled before it is read
         std::size_t done = 0;
         ucnv_resetFromUnicode(converter_.get());
         do {
@@ -212,13 +212,13 @@ private:
     void encodePiece(const char16_t* position, const char16_t* end, std::size_t offset, bool isLast,
                      std::string& bytes) {
         const char16_t* const begin = position;
-        std::array<char, pieceSize> piece;
+        std::array<char, pieceSize> piece;  // NOLINT(*-member-init): filled before it is read
         bool more = true;
         while (more) {
             char* out = piece.data();
             UErrorCode error = U_ZERO_ERROR;
             ucnv_fromUnicode(converter_.get(), &out, piece.data() + piece.size(), &position, end,
-                             nullptr, isLast, &error);
+                             nullptr, static_cast<UBool>(isLast), &error);
             if (U_FAILURE(error) && error != U_BUFFER_OVERFLOW_ERROR) {
                 failEncoding(error, offset + static_cast<std::size_t>(position - begin));
             }
@@ -230,7 +230,7 @@ private:
     // `consumed` counts the bytes read so far, those of the failing character included.
     [[noreturn]] void failDecoding(UErrorCode reason, std::size_t consumed) const {
         checkOutOfMemory(reason);
-        std::array<char, 32> invalid;
+        std::array<char, 32> invalid{};
         auto length = static_cast<std::int8_t>(invalid.size());
         UErrorCode error = U_ZERO_ERROR;
         ucnv_getInvalidChars(converter_.get(), invalid.data(), &length, &error);
@@ -244,7 +244,7 @@ private:
 
     [[noreturn]] void failEncoding(UErrorCode reason, std::size_t consumed) const {
         checkOutOfMemory(reason);
-        std::array<char16_t, 32> invalid;
+        std::array<char16_t, 32> invalid{};
         auto length = static_cast<std::int8_t>(invalid.size());
         UErrorCode error = U_ZERO_ERROR;
         ucnv_getInvalidUChars(converter_.get(), invalid.data(), &length, &error);

@@ -40,7 +40,7 @@ constexpr LetterCodes letterCodes(int noneCode, std::initializer_list<std::pair<
     int letter = 0;
     for (const auto& [first, length] : runs) {
         for (int i = 0; i < length; ++i) {
-            codes[static_cast<std::size_t>(first + i)] = letter++;
+            codes.at(static_cast<std::size_t>(first) + static_cast<std::size_t>(i)) = letter++;
         }
     }
     return codes;

@@ -172,7 +172,8 @@ public:
             std::uint64_t cost = static_cast<std::uint64_t>(
                 table_.costs[indexOf(pair.before) * size_ + current] - '0');
             if (current == 0 && pair.current != wordEnd) {
-                cost += 4U * static_cast<unsigned>(foreignCost(pair.current, pair.before));
+                cost += std::uint64_t{4} *
+                        static_cast<unsigned>(foreignCost(pair.current, pair.before));
             }
             quarterBits += pair.count * cost;
         }

@@ -11,10 +11,10 @@ namespace platform::i18n::detail {
 
 namespace {
 
-constexpr std::size_t wholeFileLimit = 24 * 1024;
+constexpr std::size_t wholeFileLimit = std::size_t{24} * 1024;
 constexpr std::size_t pieceCount = 16;
 constexpr std::size_t pieceSize = 1024;
-constexpr std::size_t boundarySearch = 16 * 1024;
+constexpr std::size_t boundarySearch = std::size_t{16} * 1024;
 constexpr std::size_t wordSearch = 64;
 constexpr int wantedOccurrences = 2;
 

@@ -41,6 +41,7 @@ json::Object Serialization::readPackageDocument(std::u16string path) const {
 json::Object Serialization::packageToJson(QuilletFilePackage package) const {
     json::Object document;
     document[partsKey] = partsToJson(std::move(package).getParts());
+    // NOLINTNEXTLINE(bugprone-use-after-move): only the parts have been taken.
     document[relationshipsKey] = relationshipsToJson(std::move(package).getRelationships());
     return document;
 }
