@@ -4,7 +4,8 @@
 // between them. The sanitizer sees OpenSSL touch the same memory from both when a server breaks a
 // connection off with an alert, and the connection is given up then.
 
-extern "C" const char* __tsan_default_suppressions();
+// Visible, or the sanitizer's library would not find it in the program.
+extern "C" [[gnu::visibility("default")]] const char* __tsan_default_suppressions();
 
 extern "C" const char* __tsan_default_suppressions() {
     return "race:libssl.so\nrace:libcrypto.so\n";
