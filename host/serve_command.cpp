@@ -34,6 +34,15 @@ namespace {
 using platform::messaging::NatsBus;
 using platform::messaging::NatsOptions;
 
+// Has nothing make clients of a bus any more, and so keep it, from the end of its life on.
+class TransportEnd {
+public:
+    TransportEnd() = default;
+    TransportEnd(const TransportEnd&) = delete;
+    TransportEnd& operator=(const TransportEnd&) = delete;
+    ~TransportEnd() { platform::messaging::setTransport({}); }
+};
+
 // The name under which the host is known to the servers.
 constexpr const char* clientName = "serialization_host";
 
@@ -259,6 +268,7 @@ int runServe(const ServeOptions& options, int output) {
             client.setValue(tellingWhatIsNotSent(bus->connect(name).get()));
             return client.getFuture();
         });
+    const TransportEnd transportEnd;
     const framework::BundleRunner bundle(options.bundle);
     tellHowToConnect(web.get(), server.get(), output);
     signals.first().wait();

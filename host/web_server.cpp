@@ -31,7 +31,7 @@ namespace {
 using Clock = std::chrono::steady_clock;
 
 // What one client can use.
-constexpr std::size_t largestHead = 16 * 1024;  // of a request: its line and headers
+constexpr std::size_t largestHead = std::size_t{16} * 1024;  // of a request: its line and headers
 constexpr std::chrono::seconds longestHead{3};
 constexpr std::chrono::seconds longestAnswer{60};
 
@@ -69,7 +69,7 @@ std::optional<std::string> readHead(int socket, int stop) {
     const Clock::time_point latest = Clock::now() + longestHead;
     std::string head;
     while (head.size() < largestHead && waitFor(socket, POLLIN, stop, latest)) {
-        std::array<char, 4096> chunk;
+        std::array<char, 4096> chunk{};
         const ssize_t count = ::recv(socket, chunk.data(), chunk.size(), MSG_DONTWAIT);
         if (count <= 0) {
             return std::nullopt;
@@ -256,7 +256,7 @@ private:
         if (!file) {
             return refuse(response, 404, "There is no such file.\n");
         }
-        response.set_content(std::move(file->content), file->type);
+        response.set_content(file->content, file->type);
     }
 
     static void refuse(httplib::Response& response, int status, const std::string& reason) {

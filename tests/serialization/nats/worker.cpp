@@ -33,10 +33,15 @@ int main(int argc, char** argv) {
         setTransport([bus](const std::string& name, const MessageServiceOptions&) {
             return bus->connect(name);
         });
-        framework::BundleRunner bundle(argv[1]);
-        int number = 0;
-        sigwait(&ending, &number);
-        return bus->drain(std::chrono::seconds(30)) ? 0 : 1;
+        int status = 0;
+        {
+            framework::BundleRunner bundle(argv[1]);
+            int number = 0;
+            sigwait(&ending, &number);
+            status = bus->drain(std::chrono::seconds(30)) ? 0 : 1;
+        }
+        setTransport({});  // which holds the bus
+        return status;
     } catch (const std::exception& error) {
         std::cerr << "nats_worker: " << error.what() << '\n';
         return 1;
