@@ -1,11 +1,13 @@
 // Three message servers that stand for one another, and three hosts that work for them. The clients
 // and what they do are those of a host's own server.
 import assert from "node:assert/strict";
+import { execFileSync } from "node:child_process";
 import { mkdirSync, readFileSync, writeFileSync } from "node:fs";
 import { createServer } from "node:net";
 import { join } from "node:path";
 import { test } from "node:test";
 
+import { connect } from "../../web/node_modules/nats.ws/esm/nats.js";
 import { Client } from "./client.mjs";
 import { HOST, IS_SANITIZED, Program, ROOT, temporaryFolder, waitFor } from "./processes.mjs";
 
@@ -137,4 +139,63 @@ test("hosts work for servers that run elsewhere", async (t) => {
     }
     assert.deepEqual(answers, Array(50).fill("true"));
   });
+});
+
+test("a worker shows its token and its certificate, and trusts the authority that it is told", async (t) => {
+  const folder = temporaryFolder(t);
+  const [key, certificate, tokenFile] = ["key.pem", "certificate.pem", "token"].map((name) =>
+    join(folder, name),
+  );
+  execFileSync(
+    "openssl",
+    [
+      ...["req", "-x509", "-newkey", "rsa:2048", "-nodes", "-subj", "/CN=test"],
+      ...["-addext", "subjectAltName=IP:127.0.0.1", "-keyout", key, "-out", certificate],
+    ],
+    { stdio: "ignore" },
+  );
+  const token = "a token for workers and clients";
+  writeFileSync(tokenFile, `${token}\n`);
+  const [port, webSocketPort] = await freePorts(2);
+  const configuration = join(folder, "server.conf");
+  const files = `cert_file: "${certificate}", key_file: "${key}", ca_file: "${certificate}"`;
+  writeFileSync(
+    configuration,
+    [
+      `listen: "127.0.0.1:${port}"`,
+      `tls: { ${files}, verify: true }`,
+      `websocket: { listen: "127.0.0.1:${webSocketPort}", no_tls: true }`,
+      `authorization: { token: "${token}" }`,
+    ].join("\n"),
+  );
+  const path = `${process.env.PATH}:/usr/sbin`;
+  const server = new Program(t, ["nats-server", "-c", configuration], { PATH: path });
+  await waitFor("the server", () => {
+    assert.ok(!server.hasEnded, server.errors);
+    return server.errors.includes("Server is ready");
+  });
+
+  const worker = [HOST, "serve", "--root", folder, "--nats", `tls://127.0.0.1:${port}`];
+  const shown = {
+    "--nats-token-file": tokenFile,
+    "--tls-ca": certificate,
+    "--tls-cert": certificate,
+    "--tls-key": key,
+  };
+  const options = (names) => names.flatMap((name) => [name, shown[name]]);
+  const names = Object.keys(shown);
+  for (const without of [["--nats-token-file"], ["--tls-ca"], ["--tls-cert", "--tls-key"]]) {
+    const shownNames = names.filter((name) => !without.includes(name));
+    const refused = new Program(t, [...worker, ...options(shownNames)]);
+    assert.equal(await refused.end, 1, `without ${without}`);
+    assert.match(refused.errors, /127\.0\.0\.1/);
+  }
+  const taken = new Program(t, [...worker, ...options(names)]);
+  const connection = await connect({ servers: `ws://127.0.0.1:${webSocketPort}`, token });
+  const client = new Client(connection, "anyone");
+  t.after(() => client.close());
+  const answer = await client.read("/no/such/file", "text/plain", { seconds: 0.5, tries: 60 });
+  assert.equal(answer.status, false, taken.errors);
+  taken.signal("SIGTERM");
+  assert.equal(await taken.end, 0, taken.errors);
 });

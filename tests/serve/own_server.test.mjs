@@ -7,6 +7,7 @@ import {
   readdirSync,
   statSync,
   symlinkSync,
+  unlinkSync,
   writeFileSync,
 } from "node:fs";
 import { createServer } from "node:net";
@@ -108,13 +109,40 @@ test("a message server that is killed is started again, and clients go on", asyn
   const client = await connected(t, host, { maxReconnectAttempts: -1, reconnectTimeWait: 50 });
   for (let count = 1; count <= 3; ++count) {
     const id = host.serverId();
+    const start = Date.now();
     process.kill(id, "SIGKILL");
-    const answer = await client.read("/no/such/file", "text/plain", { seconds: 1, tries: 30 });
+    const answer = await client.read("/no/such/file", "text/plain", { seconds: 0.5, tries: 60 });
     assert.equal(answer.status, false);
     assert.notEqual(host.serverId(), id);
+    t.diagnostic(`an answer came ${Date.now() - start} ms after the kill`);
   }
   assert.match(host.errors, /nats-server has ended \(signal 9\) and is started again/);
   assert.match(host.errors, /Connected to NATS again/);
+});
+
+test("a message server that does not stay is started again ever more slowly", async (t) => {
+  const folder = temporaryFolder(t);
+  const [program, isIll, starts] = ["nats-server", "is ill", "starts"].map((name) =>
+    join(folder, name),
+  );
+  const script = [
+    "#!/bin/sh",
+    `echo >>"${starts}"`,
+    `test -e "${isIll}" && exit 3`,
+    `PATH="$PATH:/usr/sbin" exec nats-server "$@"`,
+  ];
+  writeFileSync(program, script.join("\n"), { mode: 0o700 });
+  const host = await Host.start(t, ["--nats-server", program]);
+  writeFileSync(isIll, "");
+  const start = performance.now();
+  process.kill(host.serverId(), "SIGKILL");
+  await waitFor("five more starts", () => readFileSync(starts).length >= 6);
+  assert.ok(performance.now() - start >= 50 + 100 + 200 + 400 + 800);
+  assert.match(host.errors, /nats-server has ended \(exit status 3\) and is started again/);
+  unlinkSync(isIll);
+  const client = await connected(t, host, { waitOnFirstConnect: true, maxReconnectAttempts: -1 });
+  const answer = await client.read("/no/such/file", "text/plain", { seconds: 1, tries: 30 });
+  assert.equal(answer.status, false);
 });
 
 for (const signal of ["SIGTERM", "SIGINT"]) {
