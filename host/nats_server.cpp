@@ -176,6 +176,16 @@ public:
         return state;
     }
 
+    // Passes on what the server says until `end` is ready: a server that nobody listens to comes to
+    // a stop when it has something to say.
+    void followUntil(const std::future<void>& end) {
+        while (end.wait_for(milliseconds::zero()) != std::future_status::ready) {
+            if (isReadable(process_.output(), deliveryInterval) && !passOn()) {
+                end.wait();
+            }
+        }
+    }
+
     // Ends the server, if need be by force.
     void end() {
         process_.send(SIGTERM);
@@ -329,7 +339,7 @@ std::optional<std::string> NatsServer::live(const std::function<void()>& whenRea
             state = life.follow(forever);
         }
         if (state == Life::State::isToStop) {
-            waitForClients();
+            life.followUntil(std::async(std::launch::async, [this] { waitForClients(); }));
             life.end();
             return std::nullopt;
         }

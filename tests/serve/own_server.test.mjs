@@ -15,7 +15,7 @@ import { join } from "node:path";
 import { test } from "node:test";
 import { setTimeout as sleep } from "node:timers/promises";
 
-import { Client, READ_REQUEST, encode, parseUrl } from "./client.mjs";
+import { Client, READ_REQUEST, READ_RESPONSE, encode, parseUrl } from "./client.mjs";
 import {
   HOST,
   Host,
@@ -164,6 +164,34 @@ for (const signal of ["SIGTERM", "SIGINT"]) {
     assert.deepEqual(readdirSync(folder), []);
   });
 }
+
+test("its message server is listened to while clients take their last answers", async (t) => {
+  const folder = temporaryFolder(t);
+  const file = join(folder, "large.txt");
+  writeFileSync(file, "x".repeat(20_000_000));
+  const host = await Host.start(t, []);
+  const { user } = parseUrl(host.nats);
+  const slow = await RawClient.connect(host.nats);
+  t.after(() => slow.close());
+  const rtcId = `${user}.slow`;
+  slow.send(`SUB ${READ_RESPONSE}${rtcId} 1\r\n`);
+  slow.publish(READ_REQUEST, encode({ rtcId, contentType: "text/plain", filePath: file }));
+  await slow.waitFor("MSG ");
+  slow.socket.pause();
+  const forger = await RawClient.connect(host.nats);
+  t.after(() => forger.close());
+  host.signal("SIGTERM");
+  await waitFor("the signal", () => host.errors.includes("asked to by signal 15"));
+  // The server has a line to say about each: more than a pipe holds.
+  for (let count = 0; count < 2000; ++count) {
+    forger.publish("forbidden", "x");
+  }
+  forger.received = "";
+  forger.send("PING\r\n");
+  await forger.waitFor("PONG");
+  slow.socket.resume();
+  assert.equal(await host.end, 0, host.errors);
+});
 
 test("a second signal ends it at once", async (t) => {
   const { host, folder } = await hostWithRuntimeFolder(t, ["--bundle", UNRESPONSIVE_BUNDLE]);
