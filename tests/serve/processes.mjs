@@ -49,6 +49,10 @@ export class Program {
   constructor(test, command, environment = {}) {
     // A test program among them shall report to people, not to the runner of this one.
     const { NODE_TEST_CONTEXT, ...env } = process.env;
+    if (IS_SANITIZED) {
+      const suppressions = join(ROOT, "tests/serve/thread_sanitizer.supp");
+      env.TSAN_OPTIONS = `${env.TSAN_OPTIONS ?? ""}:suppressions="${suppressions}"`;
+    }
     if (IS_SANITIZED && command.includes("--root")) {
       // The search for leaks needs files below /proc that a confined host is kept from.
       env.ASAN_OPTIONS = `${env.ASAN_OPTIONS ?? ""}:detect_leaks=0`;
