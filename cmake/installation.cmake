@@ -33,6 +33,7 @@ foreach(header IN ITEMS
     futures/future.h
     futures/detail/shared_future_state.h
     platform/data_buffer.h
+    platform/large_pages.h
     platform/messaging/in_process_bus.h
     platform/messaging/message_service.h
     platform/messaging/nats/nats_bus.h

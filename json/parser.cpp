@@ -31,6 +31,7 @@
 #include "json/text_memory.h"
 #include "json/word_bytes.h"
 #include "platform/i18n/ascii.h"
+#include "platform/large_pages.h"
 
 namespace json {
 namespace {
@@ -136,6 +137,7 @@ Status parseQuoted(Input& input, std::string& text) {
     const char* const end = extent.end;
     Status status = Status::success;
     if (extent.escapes == 0) {
+        platform::reserveLarge(text, static_cast<std::size_t>(end - start));
         text.assign(start, end);
         input.position = end;
     } else {

@@ -13,6 +13,7 @@
 #include "platform/filesystem/filesystem.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/i18n/detect_charset.h"
+#include "platform/large_pages.h"
 #include "serialization/reading/result_keys.h"
 #include "serialization/serialization.h"
 
@@ -89,7 +90,9 @@ std::string readToEnd(std::ifstream& file, std::size_t expectedSize) {
     std::string bytes;
     std::size_t length = 0;
     // One byte more than expected, so that the end is seen without growing.
-    bytes.resize(std::max(expectedSize + 1, kSmallestPiece));
+    const std::size_t room = std::max(expectedSize + 1, kSmallestPiece);
+    platform::reserveLarge(bytes, room);
+    bytes.resize(room);
     file.exceptions(std::ios_base::badbit);
     while (file.read(bytes.data() + length, static_cast<std::streamsize>(bytes.size() - length))) {
         length = bytes.size();
