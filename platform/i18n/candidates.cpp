@@ -121,8 +121,13 @@ Candidate::Fit Candidate::fit(std::string_view bytes) const {
         return {false, {}};
     }
     for (const std::string_view name : spellings(charset_)) {
-        if (openCharset(name, true)->encode(*text) == bytes) {
-            return {true, std::string(name)};
+        try {
+            if (openCharset(name, true)->encode(*text) == bytes) {
+                return {true, std::string(name)};
+            }
+        } catch (const std::runtime_error&) {
+            // A code stands for a character that the charset itself has no code for.
+            continue;
         }
     }
     return {true, {}};

@@ -264,6 +264,14 @@ TEST(DetectCharset, KeepsTheBytesWhereBothCodesOfACharacterOccur) {
     EXPECT_NE(diagnosticsOf(bytes), "");
 }
 
+TEST(DetectCharset, SurvivesCodesOfCharactersThatTheCharsetDoesNotEncode) {
+    // In EUC-JP, two bytes behind the single shift stand for characters that it has no code for.
+    for (int byte = 0x80; byte <= 0xFF; ++byte) {
+        const std::string bytes = "?J\x8E" + std::string(1, static_cast<char>(byte));
+        EXPECT_EQ(roundTrip(detect(bytes), bytes), bytes) << byte;
+    }
+}
+
 TEST(DetectCharset, MayBeCalledFromManyThreads) {
     const std::string russian = encoded("ru", "KOI8-R");
     const std::string japanese = encoded("ja", "EUC-JP");
