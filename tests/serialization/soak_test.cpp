@@ -15,6 +15,7 @@
 #include <thread>
 #include <vector>
 
+#include "tests/serialization/documents.h"
 #include "tests/support/running_bundle.h"
 #include "tests/support/temporary_directory.h"
 
@@ -27,7 +28,10 @@ using test::kReadResponses;
 using test::kWriteRequests;
 using test::kWriteResponses;
 using test::Message;
+using test::packageAnswer;
+using test::packageDocument;
 using test::RunningBundle;
+using test::textAnswer;
 
 constexpr int kClients = 5;
 constexpr int kRounds = 150;
@@ -36,42 +40,6 @@ constexpr int kRounds = 150;
 std::string sharedText(unsigned version) {
     return "version " + std::to_string(version) +
            std::string(20'000, static_cast<char>('a' + version % 26));
-}
-
-/// A package's document JSON, as a read answers with it but for the status.
-json::Object packageDocument(const std::string& text) {
-    json::Object part;
-    part["partUri"] = "/document.xml";
-    part["contentType"] = "application/xml";
-    part["content"] = "<text>" + text + "</text>";
-    part["relationship"] = json::Array();
-    json::Object image;
-    image["partUri"] = "/image.png";
-    image["contentType"] = "image/png";
-    image["content"] = "data:image/png;base64,iVBORw==";
-    image["relationship"] = json::Array();
-    json::Object relationship;
-    relationship["relationshipId"] = "r1";
-    relationship["relationshipType"] = "urn:document";
-    relationship["target"] = "document.xml";
-    relationship["targetMode"] = "";
-    json::Object document;
-    document["parts"] = json::Array{std::move(part), std::move(image)};
-    document["relationships"] = json::Array{std::move(relationship)};
-    return document;
-}
-
-std::string packageAnswer(const std::string& text) {
-    json::Object document = packageDocument(text);
-    document["status"] = true;
-    return json::serialize(std::move(document));
-}
-
-std::string textAnswer(const std::string& text) {
-    json::Object answer;
-    answer["data"] = text;
-    answer["status"] = true;
-    return json::serialize(std::move(answer));
 }
 
 /// One client with a connection of its own, which receives the answers to its requests.

@@ -11,7 +11,7 @@
 #include "json/parser.h"
 #include "platform/messaging/nats/nats_bus.h"
 #include "platform/messaging/transport.h"
-#include "tests/serialization/nats/documents.h"
+#include "tests/serialization/documents.h"
 #include "tests/support/nats_client.h"
 #include "tests/support/nats_server.h"
 #include "tests/support/temporary_directory.h"

@@ -19,7 +19,7 @@
 #include <thread>
 #include <vector>
 
-#include "tests/serialization/nats/documents.h"
+#include "tests/serialization/documents.h"
 #include "tests/support/child_process.h"
 #include "tests/support/nats_client.h"
 #include "tests/support/nats_server.h"
