@@ -1,19 +1,24 @@
 // Reads text files: bytes, detected charset, UTF-16, and back to the file's own charset.
 
+#include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <cstddef>
 #include <exception>
-#include <fstream>
 #include <iostream>
-#include <new>
+#include <stdexcept>
+#include <string>
+#include <system_error>
 #include <utility>
 
 #include "platform/filesystem/filesystem.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/i18n/detect_charset.h"
 #include "platform/large_pages.h"
+#include "platform/package/file_descriptor.h"
 #include "serialization/reading/result_keys.h"
 #include "serialization/serialization.h"
 
@@ -28,6 +33,7 @@ using platform::i18n::detect_charset;
 using platform::i18n::requireTextLength;
 using platform::i18n::to_string;
 using platform::i18n::to_ustring;
+using platform::package::FileDescriptor;
 
 namespace {
 
@@ -83,9 +89,34 @@ std::string cleaned(std::string bytes, const std::string& charset) {
     return bytes;
 }
 
+/// What cannot be opened as such reads as empty, but these errors say nothing of the file: there
+/// was no memory, or another program is just giving up its lease of the file. It may hold a text,
+/// which must not pass for empty.
+bool saysNothingOfTheFile(int error) {
+    return error == ENOMEM || error == EWOULDBLOCK;
+}
+
+/// Opens `path` if there is a regular file; else returns nothing. Looks before it opens, because
+/// opening a device can have effects, and opens without waiting, in case the file has become a pipe
+/// in between or is one of the system's that wait for something to tell.
+/// Throws std::system_error where nothing can be said of the file.
+FileDescriptor openRegularFile(const std::string& path, struct stat& status) {
+    if (::stat(path.c_str(), &status) != 0 || !S_ISREG(status.st_mode)) {
+        return {};
+    }
+    FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+    if (!file && saysNothingOfTheFile(errno)) {
+        throw std::system_error(errno, std::generic_category(), "The file cannot be opened");
+    }
+    if (!file || ::fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode)) {
+        return {};
+    }
+    return file;
+}
+
 /// Everything that `file` still holds, which is probably `expectedSize` bytes.
-/// Throws std::ios_base::failure on an input error, and as soon as it is more than a text may have.
-std::string readToEnd(std::ifstream& file, std::size_t expectedSize) {
+/// Throws std::system_error on an input error, and as soon as it is more than a text may have.
+std::string readToEnd(const FileDescriptor& file, std::size_t expectedSize) {
     constexpr std::size_t kSmallestPiece = 4096;
     std::string bytes;
     std::size_t length = 0;
@@ -93,14 +124,24 @@ std::string readToEnd(std::ifstream& file, std::size_t expectedSize) {
     const std::size_t room = std::max(expectedSize + 1, kSmallestPiece);
     platform::reserveLarge(bytes, room);
     bytes.resize(room);
-    file.exceptions(std::ios_base::badbit);
-    while (file.read(bytes.data() + length, static_cast<std::streamsize>(bytes.size() - length))) {
-        length = bytes.size();
-        requireTextLength(length);
-        bytes.resize(bytes.size() * 2);
+    for (;;) {
+        const ssize_t count = ::read(file.get(), bytes.data() + length, bytes.size() - length);
+        if (count < 0 && errno == EINTR) {
+            continue;
+        }
+        if (count < 0) {
+            throw std::system_error(errno, std::generic_category(), "The file cannot be read");
+        }
+        if (count == 0) {
+            bytes.resize(length);
+            return bytes;
+        }
+        length += static_cast<std::size_t>(count);
+        if (length == bytes.size()) {
+            requireTextLength(length);
+            bytes.resize(bytes.size() * 2);
+        }
     }
-    bytes.resize(length + static_cast<std::size_t>(file.gcount()));
-    return bytes;
 }
 
 }  // namespace
@@ -142,21 +183,13 @@ std::u16string Serialization::readTextFile(std::u16string path, std::string& cha
 
 std::string Serialization::readFileBytes(std::u16string path) const {
     const std::string nativePath = make_native_access_form_with_cleanup(path);
-    struct stat examined = {};
-    if (::stat(nativePath.c_str(), &examined) != 0 || !S_ISREG(examined.st_mode)) {
-        return {};
-    }
-    std::ifstream file(nativePath, std::ios_base::in);
-    if (!file.is_open()) {
-        if (errno == ENOMEM) {
-            // The stream had no memory. That says nothing of the file, which must not pass for
-            // empty.
-            throw std::bad_alloc();
-        }
+    struct stat status = {};
+    const FileDescriptor file = openRegularFile(nativePath, status);
+    if (!file) {
         return {};
     }
     // Before memory is taken for a file that no text is made of.
-    const auto size = static_cast<std::size_t>(examined.st_size);
+    const auto size = static_cast<std::size_t>(status.st_size);
     requireTextLength(size);
     return readToEnd(file, size);
 }

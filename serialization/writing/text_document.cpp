@@ -2,14 +2,20 @@
 // encoded again, so that what is not valid in that charset is refused before the file is touched.
 // Where that is known to change nothing, it is left out.
 
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstddef>
 #include <exception>
-#include <filesystem>
-#include <fstream>
-#include <system_error>
+#include <string>
+#include <string_view>
 #include <utility>
 
 #include "platform/filesystem/filesystem.h"
 #include "platform/i18n/codecvt.h"
+#include "platform/package/file_descriptor.h"
 #include "serialization/serialization.h"
 
 namespace EditorServices {
@@ -18,27 +24,51 @@ using platform::filesystem::make_native_access_form_with_cleanup;
 using platform::i18n::codecvt_string_to_ustring;
 using platform::i18n::codecvt_ustring_to_string;
 using platform::i18n::comesBackUnchanged;
+using platform::package::FileDescriptor;
 
 namespace {
+
+bool isPipe(const struct stat& status) {
+    return S_ISFIFO(status.st_mode);
+}
+
+/// Opens the file at `path`, which is truncated, or made. A pipe is not opened, for nobody might
+/// ever read it; in case the file becomes one just now, this does not wait either.
+FileDescriptor openForWriting(const std::string& path) {
+    struct stat status = {};
+    if (::stat(path.c_str(), &status) == 0 && isPipe(status)) {
+        return {};
+    }
+    FileDescriptor file(::open(
+        path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NONBLOCK | O_NOCTTY, 0666));
+    if (file && ::fstat(file.get(), &status) == 0 && isPipe(status)) {
+        return {};
+    }
+    return file;
+}
+
+/// Writes `bytes`, or as many of them as can be.
+void writeTo(const FileDescriptor& file, std::string_view bytes) {
+    while (!bytes.empty()) {
+        const ssize_t count = ::write(file.get(), bytes.data(), bytes.size());
+        if (count > 0) {
+            bytes.remove_prefix(static_cast<std::size_t>(count));
+        } else if (count == 0 || errno != EINTR) {
+            return;
+        }
+    }
+}
 
 /// Writes what `makeBytes` returns over the file at `path`, which is opened and so truncated first.
 /// Returns whether it could be opened: clients have always been told only that.
 template <typename MakeBytes>
 bool overwrite(const std::u16string& path, MakeBytes makeBytes) {
-    const std::string nativePath = make_native_access_form_with_cleanup(path);
-    std::error_code notExaminable;
-    if (std::filesystem::is_fifo(nativePath, notExaminable)) {
-        // Opening a pipe waits for someone to read it, who might never come.
+    const FileDescriptor file = openForWriting(make_native_access_form_with_cleanup(path));
+    if (!file) {
         return false;
     }
-    std::ofstream file(nativePath, std::ios_base::out);
-    const bool opened = file.is_open();
-    if (opened) {
-        const std::string& bytes = makeBytes();
-        file.write(bytes.data(), static_cast<std::streamsize>(bytes.size()));
-    }
-    file.close();
-    return opened;
+    writeTo(file, makeBytes());
+    return true;
 }
 
 }  // namespace

@@ -1,3 +1,4 @@
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
@@ -170,6 +171,44 @@ TEST_F(TextDocumentReading, AnswersAFileThatIsTooLargeBeforeItReadsIt) {
     EXPECT_EQ(resultOf(to_ustring((folder / "sparse").string())),
               R"({"exception":"The text is too large: 1099511627776 bytes, )"
               R"(at most 1073741824 are accepted","status":false})");
+}
+
+TEST_F(TextDocumentReading, AnswersAFileOfFourGigabytesWithItsSize) {
+    test::writeFile(folder / "sparse", "");
+    std::filesystem::resize_file(folder / "sparse", std::uintmax_t{1} << 32);
+    EXPECT_EQ(resultOf(to_ustring((folder / "sparse").string())),
+              R"({"exception":"The text is too large: 4294967296 bytes, )"
+              R"(at most 1073741824 are accepted","status":false})");
+}
+
+TEST_F(TextDocumentReading, AnswersTextWithoutLineEndsWhole) {
+    // Text in one piece, in characters of one, two and, in the last, two or four bytes; a detection
+    // or conversion that took more than linear time would not come to an end here.
+    constexpr std::size_t count = 5'000'000;
+    std::string shiftJis;
+    std::string utf16("\xFF\xFE", 2);
+    for (std::size_t i = 0; i < count / 10; ++i) {
+        shiftJis += kShiftJis.substr(0, 10);
+        utf16.append("a\0\xE9\0\x3D\xD8\x00\xDE", 8);
+    }
+    for (const std::string& text : {std::string(count, 'x'), shiftJis}) {
+        EXPECT_TRUE(service.readTextFileContent(file(text)) == text);
+    }
+    EXPECT_TRUE(service.readTextFileContent(file(utf16)) == utf16.substr(2));
+}
+
+TEST_F(TextDocumentReading, DoesNotWaitForAFileOfTheSystemToTellSomething) {
+    // Reading it waits for the kernel's next message.
+    const int log = ::open("/proc/kmsg", O_RDONLY | O_NONBLOCK | O_CLOEXEC);
+    if (log < 0) {
+        GTEST_SKIP() << "this user may not read the messages of the kernel";
+    }
+    // What is there already is gone with this, so that there is something to wait for.
+    std::string messages(1 << 20, '\0');
+    while (::read(log, messages.data(), messages.size()) > 0) {
+    }
+    ::close(log);
+    EXPECT_NE(resultOf(u"/proc/kmsg").find("The file cannot be read"), std::string::npos);
 }
 
 TEST_F(TextDocumentReading, AnswersWhatStoppedTheReadingHalfWay) {

@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 
+#include <cstdint>
 #include <filesystem>
 #include <string>
 
@@ -49,6 +50,21 @@ TEST_F(TextDocumentWriting, ReplacesALongerFileWhole) {
     writeFile(path, "a much longer text than the new one");
     EXPECT_TRUE(write("short", "UTF-8"));
     EXPECT_EQ(readFile(path), "short");
+}
+
+TEST_F(TextDocumentWriting, ReplacesASparseFileOfFourGigabytesWhole) {
+    writeFile(path, "old");
+    std::filesystem::resize_file(path, std::uintmax_t{1} << 32);
+    EXPECT_TRUE(write("short", "UTF-8"));
+    EXPECT_EQ(readFile(path), "short");
+}
+
+TEST_F(TextDocumentWriting, StoresTextWithoutLineEnds) {
+    const std::string text(5'000'000, 'x');
+    EXPECT_TRUE(write(text, "UTF-8"));
+    EXPECT_TRUE(readFile(path) == text);
+    EXPECT_TRUE(write(text, "windows-1252"));
+    EXPECT_TRUE(readFile(path) == text);
 }
 
 TEST_F(TextDocumentWriting, OfEmptyTextTruncatesTheFile) {
