@@ -6,6 +6,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cstdint>
+#include <filesystem>
+#include <fstream>
 #include <functional>
 #include <random>
 #include <stdexcept>
@@ -29,7 +32,11 @@ protected:
     }
 
     std::string readOnly(const std::string& bytes, std::size_t index = 0) {
-        ZipArchive archive(write(bytes));
+        return readFrom(write(bytes), index);
+    }
+
+    static std::string readFrom(const std::string& path, std::size_t index = 0) {
+        ZipArchive archive(path);
         const ZipArchive::Entry& entry = archive.entries().at(index);
         std::vector<std::uint8_t> out(entry.size);
         archive.read(entry, out);
@@ -93,6 +100,22 @@ TEST_F(ZipArchiveTest, ReadsZip64) {
     ZipOptions options;
     options.isZip64 = true;
     EXPECT_EQ(readOnly(buildZip({entry}, options)), "some text");
+}
+
+TEST_F(ZipArchiveTest, ReadsEntriesBeyondFourGigabytes) {
+    constexpr std::uint64_t hole = std::uint64_t{5} << 30U;
+    ZipEntry entry{"a", "some text", true};
+    entry.isZip64 = true;
+    entry.offset = hole;
+    ZipOptions options;
+    options.isZip64 = true;
+    const std::string atTheBeginning = buildZip({entry}, options);
+    options.directoryOffset = hole + atTheBeginning.find("PK\1\2");
+    options.zip64EndOffset = hole + atTheBeginning.find("PK\6\6");
+    const std::string path = write("");
+    std::filesystem::resize_file(path, hole);
+    std::ofstream(path, std::ios::binary | std::ios::app) << buildZip({entry}, options);
+    EXPECT_EQ(readFrom(path), "some text");
 }
 
 TEST_F(ZipArchiveTest, FindsTheDirectoryBeforeACommentAndBytesBehindIt) {

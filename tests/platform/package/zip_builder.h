@@ -22,7 +22,7 @@ struct ZipEntry {
     std::optional<std::uint64_t> size;
     std::optional<std::uint64_t> compressedSize;
     std::optional<std::uint16_t> method;
-    std::optional<std::uint32_t> offset;
+    std::optional<std::uint64_t> offset;
     std::uint16_t flags = 0;
     std::string extra;                     // of the directory's entry
     std::optional<std::string> localName;  // of the local header

@@ -1,6 +1,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <cstdint>
 #include <filesystem>
 #include <string>
 #include <vector>
@@ -68,6 +69,13 @@ TEST_F(PackageDocumentWriting, StoresWhatReadsTheSameAgain) {
 }
 
 TEST_F(PackageDocumentWriting, StoresAnEmptyPackage) {
+    EXPECT_TRUE(write(R"({"parts":[],"relationships":[]})"));
+    EXPECT_EQ(readAgain(), R"({"parts":[],"relationships":[],"status":true})");
+}
+
+TEST_F(PackageDocumentWriting, ReplacesASparseFileOfFourGigabytesWhole) {
+    writeFile(path, "");
+    std::filesystem::resize_file(path, std::uintmax_t{1} << 32);
     EXPECT_TRUE(write(R"({"parts":[],"relationships":[]})"));
     EXPECT_EQ(readAgain(), R"({"parts":[],"relationships":[],"status":true})");
 }
