@@ -134,9 +134,13 @@ bool isDocumentPackage(const std::filesystem::path& file) {
         return false;
     }
     const std::uint64_t fileSize = std::filesystem::file_size(file, error);
+    if (error || fileSize < localHeaderSize) {
+        // Some files of the system have no size, and reading them can wait for ever.
+        return false;
+    }
     std::ifstream stream(file, std::ios::binary);
     const std::string header = bytesAt(stream, 0, localHeaderSize + 64);
-    if (error || !header.starts_with(localHeaderMark)) {
+    if (!header.starts_with(localHeaderMark)) {
         return false;
     }
     if (beginsAsAPackage(header)) {

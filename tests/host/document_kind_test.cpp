@@ -82,6 +82,11 @@ TEST_F(IsDocumentPackage, IsFalseForWhatIsNoRegularFile) {
     EXPECT_FALSE(isDocumentPackage(pipe));
 }
 
+TEST_F(IsDocumentPackage, DoesNotWaitForAFileOfTheSystemToTellSomething) {
+    // Reading it waits for the kernel's next message.
+    EXPECT_FALSE(isDocumentPackage("/proc/kmsg"));
+}
+
 TEST_F(IsDocumentPackage, TakesAnyBytes) {
     const std::string archive = test::zipArchive({"a", "[Content_Types].xml", "b"});
     std::mt19937 random(1);
