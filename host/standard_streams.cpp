@@ -3,6 +3,7 @@
 #include <fcntl.h>
 #include <poll.h>
 #include <sys/uio.h>
+#include <unistd.h>
 
 #include <cerrno>
 #include <system_error>
@@ -57,8 +58,10 @@ void openMissingStandardStreams() {
         if (::fcntl(fd, F_GETFD) >= 0) {
             continue;
         }
-        // The lowest free number is given out, which is `fd`: those below it are open.
-        if (::open("/dev/null", O_RDWR) < 0) {
+        // The lowest free number is given out, which is `fd`: those below it are open. It is open
+        // for the other direction, so that who uses the stream learns that there is none: an input
+        // that nobody gave is no empty document, and an answer that nobody gets is not given.
+        if (::open("/dev/null", fd == STDIN_FILENO ? O_WRONLY : O_RDONLY) < 0) {
             throwSystemError("cannot open /dev/null");
         }
     }

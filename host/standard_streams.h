@@ -13,8 +13,8 @@
 
 namespace host {
 
-/// Makes sure that descriptors 0, 1 and 2 are open, on /dev/null where they are not, so that no
-/// file opened later takes the place of a standard stream. Throws std::system_error.
+/// Makes sure that no file opened later takes the place of a standard stream that is closed.
+/// Reading or writing such a stream stays an error. Throws std::system_error.
 void openMissingStandardStreams();
 
 /// Points descriptor 1 at standard error and returns what it was. Throws std::system_error.

@@ -176,6 +176,23 @@ TEST(StandardStreams, ThatAreClosedAreNotTakenForOthers) {
     EXPECT_EQ(outcome.output, "{\"data\":\"\",\"status\":true}\n");
 }
 
+TEST(StandardStreams, ThatAreClosedAreErrorsToWhomNeedsThem) {
+    const test::TemporaryDirectory folder;
+    const std::string file = folder / "file";
+    test::writeFile(file, "old");
+
+    Outcome outcome = runInShell("\"$0\" write '" + file + "' <&-");
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_THAT(outcome.errors, HasSubstr("cannot read the standard input"));
+    EXPECT_EQ(test::readFile(file), "old");
+
+    EXPECT_EQ(runInShell("\"$0\" stdio <&-").status, 1);
+
+    outcome = runInShell("\"$0\" read '" + file + "' >&-");
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_THAT(outcome.errors, HasSubstr("cannot write to the standard output"));
+}
+
 TEST(LogLevel, SilencesTheHost) {
     const std::string missing = "/no/such/file";
     EXPECT_THAT(test::run(hostCommand({"read", missing})).errors, HasSubstr(missing));
