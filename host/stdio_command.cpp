@@ -7,7 +7,9 @@
 #include <array>
 #include <atomic>
 #include <cerrno>
+#include <chrono>
 #include <exception>
+#include <future>
 #include <mutex>
 #include <optional>
 #include <stdexcept>
@@ -20,6 +22,7 @@
 #include "host/file_descriptor.h"
 #include "host/framing.h"
 #include "host/standard_streams.h"
+#include "host/stop_signals.h"
 
 namespace host {
 
@@ -61,15 +64,17 @@ public:
 
     bool isBroken() const { return isBroken_; }
 
-    // Blocks until `input` has bytes or has ended; returns false when the output broke instead.
-    bool waitForInput(int input) const {
-        std::array<pollfd, 2> waited{{{input, POLLIN, 0}, {broken_.get(), POLLIN, 0}}};
+    // Blocks until `input` has bytes or has ended; returns false when the output broke instead, or
+    // `stop` became readable.
+    bool waitForInput(int input, int stop) const {
+        std::array<pollfd, 3> waited{
+            {{input, POLLIN, 0}, {broken_.get(), POLLIN, 0}, {stop, POLLIN, 0}}};
         while (::poll(waited.data(), waited.size(), -1) < 0) {
             if (errno != EINTR) {
                 throw std::system_error(errno, std::generic_category(), "cannot wait for input");
             }
         }
-        return !isBroken_;
+        return !isBroken_ && waited[2].revents == 0;
     }
 
 private:
@@ -80,13 +85,16 @@ private:
 };
 
 // Sends on the messages of `input` until it ends. Returns the exit status that it leads to.
-int takeMessages(FrameReader& input, BundleHost& host) {
+int takeMessages(FrameReader& input, BundleHost& host, const std::shared_future<void>& stop) {
     try {
         while (std::optional<Frame> frame = input.next()) {
             host.publish(frame->channel, std::move(frame->payload));
         }
         return exitDone;
     } catch (const FramingError& error) {
+        if (stop.wait_for(std::chrono::seconds(0)) == std::future_status::ready) {
+            return exitDone;  // The rest of a frame was not waited for.
+        }
         spdlog::error("{}", error.what());
         return exitWrongUsage;
     } catch (const std::exception& error) {
@@ -98,15 +106,18 @@ int takeMessages(FrameReader& input, BundleHost& host) {
 }  // namespace
 
 int runStdio(const StdioOptions& options, int input, int output) {
+    // Who is asked to end takes no more requests, but does not leave those half done that it took.
+    blockStopSignals();
     FrameOutput frames(output);
     BundleHost host(options.bundle, options.largestMessage,
                     [&frames](const JsonMessage& message) { frames.write(message); });
+    const StopSignals signals([] {});
     FrameReader reader(
-        [&frames, input](char* to, std::size_t room) {
-            return frames.waitForInput(input) ? readSome(input, to, room) : 0;
+        [&](char* to, std::size_t room) {
+            return frames.waitForInput(input, signals.descriptor()) ? readSome(input, to, room) : 0;
         },
         options.largestMessage);
-    const int status = takeMessages(reader, host);
+    const int status = takeMessages(reader, host, signals.first());
     host.waitUntilIdle();
     return frames.isBroken() ? exitRequestFailed : status;
 }

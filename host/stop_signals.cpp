@@ -28,6 +28,12 @@ sigset_t stopSignals() {
     return signals;
 }
 
+// Whoever waits for `event` would otherwise wait for ever.
+void announce(const FileDescriptor& event) {
+    while (::eventfd_write(event.get(), 1) != 0) {
+    }
+}
+
 }  // namespace
 
 void blockStopSignals() {
@@ -40,15 +46,16 @@ void blockStopSignals() {
 StopSignals::StopSignals(std::function<void()> abandon) : abandon_(std::move(abandon)) {
     const sigset_t signals = stopSignals();
     signals_ = FileDescriptor(::signalfd(-1, &signals, SFD_CLOEXEC));
+    came_ = FileDescriptor(::eventfd(0, EFD_CLOEXEC));
     end_ = FileDescriptor(::eventfd(0, EFD_CLOEXEC));
-    if (signals_.get() < 0 || end_.get() < 0) {
+    if (signals_.get() < 0 || came_.get() < 0 || end_.get() < 0) {
         throw std::system_error(errno, std::generic_category(), "cannot wait for signals");
     }
     thread_ = std::thread(&StopSignals::take, this);
 }
 
 StopSignals::~StopSignals() {
-    ::eventfd_write(end_.get(), 1);
+    announce(end_);
     thread_.join();
 }
 
@@ -72,6 +79,7 @@ void StopSignals::take() {
         }
         spdlog::info("ending, as asked to by signal {}; another one ends the program at once",
                      signal.ssi_signo);
+        announce(came_);
         whenFirst_.set_value();
     }
 }

@@ -30,11 +30,15 @@ public:
     /// Becomes ready with the first signal.
     const std::shared_future<void>& first() const noexcept { return first_; }
 
+    /// A descriptor that is readable from the first signal on, for those who wait for others too.
+    int descriptor() const noexcept { return came_.get(); }
+
 private:
     void take();
 
     std::function<void()> abandon_;
     FileDescriptor signals_;
+    FileDescriptor came_;
     FileDescriptor end_;  // Becomes readable when this object's life ends.
     std::promise<void> whenFirst_;
     std::shared_future<void> first_ = whenFirst_.get_future().share();

@@ -18,6 +18,7 @@
 #include "host/bundle_host.h"
 #include "host/exit_status.h"
 #include "host/standard_streams.h"
+#include "host/stop_signals.h"
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "json/value.h"
@@ -120,6 +121,9 @@ int runWrite(const WriteOptions& options, int input, int output) {
     platform::DataBuffer request = requestFor(options, Content(input));
     // What the look at the content took, the threads that answer the request cannot use.
     ::malloc_trim(0);
+    // A save is not left half done by who asks the program to end, unless asking again.
+    blockStopSignals();
+    const StopSignals signals([] {});
     std::mutex mutex;
     std::optional<JsonMessage> answer;  // guarded by mutex
     BundleHost host(options.bundle, request.length(), [&](const JsonMessage& message) {

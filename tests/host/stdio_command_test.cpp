@@ -1,8 +1,10 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <signal.h>
 
 #include <algorithm>
 #include <cstddef>
+#include <filesystem>
 #include <fstream>
 #include <future>
 #include <optional>
@@ -278,6 +280,48 @@ void expectSurvival(const std::string& input) {
     const Outcome outcome = test::run(hostCommand({"stdio"}), input);
     EXPECT_THAT(outcome.status, AnyOf(0, 2));
     EXPECT_NO_THROW(messagesIn(outcome.output));
+}
+
+TEST_F(StdioCommand, FinishesWhatItTookWhenItIsAskedToEnd) {
+    const std::string begunFrame = framedReadRequest("2", file_).substr(0, 60);
+    for (const int signal : {SIGTERM, SIGINT}) {
+        test::Subprocess program(command_);
+        program.write(framedReadRequest("1", file_) + begunFrame);
+        const std::string answer = program.readSome();
+        ::kill(program.id(), signal);
+        const Outcome outcome = program.waitForEnd();
+        EXPECT_EQ(outcome.status, 0);
+        EXPECT_THAT(outcome.errors, IsEmpty());
+        EXPECT_THAT(messagesIn(answer + outcome.output), ElementsAre(success("1", "text")));
+    }
+}
+
+TEST_F(StdioCommand, LeavesNoFileBehindWhenItIsAskedToEndDuringSaves) {
+    const std::string document = R"({"parts":[{"partUri":"/a.xml","contentType":"application/xml",)"
+                                 R"("relationship":null,"content":")" +
+                                 std::string(100'000, 'x') + R"("}],"relationships":[]})";
+    const std::string file = folder_ / "document";
+    const std::string request = framed("/zpr/service/writeRequest_cpp",
+                                       R"({"rtcId":"1","contentType":"text/xml","filePath":")" +
+                                           file + R"(","content":)" + document + "}");
+    for (int run = 0; run < 10; ++run) {
+        test::Subprocess program(command_);
+        // As many as a pipe does not hold, so that some of them have been taken.
+        for (int i = 0; i < 5; ++i) {
+            program.write(request);
+        }
+        ::kill(program.id(), SIGTERM);
+        const Outcome outcome = program.waitForEnd();
+        EXPECT_EQ(outcome.status, 0) << outcome.errors;
+        // An announcement and an answer each.
+        EXPECT_GE(messagesIn(outcome.output).size(), 2U);
+        EXPECT_EQ(messagesIn(outcome.output).size() % 2, 0U);
+    }
+    std::vector<std::string> names;
+    for (const auto& entry : std::filesystem::directory_iterator(folder_.path())) {
+        names.push_back(entry.path().filename());
+    }
+    EXPECT_THAT(names, UnorderedElementsAre("file", "document"));
 }
 
 TEST_F(StdioCommand, SurvivesRandomBytes) {
