@@ -79,8 +79,8 @@ void StopSignals::take() {
         }
         spdlog::info("ending, as asked to by signal {}; another one ends the program at once",
                      signal.ssi_signo);
-        announce(came_);
         whenFirst_.set_value();
+        announce(came_);
     }
 }
 

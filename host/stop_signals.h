@@ -31,6 +31,7 @@ public:
     const std::shared_future<void>& first() const noexcept { return first_; }
 
     /// A descriptor that is readable from the first signal on, for those who wait for others too.
+    /// By then `first` is ready.
     int descriptor() const noexcept { return came_.get(); }
 
 private:
