@@ -10,6 +10,8 @@
 
 namespace json::detail {
 namespace {
+// A table of its own for every including file is meant, for the reason above.
+// NOLINTBEGIN(misc-definitions-in-headers)
 
 using Mask = unsigned long;  // bit i is about byte i of a block
 static_assert(sizeof(Mask) == 8);
@@ -240,5 +242,6 @@ constexpr StringKernels kernelsOf(const char* name) {
     return {name, measure<Block>, unescape<Block>, escape<Block>, countEscapes<Block>};
 }
 
+// NOLINTEND(misc-definitions-in-headers)
 }  // namespace
 }  // namespace json::detail
