@@ -15,8 +15,8 @@ namespace host {
 namespace {
 
 struct Pipe {
-    FileDescriptor read;
-    FileDescriptor write;
+    platform::FileDescriptor read;
+    platform::FileDescriptor write;
 };
 
 Pipe makePipe() {
@@ -24,7 +24,7 @@ Pipe makePipe() {
     if (::pipe2(ends, O_CLOEXEC) != 0) {
         throw std::system_error(errno, std::generic_category(), "cannot make a pipe");
     }
-    return {FileDescriptor(ends[0]), FileDescriptor(ends[1])};
+    return {platform::FileDescriptor(ends[0]), platform::FileDescriptor(ends[1])};
 }
 
 // What the new process does before it becomes the program. Other threads of the host may have held

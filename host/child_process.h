@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "host/file_descriptor.h"
+#include "platform/file_descriptor.h"
 
 namespace host {
 
@@ -36,7 +36,7 @@ public:
     std::string collect();
 
 private:
-    FileDescriptor output_;
+    platform::FileDescriptor output_;
     pid_t id_ = -1;
 };
 

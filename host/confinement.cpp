@@ -57,10 +57,10 @@ int versionOfKernel() {
         ::syscall(SYS_landlock_create_ruleset, nullptr, 0, LANDLOCK_CREATE_RULESET_VERSION));
 }
 
-FileDescriptor makeRules(std::uint64_t handledAccess) {
+platform::FileDescriptor makeRules(std::uint64_t handledAccess) {
     landlock_ruleset_attr attributes{};
     attributes.handled_access_fs = handledAccess;
-    FileDescriptor rules(static_cast<int>(
+    platform::FileDescriptor rules(static_cast<int>(
         ::syscall(SYS_landlock_create_ruleset, &attributes, sizeof attributes, 0)));
     if (rules.get() < 0) {
         throw std::system_error(errno, std::generic_category(), "files cannot be confined");
@@ -73,21 +73,21 @@ FileDescriptor makeRules(std::uint64_t handledAccess) {
 }
 
 // Points at a file or a folder, at the end of symbolic links, without opening it for anything.
-FileDescriptor pointAt(const std::filesystem::path& path) {
-    FileDescriptor file(::open(path.c_str(), O_PATH | O_CLOEXEC));
+platform::FileDescriptor pointAt(const std::filesystem::path& path) {
+    platform::FileDescriptor file(::open(path.c_str(), O_PATH | O_CLOEXEC));
     if (file.get() < 0) {
         failToGrant(path, errno);
     }
     return file;
 }
 
-bool isFolder(const FileDescriptor& file) {
+bool isFolder(const platform::FileDescriptor& file) {
     struct stat status {};
     return ::fstat(file.get(), &status) == 0 && S_ISDIR(status.st_mode);
 }
 
-void grant(const FileDescriptor& rules, const std::filesystem::path& path,
-           const FileDescriptor& file, std::uint64_t access) {
+void grant(const platform::FileDescriptor& rules, const std::filesystem::path& path,
+           const platform::FileDescriptor& file, std::uint64_t access) {
     landlock_path_beneath_attr rule{};
     rule.allowed_access = access;
     rule.parent_fd = file.get();
@@ -123,14 +123,14 @@ Confinement::Confinement(const Grants& grants, int version) {
     const std::uint64_t known = knownTo(version);
     rules_ = makeRules(known);
     for (const std::filesystem::path& path : grants.readWrite) {
-        const FileDescriptor folder = pointAt(path);
+        const platform::FileDescriptor folder = pointAt(path);
         if (!isFolder(folder)) {
             failToGrant(path, ENOTDIR);
         }
         grant(rules_, path, folder, (readAccess | writeAccess) & known);
     }
     for (const std::filesystem::path& path : grants.readOnly) {
-        const FileDescriptor file = pointAt(path);
+        const platform::FileDescriptor file = pointAt(path);
         grant(rules_, path, file, isFolder(file) ? readAccess : LANDLOCK_ACCESS_FS_READ_FILE);
     }
 }

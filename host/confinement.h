@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "host/file_descriptor.h"
+#include "platform/file_descriptor.h"
 
 namespace host {
 
@@ -60,7 +60,7 @@ public:
     void confineThisThread() const;
 
 private:
-    FileDescriptor rules_;
+    platform::FileDescriptor rules_;
 };
 
 }  // namespace host

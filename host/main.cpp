@@ -21,7 +21,6 @@
 
 #include "host/bundle_location.h"
 #include "host/exit_status.h"
-#include "host/file_descriptor.h"
 #include "host/freed_memory.h"
 #include "host/limiting_sink.h"
 #include "host/memory_limit.h"
@@ -31,6 +30,7 @@
 #include "host/standard_streams.h"
 #include "host/stdio_command.h"
 #include "host/write_command.h"
+#include "platform/file_descriptor.h"
 
 namespace {
 
@@ -305,7 +305,7 @@ int explain(const CLI::App& app, const CLI::ParseError& error, int output) {
 
 int runCommandLine(int argc, char** argv) {
     host::openMissingStandardStreams();
-    const host::FileDescriptor output = host::divertStandardOutput();
+    const platform::FileDescriptor output = host::divertStandardOutput();
     CLI::App app("Loads the document-serialization bundle and gives it a message bus.",
                  programName);
     CommandLine line;

@@ -143,7 +143,7 @@ bool hasBytesUnderWay(const std::array<std::uint16_t, 2>& ports) {
 }
 
 void writePrivateFile(const std::filesystem::path& file, std::string_view text) {
-    const FileDescriptor to(
+    const platform::FileDescriptor to(
         ::open(file.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, S_IRUSR | S_IWUSR));
     if (to.get() < 0) {
         throw std::system_error(errno, std::generic_category(), file.string());

@@ -15,9 +15,9 @@
 #include <thread>
 #include <vector>
 
-#include "host/file_descriptor.h"
 #include "host/nats_configuration.h"
 #include "host/private_folder.h"
+#include "platform/file_descriptor.h"
 #include "platform/messaging/nats/nats_bus.h"
 
 namespace host {
@@ -67,7 +67,7 @@ private:
     std::filesystem::path program_;
     const PrivateFolder& folder_;
     NatsConfiguration configuration_;  // The ports change until the server is first ready.
-    FileDescriptor stop_;              // Becomes readable when the server is to be stopped.
+    platform::FileDescriptor stop_;    // Becomes readable when the server is to be stopped.
     std::thread supervisor_;
 };
 

@@ -67,8 +67,8 @@ void openMissingStandardStreams() {
     }
 }
 
-FileDescriptor divertStandardOutput() {
-    FileDescriptor output(::fcntl(STDOUT_FILENO, F_DUPFD_CLOEXEC, 3));
+platform::FileDescriptor divertStandardOutput() {
+    platform::FileDescriptor output(::fcntl(STDOUT_FILENO, F_DUPFD_CLOEXEC, 3));
     if (output.get() < 0 || ::dup2(STDERR_FILENO, STDOUT_FILENO) < 0) {
         throwSystemError("cannot set up the standard output");
     }

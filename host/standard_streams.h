@@ -9,7 +9,7 @@
 #include <initializer_list>
 #include <string_view>
 
-#include "host/file_descriptor.h"
+#include "platform/file_descriptor.h"
 
 namespace host {
 
@@ -18,7 +18,7 @@ namespace host {
 void openMissingStandardStreams();
 
 /// Points descriptor 1 at standard error and returns what it was. Throws std::system_error.
-FileDescriptor divertStandardOutput();
+platform::FileDescriptor divertStandardOutput();
 
 /// Writes all `pieces`, one after the other, waiting where `fd` takes nothing more for now. Throws
 /// std::system_error when it cannot; part of the bytes may have been written by then.

@@ -19,10 +19,10 @@
 
 #include "host/bundle_host.h"
 #include "host/exit_status.h"
-#include "host/file_descriptor.h"
 #include "host/framing.h"
 #include "host/standard_streams.h"
 #include "host/stop_signals.h"
+#include "platform/file_descriptor.h"
 
 namespace host {
 
@@ -79,7 +79,7 @@ public:
 
 private:
     int output_;
-    FileDescriptor broken_;  // Becomes readable when a write has failed.
+    platform::FileDescriptor broken_;  // Becomes readable when a write has failed.
     std::atomic<bool> isBroken_ = false;
     std::mutex mutex_;  // Held while a frame is written.
 };

@@ -29,7 +29,7 @@ sigset_t stopSignals() {
 }
 
 // Whoever waits for `event` would otherwise wait for ever.
-void announce(const FileDescriptor& event) {
+void announce(const platform::FileDescriptor& event) {
     while (::eventfd_write(event.get(), 1) != 0) {
     }
 }
@@ -45,9 +45,9 @@ void blockStopSignals() {
 
 StopSignals::StopSignals(std::function<void()> abandon) : abandon_(std::move(abandon)) {
     const sigset_t signals = stopSignals();
-    signals_ = FileDescriptor(::signalfd(-1, &signals, SFD_CLOEXEC));
-    came_ = FileDescriptor(::eventfd(0, EFD_CLOEXEC));
-    end_ = FileDescriptor(::eventfd(0, EFD_CLOEXEC));
+    signals_ = platform::FileDescriptor(::signalfd(-1, &signals, SFD_CLOEXEC));
+    came_ = platform::FileDescriptor(::eventfd(0, EFD_CLOEXEC));
+    end_ = platform::FileDescriptor(::eventfd(0, EFD_CLOEXEC));
     if (signals_.get() < 0 || came_.get() < 0 || end_.get() < 0) {
         throw std::system_error(errno, std::generic_category(), "cannot wait for signals");
     }

@@ -5,7 +5,7 @@
 #include <future>
 #include <thread>
 
-#include "host/file_descriptor.h"
+#include "platform/file_descriptor.h"
 
 namespace host {
 
@@ -38,9 +38,9 @@ private:
     void take();
 
     std::function<void()> abandon_;
-    FileDescriptor signals_;
-    FileDescriptor came_;
-    FileDescriptor end_;  // Becomes readable when this object's life ends.
+    platform::FileDescriptor signals_;
+    platform::FileDescriptor came_;
+    platform::FileDescriptor end_;  // Becomes readable when this object's life ends.
     std::promise<void> whenFirst_;
     std::shared_future<void> first_ = whenFirst_.get_future().share();
     std::thread thread_;

@@ -57,7 +57,7 @@ bool mayBeServed(std::string_view name) {
     return !name.empty() && name.front() != '.' && name.find('\0') == std::string_view::npos;
 }
 
-std::optional<std::string> contentOf(const FileDescriptor& file) {
+std::optional<std::string> contentOf(const platform::FileDescriptor& file) {
     struct stat status {};
     if (::fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
         status.st_size > largestFile) {
@@ -96,7 +96,7 @@ std::optional<WebFolder::File> WebFolder::read(std::string_view path) const {
         rest += "index.html";
     }
     // Name by name, so that no name is taken for more than one.
-    FileDescriptor opened;
+    platform::FileDescriptor opened;
     int folder = folder_.get();
     for (std::size_t begin = 0; begin <= rest.size();) {
         const std::size_t end = std::min(rest.find('/', begin), rest.size());
@@ -104,7 +104,7 @@ std::optional<WebFolder::File> WebFolder::read(std::string_view path) const {
         if (!mayBeServed(name)) {
             return std::nullopt;
         }
-        FileDescriptor next(
+        platform::FileDescriptor next(
             ::openat(folder, name.c_str(), openFlags | (end < rest.size() ? O_DIRECTORY : 0)));
         if (next.get() < 0) {
             return std::nullopt;

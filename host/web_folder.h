@@ -6,7 +6,7 @@
 #include <string>
 #include <string_view>
 
-#include "host/file_descriptor.h"
+#include "platform/file_descriptor.h"
 
 namespace host {
 
@@ -28,7 +28,7 @@ public:
     std::optional<File> read(std::string_view path) const;
 
 private:
-    FileDescriptor folder_;
+    platform::FileDescriptor folder_;
 };
 
 }  // namespace host

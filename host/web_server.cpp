@@ -21,8 +21,8 @@
 #include <system_error>
 #include <utility>
 
-#include "host/file_descriptor.h"
 #include "host/web_folder.h"
+#include "platform/file_descriptor.h"
 
 namespace host {
 
@@ -229,7 +229,7 @@ public:
 
 private:
     bool process_and_close_socket(socket_t socket) override {
-        const FileDescriptor closed(socket);
+        const platform::FileDescriptor closed(socket);
         try {
             const std::optional<std::string> head = readHead(socket, stop_.get());
             if (!head) {
@@ -265,7 +265,7 @@ private:
     }
 
     WebFolder folder_;
-    FileDescriptor stop_;  // Becomes readable when the connections are to end.
+    platform::FileDescriptor stop_;  // Becomes readable when the connections are to end.
     std::string authority_;
 };
 

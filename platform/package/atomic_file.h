@@ -8,7 +8,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/package/file_descriptor.h"
+#include "platform/file_descriptor.h"
 
 namespace platform::package {
 

@@ -12,7 +12,7 @@
 #include <string>
 #include <vector>
 
-#include "platform/package/file_descriptor.h"
+#include "platform/file_descriptor.h"
 
 struct libdeflate_decompressor;
 

@@ -14,16 +14,17 @@
 #include <system_error>
 #include <utility>
 
+#include "platform/file_descriptor.h"
 #include "platform/filesystem/filesystem.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/i18n/detect_charset.h"
 #include "platform/large_pages.h"
-#include "platform/package/file_descriptor.h"
 #include "serialization/reading/result_keys.h"
 #include "serialization/serialization.h"
 
 namespace EditorServices {
 
+using platform::FileDescriptor;
 using platform::filesystem::exists;
 using platform::filesystem::make_native_access_form_with_cleanup;
 using platform::i18n::codecvt_string_to_ustring;
@@ -33,7 +34,6 @@ using platform::i18n::detect_charset;
 using platform::i18n::requireTextLength;
 using platform::i18n::to_string;
 using platform::i18n::to_ustring;
-using platform::package::FileDescriptor;
 
 namespace {
 

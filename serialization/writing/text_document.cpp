@@ -13,18 +13,18 @@
 #include <string_view>
 #include <utility>
 
+#include "platform/file_descriptor.h"
 #include "platform/filesystem/filesystem.h"
 #include "platform/i18n/codecvt.h"
-#include "platform/package/file_descriptor.h"
 #include "serialization/serialization.h"
 
 namespace EditorServices {
 
+using platform::FileDescriptor;
 using platform::filesystem::make_native_access_form_with_cleanup;
 using platform::i18n::codecvt_string_to_ustring;
 using platform::i18n::codecvt_ustring_to_string;
 using platform::i18n::comesBackUnchanged;
-using platform::package::FileDescriptor;
 
 namespace {
 

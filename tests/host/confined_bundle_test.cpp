@@ -22,7 +22,7 @@
 #include <vector>
 
 #include "host/confinement.h"
-#include "host/file_descriptor.h"
+#include "platform/file_descriptor.h"
 #include "tests/platform/i18n/corpus.h"
 #include "tests/support/running_bundle.h"
 #include "tests/support/temporary_directory.h"
@@ -32,7 +32,7 @@ namespace {
 namespace fs = std::filesystem;
 
 using host::Confinement;
-using host::FileDescriptor;
+using platform::FileDescriptor;
 using test::Message;
 using test::readFile;
 using test::RunningBundle;

@@ -29,8 +29,8 @@ namespace {
 namespace fs = std::filesystem;
 
 using host::Confinement;
-using host::FileDescriptor;
 using host::Grants;
+using platform::FileDescriptor;
 using test::readFile;
 using test::TemporaryDirectory;
 using test::writeFile;

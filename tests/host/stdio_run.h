@@ -25,10 +25,10 @@
 #include <vector>
 
 #include "host/exit_status.h"
-#include "host/file_descriptor.h"
 #include "host/framing.h"
 #include "host/standard_streams.h"
 #include "host/stdio_command.h"
+#include "platform/file_descriptor.h"
 #include "tests/support/temporary_directory.h"
 
 namespace test {
@@ -81,7 +81,7 @@ protected:
         auto [output, outputEnd] = makePipe();
         // What comes in and what goes out fit into the pipes.
         host::writeAll(inputEnd.get(), {input_});
-        inputEnd = host::FileDescriptor(-1);
+        inputEnd = platform::FileDescriptor(-1);
         Outcome outcome;
         around([&, in = input.get(), out = outputEnd.get()] {
             try {
@@ -90,7 +90,7 @@ protected:
                 outcome.status = host::exitRequestFailed;
             }
         });
-        { const host::FileDescriptor closed = std::move(outputEnd); }
+        { const platform::FileDescriptor closed = std::move(outputEnd); }
         std::array<char, 4096> piece{};
         while (const std::size_t count = host::readSome(output.get(), piece.data(), piece.size())) {
             outcome.output.append(piece.data(), count);
@@ -165,12 +165,12 @@ protected:
     TemporaryDirectory folder_;
 
 private:
-    static std::pair<host::FileDescriptor, host::FileDescriptor> makePipe() {
+    static std::pair<platform::FileDescriptor, platform::FileDescriptor> makePipe() {
         std::array<int, 2> ends{};
         if (::pipe2(ends.data(), O_CLOEXEC) != 0) {
             throw std::system_error(errno, std::generic_category(), "no pipe");
         }
-        return {host::FileDescriptor(ends[0]), host::FileDescriptor(ends[1])};
+        return {platform::FileDescriptor(ends[0]), platform::FileDescriptor(ends[1])};
     }
 
     std::string input_;

@@ -22,19 +22,19 @@ void check(int error, const char* what) {
     }
 }
 
-std::pair<host::FileDescriptor, host::FileDescriptor> makePipe() {
+std::pair<platform::FileDescriptor, platform::FileDescriptor> makePipe() {
     int ends[2];
     check(::pipe2(ends, O_CLOEXEC) == 0 ? 0 : errno, "pipe2");
-    return {host::FileDescriptor(ends[0]), host::FileDescriptor(ends[1])};
+    return {platform::FileDescriptor(ends[0]), platform::FileDescriptor(ends[1])};
 }
 
-std::string readChunk(const host::FileDescriptor& from) {
+std::string readChunk(const platform::FileDescriptor& from) {
     std::string chunk(64 * 1024, '\0');
     chunk.resize(host::readSome(from.get(), chunk.data(), chunk.size()));
     return chunk;
 }
 
-std::string readToEnd(const host::FileDescriptor& from) {
+std::string readToEnd(const platform::FileDescriptor& from) {
     std::string all;
     if (from.get() >= 0) {
         for (std::string chunk = readChunk(from); !chunk.empty(); chunk = readChunk(from)) {

@@ -8,7 +8,7 @@
 #include <string_view>
 #include <vector>
 
-#include "host/file_descriptor.h"
+#include "platform/file_descriptor.h"
 
 namespace test {
 
@@ -47,8 +47,8 @@ public:
     Outcome finish();
 
 private:
-    host::FileDescriptor input_;
-    host::FileDescriptor output_;
+    platform::FileDescriptor input_;
+    platform::FileDescriptor output_;
     pid_t id_ = -1;
     std::future<std::string> errors_;
 };

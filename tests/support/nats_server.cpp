@@ -12,7 +12,7 @@
 #include <system_error>
 #include <thread>
 
-#include "host/file_descriptor.h"
+#include "platform/file_descriptor.h"
 
 namespace test {
 namespace {
@@ -25,8 +25,8 @@ sockaddr_in loopback(int port) {
     return address;
 }
 
-host::FileDescriptor makeSocket() {
-    host::FileDescriptor made(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+platform::FileDescriptor makeSocket() {
+    platform::FileDescriptor made(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
     if (made.get() < 0) {
         throw std::system_error(errno, std::generic_category(), "no socket can be made");
     }
@@ -34,7 +34,7 @@ host::FileDescriptor makeSocket() {
 }
 
 bool takesConnections(int port) {
-    const host::FileDescriptor probe = makeSocket();
+    const platform::FileDescriptor probe = makeSocket();
     const sockaddr_in address = loopback(port);
     return ::connect(probe.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
 }
@@ -42,7 +42,7 @@ bool takesConnections(int port) {
 }  // namespace
 
 int freePort() {
-    const host::FileDescriptor probe = makeSocket();
+    const platform::FileDescriptor probe = makeSocket();
     sockaddr_in address = loopback(0);
     socklen_t size = sizeof address;
     if (::bind(probe.get(), reinterpret_cast<const sockaddr*>(&address), size) != 0 ||

@@ -17,7 +17,7 @@
 #include <string_view>
 #include <vector>
 
-#include "host/file_descriptor.h"
+#include "platform/file_descriptor.h"
 #include "platform/messaging/nats/client_backlog.h"
 #include "tests/platform/messaging/nats/bus_at_server.h"
 
@@ -140,7 +140,7 @@ private:
         return count > 0;
     }
 
-    host::FileDescriptor socket_;
+    platform::FileDescriptor socket_;
 };
 
 TEST(NatsClientBacklog, IsWaitedFor) {

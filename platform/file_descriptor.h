@@ -1,12 +1,13 @@
-// An open file that is closed when its owner goes.
+// Ownership of a file descriptor of the operating system.
 #pragma once
 
 #include <unistd.h>
 
 #include <utility>
 
-namespace platform::package {
+namespace platform {
 
+/// Owns one file descriptor and closes it at the end of its life. -1 stands for none.
 class FileDescriptor {
 public:
     FileDescriptor() noexcept = default;
@@ -34,4 +35,4 @@ private:
     int descriptor_ = -1;
 };
 
-}  // namespace platform::package
+}  // namespace platform
