@@ -1,11 +1,14 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <signal.h>
 
+#include <algorithm>
 #include <filesystem>
 #include <string>
 #include <vector>
 
 #include "tests/host/host_program.h"
+#include "tests/host/subprocess.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
@@ -26,6 +29,13 @@ protected:
         command.emplace_back("--");
         command.push_back(file.string());
         return test::run(command, content);
+    }
+
+    bool holdsATemporaryFile() const {
+        const std::filesystem::directory_iterator entries(folder_.path());
+        return std::any_of(begin(entries), end(entries), [](const auto& entry) {
+            return entry.path().filename().string().starts_with(".~saving-");
+        });
     }
 
     test::TemporaryDirectory folder_;
@@ -83,6 +93,34 @@ TEST_F(WriteCommand, RefusesToMakeAPackageOfSomethingElse) {
     EXPECT_THAT(outcome.output, IsEmpty());
     EXPECT_THAT(outcome.errors, HasSubstr("no document package"));
     EXPECT_FALSE(std::filesystem::exists(folder_ / "file.docx"));
+}
+
+TEST_F(WriteCommand, FinishesTheSaveInWhichItIsAskedToEnd) {
+    // Much to write and little to compute, so that the temporary file is there for a while.
+    const std::string content =
+        R"({"parts":[{"partUri":"/a.png","contentType":"image/png","relationship":null,)"
+        R"("content":"data:image/png;base64,)" +
+        std::string(40'000'000, 'A') + R"("}],"relationships":[]})";
+    const std::filesystem::path file = folder_ / "document";
+    bool wasAskedInTime = false;
+    for (int run = 0; run < 20 && !wasAskedInTime; ++run) {
+        std::filesystem::remove(file);
+        test::Subprocess program(hostCommand({"write", "--", file.string()}));
+        program.write(content);
+        program.closeInput();
+        while (!std::filesystem::exists(file) && !wasAskedInTime) {
+            wasAskedInTime = holdsATemporaryFile();
+        }
+        ::kill(program.id(), SIGTERM);
+        const Outcome outcome = program.waitForEnd();
+        if (wasAskedInTime) {
+            EXPECT_EQ(outcome.status, 0) << outcome.errors;
+            EXPECT_EQ(outcome.output, "true\n");
+        }
+        EXPECT_TRUE(std::filesystem::exists(file));
+        EXPECT_FALSE(holdsATemporaryFile());
+    }
+    EXPECT_TRUE(wasAskedInTime);
 }
 
 TEST_F(WriteCommand, TellsThatNoAnswerCame) {
