@@ -74,8 +74,8 @@ bool isBundleLoaded() {
 
 TEST(Endurance, StartsAndEndsAThousandTimesWhileRequestsComeIn) {
     constexpr int kTimes = kUnderSanitizers ? 50 : 1000;
-    // Two threads that happen to allocate at once, however late, would have glibc make another heap,
-    // a megabyte that is no leak.
+    // Two threads that happen to allocate at once, however late, would have glibc make another
+    // heap, a megabyte that is no leak.
     ::mallopt(M_ARENA_MAX, 1);
     const test::TemporaryDirectory folder;
     test::writeFile(folder / "file", "\xCF\xF0\xE8\xE2\xE5\xF2");
