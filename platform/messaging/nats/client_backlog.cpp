@@ -5,6 +5,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <stdexcept>
 #include <thread>
 
@@ -23,12 +24,16 @@ constexpr milliseconds pollInterval{10};
 constexpr const char* subject = "$SYS.REQ.ACCOUNT.PING.CONNZ";
 constexpr const char* question = R"({"sort":"pending","limit":1})";
 
-// The bytes that wait for the client for which most do.
-std::uint64_t largestBacklog(const nats::Connection& connection, milliseconds timeout) {
+// The bytes that wait for the client for which most do, if the server tells within `timeout`.
+std::optional<std::uint64_t> largestBacklog(const nats::Connection& connection,
+                                            milliseconds timeout) {
     natsMsg* received = nullptr;
-    nats::check(natsConnection_RequestString(&received, connection.get(), subject, question,
-                                             timeout.count()),
-                "The NATS server does not tell about its clients");
+    const natsStatus status = natsConnection_RequestString(&received, connection.get(), subject,
+                                                           question, timeout.count());
+    if (status == NATS_TIMEOUT) {
+        return std::nullopt;
+    }
+    nats::check(status, "The NATS server does not tell about its clients");
     const std::unique_ptr<natsMsg, nats::Destroy> reply(received);
     simdjson::dom::parser parser;
     std::uint64_t bytes = 0;

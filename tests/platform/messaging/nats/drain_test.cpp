@@ -156,6 +156,16 @@ TEST(NatsClientBacklog, IsWaitedFor) {
     EXPECT_TRUE(sent.get());
 }
 
+TEST(NatsClientBacklog, OfAServerThatDoesNotAnswerIsWaitedForNoLongerThanAllowed) {
+    const test::NatsServer server(R"(authorization {
+        users: [{user: "deaf", password: "x", permissions: {publish: {deny: "$SYS.>"}}}]
+    })");
+    NatsOptions options = optionsFor(server);
+    options.user = "deaf";
+    options.password = "x";
+    EXPECT_FALSE(waitForClientBacklog(options, std::chrono::milliseconds(20)));
+}
+
 TEST(NatsClientBacklog, OfAServerThatIsGoneIsAFailure) {
     test::NatsServer server;
     server.kill();
