@@ -7,12 +7,12 @@
 #include <gtest/gtest.h>
 
 #include <filesystem>
-#include <fstream>
 #include <stdexcept>
 #include <string>
 
 #include "tests/framework/bundle_failure.h"
 #include "tests/framework/sample_bundle_control.h"
+#include "tests/support/temporary_directory.h"
 
 namespace framework {
 namespace {
@@ -77,9 +77,10 @@ TEST_F(BundleRunnerTest, SaysThatThereIsNoFile) {
 }
 
 TEST_F(BundleRunnerTest, NamesTheFileThatIsNoLibrary) {
-    const std::filesystem::path text = std::filesystem::path(testing::TempDir()) / "libtext.so";
-    std::ofstream(text)
-        << "This is a text, and it is long enough to hold an ELF header, was it one.";
+    const test::TemporaryDirectory folder;
+    const std::filesystem::path text = folder / "libtext.so";
+    test::writeFile(text,
+                    "This is a text, and it is long enough to hold an ELF header, was it one.");
     EXPECT_THAT(failureOf(text),
                 AllOf(HasSubstr("cannot load bundle "), HasSubstr(text.string() + ": ")));
 }

@@ -12,6 +12,7 @@
 #include <stdexcept>
 
 #include "platform/i18n/codecvt.h"
+#include "tests/support/temporary_directory.h"
 
 namespace platform::filesystem {
 namespace {
@@ -22,24 +23,14 @@ using ::testing::ThrowsMessage;
 
 class Paths : public ::testing::Test {
 protected:
-    void SetUp() override {
-        std::string pattern = (std::filesystem::temp_directory_path() / "paths_XXXXXX").string();
-        ASSERT_NE(mkdtemp(pattern.data()), nullptr);
-        folder_ = pattern;
-    }
-
-    void TearDown() override {
-        std::filesystem::permissions(folder_, std::filesystem::perms::all);
-        std::filesystem::remove_all(folder_);
-    }
-
     static void create(const std::filesystem::path& path) { std::ofstream(path) << "x"; }
 
     std::u16string inFolder(const std::string& name) const {
         return i18n::to_ustring((folder_ / name).string());
     }
 
-    std::filesystem::path folder_;
+    const test::TemporaryDirectory directory_;
+    const std::filesystem::path folder_ = directory_.path();
 };
 
 // What `check` returns in a process that may not do everything, as root may.

@@ -1,21 +1,15 @@
 // What the package tests share: a folder of their own, files, and small packages.
 #pragma once
 
-#include <gtest/gtest.h>
-
 #include <algorithm>
 #include <cstdint>
-#include <cstdlib>
 #include <filesystem>
-#include <fstream>
-#include <iterator>
-#include <stdexcept>
 #include <string>
-#include <system_error>
 #include <vector>
 
 #include "platform/i18n/codecvt.h"
 #include "platform/package/quillet_file_package.h"
+#include "tests/support/temporary_directory.h"
 #include "zip_builder.h"
 
 namespace testing_package {
@@ -24,44 +18,27 @@ using platform::package::QuilletFilePackage;
 using Part = QuilletFilePackage::Part;
 using Relationship = QuilletFilePackage::Relationship;
 
-/// A new folder that is removed with all that is in it.
+/// A folder of its own for each test, with paths in UTF-16, as packages take them.
 class TemporaryFolder {
 public:
-    TemporaryFolder() {
-        std::string pattern = testing::TempDir() + "package-test-XXXXXX";
-        if (::mkdtemp(pattern.data()) == nullptr) {
-            throw std::runtime_error("no temporary folder");
-        }
-        path_ = pattern;
-    }
-    TemporaryFolder(const TemporaryFolder&) = delete;
-    TemporaryFolder& operator=(const TemporaryFolder&) = delete;
-    ~TemporaryFolder() {
-        std::error_code ignored;
-        std::filesystem::remove_all(path_, ignored);
-    }
-
-    const std::filesystem::path& path() const { return path_; }
+    const std::filesystem::path& path() const { return directory_.path(); }
 
     /// Writes a file of the folder and returns its path.
     std::u16string file(const std::string& name, const std::string& bytes) const {
-        std::ofstream(path_ / name, std::ios::binary) << bytes;
+        test::writeFile(directory_ / name, bytes);
         return at(name);
     }
 
     std::u16string at(const std::string& name) const {
-        return platform::i18n::to_ustring((path_ / name).string());
+        return platform::i18n::to_ustring((directory_ / name).string());
     }
 
-    std::string bytesOf(const std::string& name) const {
-        std::ifstream stream(path_ / name, std::ios::binary);
-        return {std::istreambuf_iterator<char>(stream), {}};
-    }
+    std::string bytesOf(const std::string& name) const { return test::readFile(directory_ / name); }
 
     /// The names of all files in the folder, sorted.
     std::vector<std::string> names() const {
         std::vector<std::string> result;
-        for (const auto& entry : std::filesystem::directory_iterator(path_)) {
+        for (const auto& entry : std::filesystem::directory_iterator(path())) {
             result.push_back(entry.path().filename().string());
         }
         std::sort(result.begin(), result.end());
@@ -69,7 +46,7 @@ public:
     }
 
 private:
-    std::filesystem::path path_;
+    test::TemporaryDirectory directory_;
 };
 
 inline std::string textOf(const std::vector<std::uint8_t>& bytes) {

@@ -5,7 +5,6 @@
 
 #include <cstdint>
 #include <filesystem>
-#include <fstream>
 #include <string>
 #include <vector>
 
@@ -13,6 +12,7 @@
 #include "json/serialize.h"
 #include "platform/package/zip_archive.h"
 #include "tests/serialization/activator/elf_file.h"
+#include "tests/support/temporary_directory.h"
 
 namespace {
 
@@ -75,16 +75,14 @@ protected:
     }
 
 private:
-    // A file for each test, since they may run side by side.
-    static std::string extracted() {
-        const std::string path = testing::TempDir() +
-                                 testing::UnitTest::GetInstance()->current_test_info()->name() +
-                                 ".zip";
+    std::string extracted() const {
+        const std::filesystem::path path = folder_ / "resources.zip";
         const ElfFile bundle(BUNDLE);
-        std::ofstream(path, std::ios::binary) << bundle.content(bundle.section(".us_resources"));
+        test::writeFile(path, bundle.content(bundle.section(".us_resources")));
         return path;
     }
 
+    const test::TemporaryDirectory folder_;
     ZipArchive archive_{extracted()};
 };
 

@@ -5,7 +5,6 @@
 
 #include <exception>
 #include <filesystem>
-#include <fstream>
 #include <future>
 #include <memory>
 #include <stdexcept>
@@ -18,6 +17,7 @@
 #include "platform/messaging/message_service.h"
 #include "tests/serialization/activator/loaded_bundle.h"
 #include "tests/serialization/activator/watched_messaging.h"
+#include "tests/support/temporary_directory.h"
 
 namespace {
 
@@ -44,8 +44,7 @@ futures::Future<T> failed(const std::string& text) {
 
 class BundleTest : public testing::Test {
 protected:
-    BundleTest() { std::ofstream(document_) << "a line"; }
-    ~BundleTest() override { std::filesystem::remove(document_); }
+    BundleTest() { test::writeFile(document_, "a line"); }
 
     std::vector<std::string> answersToRead() {
         return messaging_.publish(readChannel,
@@ -63,10 +62,8 @@ protected:
         return "(the bundle starts)";
     }
 
-    // The tests may run side by side.
-    const std::filesystem::path document_ =
-        std::filesystem::path(testing::TempDir()) /
-        (std::string(testing::UnitTest::GetInstance()->current_test_info()->name()) + ".txt");
+    const test::TemporaryDirectory folder_;
+    const std::filesystem::path document_ = folder_ / "document.txt";
     WatchedMessaging messaging_;
     LoadedBundle bundle_;
 };
