@@ -1,5 +1,7 @@
 #include "platform/messaging/nats/connection.h"
 
+#include <openssl/crypto.h>
+
 #include <algorithm>
 #include <array>
 #include <limits>
@@ -165,6 +167,13 @@ std::string withoutSecrets(std::string_view url) {
     return std::string(url.substr(0, start)) + std::string(url.substr(at + 1));
 }
 
+// Threads of libnats let go of connections, and with them of what they have of OpenSSL, at times of
+// their own: also when the process exits, where OpenSSL would be torn down under them. It is not
+// when its first user asks so, which libnats would be.
+void keepOpenSslToTheEnd() {
+    OPENSSL_init_crypto(OPENSSL_INIT_NO_ATEXIT, nullptr);
+}
+
 // How long a server may take to show that nothing more of a subscription is under way.
 constexpr std::int64_t releaseTimeout = 1'000;
 
@@ -218,6 +227,7 @@ void Connection::release(natsSubscription* subscription) {
 
 ConnectionHandle openConnection(const NatsOptions& options, const std::string& name,
                                 std::uintptr_t listener) {
+    keepOpenSslToTheEnd();
     natsOptions* created = nullptr;
     check(natsOptions_Create(&created), "Cannot set up the NATS connection");
     const OptionsHandle made(created);

@@ -2,6 +2,7 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <openssl/crypto.h>
 
 #include <cstdlib>
 #include <string>
@@ -207,6 +208,18 @@ TEST_F(NatsTls, IsKeptThroughReconnects) {
     EXPECT_TRUE(log.waitFor("Connected to NATS again"));
     bus.publish("x", "1");
     EXPECT_THAT(texts.waitFor(1), ElementsAre("1"));
+}
+
+TEST_F(NatsTls, LeavesOpenSslToTheThreadsOfLibnatsWhenTheProcessExits) {
+    GTEST_FLAG_SET(death_test_style, "threadsafe");
+    const test::NatsServer server(tls("server"));
+    EXPECT_EXIT(
+        {
+            const std::string failure = connectAndSend(optionsOf(server, "ca"));
+            OPENSSL_atexit([] { std::_Exit(2); });  // called when OpenSSL is torn down
+            std::exit(failure.empty() ? 0 : 1);
+        },
+        testing::ExitedWithCode(0), "");
 }
 
 }  // namespace
