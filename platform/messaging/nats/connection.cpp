@@ -174,6 +174,17 @@ void keepOpenSslToTheEnd() {
     OPENSSL_init_crypto(OPENSSL_INIT_NO_ATEXIT, nullptr);
 }
 
+// libnats 3.4 shows no signature where one begins with a zero byte, as one in 256 does. Each
+// attempt has another to show. `made`: with the credentials of a file, or without.
+natsStatus connect(natsConnection*& connection, natsOptions& made, bool hasCredentials) {
+    int attempts = hasCredentials ? 4 : 1;
+    natsStatus status = NATS_OK;
+    do {
+        status = natsConnection_Connect(&connection, &made);
+    } while (status == NATS_CONNECTION_AUTH_FAILED && --attempts > 0);
+    return status;
+}
+
 // How long a server may take to show that nothing more of a subscription is under way.
 constexpr std::int64_t releaseTimeout = 1'000;
 
@@ -237,7 +248,7 @@ ConnectionHandle openConnection(const NatsOptions& options, const std::string& n
     setBehaviour(*made, options, name);
     setCallbacks(*made, listener);
     natsConnection* connection = nullptr;
-    check(natsConnection_Connect(&connection, made.get()),
+    check(connect(connection, *made, !options.credentialsFile.empty()),
           "Cannot connect to NATS at " + withoutSecrets(options.servers));
     return std::make_shared<Connection>(connection);
 }

@@ -85,6 +85,19 @@ TEST(NatsSecurity, ReadsTheCredentialsAgainForEachConnection) {
     EXPECT_TRUE(log.waitFor("Connected to NATS again"));
 }
 
+TEST(NatsSecurity, ShowsItsCredentialsWhateverTheServerGivesItToSign) {
+    const NatsAccounts accounts = makeNatsAccounts();
+    const test::NatsServer server(accounts.serverConfiguration);
+    const test::TemporaryDirectory folder;
+    test::writeFile(folder / "user.creds", accounts.credentials);
+    NatsOptions options = optionsFor(server);
+    options.credentialsFile = folder / "user.creds";
+    // One signature in 256 begins with a zero byte.
+    for (int i = 0; i < 1'000; ++i) {
+        EXPECT_EQ(failureOf([&] { const BusAtServer bus(options); }), "");
+    }
+}
+
 TEST(NatsSecurity, NamesACredentialsFileThatIsNotThere) {
     const test::NatsServer server(makeNatsAccounts().serverConfiguration);
     NatsOptions options = optionsFor(server);
