@@ -65,9 +65,10 @@ public:
                          const natsSubscription* subscription) = 0;
 };
 
-/// Connects to one of the servers, waiting for its welcome, and tries each once, or a few times where
-/// it refuses the credentials of a file. From then on libnats restores the connection until a server refuses it. `listener`: the number under which
-/// the events are registered. Throws NatsError.
+/// Connects to one of the servers, waiting for its welcome, and tries each once, or a few times
+/// where it refuses the credentials of a file. From then on libnats restores the connection until a
+/// server refuses it. `listener`: the number under which the events are registered. Throws
+/// NatsError.
 ConnectionHandle openConnection(const NatsOptions& options, const std::string& name,
                                 std::uintptr_t listener);
 
