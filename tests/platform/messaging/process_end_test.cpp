@@ -4,11 +4,16 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <cstddef>
 #include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
 #include <latch>
 #include <memory>
 #include <stdexcept>
 #include <string>
+#include <thread>
 
 #include "platform/messaging/message_service.h"
 #include "tests/platform/messaging/bus_test_support.h"
@@ -68,9 +73,30 @@ std::shared_ptr<MessageService> processClient() {
     std::exit(0);
 }
 
+// Whether the thread `id` of this process waits for something.
+bool isWaiting(const std::string& id) {
+    std::ifstream file("/proc/self/task/" + id + "/stat");
+    const std::string status(std::istreambuf_iterator<char>(file), {});
+    const std::size_t name = status.rfind(") ");  // behind which the state stands
+    return name != std::string::npos && status.compare(name + 2, 1, "S") == 0;
+}
+
+// Has a fork find no thread in malloc: what the address sanitizer has locked for it stays locked in
+// the child.
+void waitUntilTheOtherThreadsWait() {
+    const std::string self = std::to_string(::getpid());
+    for (const auto& task : std::filesystem::directory_iterator("/proc/self/task")) {
+        const std::string id = task.path().filename();
+        while (id != self && !isWaiting(id)) {
+            std::this_thread::yield();
+        }
+    }
+}
+
 [[noreturn]] void exitInAForkedChild() {
     const auto client = processClient();
     const auto subscription = subscribe(*client, "/forked", [](const JsonMessage&) {});
+    waitUntilTheOtherThreadsWait();
     const pid_t child = fork();
     if (child == 0) {
         std::exit(0);
