@@ -174,8 +174,8 @@ void keepOpenSslToTheEnd() {
     OPENSSL_init_crypto(OPENSSL_INIT_NO_ATEXIT, nullptr);
 }
 
-// libnats 3.4 shows no signature where one begins with a zero byte, as one in 256 does. Each
-// attempt has another to show. `made`: with the credentials of a file, or without.
+// Who has credentials signs what the server gives it. libnats 3.4 shows no signature that begins
+// with a zero byte, as one in 256 does; the next attempt has another to show.
 natsStatus connect(natsConnection*& connection, natsOptions& made, bool hasCredentials) {
     int attempts = hasCredentials ? 4 : 1;
     natsStatus status = NATS_OK;
