@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Base64 both ways, beside OpenSSL. Names are "<what>/<input>/<who>".
 #include <benchmark/benchmark.h>
 #include <openssl/evp.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The loaded bundle on a bus of its own, with a client that sends requests and waits for answers.
 #pragma once
 

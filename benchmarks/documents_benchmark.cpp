@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Documents from file to response bytes and from request text to saved file, by the loaded bundle
 // on its bus and by what programs in other languages use. All do the same jobs on the same files:
 //
@@ -35,7 +36,7 @@
 #include "benchmarks/bundle_on_bus.h"
 #include "benchmarks/peer_process.h"
 #include "benchmarks/scratch_folder.h"
-#include "host/freed_memory.h"
+#include "host/limits/freed_memory.h"
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "json/value.h"

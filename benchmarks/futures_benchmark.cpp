@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Futures beside those of the standard library and Boost: one made, resolved and read, and one with
 // a continuation. std::future has no continuations. Names are "<what>/<who>".
 #define BOOST_THREAD_VERSION 4

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The cost of the bundle's work as it grows: time per byte of texts and packages of 1 KB to 500 MB,
 // per part of packages of 1 to 50,000 parts, per request of 1 to 1,000 that are under way at once.
 // It is to stay flat. Small work pays for the way there and back too.
@@ -15,7 +16,7 @@
 
 #include "benchmarks/bundle_on_bus.h"
 #include "benchmarks/scratch_folder.h"
-#include "host/freed_memory.h"
+#include "host/limits/freed_memory.h"
 #include "json/serialize.h"
 #include "json/value.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The generated inputs of the benchmarks.
 #pragma once
 

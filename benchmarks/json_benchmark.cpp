@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // JSON texts to values and back, beside the peers; and how the time grows with the size of a text
 // and the number of an object's members. Names are "<what>/<input>/<who>".
 #include <benchmark/benchmark.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "benchmarks/json_peers.h"
 
 #include <benchmark/benchmark.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The JSON libraries that the parser and the writer are measured beside.
 //
 // Each parses a text that it must leave as it is to a tree of values, and writes such a tree as

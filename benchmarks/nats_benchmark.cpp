@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Requests over NATS: the bundle on the NATS bus, beside a bare echo written with libnats, which
 // answers at once with the same bytes, and an echo on the NATS bus. All are asked in turn, in one
 // run, by the same clients through the same server.
@@ -24,7 +25,7 @@
 #include <vector>
 
 #include "framework/bundle_runner.h"
-#include "host/child_process.h"
+#include "host/server/child_process.h"
 #include "platform/messaging/nats/nats_bus.h"
 #include "platform/messaging/transport.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A program in another language that does the bundle's jobs on command and says how long each took.
 #pragma once
 

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Builds the benchmarks, runs them, and writes their figures into docs/performance.md.
 
     benchmarks/run.py [--repetitions N] [--no-write] [SECTION...]

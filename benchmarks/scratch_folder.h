@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A folder for the files that a benchmark writes.
 #pragma once
 

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Bundles: shared libraries that a host's framework loads by the three functions that they export.
 
 # project_bundle(<target> NAME <symbolic name> MANIFEST <file> SOURCES ... [LINKS ...])

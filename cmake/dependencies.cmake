@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # The libraries that the project calls. packaging/debian-packages.txt names the packages they are in.
 
 find_package(Threads REQUIRED)

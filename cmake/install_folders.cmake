@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Where in an installation the bundle lies. The folder of libraries is the host's plug-in folder, under
 # which the manifest gives the bundle its place.
 #

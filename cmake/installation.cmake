@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # What is installed: the program, the bundle, and for hosts that carry the bundle's messages the
 # messaging library with its headers and a CMake package.
 #

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Compiler settings that hold for every target of the project, and the helpers with which the folders
 # declare their libraries and tests.
 
@@ -83,14 +84,12 @@ endfunction()
 # project_test(<name> SOURCES ... [LINKS ...])
 #
 # Declares the test program `<name>_test` and registers each of its tests with CTest as <name>.<test>.
-# Tests find the project's files under PROJECT_SOURCE_ROOT.
 function(project_test name)
   cmake_parse_arguments(arg "" "" "SOURCES;LINKS" ${ARGN})
   set(target "${name}_test")
   add_executable(${target} ${arg_SOURCES})
   target_include_directories(${target} PRIVATE "${PROJECT_SOURCE_DIR}")
-  target_compile_definitions(${target} PRIVATE PROJECT_SOURCE_ROOT="${PROJECT_SOURCE_DIR}")
-  target_link_libraries(${target} PRIVATE ${arg_LINKS} GTest::gmock GTest::gtest_main)
+  target_link_libraries(${target} PRIVATE ${arg_LINKS} editor_test_support GTest::gmock GTest::gtest_main)
   # Without the values of parameters, which may be addresses and differ from run to run.
   gtest_discover_tests(${target} TEST_PREFIX "${name}." NO_PRETTY_VALUES DISCOVERY_TIMEOUT 60
                        PROPERTIES TIMEOUT 600)

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """A short tour of the bundle: reads and writes copies of two examples, as a client of the message bus.
 
 Usage: tour.py SERIALIZATION_HOST

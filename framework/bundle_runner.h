@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // BundleRunner: loads one bundle, runs it and takes it down again. A build with CppMicroServices
 // runs the bundle in that framework, one without it in the loader of this folder.
 #pragma once

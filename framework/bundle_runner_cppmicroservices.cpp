@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // BundleRunner on CppMicroServices: a framework of its own for each bundle.
 
 #include <cppmicroservices/Bundle.h>

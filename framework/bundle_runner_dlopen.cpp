@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // BundleRunner without CppMicroServices: dlopen and the three functions that a bundle exports,
 //
 //   void _us_set_bundle_context_instance_<name>(BundleContextPrivate*)

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The archive in which a bundle's file carries its manifest, made by the compiler: a zip archive
 // without compression. It holds no times and no owners, so that equal sources make equal bundles.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One-shot asynchronous results: a Promise is resolved once, its Future is read once, by waiting
 // for the outcome (get) or by a continuation that is called with it (then).
 #pragma once

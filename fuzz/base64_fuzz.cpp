@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Base64 both ways. What is encoded decodes to the same bytes, and any text decodes to what a
 // decoder that takes it a character at a time makes of it, or is refused by both.
 #include <cstddef>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Detection on any bytes: what it returns must decode all of them and give them back, and the
 // converters must neither crash nor read beyond their input under any name.
 #include <cstddef>

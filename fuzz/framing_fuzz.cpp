@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Any bytes on the host's standard input, in pieces of any sizes: they give the same frames however
 // they come, and each frame that is read can be written and read again.
 #include <algorithm>
@@ -11,7 +12,7 @@
 #include <utility>
 #include <vector>
 
-#include "host/framing.h"
+#include "host/commands/framing.h"
 
 namespace {
 

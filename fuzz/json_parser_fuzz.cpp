@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Any bytes into each routine of the JSON parser: it has to agree with the reference in status,
 // position and value.
 #include <algorithm>

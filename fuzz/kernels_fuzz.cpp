@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The loops for wider vectors beside those for plain words, of JSON strings and of base64: on the
 // same bytes, each gives the same result. The memory is of exactly the size that each may use.
 #include <cstddef>

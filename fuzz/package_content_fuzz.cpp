@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads packages made of any entries. Their checksums are right, so that the fuzzer gets behind
 // them.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads any bytes as a document package.
 #include <cstddef>
 #include <cstdint>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "package_round_trip.h"
 
 #include <sys/mman.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the package fuzz targets do with the bytes of an archive.
 #pragma once
 

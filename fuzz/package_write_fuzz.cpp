@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Packages of any parts and relationships: each is refused, or written so that it reads back the
 // same, but for what writing settles (external relationships, the case of the top-level type).
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Any message to either request channel, about files of any bytes. A request that has what it needs
 // is answered once, on the caller's channel; a write is announced before its answer; nothing else
 // is published.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Values of any shape, made by the parser, into text and back: the text says the same value.
 #include <cstddef>
 #include <cstdint>

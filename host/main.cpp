@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // serialization_host: loads the bundle and gives it a message bus.
 #include <spdlog/logger.h>
 #include <spdlog/sinks/stdout_color_sinks.h>
@@ -19,18 +20,18 @@
 #include <stdexcept>
 #include <string>
 
-#include "host/bundle_location.h"
-#include "host/exit_status.h"
-#include "host/freed_memory.h"
-#include "host/limiting_sink.h"
-#include "host/memory_limit.h"
-#include "host/nats_configuration.h"
-#include "host/read_command.h"
-#include "host/serve_command.h"
-#include "host/standard_streams.h"
-#include "host/stdio_command.h"
-#include "host/write_command.h"
-#include "platform/file_descriptor.h"
+#include "host/bus/bundle_location.h"
+#include "host/commands/exit_status.h"
+#include "host/commands/read_command.h"
+#include "host/commands/serve_command.h"
+#include "host/commands/standard_streams.h"
+#include "host/commands/stdio_command.h"
+#include "host/commands/write_command.h"
+#include "host/limits/freed_memory.h"
+#include "host/limits/limiting_sink.h"
+#include "host/limits/memory_limit.h"
+#include "host/server/nats_configuration.h"
+#include "platform/posix/file_descriptor.h"
 
 namespace {
 

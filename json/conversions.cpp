@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Number texts to doubles, UTF-16 units to UTF-8.
 #include "json/conversions.h"
 
@@ -8,7 +9,7 @@
 #include <cstdint>
 #include <system_error>
 
-#include "platform/i18n/ascii.h"
+#include "platform/text/ascii.h"
 
 namespace json {
 namespace {
@@ -51,7 +52,7 @@ bool convertShort(std::string_view text, double& value) {
     std::size_t i = 0;
     const auto readDigits = [&] {
         const std::size_t start = i;
-        for (; i < number.size() && platform::i18n::isdigit_ascii(number[i]); ++i)
+        for (; i < number.size() && platform::text::isdigit_ascii(number[i]); ++i)
             digits = digits * 10 + static_cast<std::uint64_t>(number[i] - '0');
         return i - start;
     };
@@ -73,7 +74,7 @@ bool convertShort(std::string_view text, double& value) {
 double string_to_double(std::string_view text) {
     const std::size_t sign = text.starts_with('-') ? 1 : 0;
     // std::from_chars would also take "inf" and "nan".
-    if (text.size() == sign || !platform::i18n::isdigit_ascii(text[sign]))
+    if (text.size() == sign || !platform::text::isdigit_ascii(text[sign]))
         return 0;
     double value = 0;
     if (convertShort(text, value))

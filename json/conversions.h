@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Conversions of the pieces that JSON text is made of: number texts and UTF-16 escapes.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The parser. Strings, numbers, literals and typed data have a routine each; arrays, objects and
 // the values in them are parsed together by TreeParser, which keeps the containers that are open on
 // a stack of its own, so that no depth can exhaust the thread's.
@@ -30,14 +31,14 @@
 #include "json/string_kernels.h"
 #include "json/text_memory.h"
 #include "json/word_bytes.h"
-#include "platform/i18n/ascii.h"
 #include "platform/large_pages.h"
+#include "platform/text/ascii.h"
 
 namespace json {
 namespace {
 
-using platform::i18n::isdigit_ascii;
-using platform::i18n::isspace_ascii;
+using platform::text::isdigit_ascii;
+using platform::text::isspace_ascii;
 
 bool atEnd(const Input& input) {
     return input.position == input.end;

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The parser: JSON text to values, with the typed integer arrays of the editor's requests.
 //
 // A typed integer array is an object with the members "kqtype" and "kqdata", in either order:

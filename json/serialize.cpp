@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Writes a tree of values by walking it with a stack of its own, so that no depth can exhaust the
 // thread's. The memory for the text is had at once, by an estimate of its length.
 #include "json/serialize.h"

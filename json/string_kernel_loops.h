@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The loops of the string kernels, written once for every kind of block: 64 bytes of which one bit
 // mask each tells the backslashes, the quotes, and the bytes that need an escape.
 //

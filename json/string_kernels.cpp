@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kernels that every machine can run, and the choice among all.
 #include "json/string_kernels.h"
 

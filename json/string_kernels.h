@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The inner loops over the bytes of strings in JSON text: finding a string's end, taking its
 // escapes out and putting them in.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The string kernels for machines with AVX2. This file alone is compiled for them.
 #include <immintrin.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Writing into a string's memory without filling it with zeros first.
 #pragma once
 

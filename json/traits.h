@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kinds of a JSON value: the types that a Value can hold, their order and their names.
 #pragma once
 

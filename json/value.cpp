@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Copying, comparing and destroying trees of values without recursing into them as deep as they
 // are.
 #include "json/value.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The one in-memory JSON value: requests are parsed into it, documents and responses are built of
 // it.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Looking at the eight bytes of a word at once, which any machine can.
 #pragma once
 

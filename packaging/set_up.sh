@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # shellcheck shell=bash disable=SC2154
 # Shell code that ./start, ./test and .ci/run share: installing packages, configuring, building.
 #

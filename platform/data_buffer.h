@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // DataBuffer: a byte buffer with malloc storage, the form in which message bodies and base64 text
 // cross library boundaries.
 #pragma once

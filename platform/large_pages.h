@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Large pages for large buffers. The system gives a process memory by pages of a few kilobytes, as
 // it writes to them first, and takes longer for that than it takes to fill them with a document.
 #pragma once

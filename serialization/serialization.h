@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Serialization: the bundle's one service object. It answers the read and write requests that
 // arrive on the host's message service and holds, as constant members, every name that goes on the
 // wire.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Connects the service object to the message service.
 
 #include <exception>

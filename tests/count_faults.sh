@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # Runs the tests that make system calls and allocations fail, and prints how many each of them did.
 # Usage: count_faults.sh BUILD-FOLDER
 set -euo pipefail

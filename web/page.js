@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The page: connects to the message server named in the address's fragment (or typed in), asks the
 // bundle for a file and shows its answer. docs/protocol.md describes the messages.
 import { connect } from "./node_modules/nats.ws/esm/nats.js";

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Writes the JSON texts that the benchmarks parse.
 
     json_inputs.py FOLDER

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Makes the documents that benchmarks/documents_benchmark.cpp reads and writes.
 
     make_documents.py FOLDER

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Base64 both ways by Node's Buffer, for the same inputs as base64_benchmark. Prints results in the form
 // that run.py reads.
 const repetitions = Number(process.argv[2] ?? 5);

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The jobs of the bundle done with what Node programs use, for documents_benchmark.
 //
 // Takes the same commands as peer.py. The second word is the library: jszip or fflate for packages;

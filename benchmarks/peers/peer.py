@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The jobs of the bundle done with Python's own library, for documents_benchmark.
 
 Commands come on standard input, one a line, their words separated by tabs:

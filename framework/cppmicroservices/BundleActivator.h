@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // BundleActivator: the interface through which a framework starts and stops a bundle. Stands in for
 // the header of the same name of CppMicroServices 3.8 and has the same binary interface.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // BundleContext: what the framework hands a bundle at start and stop. Stands in for the header of
 // the same name of CppMicroServices 3.8, of which it has what our bundle and loader use.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The state that a promise and its future share, and the interface of the continuation attached to
 // it.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Base64 around the kernels, which convert whole groups: the last group's padding, white space, and
 // what is no base64.
 #include "platform/base64/base64.h"
@@ -9,7 +10,7 @@
 #include <string>
 
 #include "platform/base64/kernels.h"
-#include "platform/i18n/ascii.h"
+#include "platform/text/ascii.h"
 
 namespace platform {
 namespace {
@@ -35,7 +36,7 @@ std::size_t readGroup(std::string_view text, std::size_t& at, Group& group) {
     for (; at < text.size() && count < group.size(); ++at) {
         if (isInAlphabet(text[at])) {
             group[count++] = text[at];
-        } else if (!i18n::isspace_ascii(text[at])) {
+        } else if (!platform::text::isspace_ascii(text[at])) {
             fail("a character outside the alphabet", at);
         }
     }
@@ -48,7 +49,7 @@ void checkPadding(std::string_view text, std::size_t start, std::size_t leftOver
     for (std::size_t i = start; i < text.size(); ++i) {
         if (text[i] == '=') {
             ++count;
-        } else if (!i18n::isspace_ascii(text[i])) {
+        } else if (!platform::text::isspace_ascii(text[i])) {
             fail("data behind the padding", i);
         }
     }

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Base64 text as RFC 4648, section 4, defines it: the standard alphabet, with padding, on one line.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The inner loops of base64: whole groups of three bytes to four characters, and back.
 //
 // Each exists for plain words and for AVX2; both give the same results. Neither reads or writes

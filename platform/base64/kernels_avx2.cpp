@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kernels for machines with AVX2: eight groups at once, as W. Mula and D. Lemire describe it in
 // "Faster Base64 Encoding and Decoding using AVX2 Instructions". This file alone is compiled for
 // such machines; it calls no shared inline function, of which the linker could take this version

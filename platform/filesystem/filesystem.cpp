@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Questions to the file system about UTF-16 paths.
 #include "platform/filesystem/filesystem.h"
 

@@ -1,7 +1,8 @@
+// SPDX-License-Identifier: Apache-2.0
 // The public converters: each holds one opened charset.
 #include "platform/i18n/codecvt.h"
 
-#include "platform/i18n/charset.h"
+#include "platform/i18n/charsets/charset.h"
 
 namespace platform::i18n {
 

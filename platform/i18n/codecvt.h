@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Conversion between bytes in a named charset and UTF-16 text.
 #pragma once
 

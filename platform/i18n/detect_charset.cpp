@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Detection of the charset of a text file.
 //
 // In this order: a byte-order mark; UTF-16 and UTF-32 without one; charsets of escape sequences;
@@ -17,12 +18,12 @@
 #include <string>
 #include <vector>
 
-#include "platform/i18n/charset.h"
+#include "platform/i18n/charsets/charset.h"
+#include "platform/i18n/charsets/escape_charsets.h"
 #include "platform/i18n/codecvt.h"
-#include "platform/i18n/escape_charsets.h"
-#include "platform/i18n/ranking.h"
-#include "platform/i18n/sample.h"
-#include "platform/i18n/unicode_guess.h"
+#include "platform/i18n/detection/ranking.h"
+#include "platform/i18n/detection/sample.h"
+#include "platform/i18n/detection/unicode_guess.h"
 
 namespace platform::i18n {
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Detection of the charset of a text file.
 #pragma once
 

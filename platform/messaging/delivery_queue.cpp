@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The queue is a plain deque under a mutex; the threads take messages off it until it is closed.
 #include "platform/messaging/delivery_queue.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A subscription's queue of messages and the threads that hand them to its handler.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The threads of a subscription, which hand its messages to the handler.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A message's way: it is counted against the bound, shown to the observers, and queued at each
 // subscription of its channel. Everything that lasts is in the core, which clients, subscriptions
 // and the bus share; queues and observers guard themselves.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The message bus within one process: it carries messages between the clients that connect to it.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Logging goes through spdlog, whose registry the host shares with this library.
 #include "platform/messaging/log.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The message service that a host offers its bundles: channels of byte messages, one client per
 // user.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Futures of operations that are done when they return.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A callback that can be taken back while other threads call it.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The transport of the process, and the bus that is its default.
 #include "platform/messaging/transport.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The choice of what carries the messages of this process.
 #pragma once
 

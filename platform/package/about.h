@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Errors that say what they are about.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The content types of a package: which media type each part has, by its name or else by its
 // extension.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How much of a package is accepted. A package is expanded into memory whole, and a file of a few
 // kilobytes can claim to expand to anything, so all of these are checked against what the archive
 // declares before memory is taken. The writer keeps to them too: what it writes can be read.

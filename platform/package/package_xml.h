@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The XML of the package itself, content types and relationships: small documents of one level,
 // whose elements are told by namespace and local name and whose attributes have no namespace.
 #pragma once

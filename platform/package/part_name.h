@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Part names: which are valid, which are the same, and what the names with a meaning of their own
 // say. All names here are UTF-8 and begin with "/".
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A document package in memory: its parts, and the relationships of the package as a whole.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "platform/package/quillet_file_reader.h"
 
 #include <algorithm>
@@ -18,7 +19,7 @@
 #include "platform/package/limits.h"
 #include "platform/package/part_name.h"
 #include "platform/package/relationships.h"
-#include "platform/package/zip_archive.h"
+#include "platform/package/zip/zip_archive.h"
 
 namespace platform::package {
 namespace {

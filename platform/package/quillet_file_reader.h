@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads document packages: zip archives laid out by the Open Packaging Conventions.
 #pragma once
 

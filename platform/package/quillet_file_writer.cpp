@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "platform/package/quillet_file_writer.h"
 
 #include <algorithm>
@@ -14,13 +15,13 @@
 #include "platform/filesystem/filesystem.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/package/about.h"
-#include "platform/package/atomic_file.h"
 #include "platform/package/content_types.h"
 #include "platform/package/limits.h"
 #include "platform/package/package_xml.h"
 #include "platform/package/part_name.h"
 #include "platform/package/relationships.h"
-#include "platform/package/zip_writer.h"
+#include "platform/package/zip/zip_writer.h"
+#include "platform/posix/atomic_file.h"
 
 namespace platform::package {
 namespace {

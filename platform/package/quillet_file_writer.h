@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Writes document packages: zip archives laid out by the Open Packaging Conventions.
 #pragma once
 
@@ -7,9 +8,11 @@
 
 #include "platform/package/quillet_file_package.h"
 
-namespace platform::package {
-
+namespace platform {
 class AtomicFile;
+}
+
+namespace platform::package {
 
 /// Writes a package to a file in two steps: `write` prepares the new file beside the target,
 /// `close` puts it in the target's place or drops it. Whoever reads the target finds the old

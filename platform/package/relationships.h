@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Relationships parts: the XML form of QuilletFilePackage::Relationship.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The activator, and the functions by which the host's framework reaches it. They are all that the
 // bundle exports; the suffix of their names is the bundle's symbolic name.
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads document packages into the document JSON.
 
 #include <exception>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The keys of a read request's result object, whichever reader makes it.
 #pragma once
 

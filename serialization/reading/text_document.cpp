@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads text files: bytes, detected charset, UTF-16, and back to the file's own charset.
 
 #include <fcntl.h>
@@ -14,11 +15,11 @@
 #include <system_error>
 #include <utility>
 
-#include "platform/file_descriptor.h"
 #include "platform/filesystem/filesystem.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/i18n/detect_charset.h"
 #include "platform/large_pages.h"
+#include "platform/posix/file_descriptor.h"
 #include "serialization/reading/result_keys.h"
 #include "serialization/serialization.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Tells the host's file views what changed on disk.
 
 #include <utility>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Turns the document JSON back into a package and writes it.
 
 #include <exception>

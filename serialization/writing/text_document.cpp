@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Writes text files. The text arrives in the charset that the request names and is decoded and
 // encoded again, so that what is not valid in that charset is refused before the file is touched.
 // Where that is known to change nothing, it is left out.
@@ -13,9 +14,9 @@
 #include <string_view>
 #include <utility>
 
-#include "platform/file_descriptor.h"
 #include "platform/filesystem/filesystem.h"
 #include "platform/i18n/codecvt.h"
+#include "platform/posix/file_descriptor.h"
 #include "serialization/serialization.h"
 
 namespace EditorServices {

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Compares two document packages as an independent reader sees them.
 
 Usage: compare_packages.py ONE OTHER

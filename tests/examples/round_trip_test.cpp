@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The examples, read, written and read again through the loaded bundle.
 
 #include <gmock/gmock.h>
@@ -11,6 +12,7 @@
 #include <vector>
 
 #include "tests/support/running_bundle.h"
+#include "tests/support/source_root.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
@@ -23,7 +25,8 @@ using testing::SizeIs;
 /// The examples with one of `extensions`, by name.
 std::vector<std::filesystem::path> examples(std::initializer_list<std::string> extensions) {
     std::vector<std::filesystem::path> found;
-    for (const auto& entry : std::filesystem::directory_iterator(PROJECT_SOURCE_ROOT "/examples")) {
+    for (const auto& entry :
+         std::filesystem::directory_iterator(test::sourceRoot() + "/examples")) {
         if (std::find(extensions.begin(), extensions.end(), entry.path().extension()) !=
             extensions.end()) {
             found.push_back(entry.path());
@@ -90,9 +93,9 @@ TEST_F(Examples, ThatArePackagesAreTheSameToAnIndependentReaderAfterTheyAreWritt
         SCOPED_TRACE(path);
         const std::filesystem::path copy = folder / path.filename().string();
         ASSERT_TRUE(write(copy, "text/xml", read(path, "text/xml")));
-        const std::string command = "python3 '" PROJECT_SOURCE_ROOT
-                                    "/tests/examples/compare_packages.py' '" +
-                                    path.string() + "' '" + copy.string() + "'";
+        const std::string command = "python3 '" + test::sourceRoot() +
+                                    "/tests/examples/compare_packages.py' '" + path.string() +
+                                    "' '" + copy.string() + "'";
         EXPECT_EQ(std::system(command.c_str()), 0);
     }
 }

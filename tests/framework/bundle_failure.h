@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The way in which a bundle fails to run.
 #pragma once
 

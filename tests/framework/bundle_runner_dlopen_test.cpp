@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What BundleRunner does in a build without CppMicroServices. INCOMPLETE_BUNDLES is the folder of
 // the libraries without_<function>, each of which lacks that one of a bundle's functions.
 

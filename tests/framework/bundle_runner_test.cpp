@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // BundleRunner, whichever framework it is built on. SAMPLE_BUNDLE is the file of a bundle whose
 // behaviour each test chooses.
 

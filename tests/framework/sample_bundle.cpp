@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A bundle that does what its control says and records what is done with it.
 
 #include <exception>

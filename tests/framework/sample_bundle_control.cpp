@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "tests/framework/sample_bundle_control.h"
 
 namespace sample {

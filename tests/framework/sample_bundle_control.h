@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the sample bundle is to do and what it has done: shared between the tests and the bundle,
 // which exports nothing but its entry points.
 #pragma once

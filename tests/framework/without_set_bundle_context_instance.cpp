@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A library that lacks one of a bundle's three functions.
 
 extern "C" {

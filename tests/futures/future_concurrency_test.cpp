@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Futures under contention; meant for the thread sanitizer as much as for the assertions.
 
 #include <gmock/gmock.h>

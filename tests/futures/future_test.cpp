@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Promises, futures, continuations and unwrap as their users see them.
 
 #include "futures/future.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The host's program, as the tests run it.
 #pragma once
 
@@ -11,7 +12,7 @@
 #include <utility>
 #include <vector>
 
-#include "host/framing.h"
+#include "host/commands/framing.h"
 #include "json/serialize.h"
 #include "json/value.h"
 #include "tests/host/subprocess.h"

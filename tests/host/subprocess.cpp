@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "tests/host/subprocess.h"
 
 #include <fcntl.h>
@@ -10,7 +11,7 @@
 #include <system_error>
 #include <utility>
 
-#include "host/standard_streams.h"
+#include "host/commands/standard_streams.h"
 
 namespace test {
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A program run with pipes on its standard streams.
 #pragma once
 
@@ -8,7 +9,7 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/file_descriptor.h"
+#include "platform/posix/file_descriptor.h"
 
 namespace test {
 

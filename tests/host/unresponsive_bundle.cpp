@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A bundle for the host's failures: it prints where the host's results go, answers no request but
 // one for a file named "answered", and never comes back from one for a file named "stuck".
 #include <unistd.h>

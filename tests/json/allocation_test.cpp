@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What happens when memory runs out, at every allocation in turn: nothing leaks and nothing is left
 // half done. This program's operator new can be told to fail.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Number texts to doubles and UTF-16 units to UTF-8.
 #include "json/conversions.h"
 

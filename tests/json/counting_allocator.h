@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // An operator new, for the whole of a test program, that counts and can be told to fail.
 #pragma once
 

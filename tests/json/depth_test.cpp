@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Values and texts that nest NESTING_LEVELS deep, all on a stack of 256 KiB. There is no time limit
 // but that of the test runner: were anything quadratic, these tests would not end.
 #include <gtest/gtest.h>

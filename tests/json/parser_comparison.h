@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Runs the parser and the reference side by side.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The parser against the rules written down plainly, on many texts that are almost JSON.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The parser: its routines and their status codes, and the entry that drops the codes.
 #include "json/parser.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Random values and random JSON-like texts, the same on every run for the same seed.
 #pragma once
 

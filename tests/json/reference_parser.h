@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The parser's rules written down once more in the plainest way, without regard to speed or stack,
 // to hold the real parser against.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The text writer, alone and together with the parser.
 #include "json/serialize.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Texts and values of more bytes than 32 bits can count, and of many members.
 #include <gtest/gtest.h>
 #include <unistd.h>

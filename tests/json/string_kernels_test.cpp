@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The string kernels against plain loops over bytes: all kernels that this machine can run, on
 // random content of every length and alignment, in memory that ends where the next page cannot be
 // touched.

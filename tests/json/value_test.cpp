@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The value: its kinds, strict access, and ownership of the tree.
 #include "json/value.h"
 

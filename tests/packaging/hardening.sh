@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # Checks that programs and shared libraries have the protections that they are to be shipped with.
 # Usage: hardening.sh FILE...
 set -u

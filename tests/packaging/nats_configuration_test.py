@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Runs the packaged nats-server configurations and checks what they let through and what not."""
 
 import json

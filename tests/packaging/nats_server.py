@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The packaged nats-server configurations with a test's ports, passwords and certificates, servers
 that run them, and a client that speaks the server's protocol byte by byte."""
 

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Runs the host as a worker of servers with the packaged configurations.
 
 Usage: worker_test.py PROGRAM"""

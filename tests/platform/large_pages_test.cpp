@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Which buffers are asked to be backed by large pages, as the system tells.
 #include "platform/large_pages.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How often documents are held in memory while the loaded bundle answers requests: the allocations
 // that are as large as documents are counted, and the most bytes that were in use at one time.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Documents as requests and answers carry them.
 #pragma once
 

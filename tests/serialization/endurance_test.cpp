@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The loaded bundle over long runs: what it takes, it gives back.
 //
 // ENDURANCE_REQUESTS in the environment sets how many requests the long run makes.

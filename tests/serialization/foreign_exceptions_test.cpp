@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the document operations do with exceptions of types that they do not know. None of the real
 // libraries throws one, so this program has file-system helpers of its own, which do.
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the loaded bundle does when memory runs out.
 
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Documents at the longest paths that the system takes, and beyond.
 
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Several clients at once over the real bundle and bus: mixed reads and writes of texts and
 // packages, on files of their own and on files that all of them use.
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What becomes of a start of the bundle, and of its end, when any of their system calls fails:
 // those of the library's loading and of the threads that wait for requests.
 

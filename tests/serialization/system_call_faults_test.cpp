@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What becomes of each kind of request when any of the system calls along its way fails.
 
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Write requests through the loaded bundle and the bus.
 
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A client of the bundle over NATS, as a browser would be one: nats.ws over WebSocket.
 import WebSocket from "../../web/node_modules/ws/wrapper.mjs";
 import { connect } from "../../web/node_modules/nats.ws/esm/nats.js";

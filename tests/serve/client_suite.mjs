@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What every client of the bundle may rely on, tried with real clients. It is the same for a host's
 // own server and for any others with workers behind them:
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A host with a message server of its own, from its start to its end.
 import assert from "node:assert/strict";
 import {

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Programs that the tests run: hosts, message servers, other test programs.
 import assert from "node:assert/strict";
 import { spawn } from "node:child_process";

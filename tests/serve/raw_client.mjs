@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The messages of NATS by hand, over a plain socket or over WebSocket: for what a well-made client
 // does not do.
 import { randomBytes } from "node:crypto";

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The web page of a host that serves, over HTTP.
 import assert from "node:assert/strict";
 import { mkdirSync, readFileSync, symlinkSync, writeFileSync } from "node:fs";

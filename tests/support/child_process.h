@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A program that runs beside a test and ends with it at the latest.
 #pragma once
 

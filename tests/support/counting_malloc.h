@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A malloc that keeps account of what is allocated, in the program that links it and in the
 // libraries that it loads.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A malloc that fails when told to, for programs that link failing_malloc.cpp. The libraries that
 // such a program loads call it too.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Memory in which reading or writing behind the end is found out at once.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // An editor as the bundle sees it, in libnats alone: it asks and waits for its own answers.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "tests/support/nats_server.h"
 
 #include <arpa/inet.h>
@@ -12,7 +13,7 @@
 #include <system_error>
 #include <thread>
 
-#include "platform/file_descriptor.h"
+#include "platform/posix/file_descriptor.h"
 
 namespace test {
 namespace {

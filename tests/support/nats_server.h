@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A real nats-server for a test, on free ports of the loopback interface, with a folder of its own.
 #pragma once
 

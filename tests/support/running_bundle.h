@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The real bundle, loaded from its library and started on a bus of its own, with a client beside
 // it.
 #pragma once

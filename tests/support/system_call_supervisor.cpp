@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kernel's seccomp filters can hand system calls of a thread to a supervisor, who answers for
 // them or lets them continue. The filter here concerns only the thread that installs it.
 #include "tests/support/system_call_supervisor.h"

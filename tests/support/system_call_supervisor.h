@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Lets tests see every system call that a piece of work makes, and fail or interrupt any of them.
 #pragma once
 

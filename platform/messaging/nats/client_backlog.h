@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a NATS server has still to send to its clients.
 #pragma once
 

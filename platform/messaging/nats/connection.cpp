@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "platform/messaging/nats/connection.h"
 
 #include <openssl/crypto.h>

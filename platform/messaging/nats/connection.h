@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Connections to NATS servers.
 #pragma once
 

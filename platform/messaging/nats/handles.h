@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Owners of what libnats creates, and its failures as exceptions.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The core holds the connection, which clients and subscriptions share. libnats restores a
 // connection that breaks; when a server turns it away, libnats gives it up, and a thread of the
 // core makes a new one.

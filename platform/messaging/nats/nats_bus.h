@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The message bus past the process: channels are subjects of NATS servers.
 #pragma once
 

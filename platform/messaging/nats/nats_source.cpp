@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The delivery threads take turns: one waits in libnats while the others run the handler or queue
 // up behind it. A message thus wakes one thread, the one that handles it.
 #include "platform/messaging/nats/nats_source.h"

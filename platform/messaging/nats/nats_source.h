@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A subscription at a NATS server, as the source of its delivery threads.
 #pragma once
 

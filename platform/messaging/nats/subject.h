@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Which channels can be NATS subjects.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The shared state: its fields, its locking, and its rules against a model of them.
 
 #include "futures/detail/shared_future_state.h"

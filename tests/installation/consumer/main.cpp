@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A host that has nothing but the installed files: sets up the message service and loads the
 // bundle.
 

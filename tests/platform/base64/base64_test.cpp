@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "platform/base64/base64.h"
 
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The base64 kernels against a plain loop over bits: all kernels that this machine can run, in
 // memory that ends where the next page cannot be touched.
 #include "platform/base64/kernels.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Questions about UTF-16 paths, on a real file system.
 #include "platform/filesystem/filesystem.h"
 

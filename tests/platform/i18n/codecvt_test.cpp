@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The converters between bytes and UTF-16.
 #include "platform/i18n/codecvt.h"
 
@@ -11,12 +12,14 @@
 #include <utility>
 #include <vector>
 
-#include "platform/i18n/ascii.h"
-#include "tests/platform/i18n/corpus.h"
+#include "platform/text/ascii.h"
+#include "tests/platform/i18n/detection/corpus.h"
 
 namespace platform::i18n {
 namespace {
 
+using platform::text::isdigit_ascii;
+using platform::text::isspace_ascii;
 using std::string_literals::operator""s;
 using std::string_view_literals::operator""sv;
 using ::testing::AllOf;

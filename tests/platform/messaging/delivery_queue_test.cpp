@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Queues on their own: order, threads, what messages hold, and ends from every side.
 
 #include "platform/messaging/delivery_queue.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The bus under contention; meant for the sanitizers as much as for the assertions.
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The bus as its clients see it: delivery, ends of subscriptions, bound, observers, idleness.
 
 #include "platform/messaging/in_process_bus.h"

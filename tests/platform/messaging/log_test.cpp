@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What reaches standard error when handlers fail.
 
 #include "platform/messaging/log.h"

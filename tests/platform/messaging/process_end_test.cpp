@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How a process ends that has used the bus: normally, whatever is still subscribed.
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Functions that are revoked while they are called, from outside and from inside.
 
 #include "platform/messaging/revocable_function.h"

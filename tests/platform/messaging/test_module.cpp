@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A library that subscribes while it is loaded, in the place of a bundle.
 
 #include <memory>

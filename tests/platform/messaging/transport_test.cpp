@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Where createMessageService gets its clients from.
 
 #include "platform/messaging/transport.h"

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Describes a document package in lines, with nothing but Python's own zip and XML modules.
 
 Usage: describe_package.py FILE

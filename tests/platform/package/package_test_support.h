@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the package tests share: a folder of their own, files, and small packages.
 #pragma once
 
@@ -9,8 +10,8 @@
 
 #include "platform/i18n/codecvt.h"
 #include "platform/package/quillet_file_package.h"
+#include "tests/platform/package/zip_builder.h"
 #include "tests/support/temporary_directory.h"
-#include "zip_builder.h"
 
 namespace testing_package {
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "platform/package/part_name.h"
 
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "platform/package/quillet_file_reader.h"
 
 #include <gmock/gmock.h>
@@ -5,7 +6,7 @@
 
 #include <stdexcept>
 
-#include "package_test_support.h"
+#include "tests/platform/package/package_test_support.h"
 
 namespace testing_package {
 namespace {

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "platform/package/quillet_file_writer.h"
 
 #include <fcntl.h>
@@ -20,10 +21,11 @@
 #include <sstream>
 #include <stdexcept>
 
-#include "package_test_support.h"
 #include "platform/package/limits.h"
 #include "platform/package/quillet_file_reader.h"
-#include "platform/package/zip_archive.h"
+#include "platform/package/zip/zip_archive.h"
+#include "tests/platform/package/package_test_support.h"
+#include "tests/support/source_root.h"
 
 namespace testing_package {
 namespace {
@@ -61,9 +63,9 @@ void save(const std::u16string& path, const QuilletFilePackage& package) {
 
 /// The output of describe_package.py.
 std::string description(const std::filesystem::path& path) {
-    const std::string command = "python3 '" PROJECT_SOURCE_ROOT
-                                "/tests/platform/package/describe_package.py' '" +
-                                path.string() + "'";
+    const std::string command = "python3 '" + test::sourceRoot() +
+                                "/tests/platform/package/describe_package.py' '" + path.string() +
+                                "'";
     FILE* pipe = ::popen(command.c_str(), "r");
     std::string output;
     for (int c = std::fgetc(pipe); c != EOF; c = std::fgetc(pipe)) {

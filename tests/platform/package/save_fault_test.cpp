@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What is left on disk when a save fails or is killed at any of its system calls.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -18,9 +19,9 @@
 #include <string>
 #include <system_error>
 
-#include "package_test_support.h"
 #include "platform/package/quillet_file_reader.h"
 #include "platform/package/quillet_file_writer.h"
+#include "tests/platform/package/package_test_support.h"
 #include "tests/support/system_call_supervisor.h"
 
 namespace testing_package {

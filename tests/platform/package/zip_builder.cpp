@@ -1,4 +1,5 @@
-#include "zip_builder.h"
+// SPDX-License-Identifier: Apache-2.0
+#include "tests/platform/package/zip_builder.h"
 
 #include <libdeflate.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Builds zip archives in memory for the tests, honest ones and ones that lie in any field.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The entry points that tests cannot reach in the bundle's file: linked into the test program
 // itself.
 

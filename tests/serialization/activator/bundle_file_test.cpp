@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The bundle's file: what it exports, and the manifest in it. BUNDLE is the file.
 
 #include <gmock/gmock.h>
@@ -10,7 +11,7 @@
 
 #include "json/parser.h"
 #include "json/serialize.h"
-#include "platform/package/zip_archive.h"
+#include "platform/package/zip/zip_archive.h"
 #include "tests/serialization/activator/elf_file.h"
 #include "tests/support/temporary_directory.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The bundle in the framework that this build has.
 
 #include <gmock/gmock.h>

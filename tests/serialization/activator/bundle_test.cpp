@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The bundle from its loading to its end, with real messages on an in-process bus.
 
 #include <gmock/gmock.h>
@@ -17,6 +18,7 @@
 #include "platform/messaging/message_service.h"
 #include "tests/serialization/activator/loaded_bundle.h"
 #include "tests/serialization/activator/watched_messaging.h"
+#include "tests/support/source_root.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
@@ -108,7 +110,7 @@ TEST_F(BundleTest, AnswersReadRequests) {
 
 // Detection and conversion bring in libraries with caches of their own, which outlast the bundle.
 TEST_F(BundleTest, LosesNothingOfItsLibrariesWhenItIsUnloaded) {
-    std::filesystem::copy_file(PROJECT_SOURCE_ROOT "/examples/library-notice.shift_jis.txt",
+    std::filesystem::copy_file(test::sourceRoot() + "/examples/library-notice.shift_jis.txt",
                                document_, std::filesystem::copy_options::overwrite_existing);
     bundle_.start();
     EXPECT_THAT(answersToRead(), ElementsAre(EndsWith(R"("status":true})")));

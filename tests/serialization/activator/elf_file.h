@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A shared library's file as a linker sees it: its sections and its dynamic symbols. For 64-bit
 // files of the byte order of this machine.
 #pragma once

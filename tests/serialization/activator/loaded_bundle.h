@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The bundle's file, loaded, and an activator of it, reached as a framework reaches them.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The bundle's start and end against each other and against requests that come in all the time. Who
 // destroys the activator while its start-up still runs is not guarded against; all else is.
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "tests/serialization/activator/watched_messaging.h"
 
 #include <map>

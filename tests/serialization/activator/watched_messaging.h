@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The message service as the bundle gets it in a test: clients of an in-process bus whose
 // subscriptions are written down, and fail or take their time where a test says so.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The real bundle behind a NATS server, asked by a plain client of libnats.
 
 #include <gmock/gmock.h>

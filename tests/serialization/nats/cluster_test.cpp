@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A cluster of three servers with three workers behind it, all of which are killed again and again
 // while clients ask, and ask again when no answer comes.
 

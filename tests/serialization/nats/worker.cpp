@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A worker of NATS servers: the real bundle on the NATS bus, and nothing else.
 //
 //     nats_worker BUNDLE URL...

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Documents that others change, move and delete while they are read.
 
 #include <fcntl.h>

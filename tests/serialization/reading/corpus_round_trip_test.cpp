@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Texts in many languages and all their usual charsets, read as documents and written back.
 
 #include <gtest/gtest.h>
@@ -9,7 +10,7 @@
 
 #include "platform/i18n/codecvt.h"
 #include "serialization/serialization.h"
-#include "tests/platform/i18n/corpus.h"
+#include "tests/platform/i18n/detection/corpus.h"
 #include "tests/support/temporary_directory.h"
 
 namespace EditorServices {

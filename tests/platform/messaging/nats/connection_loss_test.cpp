@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Servers that go away, come back, turn the bus away, and are not there yet.
 
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How a worker leaves: it finishes what it took, and nothing new comes to it.
 
 #include <gmock/gmock.h>
@@ -17,8 +18,8 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/file_descriptor.h"
 #include "platform/messaging/nats/client_backlog.h"
+#include "platform/posix/file_descriptor.h"
 #include "tests/platform/messaging/nats/bus_at_server.h"
 
 namespace platform::messaging {

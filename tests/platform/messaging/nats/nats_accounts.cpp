@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A key is an Ed25519 key, written in base32 as its kind, its 32 bytes and their CRC-16. A text is
 // a JWT that such a key signs.
 #include "tests/platform/messaging/nats/nats_accounts.h"

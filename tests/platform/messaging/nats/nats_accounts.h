@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The signed texts by which NATS servers know operators, accounts and users, made for a test.
 #pragma once
 

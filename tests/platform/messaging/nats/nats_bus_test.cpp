@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The NATS bus in quiet times: what the bundle relies on of any bus, over a real server.
 
 #include "platform/messaging/nats/nats_bus.h"

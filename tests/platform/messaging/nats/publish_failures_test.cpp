@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Messages that cannot be published: the future says so, the log too, and the connection stands.
 
 #include <gmock/gmock.h>

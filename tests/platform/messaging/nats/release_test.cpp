@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Nothing is left of subscriptions and buses that are gone.
 
 #include <gtest/gtest.h>

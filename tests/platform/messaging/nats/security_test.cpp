@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Who the bus says that it is, and which servers it trusts.
 
 #include <gmock/gmock.h>

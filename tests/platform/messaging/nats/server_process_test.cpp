@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The servers of these tests do not outlive a test that is killed.
 
 #include <gtest/gtest.h>

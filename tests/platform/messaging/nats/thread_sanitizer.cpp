@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the thread sanitizer shall not report in the tests that this file is linked into.
 //
 // libnats 3.4 reads from a TLS connection on one thread while it writes on another, without a lock

@@ -1,0 +1,287 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "host/commands/serve_command.h"
+
+#include <dlfcn.h>
+#include <spdlog/spdlog.h>
+
+#include <algorithm>
+#include <chrono>
+#include <cstdlib>
+#include <fstream>
+#include <future>
+#include <memory>
+#include <optional>
+#include <stdexcept>
+#include <thread>
+#include <utility>
+
+#include "framework/bundle_runner.h"
+#include "futures/future.h"
+#include "host/bus/bundle_location.h"
+#include "host/bus/unsent_answers.h"
+#include "host/commands/exit_status.h"
+#include "host/commands/standard_streams.h"
+#include "host/commands/stop_signals.h"
+#include "host/limits/confinement.h"
+#include "host/server/private_folder.h"
+#include "platform/messaging/channels.h"
+#include "platform/messaging/nats/nats_bus.h"
+#include "platform/messaging/transport.h"
+
+namespace host {
+
+namespace {
+
+using platform::messaging::NatsBus;
+using platform::messaging::NatsOptions;
+
+// Has nothing make clients of a bus any more, and so keep it, from the end of its life on.
+class TransportEnd {
+public:
+    TransportEnd() = default;
+    TransportEnd(const TransportEnd&) = delete;
+    TransportEnd& operator=(const TransportEnd&) = delete;
+    ~TransportEnd() { platform::messaging::setTransport({}); }
+};
+
+// The name under which the host is known to the servers.
+constexpr const char* clientName = "serialization_host";
+
+// How long the servers may be out of reach when the host starts.
+constexpr std::chrono::seconds longestConnect{5};
+
+// How long the requests that were taken may need when the host ends.
+constexpr std::chrono::seconds longestDrain{60};
+
+// The first line of `file`, which holds a secret.
+std::string secretIn(const std::filesystem::path& file) {
+    std::ifstream input(file);
+    std::string secret;
+    if (!std::getline(input, secret) || secret.empty()) {
+        throw std::runtime_error("cannot read a token or password from " + file.string());
+    }
+    if (secret.back() == '\r') {
+        secret.pop_back();
+    }
+    return secret;
+}
+
+NatsOptions connectionTo(const OtherServers& servers) {
+    NatsOptions options;
+    options.servers = servers.urls;
+    options.credentialsFile = servers.credentialsFile.string();
+    options.user = servers.user;
+    if (!servers.tokenFile.empty()) {
+        options.token = secretIn(servers.tokenFile);
+    }
+    if (!servers.passwordFile.empty()) {
+        options.password = secretIn(servers.passwordFile);
+    }
+    options.tls.caFile = servers.caFile.string();
+    options.tls.certificateFile = servers.certificateFile.string();
+    options.tls.keyFile = servers.keyFile.string();
+    options.tls.enabled = !servers.caFile.empty() || !servers.certificateFile.empty();
+    options.queueGroup = servers.group;
+    options.queueChannels = {platform::messaging::readRequestChannel,
+                             platform::messaging::writeRequestChannel};
+    return options;
+}
+
+std::shared_ptr<NatsBus> makeBus(NatsOptions options) {
+    options.connectTimeout = longestConnect;
+    // Counting them takes files that the threads which ask may not be allowed to open.
+    options.concurrency = std::max(2U, std::thread::hardware_concurrency());
+    // A large document shall not hold up the small ones behind it.
+    options.concurrentChannels = {platform::messaging::readRequestChannel};
+    return NatsBus::create(std::move(options));
+}
+
+// What each kind of thread may open.
+struct Confinements {
+    Confinement documents;
+    Confinement network;
+    Confinement web;
+};
+
+// What is needed to find servers by name, to trust them, and to tell them who the host is; again
+// each time that a connection is made.
+std::vector<std::filesystem::path> filesOf(const OtherServers& servers) {
+    if (servers.urls.empty()) {
+        return {};
+    }
+    std::vector<std::filesystem::path> files{"/etc", "/usr", "/lib", "/lib64", "/run"};
+    for (const std::filesystem::path& file :
+         {servers.credentialsFile, servers.caFile, servers.certificateFile, servers.keyFile}) {
+        if (!file.empty()) {
+            // By its folder, for who replaces such a file does so by renaming another.
+            files.push_back(std::filesystem::absolute(file).parent_path());
+        }
+    }
+    std::erase_if(files, [](const auto& file) { return !std::filesystem::exists(file); });
+    return files;
+}
+
+std::optional<Confinements> confinementsOf(const ServeOptions& options,
+                                           const std::filesystem::path& webFolder) {
+    if (options.roots.empty() || !options.isConfined) {
+        spdlog::warn("clients can read and write whatever the user of this program can; {}",
+                     options.roots.empty() ? "--root DIR keeps them to a folder"
+                                           : "--root has no effect with --no-confinement");
+        return std::nullopt;
+    }
+    if (const std::optional<std::string> reason = whyConfinementIsUnavailable()) {
+        throw std::runtime_error("cannot keep to the folders of --root: " + *reason +
+                                 "; --no-confinement goes without");
+    }
+    return Confinements{
+        Confinement({options.roots, {options.bundle}}),
+        Confinement({{}, filesOf(options.otherServers)}),
+        Confinement({{},
+                     webFolder.empty() ? std::vector<std::filesystem::path>{}
+                                       : std::vector<std::filesystem::path>{webFolder}})};
+}
+
+// Keeps a library loaded, so that it can be loaded again by who cannot open all of its files.
+class LoadedLibrary {
+public:
+    // Whether that fails is found, and told, by who loads it again.
+    explicit LoadedLibrary(const std::filesystem::path& file)
+        : handle_(::dlopen(file.c_str(), RTLD_NOW | RTLD_LOCAL)) {}
+    LoadedLibrary(const LoadedLibrary&) = delete;
+    LoadedLibrary& operator=(const LoadedLibrary&) = delete;
+    ~LoadedLibrary() {
+        if (handle_ != nullptr) {
+            ::dlclose(handle_);
+        }
+    }
+
+private:
+    void* handle_;
+};
+
+bool isReady(const std::shared_future<void>& future) {
+    return future.wait_for(std::chrono::seconds::zero()) == std::future_status::ready;
+}
+
+// Connects `bus` on a thread of its own, from which the threads of the connection come. Gives up
+// when `stop` becomes ready; returns false then.
+bool connect(NatsBus& bus, const Confinement* confinement, const std::shared_future<void>& stop) {
+    std::future<void> connected = std::async(std::launch::async, [&] {
+        if (confinement != nullptr) {
+            confinement->confineThisThread();
+        }
+        bus.connect(clientName).get();
+    });
+    while (connected.wait_for(std::chrono::milliseconds(10)) == std::future_status::timeout) {
+        if (isReady(stop)) {
+            bus.drain(std::chrono::milliseconds::zero());
+            return false;
+        }
+    }
+    connected.get();
+    return true;
+}
+
+// The page's address, with what the page needs to connect in the fragment, which browsers keep to
+// themselves.
+std::string pageUrl(const WebServer& web, const NatsServer* server) {
+    std::string url = web.origin() + "/";
+    if (server != nullptr) {
+        const Login& editor = server->users().editor;
+        url += "#server=ws://" + server->webSocketAddress() + "&user=" + editor.user +
+               "&password=" + editor.password;
+    }
+    return url;
+}
+
+void tellHowToConnect(const WebServer* web, const NatsServer* server, int output) {
+    std::string lines;
+    if (web != nullptr) {
+        lines += "page: " + pageUrl(*web, server) + "\n";
+    }
+    if (server != nullptr) {
+        const Login& editor = server->users().editor;
+        const std::string login = editor.user + ":" + editor.password + "@";
+        lines += "nats: nats://" + login + server->address() + "\n";
+        lines += "websocket: ws://" + login + server->webSocketAddress() + "\n";
+    }
+    writeAll(output, {lines});
+}
+
+std::filesystem::path webFolderOf(const WebOptions& options) {
+    if (!options.isServed) {
+        return {};
+    }
+    return options.folder.empty() ? findWebFolder() : options.folder;
+}
+
+std::unique_ptr<NatsServer> startOwnServer(const ServeOptions& options, const WebServer* web,
+                                           const PrivateFolder& folder) {
+    NatsServerOptions own = options.ownServer;
+    if (web != nullptr) {
+        own.allowedOrigins.push_back(web->origin());
+    }
+    return std::make_unique<NatsServer>(std::move(own), folder);
+}
+
+}  // namespace
+
+int runServe(const ServeOptions& options, int output) {
+    blockStopSignals();
+    std::optional<PrivateFolder> folder;
+    if (options.otherServers.urls.empty()) {
+        folder.emplace();
+    }
+    const StopSignals signals([&folder] {
+        if (folder) {
+            folder->remove();
+        }
+    });
+
+    const std::filesystem::path webFolder = webFolderOf(options.web);
+    const std::optional<Confinements> confinements = confinementsOf(options, webFolder);
+    // The web page's origin is part of the server's configuration.
+    const std::unique_ptr<WebServer> web =
+        webFolder.empty() ? nullptr : std::make_unique<WebServer>(webFolder, options.web.address);
+    std::unique_ptr<NatsServer> server =
+        folder ? startOwnServer(options, web.get(), *folder) : nullptr;
+    const std::shared_ptr<NatsBus> bus =
+        makeBus(server ? server->workerConnection() : connectionTo(options.otherServers));
+    if (!connect(*bus, confinements ? &confinements->network : nullptr, signals.first())) {
+        return exitDone;
+    }
+    if (web) {
+        web->start([&] {
+            if (confinements) {
+                confinements->web.confineThisThread();
+            }
+        });
+    }
+
+    const LoadedLibrary library(options.bundle);
+    if (confinements) {
+        // The threads that handle requests come from this one.
+        confinements->documents.confineThisThread();
+    }
+    platform::messaging::setTransport(
+        [bus](const std::string& name, const platform::messaging::MessageServiceOptions&) {
+            // The bus is connected, so that this is no waiting.
+            futures::Promise<std::shared_ptr<platform::messaging::MessageService>> client;
+            client.setValue(tellingWhatIsNotSent(bus->connect(name).get()));
+            return client.getFuture();
+        });
+    const TransportEnd transportEnd;
+    const framework::BundleRunner bundle(options.bundle);
+    tellHowToConnect(web.get(), server.get(), output);
+    signals.first().wait();
+    if (!bus->drain(longestDrain)) {
+        spdlog::error("requests that were taken have not been done after {} s and are given up",
+                      longestDrain.count());
+        server.reset();
+        spdlog::default_logger()->flush();
+        std::_Exit(exitRequestFailed);  // The bundle's end would wait for them.
+    }
+    return exitDone;
+}
+
+}  // namespace host

@@ -1,0 +1,58 @@
+// SPDX-License-Identifier: Apache-2.0
+// The command `serve`: carries the bundle's messages over NATS.
+#pragma once
+
+#include <filesystem>
+#include <string>
+#include <vector>
+
+#include "host/server/nats_server.h"
+#include "host/web/web_server.h"
+
+namespace host {
+
+/// Message servers that run elsewhere, and how the host identifies itself to them.
+struct OtherServers {
+    std::vector<std::string> urls;  ///< Empty: the host runs a server of its own.
+    std::filesystem::path credentialsFile;
+    std::filesystem::path tokenFile;
+    std::string user;
+    std::filesystem::path passwordFile;
+    std::filesystem::path caFile;
+    std::filesystem::path certificateFile;
+    std::filesystem::path keyFile;
+
+    /// The workers of a group share the requests: each goes to one of them.
+    std::string group{"serialization"};
+};
+
+struct WebOptions {
+    bool isServed = true;
+    std::filesystem::path folder;  ///< Empty: the one that belongs to the program.
+    ListenAddress address{"127.0.0.1", 8080};
+};
+
+struct ServeOptions {
+    std::filesystem::path bundle;
+    NatsServerOptions ownServer;
+    OtherServers otherServers;
+    WebOptions web;
+
+    /// The folders below which clients may have files read and written; empty: everywhere.
+    std::vector<std::filesystem::path> roots;
+
+    /// Whether the kernel keeps the host to these folders. Without, they have no effect.
+    bool isConfined = true;
+};
+
+/// Serves the bundle's clients until the process is asked to end (StopSignals), and finishes then
+/// what was taken. Writes to `output`, a line each, how clients connect: "page: ", "nats: " and
+/// "websocket: " with the URL, password included, as far as they are the host's own. To be called
+/// while the process has no other threads. Returns the exit status. Throws std::runtime_error when
+/// the servers or the bundle cannot be started, or the kernel cannot confine.
+///
+/// With roots, each thread is confined to what it needs: the one that starts the bundle, and the
+/// threads of the bundle with it, to the roots, for good.
+int runServe(const ServeOptions& options, int output);
+
+}  // namespace host

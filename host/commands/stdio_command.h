@@ -1,0 +1,21 @@
+// SPDX-License-Identifier: Apache-2.0
+// The command `stdio`: the message bus on standard input and output.
+#pragma once
+
+#include <cstddef>
+#include <filesystem>
+
+namespace host {
+
+struct StdioOptions {
+    std::filesystem::path bundle;
+    std::size_t largestMessage = std::size_t{1} << 30;  ///< Of the input, in bytes.
+};
+
+/// Sends the messages that come framed on `input` to the bundle, and writes every message that the
+/// bundle publishes framed to `output`. At the end of the input, and also when the input is framed
+/// wrongly or the output cannot be written any more, it finishes what was taken before it returns
+/// the exit status. Throws std::runtime_error when the bundle cannot be started.
+int runStdio(const StdioOptions& options, int input, int output);
+
+}  // namespace host

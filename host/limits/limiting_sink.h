@@ -1,0 +1,53 @@
+// SPDX-License-Identifier: Apache-2.0
+// Keeps a log from growing without bound, since clients can have a line logged for each message.
+#pragma once
+
+#include <spdlog/sinks/base_sink.h>
+
+#include <chrono>
+#include <cstddef>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <utility>
+
+namespace host {
+
+/// Passes log lines on to another sink, but of those of one logger and one level no more than so
+/// many in a period of time; the lines beyond are left out and counted. Their number is logged, as
+/// one more line of that logger and level, with the first line of any kind after the period, or by
+/// a flush. So a flood of one kind hides no line of another.
+///
+/// A period begins with the first line after the one before. Time is that of the lines.
+class LimitingSink final : public spdlog::sinks::base_sink<std::mutex> {
+public:
+    /// At most `lines` in `period` go to `next`.
+    LimitingSink(std::shared_ptr<spdlog::sinks::sink> next, std::size_t lines,
+                 std::chrono::milliseconds period);
+
+private:
+    using TimePoint = spdlog::log_clock::time_point;
+    using Kind = std::pair<std::string, spdlog::level::level_enum>;
+
+    struct Period {
+        TimePoint start;
+        std::size_t passed = 0;
+        std::size_t leftOut = 0;
+    };
+
+    void sink_it_(const spdlog::details::log_msg& line) override;
+    void flush_() override;
+    void set_pattern_(const std::string& pattern) override;
+    void set_formatter_(std::unique_ptr<spdlog::formatter> formatter) override;
+
+    void endPeriods(TimePoint now);
+    void tell(const Kind& kind, std::size_t leftOut);
+
+    const std::shared_ptr<spdlog::sinks::sink> next_;
+    const std::size_t lines_;
+    const std::chrono::milliseconds length_;
+    std::map<Kind, Period> periods_;  // those that have not ended; as few as loggers have levels
+};
+
+}  // namespace host

@@ -1,0 +1,112 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "host/server/child_process.h"
+
+#include <fcntl.h>
+#include <signal.h>
+#include <sys/prctl.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <system_error>
+#include <utility>
+
+namespace host {
+
+namespace {
+
+struct Pipe {
+    platform::FileDescriptor read;
+    platform::FileDescriptor write;
+};
+
+Pipe makePipe() {
+    int ends[2];
+    if (::pipe2(ends, O_CLOEXEC) != 0) {
+        throw std::system_error(errno, std::generic_category(), "cannot make a pipe");
+    }
+    return {platform::FileDescriptor(ends[0]), platform::FileDescriptor(ends[1])};
+}
+
+// What the new process does before it becomes the program. Other threads of the host may have held
+// locks when it was forked off, so it keeps to system calls.
+[[noreturn]] void becomeProgram(const char* program, char* const* arguments, int output,
+                                int failure, pid_t host) {
+    ::setpgid(0, 0);
+    ::prctl(PR_SET_PDEATHSIG, SIGKILL);
+    // The host may have ended before it was asked to take the program with it.
+    bool isReady = ::getppid() == host;
+    // The signals that the host blocks or ignores are the program's to handle.
+    sigset_t none;
+    ::sigemptyset(&none);
+    ::sigprocmask(SIG_SETMASK, &none, nullptr);
+    ::signal(SIGPIPE, SIG_DFL);
+    ::signal(SIGXFSZ, SIG_DFL);
+    // Some libraries open files that would be the program's too.
+    isReady = isReady && ::close_range(3, ~0U, CLOSE_RANGE_CLOEXEC) == 0 &&
+              ::dup2(output, STDOUT_FILENO) >= 0 && ::dup2(output, STDERR_FILENO) >= 0;
+    if (isReady) {
+        ::execv(program, arguments);
+    }
+    const int error = errno;
+    // Nothing can be done about a failure to tell of the failure.
+    [[maybe_unused]] const ssize_t told = ::write(failure, &error, sizeof error);
+    ::_exit(127);
+}
+
+}  // namespace
+
+ChildProcess::ChildProcess(const std::filesystem::path& program,
+                           const std::vector<std::string>& arguments) {
+    Pipe output = makePipe();
+    Pipe failure = makePipe();
+    std::vector<char*> pointers{const_cast<char*>(program.c_str())};
+    for (const std::string& argument : arguments) {
+        pointers.push_back(const_cast<char*>(argument.c_str()));
+    }
+    pointers.push_back(nullptr);
+    const pid_t host = ::getpid();
+    id_ = ::fork();
+    if (id_ == 0) {
+        becomeProgram(program.c_str(), pointers.data(), output.write.get(), failure.write.get(),
+                      host);
+    }
+    if (id_ < 0) {
+        throw std::system_error(errno, std::generic_category(), "cannot start a process");
+    }
+    failure.write = {};
+    int error = 0;
+    ssize_t count = 0;
+    do {
+        count = ::read(failure.read.get(), &error, sizeof error);
+    } while (count < 0 && errno == EINTR);
+    if (count == sizeof error) {
+        collect();
+        throw std::system_error(error, std::generic_category(), program.string());
+    }
+    output_ = std::move(output.read);
+}
+
+ChildProcess::~ChildProcess() {
+    if (id_ >= 0) {
+        send(SIGKILL);
+        collect();
+    }
+}
+
+void ChildProcess::send(int signal) const noexcept {
+    if (id_ >= 0) {
+        ::kill(id_, signal);
+    }
+}
+
+std::string ChildProcess::collect() {
+    int status = 0;
+    while (::waitpid(id_, &status, 0) < 0 && errno == EINTR) {
+    }
+    id_ = -1;
+    return WIFSIGNALED(status) ? "signal " + std::to_string(WTERMSIG(status))
+                               : "exit status " + std::to_string(WEXITSTATUS(status));
+}
+
+}  // namespace host

@@ -1,0 +1,44 @@
+// SPDX-License-Identifier: Apache-2.0
+// A program that the host runs beside itself.
+#pragma once
+
+#include <sys/types.h>
+
+#include <filesystem>
+#include <string>
+#include <vector>
+
+#include "platform/posix/file_descriptor.h"
+
+namespace host {
+
+/// A running program. It is killed when this object ends its life, and also when the thread that
+/// started it ends, in whatever way: with the host, the program goes too.
+class ChildProcess {
+public:
+    /// Starts `program`, with `arguments` and without any other of the host's files than its
+    /// output. It is in a process group of its own, so that an interrupt from the keyboard is for
+    /// the host alone. Throws std::system_error when the program cannot be run.
+    ChildProcess(const std::filesystem::path& program, const std::vector<std::string>& arguments);
+
+    ChildProcess(const ChildProcess&) = delete;
+    ChildProcess& operator=(const ChildProcess&) = delete;
+    ~ChildProcess();
+
+    pid_t id() const noexcept { return id_; }
+
+    /// Where to read what the program writes to its standard output and standard error.
+    int output() const noexcept { return output_.get(); }
+
+    /// Sends the program `signal`, unless it has been collected.
+    void send(int signal) const noexcept;
+
+    /// Waits until the program has ended and tells how, as "exit status 1" or "signal 9".
+    std::string collect();
+
+private:
+    platform::FileDescriptor output_;
+    pid_t id_ = -1;
+};
+
+}  // namespace host

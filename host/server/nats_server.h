@@ -1,0 +1,75 @@
+// SPDX-License-Identifier: Apache-2.0
+// The nats-server that the host runs for itself, so that browsers and other programs of this
+// machine can be the bundle's clients without anything to set up.
+//
+// One thread looks after it: it starts the server, reads what it says, and starts it again when it
+// ends, with the same ports and passwords. The thread needs files that the rest of the host may be
+// kept from, so a NatsServer is to be made before any confinement.
+#pragma once
+
+#include <cstdint>
+#include <filesystem>
+#include <functional>
+#include <future>
+#include <optional>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "host/server/nats_configuration.h"
+#include "host/server/private_folder.h"
+#include "platform/messaging/nats/nats_bus.h"
+#include "platform/posix/file_descriptor.h"
+
+namespace host {
+
+struct NatsServerOptions {
+    std::filesystem::path program;  ///< Empty: nats-server, where programs are.
+    std::uint16_t port = 0;         ///< On the loopback address; 0: any free one.
+    std::uint16_t webSocketPort = 0;
+    std::vector<std::string> allowedOrigins;  ///< As in NatsConfiguration.
+};
+
+/// A supervised nats-server. It is stopped at the end of this object's life, when its clients have
+/// taken what it holds for them or some seconds are over, and dies with the host however that ends.
+class NatsServer {
+public:
+    /// Starts the server, with its files in `folder`, and waits until it takes connections. Throws
+    /// std::runtime_error when there is no such program, naming the package that has it, and when
+    /// it does not start, with what it says. The folder is removed when the server has ended.
+    NatsServer(NatsServerOptions options, const PrivateFolder& folder);
+
+    NatsServer(const NatsServer&) = delete;
+    NatsServer& operator=(const NatsServer&) = delete;
+    ~NatsServer();
+
+    /// "127.0.0.1:4222": where clients connect.
+    std::string address() const { return "127.0.0.1:" + std::to_string(configuration_.port); }
+
+    /// The same for clients that speak WebSocket.
+    std::string webSocketAddress() const {
+        return "127.0.0.1:" + std::to_string(configuration_.webSocketPort);
+    }
+
+    const NatsUsers& users() const noexcept { return configuration_.users; }
+
+    /// How the host itself connects.
+    platform::messaging::NatsOptions workerConnection() const;
+
+private:
+    class Life;
+
+    void supervise(std::promise<void> ready);
+    std::optional<std::string> live(const std::function<void()>& whenReady);
+    void waitForClients() const;
+    void removePortsFiles() const;
+    bool findPorts();
+
+    std::filesystem::path program_;
+    const PrivateFolder& folder_;
+    NatsConfiguration configuration_;  // The ports change until the server is first ready.
+    platform::FileDescriptor stop_;    // Becomes readable when the server is to be stopped.
+    std::thread supervisor_;
+};
+
+}  // namespace host

@@ -1,0 +1,35 @@
+// SPDX-License-Identifier: Apache-2.0
+// The files of a folder, as a web server gives them out.
+#pragma once
+
+#include <filesystem>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/posix/file_descriptor.h"
+
+namespace host {
+
+/// A folder whose files are given out by the paths of URLs. Nothing outside of it is, whatever the
+/// path, and nothing that is reached through a symbolic link or whose name begins with a dot.
+class WebFolder {
+public:
+    struct File {
+        std::string content;
+        std::string type;  ///< Its media type, by the ending of its name.
+    };
+
+    /// Opens `folder`. Throws std::runtime_error naming it when there is none.
+    explicit WebFolder(const std::filesystem::path& folder);
+
+    /// The file at `path`, the decoded path of a URL, which begins with a slash; for one that ends
+    /// with a slash, the file index.html in that folder. Nothing when there is no such file, or it
+    /// is too large to be part of a web page.
+    std::optional<File> read(std::string_view path) const;
+
+private:
+    platform::FileDescriptor folder_;
+};
+
+}  // namespace host

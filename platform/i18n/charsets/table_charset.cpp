@@ -1,0 +1,155 @@
+// SPDX-License-Identifier: Apache-2.0
+// Charsets of single bytes that ICU lacks.
+#include "platform/i18n/charsets/table_charset.h"
+
+#include <unicode/ucnv.h>
+#include <unicode/utf16.h>
+
+#include <algorithm>
+#include <array>
+#include <cstddef>
+#include <utility>
+
+#include "platform/i18n/charsets/charset_names.h"
+#include "platform/i18n/charsets/conversion_error.h"
+
+namespace platform::i18n::detail {
+
+namespace {
+
+// What a charset makes of each byte.
+using Table = std::array<char16_t, 256>;
+
+// ASCII and what follows it up to byte `from`, then `upper`.
+constexpr Table tableOf(std::u16string_view upper, std::size_t from) {
+    Table table{};
+    for (std::size_t i = 0; i < table.size(); ++i) {
+        table[i] = i < from ? static_cast<char16_t>(i) : upper[i - from];
+    }
+    return table;
+}
+
+// Romanian and its neighbours; the bytes from A0.
+constexpr Table iso8859_16 = tableOf(
+    u"\u00A0\u0104\u0105\u0141\u20AC\u201E\u0160\u00A7\u0161\u00A9\u0218\u00AB"
+    u"\u0179\u00AD\u017A\u017B\u00B0\u00B1\u010C\u0142\u017D\u201D\u00B6\u00B7"
+    u"\u017E\u010D\u0219\u00BB\u0152\u0153\u0178\u017C\u00C0\u00C1\u00C2\u0102"
+    u"\u00C4\u0106\u00C6\u00C7\u00C8\u00C9\u00CA\u00CB\u00CC\u00CD\u00CE\u00CF"
+    u"\u0110\u0143\u00D2\u00D3\u00D4\u0150\u00D6\u015A\u0170\u00D9\u00DA\u00DB"
+    u"\u00DC\u0118\u021A\u00DF\u00E0\u00E1\u00E2\u0103\u00E4\u0107\u00E6\u00E7"
+    u"\u00E8\u00E9\u00EA\u00EB\u00EC\u00ED\u00EE\u00EF\u0111\u0144\u00F2\u00F3"
+    u"\u00F4\u0151\u00F6\u015B\u0171\u00F9\u00FA\u00FB\u00FC\u0119\u021B\u00FF",
+    0xA0);
+
+// Vietnamese (RFC 1456); the bytes from 80. Six rare capitals stand among the control codes.
+constexpr Table viscii = [] {
+    Table table = tableOf(
+        u"\u1EA0\u1EAE\u1EB0\u1EB6\u1EA4\u1EA6\u1EA8\u1EAC\u1EBC\u1EB8\u1EBE\u1EC0"
+        u"\u1EC2\u1EC4\u1EC6\u1ED0\u1ED2\u1ED4\u1ED6\u1ED8\u1EE2\u1EDA\u1EDC\u1EDE"
+        u"\u1ECA\u1ECE\u1ECC\u1EC8\u1EE6\u0168\u1EE4\u1EF2\u00D5\u1EAF\u1EB1\u1EB7"
+        u"\u1EA5\u1EA7\u1EA9\u1EAD\u1EBD\u1EB9\u1EBF\u1EC1\u1EC3\u1EC5\u1EC7\u1ED1"
+        u"\u1ED3\u1ED5\u1ED7\u1EE0\u01A0\u1ED9\u1EDD\u1EDF\u1ECB\u1EF0\u1EE8\u1EEA"
+        u"\u1EEC\u01A1\u1EDB\u01AF\u00C0\u00C1\u00C2\u00C3\u1EA2\u0102\u1EB3\u1EB5"
+        u"\u00C8\u00C9\u00CA\u1EBA\u00CC\u00CD\u0128\u1EF3\u0110\u1EE9\u00D2\u00D3"
+        u"\u00D4\u1EA1\u1EF7\u1EEB\u1EED\u00D9\u00DA\u1EF9\u1EF5\u00DD\u1EE1\u01B0"
+        u"\u00E0\u00E1\u00E2\u00E3\u1EA3\u0103\u1EEF\u1EAB\u00E8\u00E9\u00EA\u1EBB"
+        u"\u00EC\u00ED\u0129\u1EC9\u0111\u1EF1\u00F2\u00F3\u00F4\u00F5\u1ECF\u1ECD"
+        u"\u1EE5\u00F9\u00FA\u0169\u1EE7\u00FD\u1EE3\u1EEE",
+        0x80);
+    table[0x02] = u'\u1EB2';
+    table[0x05] = u'\u1EB4';
+    table[0x06] = u'\u1EAA';
+    table[0x14] = u'\u1EF6';
+    table[0x19] = u'\u1EF8';
+    table[0x1E] = u'\u1EF4';
+    return table;
+}();
+
+class TableCharset final : public Charset {
+public:
+    TableCharset(std::string name, const Table& table, bool strict)
+        : name_(std::move(name)), table_(table), strict_(strict) {}
+
+    std::u16string decode(std::string_view bytes) override {
+        std::u16string text(bytes.size(), u'\0');
+        std::transform(bytes.begin(), bytes.end(), text.begin(),
+                       [this](char byte) { return table_[static_cast<unsigned char>(byte)]; });
+        return text;
+    }
+
+    std::string encode(std::u16string_view text) override {
+        std::string bytes;
+        bytes.reserve(text.size());
+        for (std::size_t i = 0; i < text.size(); ++i) {
+            bytes += encodeOne(text, i);
+        }
+        return bytes;
+    }
+
+private:
+    // The byte for the character at `position`, which moves to its last code unit.
+    char encodeOne(std::u16string_view text, std::size_t& position) const {
+        const char16_t unit = text[position];
+        if (unit < table_.size() && table_[unit] == unit) {
+            return static_cast<char>(unit);
+        }
+        const auto found = std::find(table_.begin(), table_.end(), unit);
+        if (found != table_.end()) {
+            return static_cast<char>(found - table_.begin());
+        }
+        if (strict_) {
+            failEncoding(text, position);
+        }
+        if (isPair(text, position)) {
+            ++position;
+        }
+        return '?';
+    }
+
+    [[noreturn]] void failEncoding(std::u16string_view text, std::size_t position) const {
+        const char16_t unit = text[position];
+        if (isPair(text, position)) {
+            throwUnmappable(name_,
+                            static_cast<char32_t>(U16_GET_SUPPLEMENTARY(unit, text[position + 1])),
+                            position);
+        }
+        if (U16_IS_SURROGATE(unit)) {
+            throwUnpairedSurrogate(name_, position);
+        }
+        throwUnmappable(name_, unit, position);
+    }
+
+    static bool isPair(std::u16string_view text, std::size_t position) {
+        return U16_IS_LEAD(text[position]) && position + 1 < text.size() &&
+               U16_IS_TRAIL(text[position + 1]);
+    }
+
+    std::string name_;
+    const Table& table_;
+    bool strict_;
+};
+
+}  // namespace
+
+std::unique_ptr<Charset> makeTableCharset(std::string_view name, bool strict) {
+    struct Known {
+        const char* name;
+        const Table& table;
+    };
+    constexpr std::array<Known, 4> known{{{"ISO-8859-16", iso8859_16},
+                                          {"latin10", iso8859_16},
+                                          {"VISCII", viscii},
+                                          {"csVISCII", viscii}}};
+    if (!isPlausibleName(name)) {
+        return nullptr;
+    }
+    const std::string wanted(name);
+    for (const Known& charset : known) {
+        if (ucnv_compareNames(charset.name, wanted.c_str()) == 0) {
+            return std::make_unique<TableCharset>(wanted, charset.table, strict);
+        }
+    }
+    return nullptr;
+}
+
+}  // namespace platform::i18n::detail

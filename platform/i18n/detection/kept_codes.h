@@ -1,0 +1,38 @@
+// SPDX-License-Identifier: Apache-2.0
+// Which codes of a charset come back as they are when they are decoded and encoded again.
+#pragma once
+
+#include <array>
+#include <atomic>
+#include <cstdint>
+#include <string_view>
+
+#include "platform/i18n/charsets/charset.h"
+
+namespace platform::i18n::detail {
+
+/// The codes of one charset in which every character is one or two bytes whose meaning does not
+/// depend on what is around them; longer codes are never found to be kept. The table starts empty
+/// and learns each code from the charset when it first turns up. May be used by several threads.
+class KeptCodes {
+public:
+    /// Whether each code in `bytes` is kept. `charset`, opened strict, is asked about those that
+    /// have not turned up before.
+    bool holdAll(std::string_view bytes, Charset& charset);
+
+private:
+    enum Kind : std::uint8_t {
+        unknown,
+        kept,
+        notKept,
+        lead,  // a byte that begins codes of two
+    };
+
+    Kind kindOfByte(std::uint8_t byte, Charset& charset);
+    Kind kindOfPair(std::uint8_t first, std::uint8_t second, Charset& charset);
+
+    std::array<std::atomic<Kind>, 0x100> bytes_{};
+    std::array<std::atomic<Kind>, 0x10000> pairs_{};
+};
+
+}  // namespace platform::i18n::detail

@@ -1,0 +1,124 @@
+// SPDX-License-Identifier: Apache-2.0
+// A part of a file from which its charset can be told.
+//
+// Pieces from all over the file show its language. Then come the words around byte values that
+// these pieces lack: often two charsets differ in a single letter, and that letter may occur once.
+#include "platform/i18n/detection/sample.h"
+
+#include <algorithm>
+#include <array>
+
+namespace platform::i18n::detail {
+
+namespace {
+
+constexpr std::size_t wholeFileLimit = std::size_t{24} * 1024;
+constexpr std::size_t pieceCount = 16;
+constexpr std::size_t pieceSize = 1024;
+constexpr std::size_t boundarySearch = std::size_t{16} * 1024;
+constexpr std::size_t wordSearch = 64;
+constexpr int wantedOccurrences = 2;
+
+bool isBeyondAscii(char byte) {
+    return static_cast<unsigned char>(byte) >= 0x80;
+}
+
+// Bytes below '0' are in no charset a part of a character of several bytes.
+bool isBoundary(char byte) {
+    return static_cast<unsigned char>(byte) < 0x30;
+}
+
+std::size_t findBeyondAscii(std::string_view bytes, std::size_t from) {
+    const auto found =
+        std::find_if(bytes.begin() + static_cast<std::ptrdiff_t>(from), bytes.end(), isBeyondAscii);
+    return static_cast<std::size_t>(found - bytes.begin());
+}
+
+class Sampler {
+public:
+    explicit Sampler(std::string_view bytes) : bytes_(bytes) {}
+
+    std::string sample() {
+        for (std::size_t i = 0; i < pieceCount; ++i) {
+            const std::size_t position =
+                findBeyondAscii(bytes_, std::max(done_, bytes_.size() / pieceCount * i));
+            if (position == bytes_.size()) {
+                break;
+            }
+            take(position, position + pieceSize, boundarySearch);
+        }
+        // Not one boundary in all of it: a text without a space or an end of line.
+        if (sample_.empty()) {
+            return std::string(bytes_.substr(0, boundarySearch));
+        }
+        takeRareBytes();
+        return sample_;
+    }
+
+private:
+    void takeRareBytes() {
+        done_ = 0;
+        for (std::size_t i = 0; i < bytes_.size(); ++i) {
+            if (isRare_[static_cast<unsigned char>(bytes_[i])] && i >= done_) {
+                take(i, i + 1, wordSearch);
+            }
+        }
+    }
+
+    // Adds the bytes from `begin` to `end` and what is around them up to the boundaries, if there
+    // are any within `search` bytes.
+    void take(std::size_t begin, std::size_t end, std::size_t search) {
+        const std::size_t first = boundaryBefore(begin, search);
+        const std::size_t last = boundaryAfter(std::min(end, bytes_.size()), search);
+        if (first == std::string_view::npos || last == std::string_view::npos) {
+            return;
+        }
+        for (const char byte : bytes_.substr(first, last - first)) {
+            const auto value = static_cast<unsigned char>(byte);
+            isRare_[value] = isBeyondAscii(byte) && ++occurrences_[value] < wantedOccurrences;
+        }
+        sample_ += bytes_.substr(first, last - first);
+        sample_ += '\n';
+        done_ = last;
+    }
+
+    std::size_t boundaryBefore(std::size_t position, std::size_t search) const {
+        const std::size_t limit = std::max(done_, position - std::min(position, search));
+        for (std::size_t i = position; i > limit; --i) {
+            if (isBoundary(bytes_[i - 1])) {
+                return i;
+            }
+        }
+        return limit == done_ ? limit : std::string_view::npos;
+    }
+
+    std::size_t boundaryAfter(std::size_t position, std::size_t search) const {
+        const std::size_t limit = std::min(bytes_.size(), position + search);
+        for (std::size_t i = position; i < limit; ++i) {
+            if (isBoundary(bytes_[i])) {
+                return i;
+            }
+        }
+        return limit == bytes_.size() ? limit : std::string_view::npos;
+    }
+
+    std::string_view bytes_;
+    std::string sample_;
+    std::array<int, 256> occurrences_{};
+    // Whether the sample wants more of a byte. All those beyond ASCII are rare at first.
+    std::array<bool, 256> isRare_ = [] {
+        std::array<bool, 256> rare{};
+        std::fill(rare.begin() + 0x80, rare.end(), true);
+        return rare;
+    }();
+    // The end of the last piece taken, which is a boundary.
+    std::size_t done_ = 0;
+};
+
+}  // namespace
+
+std::string charsetSample(std::string_view bytes) {
+    return bytes.size() <= wholeFileLimit ? std::string(bytes) : Sampler(bytes).sample();
+}
+
+}  // namespace platform::i18n::detail

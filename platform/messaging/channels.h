@@ -1,0 +1,22 @@
+// SPDX-License-Identifier: Apache-2.0
+// The channels on which the bundle and its clients meet (docs/protocol.md).
+#pragma once
+
+namespace platform::messaging {
+
+/// The channel on which the bundle takes read requests.
+inline constexpr const char* readRequestChannel = "/zpr/service/readRequest_cpp";
+
+/// What precedes the "rtcId" of a read request in the channel of its response.
+inline constexpr const char* readResponsePrefix = "/zpr/service/readResponse/";
+
+/// The channel on which the bundle takes write requests.
+inline constexpr const char* writeRequestChannel = "/zpr/service/writeRequest_cpp";
+
+/// What precedes the "rtcId" of a write request in the channel of its response.
+inline constexpr const char* writeResponsePrefix = "/zpr/service/writeResponse/";
+
+/// The channel on which the bundle tells that a file may have changed.
+inline constexpr const char* notificationChannel = "/zpr/service/notifyFileSystemRequest";
+
+}  // namespace platform::messaging

@@ -1,0 +1,388 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "platform/package/zip/zip_archive.h"
+
+#include <fcntl.h>
+#include <libdeflate.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstddef>
+#include <new>
+#include <optional>
+#include <stdexcept>
+#include <string_view>
+#include <system_error>
+#include <utility>
+
+#include "platform/i18n/codecvt.h"
+#include "platform/package/about.h"
+#include "platform/package/limits.h"
+#include "platform/package/zip/little_endian.h"
+#include "platform/package/zip/zip_format.h"
+
+namespace platform::package {
+namespace {
+
+using Bytes = std::span<const std::uint8_t>;
+
+[[noreturn]] void fail(const std::string& problem) {
+    throw std::runtime_error(problem);
+}
+
+[[noreturn]] void failForEntry(const std::string& name, const std::string& problem) {
+    fail("entry " + quoted(name) + " " + problem);
+}
+
+[[noreturn]] void failForSystem(const char* what) {
+    throw std::system_error(errno, std::generic_category(), what);
+}
+
+// Looks before it opens, because opening a device can have effects, and opens without waiting, in
+// case the file has become a pipe in between.
+FileDescriptor openRegularFile(const std::string& path, std::uint64_t& size) {
+    struct stat status {};
+    if (::stat(path.c_str(), &status) != 0) {
+        failForSystem("cannot be opened");
+    }
+    FileDescriptor file;
+    if (S_ISREG(status.st_mode)) {
+        file = FileDescriptor(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+        if (!file || ::fstat(file.get(), &status) != 0) {
+            failForSystem("cannot be opened");
+        }
+    }
+    if (!S_ISREG(status.st_mode)) {
+        fail(S_ISDIR(status.st_mode) ? "is a folder" : "is not a regular file");
+    }
+    size = static_cast<std::uint64_t>(status.st_size);
+    return file;
+}
+
+bool isUtf8(std::string_view bytes) {
+    try {
+        i18n::to_ustring(bytes);
+        return true;
+    } catch (const std::runtime_error&) {
+        return false;
+    }
+}
+
+std::string_view asText(Bytes bytes) {
+    return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
+}
+
+// The content of the extra field `id`, or nothing. What does not hold together ends the search.
+std::optional<Bytes> extraField(Bytes extra, std::uint16_t id) {
+    while (extra.size() >= 4) {
+        const std::size_t length = read16(extra, 2);
+        if (length > extra.size() - 4) {
+            break;
+        }
+        if (read16(extra, 0) == id) {
+            return extra.subspan(4, length);
+        }
+        extra = extra.subspan(4 + length);
+    }
+    return std::nullopt;
+}
+
+// `name` for an error, which must be valid text.
+std::string printable(Bytes name) {
+    i18n::codecvt_string_to_ustring converter("UTF-8", false);
+    return i18n::to_string(i18n::to_ustring(asText(name), converter));
+}
+
+// Names are UTF-8 if they say so or are valid UTF-8 (many producers do not say so), otherwise code
+// page 437, unless an extra field made for this very name has its Unicode form.
+std::string decodeName(Bytes name, Bytes extra, std::uint16_t flags) {
+    constexpr std::size_t versionAndChecksum = 5;
+    if (asText(name).find('\0') != std::string_view::npos) {
+        failForEntry(printable(name), "has a zero in its name");
+    }
+    if (isUtf8(asText(name))) {
+        return std::string(asText(name));
+    }
+    if ((flags & zip::kUtf8Flag) != 0) {
+        failForEntry(printable(name), "has a name that is not valid UTF-8");
+    }
+    const std::optional<Bytes> unicode = extraField(extra, zip::kUnicodePathExtra);
+    if (unicode && unicode->size() > versionAndChecksum && (*unicode)[0] == 1 &&
+        read32(*unicode, 1) == libdeflate_crc32(0, name.data(), name.size())) {
+        const std::string_view text = asText(unicode->subspan(versionAndChecksum));
+        if (isUtf8(text)) {
+            return std::string(text);
+        }
+    }
+    i18n::codecvt_string_to_ustring converter("IBM437", true);
+    return i18n::to_string(i18n::to_ustring(asText(name), converter));
+}
+
+// Replaces the numbers of `entry` that did not fit their fields by those of the ZIP64 extra field.
+void readZip64Numbers(ZipArchive::Entry& entry, Bytes extra) {
+    const Bytes numbers = extraField(extra, zip::kZip64Extra).value_or(Bytes());
+    std::size_t at = 0;
+    for (std::uint64_t* number : {&entry.size, &entry.compressedSize, &entry.offset}) {
+        if (*number != zip::kNotIn32Bits) {
+            continue;
+        }
+        if (numbers.size() < at + 8) {
+            failForEntry(entry.name, "lacks its ZIP64 sizes");
+        }
+        *number = read64(numbers, at);
+        at += 8;
+    }
+}
+
+// Describes a file in which no archive was found by its first bytes.
+[[noreturn]] void failWithoutEndRecord(Bytes start) {
+    constexpr std::array<std::uint8_t, 8> compoundFile = {0xD0, 0xCF, 0x11, 0xE0,
+                                                          0xA1, 0xB1, 0x1A, 0xE1};
+    if (start.empty()) {
+        fail("is empty");
+    }
+    if (std::equal(compoundFile.begin(), compoundFile.end(), start.begin(), start.end())) {
+        fail("is not a zip archive but a compound file, as encrypted and old office documents are");
+    }
+    if (start.size() >= 2 && start[0] == 'P' && start[1] == 'K') {
+        fail("is a truncated zip archive: its directory is missing");
+    }
+    fail("is not a zip archive");
+}
+
+}  // namespace
+
+void ZipArchive::FreeDecompressor::operator()(
+    libdeflate_decompressor* decompressor) const noexcept {
+    libdeflate_free_decompressor(decompressor);
+}
+
+ZipArchive::ZipArchive(const std::string& path)
+    : file_(openRegularFile(path, fileSize_)), decompressor_(libdeflate_alloc_decompressor()) {
+    if (!decompressor_) {
+        throw std::bad_alloc();
+    }
+    const Directory directory = findDirectory();
+    if (directory.entryCount > limits::kMaxEntries) {
+        fail("has too many entries: " + std::to_string(directory.entryCount) + ", at most " +
+             std::to_string(limits::kMaxEntries) + " are accepted");
+    }
+    if (directory.size > limits::kMaxDirectoryBytes) {
+        fail("has a directory of " + std::to_string(directory.size) + " bytes, at most " +
+             std::to_string(limits::kMaxDirectoryBytes) + " are accepted");
+    }
+    readDirectory(directory);
+    checkLayout(directory.offset);
+    checkSizes();
+}
+
+// The end record is the last thing in the file but for its comment, in which its signature may
+// occur by chance: the last record whose directory lies before it is taken.
+ZipArchive::Directory ZipArchive::findDirectory() const {
+    constexpr std::uint64_t maxCommentSize = 0xFFFF;
+    const std::uint64_t tailSize =
+        std::min(fileSize_, zip::kZip64LocatorSize + zip::kEndSize + maxCommentSize);
+    std::vector<std::uint8_t> bytes(tailSize);
+    const std::uint64_t tailOffset = fileSize_ - tailSize;
+    readAt(tailOffset, bytes);
+
+    for (std::size_t at = bytes.size() < zip::kEndSize ? 0 : bytes.size() - zip::kEndSize + 1;
+         at-- > 0;) {
+        const Bytes tail = bytes;
+        if (read32(tail, at) != zip::kEndSignature) {
+            continue;
+        }
+        const Bytes record = tail.subspan(at, zip::kEndSize);
+        if (at >= zip::kZip64LocatorSize &&
+            read32(tail, at - zip::kZip64LocatorSize) == zip::kZip64LocatorSignature) {
+            return findZip64Directory(tailOffset + at - zip::kZip64LocatorSize);
+        }
+        const Directory directory{read16(record, 10), read32(record, 16), read32(record, 12)};
+        if (directory.offset + directory.size > tailOffset + at) {
+            continue;
+        }
+        if (read16(record, 4) != 0 || read16(record, 8) != directory.entryCount) {
+            fail("is a zip archive that is split over several files");
+        }
+        return directory;
+    }
+    std::vector<std::uint8_t> start(std::min<std::uint64_t>(fileSize_, 8));
+    readAt(0, start);
+    failWithoutEndRecord(start);
+}
+
+ZipArchive::Directory ZipArchive::findZip64Directory(std::uint64_t locatorOffset) const {
+    std::array<std::uint8_t, zip::kZip64LocatorSize> locator{};
+    readAt(locatorOffset, locator);
+    const std::uint64_t offset = read64(locator, 8);
+    if (offset > locatorOffset || locatorOffset - offset < zip::kZip64EndSize) {
+        fail("is a damaged zip archive: its ZIP64 end record is missing");
+    }
+    std::array<std::uint8_t, zip::kZip64EndSize> record{};
+    readAt(offset, record);
+    if (read32(record, 0) != zip::kZip64EndSignature) {
+        fail("is a damaged zip archive: its ZIP64 end record is missing");
+    }
+    const Directory directory{read64(record, 32), read64(record, 48), read64(record, 40)};
+    if (directory.offset > offset || directory.size > offset - directory.offset) {
+        fail("is a damaged zip archive: its directory reaches behind its end record");
+    }
+    if (read64(record, 24) != directory.entryCount) {
+        fail("is a zip archive that is split over several files");
+    }
+    return directory;
+}
+
+void ZipArchive::readDirectory(const Directory& directory) {
+    std::vector<std::uint8_t> bytes(directory.size);
+    readAt(directory.offset, bytes);
+    Bytes rest = bytes;
+    entries_.reserve(directory.entryCount);
+    for (std::uint64_t i = 0; i < directory.entryCount; ++i) {
+        if (rest.size() < zip::kDirectoryEntrySize || read32(rest, 0) != zip::kDirectorySignature) {
+            fail("is a damaged zip archive: its directory has no entry " + std::to_string(i + 1) +
+                 " of " + std::to_string(directory.entryCount));
+        }
+        const std::size_t nameSize = read16(rest, 28);
+        const std::size_t extraSize = read16(rest, 30);
+        const std::size_t size = zip::kDirectoryEntrySize + nameSize + extraSize + read16(rest, 32);
+        if (rest.size() < size) {
+            fail("is a damaged zip archive: its directory is cut off");
+        }
+        Entry& entry = entries_.emplace_back();
+        entry.flags = read16(rest, 8);
+        entry.method = read16(rest, 10);
+        entry.checksum = read32(rest, 16);
+        entry.compressedSize = read32(rest, 20);
+        entry.size = read32(rest, 24);
+        entry.offset = read32(rest, 42);
+        const Bytes extra = rest.subspan(zip::kDirectoryEntrySize + nameSize, extraSize);
+        if ((entry.flags & zip::kMaskedDirectoryFlag) != 0) {
+            fail("is encrypted");
+        }
+        entry.name =
+            decodeName(rest.subspan(zip::kDirectoryEntrySize, nameSize), extra, entry.flags);
+        readZip64Numbers(entry, extra);
+        rest = rest.subspan(size);
+    }
+    if (rest.size() >= 4 && read32(rest, 0) == zip::kDirectorySignature) {
+        fail("is a damaged zip archive: its directory has more entries than it says");
+    }
+}
+
+// Refuses entries that share bytes, with which a small archive could claim any amount of data.
+void ZipArchive::checkLayout(std::uint64_t dataEnd) const {
+    std::vector<const Entry*> byOffset;
+    byOffset.reserve(entries_.size());
+    for (const Entry& entry : entries_) {
+        if (entry.offset > dataEnd || entry.compressedSize > dataEnd ||
+            zip::kLocalHeaderSize + entry.compressedSize > dataEnd - entry.offset) {
+            failForEntry(entry.name, "reaches behind the end of the archive's data");
+        }
+        byOffset.push_back(&entry);
+    }
+    std::sort(byOffset.begin(), byOffset.end(),
+              [](const Entry* a, const Entry* b) { return a->offset < b->offset; });
+    std::uint64_t end = 0;
+    for (const Entry* entry : byOffset) {
+        if (entry->offset < end) {
+            failForEntry(entry->name, "overlaps another entry");
+        }
+        end = entry->offset + zip::kLocalHeaderSize + entry->compressedSize;
+    }
+}
+
+void ZipArchive::checkSizes() const {
+    std::uint64_t total = 0;
+    for (const Entry& entry : entries_) {
+        if (entry.size > limits::kMaxPartBytes) {
+            failForEntry(entry.name, "is too large: " + std::to_string(entry.size) +
+                                         " bytes, at most " +
+                                         std::to_string(limits::kMaxPartBytes) + " are accepted");
+        }
+        if (entry.method == zip::kDeflated &&
+            entry.size / limits::kMaxDeflateRatio > entry.compressedSize) {
+            failForEntry(entry.name, "has a wrong size: its data cannot expand to " +
+                                         std::to_string(entry.size) + " bytes");
+        }
+        total += entry.size;
+    }
+    if (total > limits::kMaxTotalBytes) {
+        fail("is too large: it expands to " + std::to_string(total) + " bytes, at most " +
+             std::to_string(limits::kMaxTotalBytes) + " are accepted");
+    }
+    if (total > limits::kHarmlessBytes && total / limits::kMaxExpansionRatio >= fileSize_) {
+        fail("expands too much: from " + std::to_string(fileSize_) + " to " +
+             std::to_string(total) + " bytes");
+    }
+}
+
+void ZipArchive::read(const Entry& entry, std::span<std::uint8_t> out) {
+    if ((entry.flags & zip::kEncryptedFlag) != 0) {
+        fail("is encrypted");
+    }
+    const std::uint64_t offset = dataOffset(entry);
+    if (entry.method == zip::kStored) {
+        if (entry.size != entry.compressedSize) {
+            fail("is damaged (wrong size)");
+        }
+        readAt(offset, out);
+    } else if (entry.method == zip::kDeflated) {
+        expand(entry, offset, out);
+    } else {
+        fail("is compressed with the unknown method " + std::to_string(entry.method));
+    }
+    if (libdeflate_crc32(0, out.data(), out.size()) != entry.checksum) {
+        fail("is damaged (CRC)");
+    }
+}
+
+// The name and the extra field of the local header may be other ones than the directory's.
+std::uint64_t ZipArchive::dataOffset(const Entry& entry) const {
+    std::array<std::uint8_t, zip::kLocalHeaderSize> header{};
+    readAt(entry.offset, header);
+    if (read32(header, 0) != zip::kLocalSignature) {
+        fail("is damaged (no header where the directory says)");
+    }
+    return entry.offset + zip::kLocalHeaderSize + read16(header, 26) + read16(header, 28);
+}
+
+void ZipArchive::expand(const Entry& entry, std::uint64_t offset, std::span<std::uint8_t> out) {
+    if (entry.compressedSize == 0 && out.empty()) {
+        return;  // some producers write nothing at all for no content
+    }
+    compressed_.resize(entry.compressedSize);
+    readAt(offset, compressed_);
+    switch (libdeflate_deflate_decompress(decompressor_.get(), compressed_.data(),
+                                          compressed_.size(), out.data(), out.size(), nullptr)) {
+        case LIBDEFLATE_SUCCESS:
+            return;
+        case LIBDEFLATE_SHORT_OUTPUT:
+        case LIBDEFLATE_INSUFFICIENT_SPACE:
+            fail("is damaged (wrong size)");
+        default:
+            fail("is damaged (its compressed data is broken)");
+    }
+}
+
+void ZipArchive::readAt(std::uint64_t offset, std::span<std::uint8_t> out) const {
+    while (!out.empty()) {
+        const ssize_t count =
+            ::pread(file_.get(), out.data(), out.size(), static_cast<off_t>(offset));
+        if (count < 0 && errno == EINTR) {
+            continue;
+        }
+        if (count < 0) {
+            failForSystem("cannot be read");
+        }
+        if (count == 0) {
+            fail("is truncated");
+        }
+        offset += static_cast<std::uint64_t>(count);
+        out = out.subspan(static_cast<std::size_t>(count));
+    }
+}
+
+}  // namespace platform::package

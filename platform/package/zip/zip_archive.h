@@ -1,0 +1,73 @@
+// SPDX-License-Identifier: Apache-2.0
+// Reads zip archives: the directory when the archive is opened, and each entry's bytes on demand.
+//
+// The archive is believed in nothing. Opening it takes time and memory in proportion to its
+// directory, whose size is limited, and refuses archives whose entries overlap, or claim more than
+// their data can expand to or than the limits allow (limits.h). So reading all entries takes no
+// more than that either.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "platform/posix/file_descriptor.h"
+
+struct libdeflate_decompressor;
+
+namespace platform::package {
+
+class ZipArchive {
+public:
+    struct Entry {
+        std::string name;  ///< as it stands, in UTF-8
+        std::uint64_t size = 0;
+        std::uint64_t compressedSize = 0;
+        std::uint64_t offset = 0;  ///< of the local header
+        std::uint32_t checksum = 0;
+        std::uint16_t method = 0;
+        std::uint16_t flags = 0;
+    };
+
+    /// Opens the archive at the UTF-8 `path` and reads its directory. Never waits: what is no
+    /// regular file is refused. Throws std::runtime_error saying what is wrong with the file
+    /// (without its path) or, about one entry, with its name.
+    explicit ZipArchive(const std::string& path);
+
+    /// All entries, folders included, in the order of the directory.
+    const std::vector<Entry>& entries() const noexcept { return entries_; }
+
+    /// Reads and expands `entry` of this archive into `out`, which has `entry.size` bytes, and
+    /// checks the result against its checksum. Throws std::runtime_error saying what is wrong with
+    /// the entry (without its name).
+    void read(const Entry& entry, std::span<std::uint8_t> out);
+
+private:
+    struct Directory {
+        std::uint64_t entryCount;
+        std::uint64_t offset;
+        std::uint64_t size;
+    };
+    struct FreeDecompressor {
+        void operator()(libdeflate_decompressor* decompressor) const noexcept;
+    };
+
+    Directory findDirectory() const;
+    Directory findZip64Directory(std::uint64_t locatorOffset) const;
+    void readDirectory(const Directory& directory);
+    void checkLayout(std::uint64_t dataEnd) const;
+    void checkSizes() const;
+    std::uint64_t dataOffset(const Entry& entry) const;
+    void expand(const Entry& entry, std::uint64_t offset, std::span<std::uint8_t> out);
+    void readAt(std::uint64_t offset, std::span<std::uint8_t> out) const;
+
+    std::uint64_t fileSize_ = 0;
+    FileDescriptor file_;
+    std::vector<Entry> entries_;
+    std::vector<std::uint8_t> compressed_;  // the deflated bytes of the entry being read
+    std::unique_ptr<libdeflate_decompressor, FreeDecompressor> decompressor_;
+};
+
+}  // namespace platform::package

@@ -1,0 +1,142 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "platform/package/zip/zip_writer.h"
+
+#include <libdeflate.h>
+
+#include <algorithm>
+#include <new>
+#include <stdexcept>
+
+#include "platform/package/limits.h"
+#include "platform/package/zip/little_endian.h"
+#include "platform/package/zip/zip_format.h"
+
+namespace platform::package {
+namespace {
+
+constexpr int kCompressionLevel = 6;
+constexpr std::uint16_t kVersion = 20;
+constexpr std::uint16_t kDate = 1U << 5U | 1U;  // 1 January 1980, the first that there is
+
+// All offsets fit their fields: content, and names in local headers and in the directory.
+static_assert(limits::kMaxTotalBytes + 2 * limits::kMaxDirectoryBytes < zip::kNotIn32Bits);
+static_assert(limits::kMaxEntries < zip::kNotIn16Bits);
+
+bool isAscii(std::string_view text) {
+    return std::all_of(text.begin(), text.end(), [](char c) { return (c & 0x80) == 0; });
+}
+
+}  // namespace
+
+void ZipWriter::FreeCompressor::operator()(libdeflate_compressor* compressor) const noexcept {
+    libdeflate_free_compressor(compressor);
+}
+
+ZipWriter::ZipWriter(AtomicFile& file)
+    : file_(file), compressor_(libdeflate_alloc_compressor(kCompressionLevel)) {
+    if (!compressor_) {
+        throw std::bad_alloc();
+    }
+}
+
+void ZipWriter::add(std::string_view name, std::span<const std::uint8_t> content, bool mayDeflate) {
+    checkLimits(name, content.size());
+    const std::size_t deflatedSize = mayDeflate ? deflateIfWorthIt(content) : 0;
+    const bool isDeflated = deflatedSize != 0;
+    const std::span<const std::uint8_t> data =
+        isDeflated ? std::span<const std::uint8_t>(deflated_.get(), deflatedSize) : content;
+
+    // What the local header and the directory's entry have in common.
+    std::string common;
+    append16(common, kVersion);
+    append16(common, isAscii(name) ? 0 : zip::kUtf8Flag);
+    append16(common, isDeflated ? zip::kDeflated : zip::kStored);
+    append16(common, 0);  // midnight
+    append16(common, kDate);
+    append32(common, libdeflate_crc32(0, content.data(), content.size()));
+    append32(common, static_cast<std::uint32_t>(data.size()));
+    append32(common, static_cast<std::uint32_t>(content.size()));
+    append16(common, static_cast<std::uint16_t>(name.size()));
+    append16(common, 0);  // extra
+
+    append32(directory_, zip::kDirectorySignature);
+    append16(directory_, kVersion);
+    directory_.append(common);
+    directory_.append(10, '\0');  // comment length, disk, attributes
+    append32(directory_, static_cast<std::uint32_t>(offset_));
+    directory_.append(name);
+
+    std::string header;
+    append32(header, zip::kLocalSignature);
+    header.append(common).append(name);
+    write(header);
+    write({reinterpret_cast<const char*>(data.data()), data.size()});
+    ++entryCount_;
+    contentSize_ += content.size();
+}
+
+void ZipWriter::finish() {
+    const std::uint64_t directoryOffset = offset_;
+    write(directory_);
+    std::string end;
+    append32(end, zip::kEndSignature);
+    append32(end, 0);  // disks
+    append16(end, static_cast<std::uint16_t>(entryCount_));
+    append16(end, static_cast<std::uint16_t>(entryCount_));
+    append32(end, static_cast<std::uint32_t>(directory_.size()));
+    append32(end, static_cast<std::uint32_t>(directoryOffset));
+    append16(end, 0);  // comment length
+    write(end);
+}
+
+// Deflates `content` into deflated_. Returns the size, or zero if that exceeds `maxSize`. What of
+// the buffer is not written to takes no memory.
+std::size_t ZipWriter::deflate(std::span<const std::uint8_t> content, std::size_t maxSize) {
+    if (deflatedCapacity_ < maxSize) {
+        deflated_.reset();
+        deflated_ = std::make_unique_for_overwrite<std::uint8_t[]>(maxSize);
+        deflatedCapacity_ = maxSize;
+    }
+    return libdeflate_deflate_compress(compressor_.get(), content.data(), content.size(),
+                                       deflated_.get(), maxSize);
+}
+
+// Returns the size of the deflated form in deflated_, or zero to store the content. Large content
+// is tried on a sample first, taken from the middle because headers compress even where the rest
+// does not.
+std::size_t ZipWriter::deflateIfWorthIt(std::span<const std::uint8_t> content) {
+    constexpr std::size_t sampleSize = 65'536;
+    constexpr std::size_t worthwhile = sampleSize - sampleSize / 32;
+    if (content.empty()) {
+        return 0;
+    }
+    if (content.size() > 4 * sampleSize &&
+        deflate(content.subspan(content.size() / 2, sampleSize), worthwhile) == 0) {
+        return 0;
+    }
+    const std::size_t size = deflate(content, content.size() - 1);
+    return content.size() / limits::kMaxExpansionRatio < size ? size : 0;
+}
+
+void ZipWriter::checkLimits(std::string_view name, std::uint64_t size) const {
+    constexpr std::size_t maxNameSize = 0xFFFF;
+    if (size > limits::kMaxPartBytes) {
+        throw std::runtime_error("is too large: " + std::to_string(size) + " bytes, at most " +
+                                 std::to_string(limits::kMaxPartBytes) + " are accepted");
+    }
+    if (size > limits::kMaxTotalBytes - contentSize_) {
+        throw std::runtime_error("makes the package larger than " +
+                                 std::to_string(limits::kMaxTotalBytes) + " bytes");
+    }
+    if (entryCount_ == limits::kMaxEntries || name.size() > maxNameSize ||
+        directory_.size() + zip::kDirectoryEntrySize + name.size() > limits::kMaxDirectoryBytes) {
+        throw std::runtime_error("has one part too many, or too long a name");
+    }
+}
+
+void ZipWriter::write(std::string_view bytes) {
+    file_.write(bytes);
+    offset_ += bytes.size();
+}
+
+}  // namespace platform::package

@@ -1,0 +1,300 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "platform/posix/atomic_file.h"
+
+#include <fcntl.h>
+#include <sys/random.h>
+#include <sys/xattr.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <climits>
+#include <cstddef>
+#include <cstdint>
+#include <cstdio>
+#include <stdexcept>
+#include <system_error>
+#include <utility>
+#include <vector>
+
+namespace platform {
+namespace {
+
+constexpr std::size_t kBufferSize = 65'536;
+constexpr std::size_t kMaxAttributeSize = 65'536;  // of a value, and of the list of all names
+constexpr const char* kAccessControlList = "system.posix_acl_access";
+
+[[noreturn]] void failForSystem(const char* what) {
+    throw std::system_error(errno, std::generic_category(), what);
+}
+
+// Repeats `call` as long as a signal interrupts it.
+template <class Call>
+auto uninterrupted(Call call) {
+    auto result = call();
+    while (result < 0 && errno == EINTR) {
+        result = call();
+    }
+    return result;
+}
+
+// The folder of `path`, with a slash at its end; empty for the current one.
+std::string folderOf(const std::string& path) {
+    return path.substr(0, path.rfind('/') + 1);
+}
+
+// The path at the end of the symbolic links that begin at `path`, where there may be nothing. Links
+// in the folders on the way there are the system's business.
+std::string followLinks(std::string path) {
+    constexpr int maxLinks = 40;  // as the system itself
+    for (int i = 0; i < maxLinks; ++i) {
+        std::array<char, PATH_MAX> buffer{};
+        const ssize_t length = ::readlink(path.c_str(), buffer.data(), buffer.size());
+        if (length < 0 && (errno == EINVAL || errno == ENOENT)) {
+            return path;
+        }
+        if (length < 0) {
+            failForSystem("cannot be found");
+        }
+        const std::string link(buffer.data(), static_cast<std::size_t>(length));
+        path = link.starts_with('/') ? link : folderOf(path).append(link);
+    }
+    errno = ELOOP;
+    failForSystem("cannot be found");
+}
+
+// A name that no other save uses, short enough for every file system.
+std::string randomName() {
+    std::uint64_t number = 0;
+    if (uninterrupted([&] { return ::getrandom(&number, sizeof number, 0); }) != sizeof number) {
+        failForSystem("cannot be saved: no random name for a temporary file");
+    }
+    std::array<char, 32> name{};
+    std::snprintf(name.data(), name.size(), ".~saving-%016llx.tmp",
+                  static_cast<unsigned long long>(number));
+    return name.data();
+}
+
+// The value of the extended attribute `name` of the file at `path`, or nothing, with the reason in
+// errno, if it cannot be had.
+std::optional<std::string> attributeOf(const std::string& path, const char* name) {
+    std::string value(kMaxAttributeSize, '\0');
+    const ssize_t size = ::lgetxattr(path.c_str(), name, value.data(), value.size());
+    if (size < 0) {
+        return std::nullopt;
+    }
+    value.resize(static_cast<std::size_t>(size));
+    return value;
+}
+
+// The names of the extended attributes of the file at `path`; none where there is no such thing.
+std::vector<std::string> attributeNamesOf(const std::string& path) {
+    std::string list(kMaxAttributeSize, '\0');
+    const ssize_t size = ::llistxattr(path.c_str(), list.data(), list.size());
+    list.resize(static_cast<std::size_t>(std::max<ssize_t>(size, 0)));
+    std::vector<std::string> names;
+    for (std::size_t at = 0; at < list.size(); at += names.back().size() + 1) {
+        names.emplace_back(list.c_str() + at);
+    }
+    return names;
+}
+
+// Whether an attribute is worth taking over: what users noted, and the label that access depends
+// on. Others say things about the old content, such as its signature.
+bool isLasting(const std::string& attributeName) {
+    return attributeName.starts_with("user.") || attributeName == "security.selinux";
+}
+
+}  // namespace
+
+AtomicFile::AtomicFile(const std::string& path) : targetPath_(followLinks(path)) {
+    const std::string folder = folderOf(targetPath_);
+    targetName_ = targetPath_.substr(folder.size());
+    if (targetName_.empty() || targetName_ == "." || targetName_ == "..") {
+        throw std::runtime_error(path.empty() ? "has no name" : "is a folder");
+    }
+    buffer_.reserve(kBufferSize);
+    openFolder(folder.empty() ? "." : folder);
+    examineTarget();
+    createTemporary();
+}
+
+AtomicFile::~AtomicFile() {
+    if (!temporaryName_.empty()) {
+        ::unlinkat(folder_.get(), temporaryName_.c_str(), 0);
+    }
+}
+
+// The folder is held open so that everything happens in it even if it is renamed meanwhile. A
+// folder that may be written but not listed cannot be opened in the way that syncing it needs.
+void AtomicFile::openFolder(const std::string& folder) {
+    folder_ = FileDescriptor(
+        uninterrupted([&] { return ::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); }));
+    if (!folder_ && errno == EACCES) {
+        folderCanSync_ = false;
+        folder_ = FileDescriptor(uninterrupted(
+            [&] { return ::open(folder.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC); }));
+    }
+    if (!folder_) {
+        failForSystem("cannot be saved: its folder cannot be opened");
+    }
+}
+
+// Replacing a file needs no permission to write it, so that is asked for.
+void AtomicFile::examineTarget() {
+    struct stat status {};
+    if (::fstatat(folder_.get(), targetName_.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
+        if (errno == ENOENT) {
+            return;
+        }
+        failForSystem("cannot be examined");
+    }
+    if (!S_ISREG(status.st_mode)) {
+        throw std::runtime_error(S_ISDIR(status.st_mode) ? "is a folder" : "is not a regular file");
+    }
+    if (::faccessat(folder_.get(), targetName_.c_str(), W_OK, AT_EACCESS) != 0) {
+        failForSystem("may not be written");
+    }
+    target_ = status;
+}
+
+// The content of an existing document stays private until its permissions are known to be right; a
+// new one gets what the process gives to new files.
+void AtomicFile::createTemporary() {
+    constexpr int attempts = 100;
+    const mode_t mode = target_ ? 0600 : 0666;
+    for (int i = 0; i < attempts && !temporary_; ++i) {
+        std::string name = randomName();
+        temporary_ = FileDescriptor(uninterrupted([&] {
+            return ::openat(folder_.get(), name.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC,
+                            mode);
+        }));
+        if (temporary_) {
+            temporaryName_ = std::move(name);
+        } else if (errno != EEXIST) {
+            break;
+        }
+    }
+    if (!temporary_) {
+        failForSystem("cannot be saved: no file can be created in its folder");
+    }
+}
+
+void AtomicFile::write(std::string_view bytes) {
+    if (buffer_.size() + bytes.size() > kBufferSize) {
+        flush();
+    }
+    if (bytes.size() >= kBufferSize) {
+        writeAll(bytes);
+    } else {
+        buffer_.append(bytes);
+    }
+}
+
+void AtomicFile::flush() {
+    writeAll(buffer_);
+    buffer_.clear();
+}
+
+void AtomicFile::writeAll(std::string_view bytes) {
+    while (!bytes.empty()) {
+        const ssize_t count =
+            uninterrupted([&] { return ::write(temporary_.get(), bytes.data(), bytes.size()); });
+        if (count < 0) {
+            failForSystem("cannot be saved");
+        }
+        bytes.remove_prefix(static_cast<std::size_t>(count));
+    }
+}
+
+void AtomicFile::commit() {
+    flush();
+    if (target_) {
+        takeOverAccess();
+    }
+    if (uninterrupted([&] { return ::fsync(temporary_.get()); }) != 0) {
+        failForSystem("cannot be saved");
+    }
+    if (::close(temporary_.release()) != 0) {
+        failForSystem("cannot be saved");
+    }
+    if (::renameat(folder_.get(), temporaryName_.c_str(), folder_.get(), targetName_.c_str()) !=
+        0) {
+        failForSystem("cannot be replaced");
+    }
+    temporaryName_.clear();
+    syncFolder();
+}
+
+// The permissions come last: changing the owner can clear some of them, and the group's permissions
+// are those of the access control list's mask where there is a list.
+void AtomicFile::takeOverAccess() {
+    const mode_t mode = takeOverOwner();
+    takeOverAttributes();
+    takeOverAccessControlList();
+    if (::fchmod(temporary_.get(), mode) != 0) {
+        failForSystem("cannot be saved with its permissions");
+    }
+}
+
+// Returns the permissions that the file may have with the owner and the group that it got.
+mode_t AtomicFile::takeOverOwner() {
+    const auto change = [this](uid_t owner, gid_t group) {
+        if (::fchown(temporary_.get(), owner, group) == 0) {
+            return true;
+        }
+        const bool isUnknownHere = errno == EINVAL;  // as owners from outside a container are
+        if (errno != EPERM && !isUnknownHere) {
+            failForSystem("cannot be saved with its owner");
+        }
+        return false;
+    };
+    const mode_t mode = target_->st_mode;
+    if (change(target_->st_uid, target_->st_gid)) {
+        return mode & 07777U;
+    }
+    if (change(static_cast<uid_t>(-1), target_->st_gid)) {
+        return mode & 01777U;
+    }
+    const mode_t forAll = mode & (mode >> 3U) & 07U;
+    return (mode & 01707U) | forAll << 3U;
+}
+
+// Attributes are copied as far as the system lets them be.
+void AtomicFile::takeOverAttributes() {
+    for (const std::string& name : attributeNamesOf(targetPath_)) {
+        const auto value = isLasting(name) ? attributeOf(targetPath_, name.c_str()) : std::nullopt;
+        if (value) {
+            ::fsetxattr(temporary_.get(), name.c_str(), value->data(), value->size(), 0);
+        }
+    }
+}
+
+// Without its list, or with one that the folder gave to the new file, others could read the
+// document who should not.
+void AtomicFile::takeOverAccessControlList() {
+    const auto hasNone = [] { return errno == ENODATA || errno == ENOTSUP; };
+    bool done = false;
+    if (const auto list = attributeOf(targetPath_, kAccessControlList)) {
+        done =
+            ::fsetxattr(temporary_.get(), kAccessControlList, list->data(), list->size(), 0) == 0;
+    } else if (hasNone()) {
+        done = ::fremovexattr(temporary_.get(), kAccessControlList) == 0 || hasNone();
+    }
+    if (!done) {
+        failForSystem("cannot be saved with its access control list");
+    }
+}
+
+void AtomicFile::syncFolder() {
+    if (!folderCanSync_) {
+        return;
+    }
+    // Some file systems cannot sync folders, and say so.
+    if (uninterrupted([&] { return ::fsync(folder_.get()); }) != 0 && errno != EINVAL) {
+        failForSystem("has been replaced, but that may not be safe on disk");
+    }
+}
+
+}  // namespace platform

@@ -1,0 +1,68 @@
+// SPDX-License-Identifier: Apache-2.0
+// Replaces files so that whoever looks sees the old content or the new one, whatever fails in
+// between. All system calls of a save are made here.
+#pragma once
+
+#include <sys/stat.h>
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/posix/file_descriptor.h"
+
+namespace platform {
+
+/// New content for one file. It is collected in a temporary file in the same folder, which takes
+/// the place of the target when it is committed and is removed when it is not.
+///
+/// A symbolic link is followed: the file at its end is replaced, or created if there is none. The
+/// new file has the permissions, the owner and group, the access control list and the user's
+/// extended attributes of the old one. Where the process may not give a file away, the owner
+/// becomes its own, and nobody gets permissions who did not have them. Other hard links keep the
+/// old content.
+class AtomicFile {
+public:
+    /// Creates the temporary file for `path` (UTF-8). Throws std::runtime_error when the target is
+    /// no regular file or may not be written, even if it could be replaced, and when its folder
+    /// takes no new file.
+    explicit AtomicFile(const std::string& path);
+
+    AtomicFile(const AtomicFile&) = delete;
+    AtomicFile& operator=(const AtomicFile&) = delete;
+
+    /// Removes the temporary file if there was no commit.
+    ~AtomicFile();
+
+    /// Appends to the new content. Throws std::system_error when that fails, after which commit
+    /// must not be called.
+    void write(std::string_view bytes);
+
+    /// Puts the new content in the place of the old, safe on disk when it returns. Throws
+    /// std::system_error when something fails; the old content then still stands, except when only
+    /// the last step failed, which is to make the replacement itself safe. To be called once.
+    void commit();
+
+private:
+    void openFolder(const std::string& folder);
+    void examineTarget();
+    void createTemporary();
+    void flush();
+    void writeAll(std::string_view bytes);
+    void takeOverAccess();
+    mode_t takeOverOwner();
+    void takeOverAttributes();
+    void takeOverAccessControlList();
+    void syncFolder();
+
+    FileDescriptor folder_;
+    bool folderCanSync_ = true;
+    std::string targetPath_;             // links followed
+    std::string targetName_;             // in folder_
+    std::optional<struct stat> target_;  // of the file to be replaced, if there is one
+    std::string temporaryName_;          // in folder_; empty once it is gone
+    FileDescriptor temporary_;
+    std::string buffer_;
+};
+
+}  // namespace platform

@@ -1,0 +1,149 @@
+// SPDX-License-Identifier: Apache-2.0
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+
+#include <algorithm>
+#include <filesystem>
+#include <string>
+#include <vector>
+
+#include "tests/host/host_program.h"
+#include "tests/host/subprocess.h"
+#include "tests/support/source_root.h"
+#include "tests/support/temporary_directory.h"
+
+namespace {
+
+using test::hostCommand;
+using test::Outcome;
+using test::readFile;
+using test::writeFile;
+using ::testing::HasSubstr;
+using ::testing::IsEmpty;
+
+class WriteCommand : public ::testing::Test {
+protected:
+    static Outcome write(const std::filesystem::path& file, const std::string& content,
+                         const std::vector<std::string>& options = {}) {
+        std::vector<std::string> command = hostCommand({"write"});
+        command.insert(command.end(), options.begin(), options.end());
+        command.emplace_back("--");
+        command.push_back(file.string());
+        return test::run(command, content);
+    }
+
+    bool holdsATemporaryFile() const {
+        const std::filesystem::directory_iterator entries(folder_.path());
+        return std::any_of(begin(entries), end(entries), [](const auto& entry) {
+            return entry.path().filename().string().starts_with(".~saving-");
+        });
+    }
+
+    test::TemporaryDirectory folder_;
+};
+
+TEST_F(WriteCommand, WritesItsInputAndPrintsTrue) {
+    const Outcome outcome = write(folder_ / "file", "one\ntwo \"quoted\"\n");
+    EXPECT_EQ(outcome.status, 0);
+    EXPECT_EQ(outcome.output, "true\n");
+    EXPECT_THAT(outcome.errors, IsEmpty());
+    EXPECT_EQ(readFile(folder_ / "file"), "one\ntwo \"quoted\"\n");
+}
+
+TEST_F(WriteCommand, WritesAnEmptyInput) {
+    writeFile(folder_ / "file", "old");
+    EXPECT_EQ(write(folder_ / "file", "").output, "true\n");
+    EXPECT_EQ(readFile(folder_ / "file"), "");
+}
+
+TEST_F(WriteCommand, WritesTextInTheCharsetThatItIsGiven) {
+    EXPECT_EQ(write(folder_ / "file", "\xCF\xF0\xE8", {"--encoding", "windows-1251"}).output,
+              "true\n");
+    EXPECT_EQ(readFile(folder_ / "file"), "\xCF\xF0\xE8");
+}
+
+TEST_F(WriteCommand, PrintsFalseForTextThatIsNotInItsCharset) {
+    writeFile(folder_ / "file", "old");
+    const Outcome outcome = write(folder_ / "file", "\xCF\xF0\xE8");
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_EQ(outcome.output, "false\n");
+    EXPECT_THAT(outcome.errors, HasSubstr("file: cannot be written"));
+    EXPECT_EQ(readFile(folder_ / "file"), "old");
+}
+
+TEST_F(WriteCommand, WritesAPackageThatReadHasPrinted) {
+    const std::string report = test::sourceRoot() + "/examples/report.docx";
+    const Outcome original = test::run(hostCommand({"read", report}));
+    ASSERT_EQ(original.status, 0);
+    EXPECT_EQ(write(folder_ / "copy.docx", original.output).output, "true\n");
+    EXPECT_EQ(test::run(hostCommand({"read", (folder_ / "copy.docx").string()})).output,
+              original.output);
+}
+
+TEST_F(WriteCommand, WritesAPackagesJsonAsTextWhenTold) {
+    const std::string json = R"({"parts":[],"relationships":[]})";
+    EXPECT_EQ(write(folder_ / "file.json", json, {"--content-type", "text/plain"}).output,
+              "true\n");
+    EXPECT_EQ(readFile(folder_ / "file.json"), json);
+}
+
+TEST_F(WriteCommand, RefusesToMakeAPackageOfSomethingElse) {
+    const Outcome outcome =
+        write(folder_ / "file.docx", "plain text", {"--content-type", "text/xml"});
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_THAT(outcome.output, IsEmpty());
+    EXPECT_THAT(outcome.errors, HasSubstr("no document package"));
+    EXPECT_FALSE(std::filesystem::exists(folder_ / "file.docx"));
+}
+
+TEST_F(WriteCommand, FinishesTheSaveInWhichItIsAskedToEnd) {
+    // Much to write and little to compute, so that the temporary file is there for a while.
+    const std::string content =
+        R"({"parts":[{"partUri":"/a.png","contentType":"image/png","relationship":null,)"
+        R"("content":"data:image/png;base64,)" +
+        std::string(40'000'000, 'A') + R"("}],"relationships":[]})";
+    const std::filesystem::path file = folder_ / "document";
+    bool wasAskedInTime = false;
+    for (int run = 0; run < 20 && !wasAskedInTime; ++run) {
+        std::filesystem::remove(file);
+        test::Subprocess program(hostCommand({"write", "--", file.string()}));
+        program.write(content);
+        program.closeInput();
+        while (!std::filesystem::exists(file) && !wasAskedInTime) {
+            wasAskedInTime = holdsATemporaryFile();
+        }
+        ::kill(program.id(), SIGTERM);
+        const Outcome outcome = program.waitForEnd();
+        if (wasAskedInTime) {
+            EXPECT_EQ(outcome.status, 0) << outcome.errors;
+            EXPECT_EQ(outcome.output, "true\n");
+        }
+        EXPECT_TRUE(std::filesystem::exists(file));
+        EXPECT_FALSE(holdsATemporaryFile());
+    }
+    EXPECT_TRUE(wasAskedInTime);
+}
+
+TEST_F(WriteCommand, TellsThatNoAnswerCame) {
+    const Outcome outcome = write(folder_ / "caf\xE9", "x");
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_THAT(outcome.output, IsEmpty());
+    EXPECT_THAT(outcome.errors, HasSubstr("no answer"));
+}
+
+TEST_F(WriteCommand, WritesLargeTexts) {
+    std::string text;
+    while (text.size() < 20'000'000) {
+        text += "line " + std::to_string(text.size()) + "\n";
+    }
+    EXPECT_EQ(write(folder_ / "file", text).output, "true\n");
+    EXPECT_TRUE(readFile(folder_ / "file") == text);
+}
+
+TEST_F(WriteCommand, NeedsOneFile) {
+    EXPECT_EQ(test::run(hostCommand({"write"})).status, 2);
+    EXPECT_EQ(test::run(hostCommand({"write", "one", "two"})).status, 2);
+}
+
+}  // namespace

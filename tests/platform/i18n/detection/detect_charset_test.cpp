@@ -1,0 +1,306 @@
+// SPDX-License-Identifier: Apache-2.0
+// What detection decides, in which order, and what it guarantees.
+#include "platform/i18n/detect_charset.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <future>
+#include <random>
+#include <sstream>
+#include <stdexcept>
+#include <vector>
+
+#include "platform/i18n/codecvt.h"
+#include "platform/i18n/detection/candidates.h"
+#include "tests/platform/i18n/detection/corpus.h"
+
+namespace platform::i18n {
+namespace {
+
+using std::string_literals::operator""s;
+using ::testing::AnyOf;
+using ::testing::HasSubstr;
+
+std::string diagnosticsOf(std::string_view bytes, std::u16string_view source = u"<unknown>") {
+    std::ostringstream diagnostics;
+    detect_charset(bytes.data(), bytes.size(), diagnostics, source);
+    return diagnostics.str();
+}
+
+std::string detect(std::string_view bytes) {
+    std::ostringstream diagnostics;
+    return detect_charset(bytes.data(), bytes.size(), diagnostics, u"<unknown>");
+}
+
+std::string roundTrip(const std::string& charset, std::string_view bytes) {
+    codecvt_string_to_ustring decoder(charset, true);
+    codecvt_ustring_to_string encoder(charset, true);
+    return to_string(to_ustring(bytes, decoder), encoder);
+}
+
+std::string encoded(const std::string& language, const std::string& iconvName) {
+    return testing::iconvEncode(iconvName, testing::corpusText(language)).value();
+}
+
+TEST(DetectCharset, TakesEmptyAsciiAndValidUtf8ForUtf8) {
+    EXPECT_EQ(detect(""), "UTF-8");
+    EXPECT_EQ(detect("plain text\n"), "UTF-8");
+    EXPECT_EQ(detect("\xC3\xA9"), "UTF-8");
+    EXPECT_EQ(detect("\xF0\x9F\x98\x80"), "UTF-8");
+    EXPECT_EQ(detect("a\0b"s), "UTF-8");
+}
+
+TEST(DetectCharset, AcceptsNoDataAtAll) {
+    std::ostringstream diagnostics;
+    EXPECT_EQ(detect_charset(nullptr, 0, diagnostics, u""), "UTF-8");
+}
+
+TEST(DetectCharset, FollowsAByteOrderMark) {
+    EXPECT_EQ(detect("\xEF\xBB\xBFx"), "UTF-8");
+    EXPECT_EQ(detect("\xEF\xBB\xBF"), "UTF-8");
+    EXPECT_EQ(detect("\xFF\xFEx\0"s), "UTF-16LE");
+    EXPECT_EQ(detect("\xFF\xFE"), "UTF-16LE");
+    EXPECT_EQ(detect("\xFE\xFF\0x"s), "UTF-16BE");
+    EXPECT_EQ(detect("\xFF\xFE\0\0x\0\0\0"s), "UTF-32LE");
+    EXPECT_EQ(detect("\0\0\xFE\xFF\0\0\0x"s), "UTF-32BE");
+}
+
+TEST(DetectCharset, TakesAMarkForTextWhereTheRestContradictsIt) {
+    EXPECT_EQ(detect("\xFF\xFE\0\0x\0"s), "UTF-16LE");  // no multiple of four bytes
+    for (const std::string& bytes : {"\xEF\xBB\xBF\xFF"s, "\xFF\xFEx"s, "\xFE\xFF\xD8\0\0x"s}) {
+        EXPECT_EQ(roundTrip(detect(bytes), bytes), bytes);
+    }
+}
+
+TEST(DetectCharset, ReadsUtf16AndUtf32WithoutAMark) {
+    for (const char* charset : {"UTF-16LE", "UTF-16BE", "UTF-32LE", "UTF-32BE"}) {
+        EXPECT_EQ(detect(testing::iconvEncode(charset, "Hello, world").value()), charset);
+        for (const char* language :
+             {"en", "ru", "el", "he", "ar", "th", "ja", "zh-Hans", "zh-Hant", "ko"}) {
+            for (const std::string& line : testing::linesOf(testing::corpusText(language))) {
+                const std::string bytes = testing::iconvEncode(charset, line).value();
+                // A handful of ideographs can pass for something else.
+                if (bytes.size() >= 24) {
+                    EXPECT_EQ(detect(bytes), charset) << line;
+                }
+            }
+        }
+    }
+}
+
+TEST(DetectCharset, ReadsEscapeSequencesThatSpellSomething) {
+    EXPECT_EQ(detect("\x1B$B$3$s$K$A$O\x1B(B\n"), "ISO-2022-JP");
+    EXPECT_EQ(detect("\x1B$)C\x0E>H3g\x0F\n"), "ISO-2022-KR");
+    EXPECT_EQ(detect("~{<:Ky2;NpJ)l6HK!#~}\n"), "HZ-GB-2312");
+    EXPECT_EQ(detect(encoded("zh-Hans", "ISO-2022-CN")), "ISO-2022-CN");
+}
+
+TEST(DetectCharset, TakesOtherEscapesForAscii) {
+    for (const char* text : {"\x1B[31mred\x1B[0m\n", "\x1B", "\x1B$B", "\x1B$B$3$s", "a ~{ b ~} c",
+                             "~{", "~~{<:~}", "if (~{x}) ~}"}) {
+        const std::string charset = detect(text);
+        EXPECT_EQ(charset, "UTF-8") << text;
+    }
+}
+
+TEST(DetectCharset, KeepsTheBytesOfRedundantEscapes) {
+    const std::string bytes = "\x1B$B$3\x1B(B\x1B$B$s\x1B(J\x1B(B";
+    EXPECT_EQ(roundTrip(detect(bytes), bytes), bytes);
+}
+
+TEST(DetectCharset, SpellsNamesAsIanaDoes) {
+    EXPECT_EQ(detect(encoded("ja", "CP932")), "Shift_JIS");
+    EXPECT_EQ(detect(encoded("ja", "EUC-JP")), "EUC-JP");
+    EXPECT_EQ(detect(encoded("ko", "EUC-KR")), "EUC-KR");
+    EXPECT_EQ(detect(encoded("zh-Hant", "BIG5")), "Big5");
+    EXPECT_EQ(detect(encoded("zh-Hans", "GB2312")), "GB18030");
+    EXPECT_EQ(detect(encoded("ru", "CP1251")), "windows-1251");
+    EXPECT_EQ(detect(encoded("ru", "KOI8-R")), "KOI8-R");
+    EXPECT_EQ(detect(encoded("pl", "ISO-8859-2")), "ISO-8859-2");
+    EXPECT_EQ(detect(encoded("el", "ISO-8859-7")), "ISO-8859-7");
+}
+
+TEST(DetectCharset, ReadsShiftJisThatHoldsControlCodes) {
+    const std::string bytes = "\x82\xB1\x82\xEA\x82\xCD\x1C\x82\xC5\x82\xB7\x1A\x81\x42\n";
+    EXPECT_EQ(detect(bytes), "Shift_JIS");
+    EXPECT_EQ(roundTrip("Shift_JIS", bytes), bytes);
+}
+
+TEST(DetectCharset, BelievesWhatADocumentSaysWhereItsTextIsAmbiguous) {
+    const std::string word = "\xE9\xF2\xE1";
+    for (const char* charset : {"windows-1251", "koi8-r", "ISO-8859-2", "windows-1253"}) {
+        const std::string page = "<meta charset=\""s + charset + "\"><p>" + word + "</p>";
+        codecvt_string_to_ustring expected(charset, true);
+        codecvt_string_to_ustring found(detect(page), true);
+        EXPECT_EQ(to_ustring(page, found), to_ustring(page, expected)) << charset;
+    }
+}
+
+TEST(DetectCharset, DoesNotBelieveADocumentWhoseTextContradictsIt) {
+    for (const char* lie : {"utf-8", "iso-8859-1", "us-ascii", "shift_jis", "nonesuch", "utf-16"}) {
+        const std::string page =
+            "<html><head><meta charset=\""s + lie + "\"></head>\n" + encoded("ru", "KOI8-R");
+        EXPECT_EQ(detect(page), "KOI8-R") << lie;
+    }
+}
+
+TEST(DetectCharset, FindsTheOneLetterThatTellsCharsetsApartInALargeFile) {
+    // The euro sign and the z with caron tell ISO-8859-15 from ISO-8859-1.
+    std::string utf8 = testing::grownTo(testing::corpusText("fi"), 300 * 1000);
+    utf8.insert(utf8.find('\n', 151234) + 1,
+                "D\xC5\xBEonkki maksoi 20 \xE2\x82\xAC ja \xC5\xA1"
+                "akki 5 \xE2\x82\xAC.\n");
+    const std::string bytes = testing::iconvEncode("ISO-8859-15", utf8).value();
+    codecvt_string_to_ustring decoder(detect(bytes), true);
+    EXPECT_TRUE(to_ustring(bytes, decoder) == testing::iconvUtf16(utf8));
+}
+
+TEST(DetectCharset, FindsTheFewLettersOfALargeFileThatIsAsciiAlmostThroughout) {
+    std::string bytes(3 * 1000 * 1000, 'x');
+    for (std::size_t i = 79; i < bytes.size(); i += 80) {
+        bytes[i] = '\n';
+    }
+    bytes.insert(2 * 1000 * 1000, " " +
+                                      testing::iconvEncode("CP1251",
+                                                           "\xD0\xBF\xD1\x80\xD0\xB8\xD0\xB2\xD0"
+                                                           "\xB5\xD1\x82 \xD0\xBC\xD0\xB8\xD1\x80")
+                                          .value() +
+                                      " ");
+    EXPECT_EQ(detect(bytes), "windows-1251");
+}
+
+TEST(DetectCharset, ReadsLargeTextWithoutASpaceOrAnEndOfLine) {
+    for (const auto& [language, iconvName, charset] :
+         {std::tuple{"zh-Hans", "GB18030", "GB18030"}, {"ja", "EUC-JP", "EUC-JP"}}) {
+        std::string solid;
+        for (const std::string& line : testing::linesOf(testing::corpusText(language))) {
+            for (const char c : line) {
+                solid += static_cast<unsigned char>(c) < 0x80 ? ""s : std::string(1, c);
+            }
+        }
+        while (solid.size() < 200000) {
+            solid += solid;
+        }
+        for (const std::string& prefix : {""s, "x"s}) {
+            EXPECT_EQ(detect(testing::iconvEncode(iconvName, prefix + solid).value()), charset);
+        }
+    }
+}
+
+TEST(DetectCharset, KeepsTheBytesOfDamagedUtf8) {
+    for (const char* language : {"fr", "ru", "ja"}) {
+        std::string bytes = testing::corpusText(language);
+        bytes.erase(bytes.size() - 40, 1);
+        bytes[100] = '\xFF';
+        EXPECT_EQ(detect(bytes), "ISO-8859-1");
+        EXPECT_EQ(roundTrip(detect(bytes), bytes), bytes);
+    }
+}
+
+TEST(DetectCharset, SaysSoWhenNothingFitsAndIsSilentOtherwise) {
+    std::string binary;
+    for (int i = 0; i < 4096; ++i) {
+        binary += static_cast<char>(i * 7 % 251);
+    }
+    EXPECT_EQ(detect(binary), "ISO-8859-1");
+    EXPECT_THAT(diagnosticsOf(binary, u"caf\u00E9.bin"), HasSubstr("caf\xC3\xA9.bin"));
+    const std::string line = diagnosticsOf(binary);
+    EXPECT_EQ(std::count(line.begin(), line.end(), '\n'), 1);
+    EXPECT_EQ(line.back(), '\n');
+    for (const std::string& text : {""s, "abc"s, "\xEF\xBB\xBF"s, encoded("ru", "KOI8-R"),
+                                    encoded("ja", "ISO-2022-JP"), encoded("zh-Hans", "UTF-16LE")}) {
+        EXPECT_EQ(diagnosticsOf(text), "");
+    }
+}
+
+TEST(DetectCharset, NamesASourceWithBrokenCharactersToo) {
+    EXPECT_THAT(diagnosticsOf("\xFF\0\1\2\3\4\5\6"s, u"x\xD800y"), HasSubstr("x\xEF\xBF\xBDy"));
+}
+
+TEST(DetectCharset, AnyBytesComeBackFromWhatItReturns) {
+    std::mt19937 random(11);
+    for (int round = 0; round < 3000; ++round) {
+        std::string bytes(random() % 200, '\0');
+        // All bytes; bytes above ASCII; pairs that look like East Asian text.
+        const unsigned lowest = round % 3 == 0 ? 0 : round % 3 == 1 ? 0x80 : 0xA1;
+        for (char& byte : bytes) {
+            byte = static_cast<char>(random() % 8 == 0 ? random() % 0x60 + 0x20
+                                                       : lowest + random() % (0x100 - lowest));
+        }
+        const std::string charset = detect(bytes);
+        ASSERT_EQ(roundTrip(charset, bytes), bytes) << charset;
+    }
+}
+
+TEST(DetectCharset, ReadsDuplicateCodesAndGivesThemBack) {
+    struct Case {
+        const char* language;
+        const char* iconvName;
+        std::string code;
+        char16_t character;
+    };
+    for (const auto& [language, iconvName, code, character] : {
+             Case{"ja", "CP932", "\x87\x90", u'\u2252'},
+             Case{"ja", "CP932", "\x81\xE0", u'\u2252'},
+             Case{"ja", "CP932", "\xEE\xE0", u'\u9AD9'},
+             Case{"ja", "CP932", "\xFB\xFC", u'\u9AD9'},
+             Case{"ja", "CP932", "\xFA\x4A", u'\u2160'},
+             Case{"ja", "CP932", "\x87\x54", u'\u2160'},
+             Case{"ja", "CP932", "\xFA\x54", u'\uFFE2'},
+             Case{"ja", "EUC-JP", "\xAD\xF0", u'\u2252'},
+             Case{"zh-Hant", "BIG5", "\xA2\xA4", u'\u2550'},
+             Case{"zh-Hant", "BIG5", "\xF9\xF9", u'\u2550'},
+         }) {
+        const std::string bytes = encoded(language, iconvName) + code;
+        codecvt_string_to_ustring decoder(detect(bytes), true);
+        EXPECT_EQ(to_ustring(bytes, decoder).back(), character) << detect(bytes);
+        EXPECT_EQ(roundTrip(detect(bytes), bytes), bytes);
+    }
+}
+
+TEST(DetectCharset, KeepsTheBytesWhereBothCodesOfACharacterOccur) {
+    const std::string bytes = encoded("ja", "CP932") + "\x87\x90\x81\xE0";
+    EXPECT_EQ(detect(bytes), "ISO-8859-1");
+    EXPECT_NE(diagnosticsOf(bytes), "");
+}
+
+TEST(DetectCharset, SurvivesCodesOfCharactersThatTheCharsetDoesNotEncode) {
+    // In EUC-JP, two bytes behind the single shift stand for characters that it has no code for.
+    for (int byte = 0x80; byte <= 0xFF; ++byte) {
+        const std::string bytes = "?J\x8E" + std::string(1, static_cast<char>(byte));
+        EXPECT_EQ(roundTrip(detect(bytes), bytes), bytes) << byte;
+    }
+}
+
+TEST(DetectCharset, MayBeCalledFromManyThreads) {
+    const std::string russian = encoded("ru", "KOI8-R");
+    const std::string japanese = encoded("ja", "EUC-JP");
+    std::vector<std::future<std::string>> answers;
+    for (int i = 0; i < 8; ++i) {
+        answers.push_back(std::async(std::launch::async, detect, i % 2 == 0 ? russian : japanese));
+    }
+    for (std::size_t i = 0; i < answers.size(); ++i) {
+        EXPECT_EQ(answers[i].get(), i % 2 == 0 ? "KOI8-R" : "EUC-JP");
+    }
+}
+
+TEST(DetectCharset, RefusesTextThatIsTooLargeBeforeItLooksAtIt) {
+    // Nobody may read these bytes: there are none behind the first.
+    const char first = 'a';
+    std::ostringstream diagnostics;
+    EXPECT_THAT([&] { detect_charset(&first, maxTextLength + 1, diagnostics, u"text"); },
+                ::testing::ThrowsMessage<std::runtime_error>(
+                    "The text is too large: 1073741825 bytes, at most 1073741824 are accepted"));
+}
+
+TEST(LegacyCandidates, OpenInBothConvertersAndAreMadeForSomeLanguage) {
+    for (const detail::Candidate& candidate : detail::legacyCandidates()) {
+        EXPECT_NO_THROW(codecvt_string_to_ustring(candidate.charset(), true));
+        EXPECT_NO_THROW(codecvt_ustring_to_string(candidate.charset(), true));
+        EXPECT_FALSE(candidate.languages().empty()) << candidate.charset();
+    }
+}
+
+}  // namespace
+}  // namespace platform::i18n
