@@ -12,7 +12,7 @@ find_package(OpenSSL REQUIRED COMPONENTS Crypto)
 find_package(CLI11 REQUIRED)
 pkg_check_modules(libnats REQUIRED IMPORTED_TARGET libnats)
 find_package(spdlog REQUIRED)
-pkg_check_modules(httplib REQUIRED IMPORTED_TARGET cpp-httplib)
+pkg_check_modules(libmicrohttpd REQUIRED IMPORTED_TARGET libmicrohttpd)
 
 # The real bundle framework is used where it is installed; framework/ stands in for it elsewhere.
 find_package(CppMicroServices 3.8 CONFIG QUIET)

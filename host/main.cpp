@@ -169,6 +169,12 @@ void declareWeb(CLI::App& command, host::WebOptions& options) {
             "Where browsers find it (default: 127.0.0.1:8080)")
         ->type_name("HOST:PORT")
         ->excludes(none);
+    command
+        .add_option("--web-connections", options.connectionsOfAddress,
+                    "The most connections that one address may have to it (default: no limit of "
+                    "its own, for all who come through one proxy share an address)")
+        ->type_name("COUNT")
+        ->excludes(none);
 }
 
 // The host's own server can let pages of one origin of each host in, the web page's included.

@@ -23,6 +23,7 @@
 #include "host/commands/standard_streams.h"
 #include "host/commands/stop_signals.h"
 #include "host/limits/confinement.h"
+#include "host/limits/open_files.h"
 #include "host/server/private_folder.h"
 #include "platform/messaging/channels.h"
 #include "platform/messaging/nats/nats_bus.h"
@@ -215,6 +216,16 @@ std::filesystem::path webFolderOf(const WebOptions& options) {
     return options.folder.empty() ? findWebFolder() : options.folder;
 }
 
+std::unique_ptr<WebServer> makeWebServer(const WebOptions& options,
+                                         const std::filesystem::path& folder) {
+    if (folder.empty()) {
+        return nullptr;
+    }
+    HttpLimits limits;
+    limits.connectionsOfAddress = options.connectionsOfAddress;
+    return std::make_unique<WebServer>(folder, options.address, limits);
+}
+
 std::unique_ptr<NatsServer> startOwnServer(const ServeOptions& options, const WebServer* web,
                                            const PrivateFolder& folder) {
     NatsServerOptions own = options.ownServer;
@@ -228,6 +239,7 @@ std::unique_ptr<NatsServer> startOwnServer(const ServeOptions& options, const We
 
 int runServe(const ServeOptions& options, int output) {
     blockStopSignals();
+    raiseOpenFileLimit();
     std::optional<PrivateFolder> folder;
     if (options.otherServers.urls.empty()) {
         folder.emplace();
@@ -241,8 +253,7 @@ int runServe(const ServeOptions& options, int output) {
     const std::filesystem::path webFolder = webFolderOf(options.web);
     const std::optional<Confinements> confinements = confinementsOf(options, webFolder);
     // The web page's origin is part of the server's configuration.
-    const std::unique_ptr<WebServer> web =
-        webFolder.empty() ? nullptr : std::make_unique<WebServer>(webFolder, options.web.address);
+    const std::unique_ptr<WebServer> web = makeWebServer(options.web, webFolder);
     std::unique_ptr<NatsServer> server =
         folder ? startOwnServer(options, web.get(), *folder) : nullptr;
     const std::shared_ptr<NatsBus> bus =

@@ -30,6 +30,9 @@ struct WebOptions {
     bool isServed = true;
     std::filesystem::path folder;  ///< Empty: the one that belongs to the program.
     ListenAddress address{"127.0.0.1", 8080};
+
+    /// Connections that one address may have; 0: as many as there are for all.
+    unsigned connectionsOfAddress = 0;
 };
 
 struct ServeOptions {

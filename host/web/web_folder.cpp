@@ -3,7 +3,6 @@
 
 #include <fcntl.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <array>
@@ -13,14 +12,9 @@
 #include <system_error>
 #include <utility>
 
-#include "host/commands/standard_streams.h"
-
 namespace host {
 
 namespace {
-
-// A file is held in memory while it is sent.
-constexpr off_t largestFile = off_t{64} * 1024 * 1024;
 
 // No link is followed, and the open waits for nobody at the other end of a pipe.
 constexpr int openFlags = O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK;
@@ -58,37 +52,22 @@ bool mayBeServed(std::string_view name) {
     return !name.empty() && name.front() != '.' && name.find('\0') == std::string_view::npos;
 }
 
-std::optional<std::string> contentOf(const platform::FileDescriptor& file) {
+bool isRegularFile(const platform::FileDescriptor& file) {
     struct stat status {};
-    if (::fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
-        status.st_size > largestFile) {
-        return std::nullopt;
-    }
-    std::string content(static_cast<std::size_t>(status.st_size), '\0');
-    std::size_t filled = 0;
-    while (filled < content.size()) {
-        const std::size_t count =
-            readSome(file.get(), content.data() + filled, content.size() - filled);
-        if (count == 0) {
-            break;  // It has become shorter.
-        }
-        filled += count;
-    }
-    content.resize(filled);
-    return content;
+    return ::fstat(file.get(), &status) == 0 && S_ISREG(status.st_mode);
 }
 
 }  // namespace
 
 WebFolder::WebFolder(const std::filesystem::path& folder)
     : folder_(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)) {
-    if (folder_.get() < 0) {
+    if (!folder_) {
         throw std::runtime_error("cannot serve the web folder " + folder.string() + ": " +
                                  std::generic_category().message(errno));
     }
 }
 
-std::optional<WebFolder::File> WebFolder::read(std::string_view path) const {
+std::optional<WebFolder::File> WebFolder::open(std::string_view path) const {
     if (!path.starts_with('/')) {
         return std::nullopt;
     }
@@ -107,18 +86,17 @@ std::optional<WebFolder::File> WebFolder::read(std::string_view path) const {
         }
         platform::FileDescriptor next(
             ::openat(folder, name.c_str(), openFlags | (end < rest.size() ? O_DIRECTORY : 0)));
-        if (next.get() < 0) {
+        if (!next) {
             return std::nullopt;
         }
         opened = std::move(next);
         folder = opened.get();
         begin = end + 1;
     }
-    std::optional<std::string> content = contentOf(opened);
-    if (!content) {
+    if (!isRegularFile(opened)) {
         return std::nullopt;
     }
-    return File{std::move(*content), typeOf(rest)};
+    return File{std::move(opened), typeOf(rest)};
 }
 
 }  // namespace host

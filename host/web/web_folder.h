@@ -16,7 +16,7 @@ namespace host {
 class WebFolder {
 public:
     struct File {
-        std::string content;
+        platform::FileDescriptor content;
         std::string type;  ///< Its media type, by the ending of its name.
     };
 
@@ -24,9 +24,8 @@ public:
     explicit WebFolder(const std::filesystem::path& folder);
 
     /// The file at `path`, the decoded path of a URL, which begins with a slash; for one that ends
-    /// with a slash, the file index.html in that folder. Nothing when there is no such file, or it
-    /// is too large to be part of a web page.
-    std::optional<File> read(std::string_view path) const;
+    /// with a slash, the file index.html in that folder. Nothing when there is no such file.
+    std::optional<File> open(std::string_view path) const;
 
 private:
     platform::FileDescriptor folder_;

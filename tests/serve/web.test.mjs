@@ -135,6 +135,7 @@ test("clients that send without end, or not at all, are cut off", async (t) => {
     const socket = connect({ host: hostname, port });
     socket.on("error", () => {});
     socket.on("close", () => (socket.isClosed = true));
+    socket.resume();
     socket.write(index % 2 === 0 ? "GET / HTTP/1.1\r\nx: " : "GET / HT");
     if (index % 4 === 0) {
       socket.write("x".repeat(1_000_000));

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "host/web/web_server.h"
+#include "host/web/listen_address.h"
 
 #include <gtest/gtest.h>
 
