@@ -18,13 +18,14 @@ constexpr std::string_view kRelationshipsExtension = "rels";
 constexpr std::string_view kXmlMediaType = "application/xml";
 
 // Enters a type under `key`. Saying the same twice does no harm, saying two things is refused.
+// Media types mean the same in any case.
 template <class Map>
 void enter(Map& types, std::string key, std::string_view mediaType) {
     if (mediaType.empty()) {
         throw std::runtime_error("has an empty content type for " + quoted(key));
     }
     const auto [place, isNew] = types.try_emplace(std::move(key), mediaType);
-    if (!isNew && place->second != mediaType) {
+    if (!isNew && toLowerAscii(place->second) != toLowerAscii(mediaType)) {
         throw std::runtime_error("has two content types for " + quoted(place->first));
     }
 }
@@ -45,19 +46,17 @@ void appendDefault(std::string& xml, std::string_view extension, std::string_vie
 
 }  // namespace
 
-ContentTypes ContentTypes::parse(std::vector<std::uint8_t> xml) {
+ContentTypes ContentTypes::parse(std::span<const std::uint8_t> xml) {
     ContentTypes types;
-    forEachElement(std::move(xml), "Types", kContentTypesNamespace,
-                   [&](std::string_view name, const pugi::xml_node& element) {
-                       if (name == "Default") {
-                           enter(types.byExtension_,
-                                 partNameKey(requiredAttribute(element, "Extension")),
-                                 requiredAttribute(element, "ContentType"));
-                       } else if (name == "Override") {
-                           enter(types.byName_, partNameKey(requiredAttribute(element, "PartName")),
-                                 requiredAttribute(element, "ContentType"));
-                       }
-                   });
+    forEachElement(xml, "Types", contentTypesNamespace, [&](const XmlElement& element) {
+        if (element.localName() == "Default") {
+            enter(types.byExtension_, partNameKey(element.requiredAttribute("Extension")),
+                  element.requiredAttribute("ContentType"));
+        } else if (element.localName() == "Override") {
+            enter(types.byName_, partNameKey(element.requiredAttribute("PartName")),
+                  element.requiredAttribute("ContentType"));
+        }
+    });
     return types;
 }
 
@@ -103,7 +102,7 @@ std::map<std::string, std::string> ContentTypesBuilder::defaults() const {
 
 std::string ContentTypesBuilder::xml() const {
     const std::map<std::string, std::string> byExtension = defaults();
-    std::string xml = xmlStart("Types", kContentTypesNamespace);
+    std::string xml = xmlStart("Types", contentTypesNamespace);
     for (const auto& [extension, mediaType] : byExtension) {
         appendDefault(xml, extension, mediaType);
     }

@@ -5,6 +5,7 @@
 
 #include <cstdint>
 #include <map>
+#include <span>
 #include <string>
 #include <string_view>
 #include <unordered_map>
@@ -16,7 +17,7 @@ class ContentTypes {
 public:
     /// Reads [Content_Types].xml. Throws std::runtime_error saying what is wrong with it when it is
     /// not what it should be, or gives one part or one extension two types.
-    static ContentTypes parse(std::vector<std::uint8_t> xml);
+    static ContentTypes parse(std::span<const std::uint8_t> xml);
 
     /// The media type of the part `name`, compared without case; null if it has none. Valid as long
     /// as this object.

@@ -24,11 +24,6 @@ constexpr std::uint64_t kMaxPartBytes = 1024 * kMebibyte;
 /// Bytes of all entries together, expanded.
 constexpr std::uint64_t kMaxTotalBytes = 2048 * kMebibyte;
 
-/// Bytes of the content types or of one relationships part, whose XML trees take a multiple of
-/// that: the content types of kMaxEntries parts, or the links of a worksheet full of them, are some
-/// 15 MB.
-constexpr std::uint64_t kMaxPackageXmlBytes = 32 * kMebibyte;
-
 /// Expanded bytes per byte of the archive. Sheets full of equal cells reach 150, archives made to
 /// fill memory 1000 and more.
 constexpr std::uint64_t kMaxExpansionRatio = 256;

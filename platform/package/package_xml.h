@@ -1,33 +1,58 @@
 // SPDX-License-Identifier: Apache-2.0
 // The XML of the package itself, content types and relationships: small documents of one level,
 // whose elements are told by namespace and local name and whose attributes have no namespace.
+//
+// It is read strictly. What one reader refuses and another one guesses the meaning of is a way to
+// hide something in a package.
 #pragma once
 
 #include <cstdint>
 #include <functional>
-#include <pugixml.hpp>
+#include <optional>
+#include <span>
 #include <string>
 #include <string_view>
-#include <vector>
 
 namespace platform::package {
 
-constexpr std::string_view kContentTypesNamespace =
+constexpr std::string_view contentTypesNamespace =
     "http://schemas.openxmlformats.org/package/2006/content-types";
-constexpr std::string_view kRelationshipsNamespace =
+constexpr std::string_view relationshipsNamespace =
     "http://schemas.openxmlformats.org/package/2006/relationships";
 
-/// Parses `bytes` (in any Unicode encoding) and calls `visit` for each child element of the root
-/// that is in `namespaceUri`, with its local name. Throws std::runtime_error when the bytes are not
-/// well-formed XML, have a document type declaration, which packages may not have, or another root
-/// than `root` in `namespaceUri`; what `visit` throws passes through.
-void forEachElement(
-    std::vector<std::uint8_t> bytes, std::string_view root, std::string_view namespaceUri,
-    const std::function<void(std::string_view localName, const pugi::xml_node& element)>& visit);
+/// Bytes of the content types or of one relationships part that are accepted: the content types of
+/// as many parts as an archive may have, or the links of a worksheet full of them, are some 15 MB.
+constexpr std::uint64_t maxPackageXmlBytes = std::uint64_t{32} << 20U;
 
-/// The value of the attribute `name` of `element`. Throws std::runtime_error naming the attribute
-/// when there is none.
-std::string_view requiredAttribute(const pugi::xml_node& element, const char* name);
+/// An element while it is visited. What it returns is UTF-8 and valid for that long.
+class XmlElement {
+public:
+    /// `attributes` are names and values by turns, with a null pointer behind the last.
+    XmlElement(std::string_view localName, const char* const* attributes)
+        : localName_(localName), attributes_(attributes) {}
+
+    std::string_view localName() const noexcept { return localName_; }
+
+    /// The value of the attribute `name`, which has no namespace; nothing if there is none.
+    std::optional<std::string_view> attribute(std::string_view name) const;
+
+    /// The same. Throws std::runtime_error naming element and attribute if there is none.
+    std::string_view requiredAttribute(std::string_view name) const;
+
+private:
+    std::string_view localName_;
+    const char* const* attributes_;
+};
+
+/// Parses `xml`, in UTF-8 or UTF-16, and calls `visit` for each child element of the root that is
+/// in `namespaceUri`. Throws std::runtime_error when the bytes are not well-formed XML with
+/// namespaces, are in another encoding, have a document type declaration, which packages may not
+/// have, are nested deeper than any package's, or have another root than `root` in `namespaceUri`;
+/// what `visit` throws passes through. `visit` may have been called before that is noticed. Takes
+/// time in proportion to `xml`, and no memory for what was visited.
+void forEachElement(std::span<const std::uint8_t> xml, std::string_view root,
+                    std::string_view namespaceUri,
+                    const std::function<void(const XmlElement& element)>& visit);
 
 /// The start of a document whose root is `root` in `namespaceUri`: declaration and root tag.
 std::string xmlStart(std::string_view root, std::string_view namespaceUri);

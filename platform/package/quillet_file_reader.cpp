@@ -17,6 +17,7 @@
 #include "platform/package/about.h"
 #include "platform/package/content_types.h"
 #include "platform/package/limits.h"
+#include "platform/package/package_xml.h"
 #include "platform/package/part_name.h"
 #include "platform/package/relationships.h"
 #include "platform/package/zip/zip_archive.h"
@@ -47,9 +48,9 @@ std::string partNameOf(const ZipArchive::Entry& entry) {
     return name.starts_with('/') ? name : "/" + name;
 }
 
-// Puts the fragments of `item` in order. Throws when it has one twice or lacks one.
-void order(Item& item) {
-    std::vector<Fragment>& fragments = item.fragments;
+// The fragments of `item` in their order. Throws when it has one twice or lacks one.
+std::vector<Fragment> orderedFragments(const Item& item) {
+    std::vector<Fragment> fragments = item.fragments;
     std::sort(fragments.begin(), fragments.end(),
               [](const Fragment& a, const Fragment& b) { return a.number < b.number; });
     const auto sameNumber = [](const Fragment& a, const Fragment& b) {
@@ -63,6 +64,7 @@ void order(Item& item) {
             throw std::runtime_error("lacks pieces of the interleaved part " + quoted(item.name));
         }
     }
+    return fragments;
 }
 
 // The archive as the Open Packaging Conventions see it.
@@ -75,7 +77,6 @@ public:
                 add(name, entry);
             }
         }
-        std::for_each(items_.begin(), items_.end(), order);
     }
 
     QuilletFilePackage read() {
@@ -84,7 +85,7 @@ public:
             throw std::runtime_error("is not a document package: it has no [Content_Types].xml");
         }
         const ContentTypes types = about("has a broken [Content_Types].xml, which", [&] {
-            return ContentTypes::parse(contentOf(*typesItem, limits::kMaxPackageXmlBytes));
+            return ContentTypes::parse(contentOf(*typesItem, maxPackageXmlBytes));
         });
         std::vector<Part> parts;
         for (const Item& item : items_) {
@@ -114,8 +115,9 @@ private:
     }
 
     std::vector<std::uint8_t> contentOf(const Item& item, std::uint64_t maxSize) {
+        const std::vector<Fragment> fragments = orderedFragments(item);
         std::uint64_t size = 0;
-        for (const Fragment& fragment : item.fragments) {
+        for (const Fragment& fragment : fragments) {
             size += fragment.entry->size;
         }
         if (size > maxSize) {
@@ -124,7 +126,7 @@ private:
         }
         std::vector<std::uint8_t> content(size);
         std::span<std::uint8_t> rest = content;
-        for (const Fragment& fragment : item.fragments) {
+        for (const Fragment& fragment : fragments) {
             archive_.read(*fragment.entry, rest.first(fragment.entry->size));
             rest = rest.subspan(fragment.entry->size);
         }
@@ -151,9 +153,8 @@ private:
         if (item == nullptr) {
             return {};
         }
-        return about("has a broken relationships part: " + quoted(item->name), [&] {
-            return parseRelationships(contentOf(*item, limits::kMaxPackageXmlBytes));
-        });
+        return about("has a broken relationships part: " + quoted(item->name),
+                     [&] { return parseRelationships(contentOf(*item, maxPackageXmlBytes)); });
     }
 
     ZipArchive archive_;

@@ -181,7 +181,7 @@ private:
     }
 
     static void addXml(ZipWriter& zip, std::string_view name, const std::string& xml) {
-        if (xml.size() > limits::kMaxPackageXmlBytes) {
+        if (xml.size() > maxPackageXmlBytes) {
             throw std::runtime_error("has too many parts or relationships");
         }
         addEntry(zip, name, {reinterpret_cast<const std::uint8_t*>(xml.data()), xml.size()}, true);

@@ -3,7 +3,6 @@
 
 #include <stdexcept>
 #include <unordered_set>
-#include <utility>
 
 #include "platform/i18n/codecvt.h"
 #include "platform/package/about.h"
@@ -30,31 +29,29 @@ void check(const std::string& id, std::string_view type, Ids& ids) {
 
 }  // namespace
 
-std::vector<Relationship> parseRelationships(std::vector<std::uint8_t> xml) {
+std::vector<Relationship> parseRelationships(std::span<const std::uint8_t> xml) {
     std::vector<Relationship> relationships;
     Ids ids;
-    forEachElement(std::move(xml), "Relationships", kRelationshipsNamespace,
-                   [&](std::string_view name, const pugi::xml_node& element) {
-                       if (name != "Relationship") {
-                           return;
-                       }
-                       const std::string id(requiredAttribute(element, "Id"));
-                       const std::string_view type = requiredAttribute(element, "Type");
-                       check(id, type, ids);
-                       Relationship& relationship = relationships.emplace_back();
-                       relationship.relationshipId = i18n::to_ustring(id);
-                       relationship.relationshipType = i18n::to_ustring(type);
-                       relationship.target = i18n::to_ustring(requiredAttribute(element, "Target"));
-                       const std::string_view mode = element.attribute("TargetMode").value();
-                       relationship.targetMode = mode == "External" ? 0 : 1;
-                   });
+    forEachElement(xml, "Relationships", relationshipsNamespace, [&](const XmlElement& element) {
+        if (element.localName() != "Relationship") {
+            return;
+        }
+        const std::string id(element.requiredAttribute("Id"));
+        const std::string_view type = element.requiredAttribute("Type");
+        check(id, type, ids);
+        Relationship& relationship = relationships.emplace_back();
+        relationship.relationshipId = i18n::to_ustring(id);
+        relationship.relationshipType = i18n::to_ustring(type);
+        relationship.target = i18n::to_ustring(element.requiredAttribute("Target"));
+        relationship.targetMode = element.attribute("TargetMode") == "External" ? 0 : 1;
+    });
     return relationships;
 }
 
 std::string relationshipsXml(
     const std::vector<Relationship>& relationships,
     const std::function<bool(const Relationship&, std::string_view)>& isExternal) {
-    std::string xml = xmlStart("Relationships", kRelationshipsNamespace);
+    std::string xml = xmlStart("Relationships", relationshipsNamespace);
     Ids ids;
     for (const Relationship& relationship : relationships) {
         const std::string id = i18n::to_string(relationship.relationshipId);

@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <functional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -17,7 +18,7 @@ constexpr std::string_view kRelationshipsMediaType =
 
 /// Reads a relationships part. Targets are kept as they stand. Throws std::runtime_error saying
 /// what is wrong with it when it is not what it should be, or has two relationships of one id.
-std::vector<QuilletFilePackage::Relationship> parseRelationships(std::vector<std::uint8_t> xml);
+std::vector<QuilletFilePackage::Relationship> parseRelationships(std::span<const std::uint8_t> xml);
 
 /// The relationships part for `relationships`. Those of which `isExternal` is true are written as
 /// external. Throws std::runtime_error naming the relationship when it has no id or no type, its id

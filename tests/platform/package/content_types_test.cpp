@@ -107,7 +107,8 @@ TEST(ContentTypes, FindWhatTheBuilderWrote) {
     }
     builder.addRelationships();
     const std::string xml = builder.xml();
-    const ContentTypes types = ContentTypes::parse({xml.begin(), xml.end()});
+    const ContentTypes types =
+        ContentTypes::parse(std::vector<std::uint8_t>(xml.begin(), xml.end()));
     for (const auto& [name, type] : parts) {
         ASSERT_NE(types.find(name), nullptr) << name;
         EXPECT_EQ(*types.find(name), type) << name;

@@ -106,6 +106,23 @@ TEST_F(QuilletFileReaderTest, DoesNotReadWhatItLeavesOut) {
     EXPECT_THAT(namesOf(readUsual({broken, encrypted})), IsEmpty());
 }
 
+TEST_F(QuilletFileReaderTest, IsNotDisturbedByNamesOfWhatItLeavesOut) {
+    EXPECT_THAT(namesOf(readUsual({{"x.foo", "1"}, {"X.FOO", "2"}, {"c.xml", "<c/>"}})),
+                ElementsAre(u"/c.xml"));
+    EXPECT_THAT(namesOf(readUsual({{"a.foo/[0].piece", "1"},
+                                   {"b.foo/[1].last.piece", "1"},
+                                   {"b.foo", "1"},
+                                   {"c.xml", "<c/>"}})),
+                ElementsAre(u"/c.xml"));
+}
+
+TEST_F(QuilletFileReaderTest, RefusesRelationshipsThatAreThereTwice) {
+    expectRefused(usualPackage({{"a.xml", "<a/>"},
+                                {"_rels/a.xml.rels", relationshipsXmlOf("")},
+                                {"_RELS/a.xml.rels", relationshipsXmlOf("")}}),
+                  "has two entries named \"/_rels/a.xml.rels\"");
+}
+
 TEST_F(QuilletFileReaderTest, LeavesOutFoldersAndTrash) {
     const auto package =
         readUsual({{"word/", ""}, {"[trash]/0000.xml", "x"}, {"word\\x.xml/", ""}});
@@ -206,7 +223,7 @@ TEST_F(QuilletFileReaderTest, TakesEachAttributeAndElementOfPackageXmlOnce) {
         " xmlns='http://schemas.openxmlformats.org/package/2006/content-types'>"
         "<Default Extension='txt' ContentType='a/b'/>";
     for (int i = 0; i < 500'000; ++i) {
-        xml += "<p1:x/><y:x/>";
+        xml += "<p1:x/><p2:x/>";
     }
     xml += "</Types>";
     EXPECT_EQ(read(buildZip({{"[Content_Types].xml", xml}, {"a.txt", ""}})).parts().size(), 1U);
@@ -314,11 +331,19 @@ TEST_F(QuilletFileReaderTest, RefusesBrokenContentTypes) {
 TEST_F(QuilletFileReaderTest, AcceptsAContentTypeThatIsGivenTwice) {
     EXPECT_EQ(read(buildZip({{"[Content_Types].xml",
                               typesXml("<Override PartName='/a' ContentType='a/b'/>"
-                                       "<Override PartName='/A' ContentType='a/b'/>")},
+                                       "<Override PartName='/A' ContentType='A/b'/>")},
                              {"a", "x"}}))
                   .parts()
                   .size(),
               1U);
+    EXPECT_EQ(read(buildZip({{"[Content_Types].xml",
+                              typesXml("<Default Extension='x' ContentType='image/png'/>"
+                                       "<Default Extension='X' ContentType='Image/PNG'/>")},
+                             {"a.x", "x"}}))
+                  .parts()
+                  .at(0)
+                  .contentType,
+              u"image/png");
 }
 
 TEST_F(QuilletFileReaderTest, RefusesBrokenRelationships) {
