@@ -7,6 +7,7 @@
 #include "platform/i18n/charsets/charset_names.h"
 #include "platform/i18n/charsets/conversion_error.h"
 #include "platform/i18n/charsets/duplicate_codes.h"
+#include "platform/i18n/charsets/hz.h"
 #include "platform/i18n/charsets/icu_charset.h"
 #include "platform/i18n/charsets/johab.h"
 #include "platform/i18n/charsets/table_charset.h"
@@ -36,6 +37,9 @@ std::unique_ptr<Charset> makeCharset(const std::string& name, bool strict) {
     const std::string converter = converterName(name).value_or("");
     if (converter.empty()) {
         return nullptr;
+    }
+    if (converter == "HZ") {
+        return makeHz(name, strict);
     }
     if (converter == "UTF-8") {
         return makeUtf8(name, strict);

@@ -2,6 +2,8 @@
 // The texts of failed conversions, the same for every charset.
 #include "platform/i18n/charsets/conversion_error.h"
 
+#include <unicode/utf16.h>
+
 #include <cstdio>
 #include <stdexcept>
 #include <string>
@@ -46,6 +48,22 @@ void throwUnmappable(std::string_view charset, char32_t character, std::size_t o
 void throwUnpairedSurrogate(std::string_view charset, std::size_t offset) {
     throw std::runtime_error(cannotEncode(charset) + "unpaired surrogate at code unit " +
                              std::to_string(offset));
+}
+
+bool startsWithPair(std::u16string_view text) {
+    return text.size() > 1 && U16_IS_LEAD(text[0]) && U16_IS_TRAIL(text[1]);
+}
+
+void throwCannotEncode(std::string_view charset, std::u16string_view text, std::size_t offset) {
+    const char16_t unit = text[offset];
+    if (startsWithPair(text.substr(offset))) {
+        throwUnmappable(
+            charset, static_cast<char32_t>(U16_GET_SUPPLEMENTARY(unit, text[offset + 1])), offset);
+    }
+    if (U16_IS_SURROGATE(unit)) {
+        throwUnpairedSurrogate(charset, offset);
+    }
+    throwUnmappable(charset, unit, offset);
 }
 
 void throwUnknownCharset(std::string_view name) {

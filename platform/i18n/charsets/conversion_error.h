@@ -19,6 +19,14 @@ namespace platform::i18n::detail {
 /// Throws std::runtime_error: code unit `offset` is a surrogate without its other half.
 [[noreturn]] void throwUnpairedSurrogate(std::string_view charset, std::size_t offset);
 
+/// Whether `text` begins with a surrogate pair.
+bool startsWithPair(std::u16string_view text);
+
+/// Throws what says why the character at code unit `offset` of `text` cannot be encoded: it is an
+/// unpaired surrogate, or has no place in `charset`.
+[[noreturn]] void throwCannotEncode(std::string_view charset, std::u16string_view text,
+                                    std::size_t offset);
+
 /// Throws std::runtime_error: there is no charset of this name. A name that is long or not plain
 /// text is shortened, so that the message stays one readable line.
 [[noreturn]] void throwUnknownCharset(std::string_view name);

@@ -11,7 +11,6 @@
 #include "platform/i18n/charsets/johab.h"
 
 #include <unicode/ucnv.h>
-#include <unicode/utf16.h>
 
 #include <algorithm>
 #include <array>
@@ -22,6 +21,7 @@
 
 #include "platform/i18n/charsets/charset_names.h"
 #include "platform/i18n/charsets/conversion_error.h"
+#include "platform/i18n/charsets/row_table.h"
 
 namespace platform::i18n::detail {
 
@@ -119,33 +119,41 @@ constexpr bool isTrail(unsigned byte) {
     return (byte >= 0x31 && byte <= 0x7E) || (byte >= 0x91 && byte <= 0xFE);
 }
 
-// The EUC-KR code of the symbol or ideograph with this code; empty when it is none.
-std::string rowCode(unsigned lead, unsigned trail) {
+const RowTable& ksX1001() {
+    static const RowTable table("EUC-KR");
+    return table;
+}
+
+// The symbol or ideograph with this code.
+std::optional<char16_t> rowCharacter(unsigned lead, unsigned trail) {
     const bool symbol = lead >= 0xD9 && lead <= 0xDE;
     if (!isTrail(trail) || (!symbol && (lead < 0xE0 || lead > 0xF9))) {
-        return {};
+        return std::nullopt;
     }
     const unsigned cell = trail < 0x91 ? trail - 0x31 : trail - 0x43;
     const unsigned row = (symbol ? 0x21 + 2 * (lead - 0xD9) : 0x4A + 2 * (lead - 0xE0)) + cell / 94;
-    return {static_cast<char>(row | 0x80), static_cast<char>((cell % 94 + 0x21) | 0x80)};
+    return ksX1001().character(row, cell % 94 + 0x21);
 }
 
-// The other way; empty when the row has no place.
-std::string codeOfRow(unsigned row, unsigned column) {
-    const bool symbol = row >= 0x21 && row <= 0x2C;
-    if (!symbol && (row < 0x4A || row > 0x7D)) {
+// The other way; empty when the character is neither.
+std::string rowCode(char16_t character) {
+    const std::optional<RowTable::Place> place = ksX1001().place(character);
+    if (!place) {
+        return {};
+    }
+    const bool symbol = place->row >= 0x21 && place->row <= 0x2C;
+    if (!symbol && (place->row < 0x4A || place->row > 0x7D)) {
         return {};
     }
     const unsigned first = symbol ? 0x21 : 0x4A;
-    const unsigned lead = (symbol ? 0xD9U : 0xE0U) + (row - first) / 2;
-    const unsigned cell = (row - first) % 2 * 94 + column - 0x21;
+    const unsigned lead = (symbol ? 0xD9U : 0xE0U) + (place->row - first) / 2;
+    const unsigned cell = (place->row - first) % 2 * 94 + place->column - 0x21;
     return {static_cast<char>(lead), static_cast<char>(cell < 78 ? cell + 0x31 : cell + 0x43)};
 }
 
 class Johab final : public Charset {
 public:
-    Johab(std::string name, bool strict)
-        : name_(std::move(name)), strict_(strict), rows_(openCharset("EUC-KR", false)) {}
+    Johab(std::string name, bool strict) : name_(std::move(name)), strict_(strict) {}
 
     std::u16string decode(std::string_view bytes) override {
         std::u16string text;
@@ -181,19 +189,17 @@ public:
                 bytes += code;
                 continue;
             }
-            const bool pair =
-                U16_IS_LEAD(text[i]) && i + 1 < text.size() && U16_IS_TRAIL(text[i + 1]);
             if (strict_) {
-                fail(text, i, pair);
+                throwCannotEncode(name_, text, i);
             }
             bytes += '?';
-            i += pair ? 1 : 0;
+            i += startsWithPair(text.substr(i)) ? 1 : 0;
         }
         return bytes;
     }
 
 private:
-    std::optional<char16_t> decodePair(std::string_view pair) const {
+    static std::optional<char16_t> decodePair(std::string_view pair) {
         if (pair.size() < 2) {
             return std::nullopt;
         }
@@ -202,53 +208,19 @@ private:
         if (lead >= 0x84 && lead <= 0xD3) {
             return composed(static_cast<unsigned>(lead << 8 | trail));
         }
-        const std::string code = rowCode(lead, trail);
-        if (code.empty()) {
-            return std::nullopt;
-        }
-        const std::u16string text = rows_->decode(code);
-        const bool holds = text.size() == 1 && text.front() != 0xFFFD && !isPrivate(text.front());
-        return holds ? std::optional(text.front()) : std::nullopt;
+        return rowCharacter(lead, trail);
     }
 
-    std::string encodeOne(char16_t character) const {
+    static std::string encodeOne(char16_t character) {
         if (character < 0x80) {
             return std::string(1, static_cast<char>(character));
         }
-        if (std::string code = composedCode(character); !code.empty()) {
-            return code;
-        }
-        if (isPrivate(character) || U16_IS_SURROGATE(character)) {
-            return {};
-        }
-        const std::string code = rows_->encode({&character, 1});
-        if (code.size() != 2) {
-            return {};
-        }
-        const auto row = static_cast<unsigned char>(code[0]);
-        const auto column = static_cast<unsigned char>(code[1]);
-        return row > 0xA0 && column > 0xA0 ? codeOfRow(row & 0x7FU, column & 0x7FU) : std::string();
-    }
-
-    static bool isPrivate(char16_t character) { return character >= 0xE000 && character < 0xF900; }
-
-    [[noreturn]] void fail(std::u16string_view text, std::size_t position, bool pair) const {
-        const char16_t unit = text[position];
-        if (pair) {
-            throwUnmappable(name_,
-                            static_cast<char32_t>(U16_GET_SUPPLEMENTARY(unit, text[position + 1])),
-                            position);
-        }
-        if (U16_IS_SURROGATE(unit)) {
-            throwUnpairedSurrogate(name_, position);
-        }
-        throwUnmappable(name_, unit, position);
+        const std::string code = composedCode(character);
+        return code.empty() ? rowCode(character) : code;
     }
 
     std::string name_;
     bool strict_;
-    // Symbols and ideographs, in the layout of EUC-KR.
-    std::unique_ptr<Charset> rows_;
 };
 
 }  // namespace

@@ -3,7 +3,6 @@
 #include "platform/i18n/charsets/table_charset.h"
 
 #include <unicode/ucnv.h>
-#include <unicode/utf16.h>
 
 #include <algorithm>
 #include <array>
@@ -98,30 +97,12 @@ private:
             return static_cast<char>(found - table_.begin());
         }
         if (strict_) {
-            failEncoding(text, position);
+            throwCannotEncode(name_, text, position);
         }
-        if (isPair(text, position)) {
+        if (startsWithPair(text.substr(position))) {
             ++position;
         }
         return '?';
-    }
-
-    [[noreturn]] void failEncoding(std::u16string_view text, std::size_t position) const {
-        const char16_t unit = text[position];
-        if (isPair(text, position)) {
-            throwUnmappable(name_,
-                            static_cast<char32_t>(U16_GET_SUPPLEMENTARY(unit, text[position + 1])),
-                            position);
-        }
-        if (U16_IS_SURROGATE(unit)) {
-            throwUnpairedSurrogate(name_, position);
-        }
-        throwUnmappable(name_, unit, position);
-    }
-
-    static bool isPair(std::u16string_view text, std::size_t position) {
-        return U16_IS_LEAD(text[position]) && position + 1 < text.size() &&
-               U16_IS_TRAIL(text[position + 1]);
     }
 
     std::string name_;

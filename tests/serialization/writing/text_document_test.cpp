@@ -90,6 +90,21 @@ TEST_F(TextDocumentWriting, OfTextThatIsNotInTheCharsetIsRefusedWithTheFileUntou
     EXPECT_EQ(readFile(path), "old");
 }
 
+TEST_F(TextDocumentWriting, OfMalformedHzIsRefusedWithTheFileUntouched) {
+    writeFile(path, "KEEP");
+    for (const char* malformed : {"~{::W", "~{::\xFF", "~}", "abc~", "~{a", "~{", "~{::", "a~b"}) {
+        EXPECT_FALSE(write(malformed, "HZ-GB-2312")) << malformed;
+        EXPECT_EQ(readFile(path), "KEEP") << malformed;
+    }
+}
+
+TEST_F(TextDocumentWriting, OfHzStoresItsBytes) {
+    for (const char* text : {"abc", "~~", "~{::~}", "a~{::VW~}~~\n~{::~}\n"}) {
+        EXPECT_TRUE(write(text, "HZ-GB-2312")) << text;
+        EXPECT_EQ(readFile(path), text);
+    }
+}
+
 TEST_F(TextDocumentWriting, ToAPathThatCannotBeOpenedIsRefused) {
     EXPECT_FALSE(service.writeTextDocument(to_ustring((folder / "no/such/folder").string()), "text",
                                            "UTF-8"));
