@@ -13,6 +13,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstdio>
+#include <optional>
 #include <stdexcept>
 #include <system_error>
 #include <utility>
@@ -76,11 +77,17 @@ std::string randomName() {
     return name.data();
 }
 
+// A path that leads to the file of `descriptor`, wherever that file is by now. Unlike the
+// descriptor of a file that was opened without reading it, it can be asked for extended attributes.
+std::string pathTo(const FileDescriptor& descriptor) {
+    return "/proc/self/fd/" + std::to_string(descriptor.get());
+}
+
 // The value of the extended attribute `name` of the file at `path`, or nothing, with the reason in
 // errno, if it cannot be had.
 std::optional<std::string> attributeOf(const std::string& path, const char* name) {
     std::string value(kMaxAttributeSize, '\0');
-    const ssize_t size = ::lgetxattr(path.c_str(), name, value.data(), value.size());
+    const ssize_t size = ::getxattr(path.c_str(), name, value.data(), value.size());
     if (size < 0) {
         return std::nullopt;
     }
@@ -91,7 +98,7 @@ std::optional<std::string> attributeOf(const std::string& path, const char* name
 // The names of the extended attributes of the file at `path`; none where there is no such thing.
 std::vector<std::string> attributeNamesOf(const std::string& path) {
     std::string list(kMaxAttributeSize, '\0');
-    const ssize_t size = ::llistxattr(path.c_str(), list.data(), list.size());
+    const ssize_t size = ::listxattr(path.c_str(), list.data(), list.size());
     list.resize(static_cast<std::size_t>(std::max<ssize_t>(size, 0)));
     std::vector<std::string> names;
     for (std::size_t at = 0; at < list.size(); at += names.back().size() + 1) {
@@ -108,9 +115,10 @@ bool isLasting(const std::string& attributeName) {
 
 }  // namespace
 
-AtomicFile::AtomicFile(const std::string& path) : targetPath_(followLinks(path)) {
-    const std::string folder = folderOf(targetPath_);
-    targetName_ = targetPath_.substr(folder.size());
+AtomicFile::AtomicFile(const std::string& path) {
+    const std::string targetPath = followLinks(path);
+    const std::string folder = folderOf(targetPath);
+    targetName_ = targetPath.substr(folder.size());
     if (targetName_.empty() || targetName_ == "." || targetName_ == "..") {
         throw std::runtime_error(path.empty() ? "has no name" : "is a folder");
     }
@@ -141,22 +149,29 @@ void AtomicFile::openFolder(const std::string& folder) {
     }
 }
 
-// Replacing a file needs no permission to write it, so that is asked for.
+// The target is held, so that all that the new file takes over is that of one file, even if another
+// folder or file is put at its path meanwhile. Holding it opens it neither for reading, which may
+// not be allowed, nor for writing. Replacing a file needs no permission to write it, so that is
+// asked for.
 void AtomicFile::examineTarget() {
+    FileDescriptor target(uninterrupted([&] {
+        return ::openat(folder_.get(), targetName_.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC);
+    }));
+    if (!target && errno == ENOENT) {
+        return;
+    }
     struct stat status {};
-    if (::fstatat(folder_.get(), targetName_.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
-        if (errno == ENOENT) {
-            return;
-        }
+    if (!target || ::fstat(target.get(), &status) != 0) {
         failForSystem("cannot be examined");
     }
     if (!S_ISREG(status.st_mode)) {
         throw std::runtime_error(S_ISDIR(status.st_mode) ? "is a folder" : "is not a regular file");
     }
-    if (::faccessat(folder_.get(), targetName_.c_str(), W_OK, AT_EACCESS) != 0) {
+    if (::faccessat(AT_FDCWD, pathTo(target).c_str(), W_OK, AT_EACCESS) != 0) {
         failForSystem("may not be written");
     }
-    target_ = status;
+    target_ = std::move(target);
+    targetStatus_ = status;
 }
 
 // The content of an existing document stays private until its permissions are known to be right; a
@@ -250,11 +265,11 @@ mode_t AtomicFile::takeOverOwner() {
         }
         return false;
     };
-    const mode_t mode = target_->st_mode;
-    if (change(target_->st_uid, target_->st_gid)) {
+    const mode_t mode = targetStatus_.st_mode;
+    if (change(targetStatus_.st_uid, targetStatus_.st_gid)) {
         return mode & 07777U;
     }
-    if (change(static_cast<uid_t>(-1), target_->st_gid)) {
+    if (change(static_cast<uid_t>(-1), targetStatus_.st_gid)) {
         return mode & 01777U;
     }
     const mode_t forAll = mode & (mode >> 3U) & 07U;
@@ -263,8 +278,9 @@ mode_t AtomicFile::takeOverOwner() {
 
 // Attributes are copied as far as the system lets them be.
 void AtomicFile::takeOverAttributes() {
-    for (const std::string& name : attributeNamesOf(targetPath_)) {
-        const auto value = isLasting(name) ? attributeOf(targetPath_, name.c_str()) : std::nullopt;
+    for (const std::string& name : attributeNamesOf(pathTo(target_))) {
+        const auto value =
+            isLasting(name) ? attributeOf(pathTo(target_), name.c_str()) : std::nullopt;
         if (value) {
             ::fsetxattr(temporary_.get(), name.c_str(), value->data(), value->size(), 0);
         }
@@ -276,7 +292,7 @@ void AtomicFile::takeOverAttributes() {
 void AtomicFile::takeOverAccessControlList() {
     const auto hasNone = [] { return errno == ENODATA || errno == ENOTSUP; };
     bool done = false;
-    if (const auto list = attributeOf(targetPath_, kAccessControlList)) {
+    if (const auto list = attributeOf(pathTo(target_), kAccessControlList)) {
         done =
             ::fsetxattr(temporary_.get(), kAccessControlList, list->data(), list->size(), 0) == 0;
     } else if (hasNone()) {

@@ -5,7 +5,6 @@
 
 #include <sys/stat.h>
 
-#include <optional>
 #include <string>
 #include <string_view>
 
@@ -57,10 +56,10 @@ private:
 
     FileDescriptor folder_;
     bool folderCanSync_ = true;
-    std::string targetPath_;             // links followed
-    std::string targetName_;             // in folder_
-    std::optional<struct stat> target_;  // of the file to be replaced, if there is one
-    std::string temporaryName_;          // in folder_; empty once it is gone
+    std::string targetName_;       // in folder_, links followed
+    FileDescriptor target_;        // the file to be replaced, if there is one; only points at it
+    struct stat targetStatus_ {};  // of target_
+    std::string temporaryName_;    // in folder_; empty once it is gone
     FileDescriptor temporary_;
     std::string buffer_;
 };
