@@ -10,9 +10,10 @@ set(CMAKE_CXX_VISIBILITY_PRESET hidden)
 set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
 set(CMAKE_EXPORT_COMPILE_COMMANDS ON)
 
-# Everything that runs lands in two folders, so that a host finds the bundle beside it.
-set(CMAKE_RUNTIME_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/bin")
-set(CMAKE_LIBRARY_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/lib")
+# Everything that runs lands in two folders, which lie to each other as in an installation, so that
+# programs find libraries and bundles in the same way in both.
+set(CMAKE_RUNTIME_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/${CMAKE_INSTALL_BINDIR}")
+set(CMAKE_LIBRARY_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/${CMAKE_INSTALL_LIBDIR}")
 
 option(EDITOR_SERIALIZATION_WARNINGS_AS_ERRORS "Treat compiler warnings as errors" ON)
 set(EDITOR_SERIALIZATION_SANITIZERS "" CACHE STRING "Sanitizers to build with, as for -fsanitize=")
@@ -51,6 +52,18 @@ function(project_hardening target)
   endif()
   target_compile_options(${target} PRIVATE "$<$<CONFIG:Release>:${options}>")
   target_link_options(${target} PRIVATE "$<$<CONFIG:Release>:LINKER:-z,relro,-z,now>")
+endfunction()
+
+# project_run_path(<target> FOLDER...)
+#
+# Has the loader look for the target's libraries in these folders, in the build tree and where it is
+# installed. A path that differed would be rewritten by the installation, and CMake ends those in a build
+# tree with an empty entry: the loader takes that for the current folder, and runs whatever library lies
+# there.
+function(project_run_path target)
+  set_target_properties(${target} PROPERTIES
+    BUILD_WITH_INSTALL_RPATH ON
+    INSTALL_RPATH "${ARGN}")
 endfunction()
 
 # project_library(<name> [STATIC|SHARED] [SOURCES ...] [LINKS ...] [PRIVATE_LINKS ...])

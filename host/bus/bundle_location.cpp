@@ -18,7 +18,8 @@ std::filesystem::path programFolder() {
 
 std::filesystem::path findBundle() {
     // From the program's folder, the bundle's folder in a build tree and in an installation.
-    const std::array<std::filesystem::path, 2> bundleFolders = {"../lib", INSTALLED_BUNDLE_FOLDER};
+    const std::array<std::filesystem::path, 2> bundleFolders = {INSTALLED_LIBRARY_FOLDER,
+                                                                INSTALLED_BUNDLE_FOLDER};
     std::string places;
     for (const std::filesystem::path& folder : bundleFolders) {
         std::filesystem::path bundle =

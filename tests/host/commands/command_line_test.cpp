@@ -86,12 +86,15 @@ TEST(CommandLine, NamesABundleThatIsNoLibrary) {
     EXPECT_THAT(outcome.errors, AllOf(StartsWith("serialization_host: "), HasSubstr(file)));
 }
 
-// The program in a folder of its own, apart from its bundle.
+// The program in a folder of its own with the library that it is linked to, apart from its bundle.
 class CopiedProgram : public ::testing::Test {
 protected:
     CopiedProgram() {
+        const std::filesystem::path libraries = program_.parent_path() / INSTALLED_LIBRARY_FOLDER;
         std::filesystem::create_directories(program_.parent_path());
-        std::filesystem::copy_file(SERIALIZATION_HOST, program_);
+        std::filesystem::create_directories(libraries);
+        std::filesystem::copy(SERIALIZATION_HOST, program_);
+        std::filesystem::copy(MESSAGING_LIBRARY, libraries);
     }
 
     void copyBundleTo(const std::filesystem::path& folder) {
