@@ -5,6 +5,7 @@
 #include <spdlog/spdlog.h>
 
 #include <algorithm>
+#include <array>
 #include <cstddef>
 #include <cstdlib>
 #include <memory>
@@ -14,13 +15,15 @@
 #include <stdexcept>
 #include <string>
 #include <string_view>
+#include <system_error>
 #include <utility>
 
 #include "host/bus/bundle_host.h"
+#include "host/commands/document_kind.h"
 #include "host/commands/exit_status.h"
+#include "host/commands/package_text.h"
 #include "host/commands/standard_streams.h"
 #include "host/commands/stop_signals.h"
-#include "json/parser.h"
 #include "json/serialize.h"
 #include "json/value.h"
 #include "platform/data_buffer.h"
@@ -71,18 +74,6 @@ private:
     std::size_t length_ = 0;
 };
 
-// The text of the document package that `content` begins with, as a read request is answered with
-// it; or nothing.
-std::optional<std::string_view> packageIn(std::string_view content) {
-    json::Input input{content.data(), content.data() + content.size()};
-    json::Object document;
-    if (json::parseObject(input, document) == json::Status::success &&
-        document["parts"].is<json::Array>() && document["relationships"].is<json::Array>()) {
-        return content.substr(0, static_cast<std::size_t>(input.position - content.data()));
-    }
-    return std::nullopt;
-}
-
 // The text of `request` with a last member "content" of the JSON text `content`. The package, which
 // may be large, becomes part of the request as it stands.
 platform::DataBuffer withContent(json::Object request, std::string_view content) {
@@ -97,18 +88,62 @@ platform::DataBuffer withContent(json::Object request, std::string_view content)
     return text;
 }
 
-platform::DataBuffer requestFor(const WriteOptions& options, const Content& content) {
-    json::Object request{{"rtcId", "0"}, {"filePath", options.file}};
-    const bool mayBePackage =
-        options.contentType.empty() || options.contentType == packageContentType;
-    if (const auto document = mayBePackage ? packageIn(content.text()) : std::nullopt) {
-        request["contentType"] = packageContentType;
-        return withContent(std::move(request), *document);
+// Whether `file` is named as the document packages of office programs are.
+bool hasDocumentName(const std::filesystem::path& file) {
+    constexpr std::array extensions{".docm", ".docx", ".dotm", ".dotx", ".potm", ".potx", ".ppam",
+                                    ".ppsm", ".ppsx", ".pptm", ".pptx", ".sldm", ".sldx", ".vsdm",
+                                    ".vsdx", ".xlam", ".xlsb", ".xlsm", ".xlsx", ".xltm", ".xltx"};
+    std::string extension = file.extension();
+    std::transform(extension.begin(), extension.end(), extension.begin(),
+                   [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + 32) : c; });
+    return std::find(extensions.begin(), extensions.end(), extension) != extensions.end();
+}
+
+// Whether `file`, or what symbolic links lead to from there, is a document package or named as one.
+bool isForADocument(std::filesystem::path file) {
+    if (isDocumentPackage(file)) {
+        return true;
+    }
+    constexpr int mostLinks = 40;  // as many as the system follows
+    std::error_code isNoLink;
+    for (int links = 0; links < mostLinks && !isNoLink; ++links) {
+        if (hasDocumentName(file)) {
+            return true;
+        }
+        file = file.parent_path() / std::filesystem::read_symlink(file, isNoLink);
+    }
+    return false;
+}
+
+// The package in `content`; nothing when it is to be written as a text. Throws std::runtime_error
+// when it may be written as neither: a text in the place of a document would destroy that.
+std::optional<std::string_view> packageToWrite(const WriteOptions& options,
+                                               std::string_view content) {
+    if (!options.contentType.empty() && options.contentType != packageContentType) {
+        return std::nullopt;
+    }
+    PackageText package = findPackage(content);
+    if (package.fault.empty()) {
+        return package.json;
     }
     if (options.contentType == packageContentType) {
-        throw std::runtime_error(
-            "The content is no document package: JSON with the arrays \"parts\" "
-            "and \"relationships\" is expected");
+        throw std::runtime_error("the content is no document package: " + package.fault);
+    }
+    if (isForADocument(options.file)) {
+        throw std::runtime_error(options.file +
+                                 " is a document package, or named as one, and the content is "
+                                 "none: " +
+                                 package.fault +
+                                 ". To write it as a text nevertheless: --content-type text/plain");
+    }
+    return std::nullopt;
+}
+
+platform::DataBuffer requestFor(const WriteOptions& options, const Content& content) {
+    json::Object request{{"rtcId", "0"}, {"filePath", options.file}};
+    if (const auto package = packageToWrite(options, content.text())) {
+        request["contentType"] = packageContentType;
+        return withContent(std::move(request), *package);
     }
     request["contentType"] = options.contentType.empty() ? "text/plain" : options.contentType;
     request["encoding"] = options.encoding;

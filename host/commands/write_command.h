@@ -20,7 +20,8 @@ struct WriteOptions {
 /// `output`, followed by a line feed. Without a content type, a document package's JSON goes to the
 /// package writer and everything else is text. What fails is told on standard error. Returns the
 /// exit status. Throws when the bundle cannot be started, `input` not be read or `output` not be
-/// written.
+/// written, and when the content is no package but the file is one, or named as one: it stays as it
+/// is unless a content type says that a text is meant.
 int runWrite(const WriteOptions& options, int input, int output);
 
 }  // namespace host

@@ -97,6 +97,57 @@ TEST_F(WriteCommand, RefusesToMakeAPackageOfSomethingElse) {
     EXPECT_FALSE(std::filesystem::exists(folder_ / "file.docx"));
 }
 
+// Each of these was once written over the document.
+class NoPackage : public WriteCommand, public ::testing::WithParamInterface<std::string> {
+protected:
+    const std::string report_ = readFile(test::sourceRoot() + "/examples/report.docx");
+};
+
+TEST_P(NoPackage, IsNotWrittenOverADocument) {
+    for (const std::string name : {"report.docx", "another name"}) {
+        writeFile(folder_ / name, report_);
+        const Outcome outcome = write(folder_ / name, GetParam());
+        EXPECT_EQ(outcome.status, 1);
+        EXPECT_THAT(outcome.output, IsEmpty());
+        EXPECT_THAT(outcome.errors, HasSubstr(name + " is a document package"));
+        EXPECT_THAT(outcome.errors, HasSubstr("--content-type text/plain"));
+        EXPECT_TRUE(readFile(folder_ / name) == report_);
+    }
+}
+
+TEST_P(NoPackage, IsNotWrittenUnderADocumentsName) {
+    std::filesystem::create_symlink("Slides.PPTX", folder_ / "link");
+    for (const std::string name : {"new.docx", "Budget.XLSX", "link"}) {
+        EXPECT_EQ(write(folder_ / name, GetParam()).status, 1);
+    }
+    writeFile(folder_ / "empty.docx", "");
+    EXPECT_EQ(write(folder_ / "empty.docx", GetParam()).status, 1);
+    for (const std::string name : {"new.docx", "Budget.XLSX", "Slides.PPTX"}) {
+        EXPECT_FALSE(std::filesystem::exists(folder_ / name));
+    }
+}
+
+TEST_P(NoPackage, IsWrittenOverADocumentWhenItIsSaidToBeText) {
+    writeFile(folder_ / "report.docx", report_);
+    EXPECT_EQ(write(folder_ / "report.docx", GetParam(), {"--content-type", "text/plain"}).output,
+              "true\n");
+    EXPECT_EQ(readFile(folder_ / "report.docx"), GetParam());
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    WriteCommand, NoPackage,
+    ::testing::Values("", "some text", R"({"exception":"File does not exist","status":false})",
+                      R"({"parts":[],"relationships":[)", R"({"parts":[]})",
+                      R"({"parts":[],"relationships":[]}{"parts":[],"relationships":[]})"));
+
+TEST_F(WriteCommand, TakesAPackageWithWhiteSpaceAroundIt) {
+    const std::filesystem::path file = folder_ / "report.docx";
+    const std::string report = test::sourceRoot() + "/examples/report.docx";
+    const std::string json = test::run(hostCommand({"read", report})).output;
+    EXPECT_EQ(write(file, " \n\t" + json + "\r\n").output, "true\n");
+    EXPECT_EQ(test::run(hostCommand({"read", file.string()})).output, json);
+}
+
 TEST_F(WriteCommand, FinishesTheSaveInWhichItIsAskedToEnd) {
     // Much to write and little to compute, so that the temporary file is there for a while.
     const std::string content =

@@ -1,0 +1,50 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "host/commands/package_text.h"
+
+#include <algorithm>
+
+#include "json/parser.h"
+#include "json/value.h"
+#include "platform/text/ascii.h"
+
+namespace host {
+
+namespace {
+
+std::string_view withoutLeadingSpace(std::string_view text) {
+    text.remove_prefix(static_cast<std::size_t>(
+        std::find_if_not(text.begin(), text.end(), platform::text::isspace_ascii) - text.begin()));
+    return text;
+}
+
+// Why `object` is no package; empty when it is one.
+std::string faultOf(json::Object& object) {
+    if (object["parts"].is<json::Array>() && object["relationships"].is<json::Array>()) {
+        return "";
+    }
+    if (object["exception"].is<std::string>()) {
+        return "it is the answer to a read that failed: " + object["exception"].get<std::string>();
+    }
+    return "it lacks the arrays \"parts\" and \"relationships\"";
+}
+
+}  // namespace
+
+PackageText findPackage(std::string_view text) {
+    text = withoutLeadingSpace(text);
+    if (text.empty()) {
+        return {{}, "it is empty"};
+    }
+    json::Input input{text.data(), text.data() + text.size()};
+    json::Object object;
+    if (json::parseObject(input, object) != json::Status::success) {
+        return {{}, "it is no JSON object, or only the beginning of one"};
+    }
+    const auto length = static_cast<std::size_t>(input.position - text.data());
+    if (!withoutLeadingSpace(text.substr(length)).empty()) {
+        return {{}, "more follows the first JSON object"};
+    }
+    return {text.substr(0, length), faultOf(object)};
+}
+
+}  // namespace host
