@@ -1,7 +1,66 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "host/limits/limiting_sink.h"
 
+#include <simdjson.h>
+
+#include <array>
+#include <cstdio>
+#include <string_view>
+
 namespace host {
+
+namespace {
+
+// Of one line, in bytes: with the names of logger and level it stays below 2 KB.
+constexpr std::size_t longestText = 2000;
+constexpr std::string_view cutMark = "...";
+
+bool isControl(std::string_view character) {
+    const auto first = static_cast<unsigned char>(character[0]);
+    // The second range is that of C1, two bytes of UTF-8 each.
+    return first < 0x20 || first == 0x7F ||
+           (first == 0xC2 && static_cast<unsigned char>(character[1]) < 0xA0);
+}
+
+// The character of UTF-8 that `text` begins with; empty when its first byte begins none.
+std::string_view firstCharacter(std::string_view text) {
+    const auto first = static_cast<unsigned char>(text[0]);
+    const std::size_t length = first < 0x80 ? 1 : first < 0xE0 ? 2 : first < 0xF0 ? 3 : 4;
+    const std::string_view character = text.substr(0, length);
+    return simdjson::validate_utf8(character.data(), character.size()) ? character
+                                                                       : std::string_view();
+}
+
+std::string escaped(std::string_view bytes) {
+    std::string text;
+    for (const char byte : bytes) {
+        std::array<char, 5> code{};
+        std::snprintf(code.data(), code.size(), "\\x%02X", static_cast<unsigned char>(byte));
+        text += code.data();
+    }
+    return text;
+}
+
+// `text` as one line of at most longestText bytes: controls, and what is no UTF-8, as \xNN.
+std::string asLine(std::string_view text) {
+    std::string line;
+    std::size_t lengthIfCut = 0;  // What fits together with the mark.
+    while (!text.empty()) {
+        const std::string_view character = firstCharacter(text);
+        const std::string_view bytes = character.empty() ? text.substr(0, 1) : character;
+        line += character.empty() || isControl(character) ? escaped(bytes) : std::string(bytes);
+        if (line.size() > longestText) {
+            return line.substr(0, lengthIfCut).append(cutMark);
+        }
+        if (line.size() + cutMark.size() <= longestText) {
+            lengthIfCut = line.size();
+        }
+        text.remove_prefix(bytes.size());
+    }
+    return line;
+}
+
+}  // namespace
 
 LimitingSink::LimitingSink(std::shared_ptr<spdlog::sinks::sink> next, std::size_t lines,
                            std::chrono::milliseconds period)
@@ -16,7 +75,10 @@ void LimitingSink::sink_it_(const spdlog::details::log_msg& line) {
         return;
     }
     ++period.passed;
-    next_->log(line);
+    const std::string text = asLine({line.payload.data(), line.payload.size()});
+    spdlog::details::log_msg shown = line;
+    shown.payload = text;
+    next_->log(shown);
 }
 
 void LimitingSink::flush_() {

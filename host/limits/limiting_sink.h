@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Keeps a log from growing without bound, since clients can have a line logged for each message.
+// Keeps a log readable and from growing without bound, since clients can have a line logged for
+// each message, with text of theirs in it.
 #pragma once
 
 #include <spdlog/sinks/base_sink.h>
@@ -18,6 +19,9 @@ namespace host {
 /// many in a period of time; the lines beyond are left out and counted. Their number is logged, as
 /// one more line of that logger and level, with the first line of any kind after the period, or by
 /// a flush. So a flood of one kind hides no line of another.
+///
+/// Each text becomes one line of less than 2 KB: what is longer is cut, and controls (line breaks,
+/// the escapes that terminals obey) and bytes that are no UTF-8 are written as \xNN.
 ///
 /// A period begins with the first line after the one before. Time is that of the lines.
 class LimitingSink final : public spdlog::sinks::base_sink<std::mutex> {

@@ -147,7 +147,7 @@ TEST_F(ReadCommand, TellsOfANameThatIsNotUtf8AndReadsTheOthers) {
     const Outcome outcome = read({makeFile("caf\xE9", "x"), makeFile("file", "y")});
     EXPECT_EQ(outcome.status, 1);
     EXPECT_EQ(outcome.output, successOf("y") + "\n");
-    EXPECT_THAT(outcome.errors, AllOf(HasSubstr("caf\xE9"), HasSubstr("not UTF-8")));
+    EXPECT_THAT(outcome.errors, AllOf(HasSubstr("caf\\xE9"), HasSubstr("not UTF-8")));
     EXPECT_THAT(outcome.errors, Not(HasSubstr("no answer")));
 }
 

@@ -35,7 +35,7 @@ protected:
         return text;
     }
 
-    const spdlog::log_clock::time_point start_ = spdlog::log_clock::now();
+    spdlog::log_clock::time_point start_ = spdlog::log_clock::now();
     std::ostringstream output_;
     LimitingSink sink_{std::make_shared<spdlog::sinks::ostream_sink_mt>(output_), 3, 10s};
 };
@@ -98,6 +98,50 @@ TEST_F(LimitingSinkTest, TellsWhenItIsFlushedAndNotAgain) {
     sink_.flush();
     log(10s, "b");
     EXPECT_EQ(logged(), "host error: b\n");
+}
+
+TEST_F(LimitingSinkTest, EscapesWhatWouldBreakALineOrSteerATerminal) {
+    log(0s, std::string("a\nb\r\x1B[2J\0\x7F", 10));
+    EXPECT_EQ(logged(), "host error: a\\x0Ab\\x0D\\x1B[2J\\x00\\x7F\n");
+    log(0s, "\xC2\x9B\xC2\x85");
+    EXPECT_EQ(logged(), "host error: \\xC2\\x9B\\xC2\\x85\n");
+}
+
+TEST_F(LimitingSinkTest, KeepsUtf8AndEscapesOtherBytes) {
+    const std::string text = "\xC3\xA9 \xE2\x82\xAC \xF0\x9F\x98\x80 \xC2\xA0";
+    log(0s, text);
+    EXPECT_EQ(logged(), "host error: " + text + "\n");
+    // A byte of Latin-1, an overlong form, a surrogate, an end that is missing.
+    log(0s, "caf\xE9! \xC0\xAF \xED\xA0\x80 \xE2\x82");
+    EXPECT_EQ(logged(), "host error: caf\\xE9! \\xC0\\xAF \\xED\\xA0\\x80 \\xE2\\x82\n");
+}
+
+TEST_F(LimitingSinkTest, CutsWhatIsLongBetweenTwoCharacters) {
+    for (const std::string character : {"x", "\xC3\xA9", "\xE2\x82\xAC", "\n", "\xFF"}) {
+        std::string text;
+        while (text.size() < 100'000) {
+            text += character;
+        }
+        log(0s, text);
+        const std::string line = logged();
+        EXPECT_LT(line.size(), 2048U);
+        EXPECT_GT(line.size(), 1980U);
+        EXPECT_TRUE(line.ends_with("...\n"));
+        const std::string shown = character == "\n"     ? "\\x0A"
+                                  : character == "\xFF" ? "\\xFF"
+                                                        : character;
+        EXPECT_EQ((line.size() - std::string("host error: ...\n").size()) % shown.size(), 0U);
+        sink_.flush();
+        start_ += 10s;
+    }
+}
+
+TEST_F(LimitingSinkTest, DoesNotCutWhatJustFits) {
+    const std::string text(2000, 'x');
+    log(0s, text);
+    EXPECT_EQ(logged(), "host error: " + text + "\n");
+    log(0s, text + "x");
+    EXPECT_EQ(logged(), "host error: " + text.substr(3) + "...\n");
 }
 
 TEST_F(LimitingSinkTest, GoesOnWhenTheClockIsSetBack) {
