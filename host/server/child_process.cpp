@@ -8,6 +8,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <string_view>
 #include <system_error>
 #include <utility>
 
@@ -28,10 +29,22 @@ Pipe makePipe() {
     return {platform::FileDescriptor(ends[0]), platform::FileDescriptor(ends[1])};
 }
 
+// The environment for programs.
+std::vector<char*> makeEnvironment() {
+    std::vector<char*> variables;
+    for (char** variable = environ; *variable != nullptr; ++variable) {
+        if (!std::string_view(*variable).starts_with("GLIBC_TUNABLES=")) {
+            variables.push_back(*variable);
+        }
+    }
+    variables.push_back(nullptr);
+    return variables;
+}
+
 // What the new process does before it becomes the program. Other threads of the host may have held
 // locks when it was forked off, so it keeps to system calls.
-[[noreturn]] void becomeProgram(const char* program, char* const* arguments, int output,
-                                int failure, pid_t host) {
+[[noreturn]] void becomeProgram(const char* program, char* const* arguments,
+                                char* const* environment, int output, int failure, pid_t host) {
     ::setpgid(0, 0);
     ::prctl(PR_SET_PDEATHSIG, SIGKILL);
     // The host may have ended before it was asked to take the program with it.
@@ -46,7 +59,7 @@ Pipe makePipe() {
     isReady = isReady && ::close_range(3, ~0U, CLOSE_RANGE_CLOEXEC) == 0 &&
               ::dup2(output, STDOUT_FILENO) >= 0 && ::dup2(output, STDERR_FILENO) >= 0;
     if (isReady) {
-        ::execv(program, arguments);
+        ::execve(program, arguments, environment);
     }
     const int error = errno;
     // Nothing can be done about a failure to tell of the failure.
@@ -65,11 +78,12 @@ ChildProcess::ChildProcess(const std::filesystem::path& program,
         pointers.push_back(const_cast<char*>(argument.c_str()));
     }
     pointers.push_back(nullptr);
+    const std::vector<char*> environment = makeEnvironment();
     const pid_t host = ::getpid();
     id_ = ::fork();
     if (id_ == 0) {
-        becomeProgram(program.c_str(), pointers.data(), output.write.get(), failure.write.get(),
-                      host);
+        becomeProgram(program.c_str(), pointers.data(), environment.data(), output.write.get(),
+                      failure.write.get(), host);
     }
     if (id_ < 0) {
         throw std::system_error(errno, std::generic_category(), "cannot start a process");

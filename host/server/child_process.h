@@ -17,7 +17,8 @@ namespace host {
 class ChildProcess {
 public:
     /// Starts `program`, with `arguments` and without any other of the host's files than its
-    /// output. It is in a process group of its own, so that an interrupt from the keyboard is for
+    /// output. Its environment is the host's without GLIBC_TUNABLES, which is for the host's own
+    /// memory. It is in a process group of its own, so that an interrupt from the keyboard is for
     /// the host alone. Throws std::system_error when the program cannot be run.
     ChildProcess(const std::filesystem::path& program, const std::vector<std::string>& arguments);
 

@@ -17,6 +17,7 @@
 #include <vector>
 
 #include "host/server/nats_configuration.h"
+#include "host/server/nats_process.h"
 #include "host/server/private_folder.h"
 #include "platform/messaging/nats/nats_bus.h"
 #include "platform/posix/file_descriptor.h"
@@ -57,13 +58,10 @@ public:
     platform::messaging::NatsOptions workerConnection() const;
 
 private:
-    class Life;
-
     void supervise(std::promise<void> ready);
-    std::optional<std::string> live(const std::function<void()>& whenReady);
+    std::optional<std::string> runOnce(const std::function<void()>& whenReady);
+    void keepPorts(const NatsPorts& ports);
     void waitForClients() const;
-    void removePortsFiles() const;
-    bool findPorts();
 
     std::filesystem::path program_;
     const PrivateFolder& folder_;
