@@ -36,6 +36,7 @@ foreach(header IN ITEMS
     platform/data_buffer.h
     platform/large_pages.h
     platform/messaging/in_process_bus.h
+    platform/messaging/memory_budget.h
     platform/messaging/message_service.h
     platform/messaging/nats/nats_bus.h
     platform/messaging/transport.h)

@@ -7,6 +7,8 @@
 #include <charconv>
 #include <cmath>
 #include <iterator>
+#include <limits>
+#include <optional>
 #include <stack>
 #include <string_view>
 #include <type_traits>
@@ -143,12 +145,16 @@ private:
 
 // ---- Writing ----
 
+/// Writes the text of a tree, up to where it turns out longer than allowed.
 class Writer {
 public:
     /// `memory` gets the text; it is enlarged where `estimate` turns out too low.
-    Writer(std::string& memory, std::size_t estimate) : text(memory) { enlarge(estimate); }
+    Writer(std::string& memory, std::size_t estimate, std::size_t limit)
+        : text(memory), maxLength(limit) {
+        enlarge(0, estimate);
+    }
 
-    static bool done() { return false; }
+    bool done() const { return tooLong; }
 
     void open(char c) { put(c); }
     void close(char c) { put(c); }
@@ -167,17 +173,18 @@ public:
         put('"');
         const char* in = string.data();
         const char* const last = in + string.size();
-        if (end - position < std::ssize(string))
-            require(std::ssize(string) + static_cast<std::ptrdiff_t>(estimateEscapes(string)));
+        if (end - position < std::ssize(string) &&
+            !enlarge(string.size(), string.size() + estimateEscapes(string)))
+            return;
         for (;;) {
             const auto copied = kernels.escape(in, last, position, end);
             in = copied.in;
             position = copied.out;
             if (in == last)
-                break;
-            require(detail::maxEscapeLength);
+                return put('"');
+            if (!require(detail::maxEscapeLength))
+                return;
         }
-        put('"');
     }
 
     template <typename Number>
@@ -187,57 +194,76 @@ public:
             if (!std::isfinite(number))
                 return leaf(Null());
         }
-        constexpr std::ptrdiff_t longestNumber = 32;
-        require(longestNumber);
-        position = std::to_chars(position, end, number).ptr;
+        if (require(longestNumber))
+            position = std::to_chars(position, end, number).ptr;
     }
 
-    /// Ends the text.
-    void finish() { text.resize(length()); }
+    /// Ends the text. Returns false when it is too long.
+    bool finish() {
+        text.resize(length());
+        return !tooLong && text.size() <= maxLength;
+    }
 
 private:
     std::size_t length() const { return static_cast<std::size_t>(position - text.data()); }
 
     void put(char c) {
-        require(1);
-        *position++ = c;
+        if (require(1))
+            *position++ = c;
     }
 
     void put(std::string_view literal) {
-        require(std::ssize(literal));
-        position = std::copy(literal.begin(), literal.end(), position);
+        if (require(std::ssize(literal)))
+            position = std::copy(literal.begin(), literal.end(), position);
     }
 
-    /// Makes room for `count` more bytes.
-    void require(std::ptrdiff_t count) {
-        if (end - position < count)
-            enlarge(static_cast<std::size_t>(count));
+    /// Makes room for `count` more bytes. Returns false when the text is too long already.
+    bool require(std::ptrdiff_t count) {
+        return end - position >= count || enlarge(0, static_cast<std::size_t>(count));
     }
 
-    void enlarge(std::size_t count) {
+    /// Makes room for `wanted` more bytes, or for as many as are allowed. `certain`: how many will
+    /// be written at least; returns false when the text is too long with them.
+    bool enlarge(std::size_t certain, std::size_t wanted) {
         const std::size_t used = end == nullptr ? 0 : length();
-        const std::size_t size = used + std::max(count, used / 2);
+        if (used > maxLength || certain > maxLength - used) {
+            tooLong = true;
+            return false;
+        }
+        // Some more than allowed, since what is written last wants room for the longest that it
+        // could be.
+        constexpr std::size_t margin = 2 * longestNumber;
+        const std::size_t most = maxLength + std::min(margin, text.max_size() - maxLength);
+        const std::size_t size = std::min(used + std::max(wanted, used / 2), most);
         detail::overwrite(text, size, [size](char*) { return size; });
         position = text.data() + used;
         end = text.data() + text.size();
+        return true;
     }
+
+    static constexpr std::ptrdiff_t longestNumber = 32;
 
     const detail::StringKernels& kernels = detail::stringKernels();
     std::string& text;
+    const std::size_t maxLength;
+    bool tooLong = false;
     char* position = nullptr;
     char* end = nullptr;  // of the memory
 };
 
 }  // namespace
 
-std::string serialize(const Value& value) {
+std::optional<std::string> serialize(const Value& value, std::size_t maxLength) {
     Estimate estimate;
     TreeWalk(estimate).walk(value);
     std::string text;
-    Writer writer(text, estimate.length);
+    Writer writer(text, estimate.length, std::min(maxLength, text.max_size()));
     TreeWalk(writer).walk(value);
-    writer.finish();
-    return text;
+    return writer.finish() ? std::optional(std::move(text)) : std::nullopt;
+}
+
+std::string serialize(const Value& value) {
+    return serialize(value, std::numeric_limits<std::size_t>::max()).value();
 }
 
 }  // namespace json

@@ -2,6 +2,8 @@
 // The text writer: a Value to JSON text.
 #pragma once
 
+#include <cstddef>
+#include <optional>
 #include <string>
 
 #include "json/value.h"
@@ -17,5 +19,9 @@ namespace json {
 ///
 /// Takes time linear in the size of the text, and no stack in proportion to the nesting.
 std::string serialize(const Value& value);
+
+/// The same, or nothing when the text has more than `maxLength` bytes. Takes memory for little more
+/// than `maxLength` bytes, however long the text would be.
+std::optional<std::string> serialize(const Value& value, std::size_t maxLength);
 
 }  // namespace json

@@ -27,7 +27,7 @@ void Serialization::handleReadRequest(const JsonMessage& message) {
     std::u16string path = to_ustring(filePath);
     json::Object result = contentType == packageContentType ? readPackageDocument(std::move(path))
                                                             : readTextDocument(std::move(path));
-    publish(readResponsePrefix + rtcId, std::move(result));
+    publishReadResult(readResponsePrefix + rtcId, std::move(result));
 }
 
 void Serialization::handleWriteRequest(const JsonMessage& message) {

@@ -218,6 +218,11 @@ private:
     /// Throws std::runtime_error "Out of memory!" when the message's buffer cannot be allocated.
     void publish(const std::string& channel, json::Value value) const;
 
+    /// The same for the result of a read. A result that is too long for the message service is
+    /// replaced by one that says so, {"exception": ..., "status": false}, without taking the memory
+    /// for its text.
+    void publishReadResult(const std::string& channel, json::Value result) const;
+
     std::shared_ptr<platform::messaging::MessageService> messageService;
     std::shared_ptr<platform::messaging::Subscription> readSubscription;
     std::shared_ptr<platform::messaging::Subscription> writeSubscription;

@@ -42,6 +42,10 @@ public:
         return promise.getFuture();
     }
 
+    std::size_t maxPayload(const std::string& channel) const override {
+        return client_->maxPayload(channel);
+    }
+
 private:
     const std::shared_ptr<MessageService> client_;
 };

@@ -6,7 +6,9 @@
 // bus (in_process_bus.h).
 #pragma once
 
+#include <cstddef>
 #include <functional>
+#include <limits>
 #include <memory>
 #include <string>
 #include <string_view>
@@ -73,6 +75,13 @@ public:
     /// Sends `payload` to the subscribers of `channel`, taking the buffer over. The future resolves
     /// when the bus has accepted the message, or holds an exception when it has not.
     virtual futures::Future<void> publish(const std::string& channel, DataBuffer payload) = 0;
+
+    /// The length, in bytes, of the longest payload that can be published on `channel` now. Whoever
+    /// builds a message can stop when it gets longer. Services without such a limit need not
+    /// override this.
+    virtual std::size_t maxPayload([[maybe_unused]] const std::string& channel) const {
+        return std::numeric_limits<std::size_t>::max();
+    }
 };
 
 /// Options of a client, by name. None are defined for the in-process bus.

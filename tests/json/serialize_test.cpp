@@ -8,6 +8,7 @@
 #include <cmath>
 #include <cstdint>
 #include <limits>
+#include <optional>
 #include <string>
 
 #include "json/parser.h"
@@ -163,6 +164,24 @@ TEST(RoundTrip, GivesBackTypedIntegers) {
     const Object unsignedObject{{"kqtype", "uint64"},
                                 {"kqdata", Array{0UL, 18446744073709551615UL}}};
     EXPECT_EQ(parse(serialize(unsignedObject)), unsignedObject);
+}
+
+TEST(Serialize, GivesNothingWhenTheTextIsLongerThanAllowed) {
+    RandomJson random(1);
+    for (int i = 0; i < 500; ++i) {
+        const Value value = random.tree(i % 20);
+        const std::string text = serialize(value);
+        EXPECT_EQ(serialize(value, text.size()), text);
+        EXPECT_EQ(serialize(value, text.size() + 1), text);
+        for (std::size_t length = text.size(); length > 0; length /= 2)
+            EXPECT_EQ(serialize(value, length - 1), std::nullopt) << text;
+    }
+}
+
+TEST(Serialize, GivesNothingForAStringWhoseEscapesMakeItTooLong) {
+    const Value value = std::string(10'000, '\0');
+    EXPECT_EQ(serialize(value, 60'001), std::nullopt);
+    EXPECT_EQ(serialize(value, 60'002), serialize(value));
 }
 
 }  // namespace

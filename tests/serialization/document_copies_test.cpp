@@ -8,6 +8,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <limits>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -56,12 +57,35 @@ std::string noise(std::size_t size) {
     return bytes;
 }
 
+/// A client of a bus that takes payloads up to a length.
+class LimitedClient final : public platform::messaging::MessageService {
+public:
+    LimitedClient(std::shared_ptr<MessageService> client, const std::size_t& maxPayload)
+        : client_(std::move(client)), maxPayload_(maxPayload) {}
+
+    futures::Future<std::shared_ptr<platform::messaging::Subscription>> subscribe(
+        const std::string& channel, platform::messaging::MessageHandler handler) override {
+        return client_->subscribe(channel, std::move(handler));
+    }
+    futures::Future<void> publish(const std::string& channel, DataBuffer payload) override {
+        return client_->publish(channel, std::move(payload));
+    }
+    std::size_t maxPayload(const std::string&) const override { return maxPayload_; }
+
+private:
+    const std::shared_ptr<MessageService> client_;
+    const std::size_t& maxPayload_;
+};
+
 class DocumentCopies : public testing::Test {
 protected:
     DocumentCopies() {
         using namespace platform::messaging;
         setTransport([this](const std::string& clientName, const MessageServiceOptions&) {
-            return bus->connect(clientName);
+            futures::Promise<std::shared_ptr<MessageService>> limited;
+            limited.setValue(
+                std::make_shared<LimitedClient>(bus->connect(clientName).get(), maxPayload));
+            return limited.getFuture();
         });
         runner = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
         client = bus->connect("client").get();
@@ -138,6 +162,7 @@ protected:
     test::TemporaryDirectory folder;
     std::shared_ptr<platform::messaging::InProcessBus> bus =
         platform::messaging::InProcessBus::create();
+    std::size_t maxPayload = std::numeric_limits<std::size_t>::max();
     std::mutex mutex;
     std::string answer;
     std::size_t answerSize = 0;
@@ -199,6 +224,26 @@ TEST_F(DocumentCopies, OfAPackageThatIsRead) {
     ASSERT_GT(answerSize, 24 * kMegabyte);
     EXPECT_THAT(allocations.large, SizeIs(2 + 4 * 4 + 2));
     EXPECT_LE(timesTheAnswer(allocations), 2.05);
+}
+
+// The part's content, and as much of the answer's text, six bytes for one, as could be sent.
+TEST_F(DocumentCopies, OfAPackageWhoseAnswerIsTooLongToBeSent) {
+    constexpr std::size_t size = 60 * kMegabyte;
+    write(json::serialize(json::Value(json::Object{
+        {"rtcId", "1"},
+        {"contentType", "text/xml"},
+        {"filePath", packagePath()},
+        {"content",
+         json::Object{{"parts", json::Array{json::Object{{"partUri", "/part.bin"},
+                                                         {"contentType", "x/y"},
+                                                         {"content", std::string(size, '\0')},
+                                                         {"relationship", json::Null()}}}},
+                      {"relationships", json::Array()}}}})));
+    ASSERT_EQ(answer, "true");
+    maxPayload = 64 * kMegabyte;
+    const Allocations allocations = read("text/xml", packagePath());
+    EXPECT_THAT(answer, testing::StartsWith(R"({"exception":"The document is too large: )"));
+    EXPECT_LE(allocations.peak, size + maxPayload + kMegabyte);
 }
 
 }  // namespace

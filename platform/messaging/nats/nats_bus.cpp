@@ -45,6 +45,9 @@ std::chrono::milliseconds nextDelay(std::chrono::milliseconds delay) {
 // How long a subscription waits for the server to have it, in milliseconds.
 constexpr std::int64_t subscribeTimeout = 10'000;
 
+// The length of a message is an int in libnats.
+constexpr std::int64_t largestMessage = std::numeric_limits<int>::max();
+
 // Whether trying again may help: no server answered, rather than refused.
 bool isUnreachable(natsStatus status) {
     return status == NATS_NO_SERVER || status == NATS_IO_ERROR || status == NATS_TIMEOUT ||
@@ -72,6 +75,7 @@ public:
     std::shared_ptr<MessageService> connect(const std::string& clientName);
     std::shared_ptr<Subscription> subscribe(const std::string& channel, MessageHandler handler);
     void publish(const std::string& channel, const DataBuffer& payload);
+    std::size_t maxPayload();
     bool isConnected();
     bool drain(std::chrono::milliseconds timeout);
 
@@ -149,6 +153,8 @@ public:
     futures::Future<void> publish(const std::string& channel, DataBuffer payload) override {
         return resolved([&] { core_->publish(channel, payload); });
     }
+
+    std::size_t maxPayload(const std::string&) const override { return core_->maxPayload(); }
 
 private:
     const std::shared_ptr<Core> core_;
@@ -314,7 +320,7 @@ void NatsBus::Core::publish(const std::string& channel, const DataBuffer& payloa
 void NatsBus::Core::send(const std::string& channel, const DataBuffer& payload) {
     nats::requireSubject(channel);
     const ConnectionHandle connection = this->connection();
-    if (std::cmp_greater(payload.length(), std::numeric_limits<int>::max())) {
+    if (std::cmp_greater(payload.length(), largestMessage)) {
         throw std::runtime_error("NATS takes messages of less than 2 GiB.");
     }
     const natsStatus status = natsConnection_Publish(
@@ -336,6 +342,18 @@ void NatsBus::Core::send(const std::string& channel, const DataBuffer& payload) 
     if (disconnected_) {
         unsent_ = true;
     }
+}
+
+std::size_t NatsBus::Core::maxPayload() {
+    ConnectionHandle connection;
+    {
+        const std::lock_guard lock(mutex_);
+        connection = connection_;
+    }
+    // Asked each time, since the next server, or this one after it was configured anew, may differ.
+    const std::int64_t limit = connection ? natsConnection_GetMaxPayload(connection->get()) : 0;
+    // A server that has not said it yet says zero.
+    return limit > 0 ? static_cast<std::size_t>(std::min(limit, largestMessage)) : largestMessage;
 }
 
 bool NatsBus::Core::isStopping() {

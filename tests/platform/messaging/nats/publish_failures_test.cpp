@@ -35,6 +35,18 @@ TEST(NatsPublish, RefusesAMessageThatTheServerWouldNotTake) {
     EXPECT_EQ(log.count("lost"), 0);
 }
 
+TEST(NatsPublish, KnowsTheLongestPayloadThatTheServerTakes) {
+    const test::NatsServer server("max_payload: 1000");
+    NatsOptions options;
+    options.servers = {server.url()};
+    const auto bus = NatsBus::create(options);
+    const auto client = bus->connect("client").get();
+    EXPECT_EQ(client->maxPayload("/any"), 1000u);
+    bus->drain(std::chrono::seconds(5));
+    // Publishing tells what is wrong; the length is not.
+    EXPECT_GT(client->maxPayload("/any"), 1000u);
+}
+
 TEST(NatsPublish, RefusesChannelsThatAreNoSubjects) {
     BusLog& log = BusLog::start();
     const test::NatsServer server;
