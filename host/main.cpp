@@ -22,6 +22,7 @@
 
 #include "host/bus/bundle_location.h"
 #include "host/commands/exit_status.h"
+#include "host/commands/history_command.h"
 #include "host/commands/read_command.h"
 #include "host/commands/serve_command.h"
 #include "host/commands/standard_streams.h"
@@ -41,6 +42,7 @@ struct CommandLine {
     std::string logLevel = "warning";
     std::uint64_t memoryLimit = LIMIT_MEMORY ? host::defaultMemoryLimit() : 0;
     std::filesystem::path bundle;
+    host::HistoryCommandOptions history;
     host::ReadOptions read;
     host::ServeOptions serve;
     host::StdioOptions stdio;
@@ -190,6 +192,29 @@ void requireDistinctHosts(const host::ServeOptions& options) {
     }
 }
 
+// Options of the commands that save documents. `isOn` is what they do without.
+void declareGuard(CLI::App& command, host::GuardOptions& options) {
+    if (options.isOn) {
+        command.add_flag("!--no-safe-saves", options.isOn,
+                         "Have texts written in place, as the bundle does by itself");
+    } else {
+        command.add_flag("--safe-saves", options.isOn,
+                         "Have no fault of the machine make a save lose a text");
+    }
+    command
+        .add_option("--history", options.folder,
+                    "Where earlier versions of documents are kept (default: the user's folder for "
+                    "states)")
+        ->type_name("DIR");
+    command
+        .add_option("--keep", options.versions,
+                    "The earlier versions to keep of each document (default: " +
+                        std::to_string(options.versions) + ")")
+        ->type_name("N")
+        ->check(CLI::Range(1U, 1'000'000U));
+    command.add_flag("!--no-history", options.keepsVersions, "Keep no earlier versions");
+}
+
 void declareServe(CLI::App& command, host::ServeOptions& options) {
     command
         .add_option("--root", options.roots,
@@ -199,6 +224,7 @@ void declareServe(CLI::App& command, host::ServeOptions& options) {
         ->check(CLI::ExistingDirectory);
     command.add_flag("!--no-confinement", options.isConfined,
                      "Go without the kernel's help to keep clients to the folders of --root");
+    declareGuard(command, options.guard);
     declareWeb(command, options.web);
     declareOwnServer(command, options.ownServer,
                      declareOtherServers(command, options.otherServers));
@@ -219,6 +245,7 @@ void declareStdio(CLI::App& command, host::StdioOptions& options) {
             "The largest message to take, in bytes or with a unit such as MB (default: 1 GB)")
         ->type_name("SIZE")
         ->transform(CLI::AsSizeValue(false));
+    declareGuard(command, options.guard);
 }
 
 void declareWrite(CLI::App& command, host::WriteOptions& options) {
@@ -233,7 +260,28 @@ void declareWrite(CLI::App& command, host::WriteOptions& options) {
                     "The charset of a text, as it comes in and as it is stored (default: " +
                         options.encoding + ")")
         ->type_name("CHARSET");
+    declareGuard(command, options.guard);
     declareTimeout(command, options.timeout);
+}
+
+void declareHistory(CLI::App& command, host::HistoryCommandOptions& options) {
+    command.add_option("FILE", options.file, "The document")->required();
+    command
+        .add_option("--history", options.guard.folder,
+                    "Where the versions are (default: the user's folder for states)")
+        ->type_name("DIR");
+    CLI::Option* const shown =
+        command.add_option("--show", options.shown, "Print a version, as read does")
+            ->type_name("N")
+            ->check(CLI::PositiveNumber);
+    command.add_option("--restore", options.restored, "Save a version as the newest")
+        ->type_name("N")
+        ->check(CLI::PositiveNumber)
+        ->excludes(shown);
+    command
+        .add_option("--content-type", options.contentType,
+                    "The content type to show it as (default: by its content)")
+        ->type_name("TYPE");
 }
 
 // Declares the options and commands of `app`, which a parse puts into `line`.
@@ -255,6 +303,10 @@ void declare(CLI::App& app, CommandLine& line) {
     app.fallthrough();
     declareRead(*app.add_subcommand("read", "Read files and print the response for each on a line"),
                 line.read);
+    declareHistory(*app.add_subcommand("history",
+                                       "List earlier versions of a document, or show or "
+                                       "restore one"),
+                   line.history);
     declareServe(*app.add_subcommand("serve", "Serve browsers and other programs, over NATS"),
                  line.serve);
     declareStdio(*app.add_subcommand("stdio", "Carry framed messages on standard input and output"),
@@ -284,6 +336,10 @@ int run(CLI::App& app, CommandLine& line, int output) {
     if (app.got_subcommand("read")) {
         line.read.bundle = bundle;
         return host::runRead(line.read, output);
+    }
+    if (app.got_subcommand("history")) {
+        line.history.bundle = bundle;
+        return host::runHistory(line.history, output);
     }
     if (app.got_subcommand("serve")) {
         line.serve.bundle = bundle;

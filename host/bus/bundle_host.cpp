@@ -11,6 +11,7 @@
 #include <utility>
 
 #include "host/commands/exit_status.h"
+#include "host/guard/guarded_client.h"
 #include "platform/messaging/transport.h"
 
 namespace host {
@@ -29,15 +30,21 @@ constexpr std::size_t usualQueuedBytes = std::size_t{16} * 1024 * 1024;
 constexpr std::size_t mostQueuedMessages = 4096;
 
 // A bus on which createMessageService makes its clients from now on.
-std::shared_ptr<InProcessBus> makeBus(std::size_t largestMessage) {
+std::shared_ptr<InProcessBus> makeBus(std::size_t largestMessage, Guard guard) {
     platform::messaging::InProcessBusOptions options;
     options.maxQueuedBytes = std::max(largestMessage, usualQueuedBytes);
     // A large document shall not hold up the small ones behind it.
     options.concurrentChannels = {platform::messaging::readRequestChannel};
     std::shared_ptr<InProcessBus> bus = InProcessBus::create(std::move(options));
     platform::messaging::setTransport(
-        [bus](const std::string& name, const platform::messaging::MessageServiceOptions&) {
-            return bus->connect(name);
+        [bus, guard = std::move(guard)](const std::string& name,
+                                        const platform::messaging::MessageServiceOptions&) {
+            if (!guard.saves) {
+                return bus->connect(name);
+            }
+            futures::Promise<std::shared_ptr<platform::messaging::MessageService>> client;
+            client.setValue(savingSafely(bus->connect(name).get(), guard));
+            return client.getFuture();
         });
     return bus;
 }
@@ -45,8 +52,8 @@ std::shared_ptr<InProcessBus> makeBus(std::size_t largestMessage) {
 }  // namespace
 
 BundleHost::BundleHost(const std::filesystem::path& bundle, std::size_t largestMessage,
-                       platform::messaging::MessageHandler published)
-    : bus_(makeBus(largestMessage)),
+                       platform::messaging::MessageHandler published, Guard guard)
+    : bus_(makeBus(largestMessage, std::move(guard))),
       observation_(bus_->observe(
           [published = std::move(published)](std::string_view sender, const JsonMessage& message) {
               if (sender != clientName) {
@@ -55,6 +62,11 @@ BundleHost::BundleHost(const std::filesystem::path& bundle, std::size_t largestM
           })),
       client_(bus_->connect(clientName).get()),
       bundle_(bundle) {}
+
+// The transport holds the bus, and what guards its saves.
+BundleHost::~BundleHost() {
+    platform::messaging::setTransport({});
+}
 
 void BundleHost::publish(const std::string& channel, platform::DataBuffer payload) {
     const std::size_t size = payload.length();

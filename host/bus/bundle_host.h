@@ -10,6 +10,7 @@
 #include <string>
 
 #include "framework/bundle_runner.h"
+#include "host/guard/guard.h"
 #include "platform/data_buffer.h"
 #include "platform/messaging/channels.h"
 #include "platform/messaging/in_process_bus.h"
@@ -24,9 +25,14 @@ public:
     /// Starts `bundle`, a shared library. `published` is called with every message that the bundle
     /// publishes, on the publishing thread and by several threads at once; while it runs, the
     /// request that the message answers is not done. Messages of up to `largestMessage` bytes can
-    /// be sent. Throws std::runtime_error when the bundle cannot be loaded or started.
+    /// be sent. What `guard` has saves for, it saves. Throws std::runtime_error
+    /// when the bundle cannot be loaded or started.
     BundleHost(const std::filesystem::path& bundle, std::size_t largestMessage,
-               platform::messaging::MessageHandler published);
+               platform::messaging::MessageHandler published, Guard guard = {});
+
+    BundleHost(const BundleHost&) = delete;
+    BundleHost& operator=(const BundleHost&) = delete;
+    ~BundleHost();
 
     /// Sends `payload` on `channel`, after waiting until the messages ahead of it leave it room: a
     /// sender that is faster than the bundle is slowed down and loses nothing.

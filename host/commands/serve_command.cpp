@@ -22,6 +22,7 @@
 #include "host/commands/exit_status.h"
 #include "host/commands/standard_streams.h"
 #include "host/commands/stop_signals.h"
+#include "host/guard/guarded_client.h"
 #include "host/limits/confinement.h"
 #include "host/limits/open_files.h"
 #include "host/server/private_folder.h"
@@ -251,6 +252,8 @@ int runServe(const ServeOptions& options, int output) {
     });
 
     const std::filesystem::path webFolder = webFolderOf(options.web);
+    // What keeps earlier versions opens files that clients may not reach.
+    const Guard guard = makeGuard(options.guard, options.roots);
     const std::optional<Confinements> confinements = confinementsOf(options, webFolder);
     // The web page's origin is part of the server's configuration.
     const std::unique_ptr<WebServer> web = makeWebServer(options.web, webFolder);
@@ -275,11 +278,14 @@ int runServe(const ServeOptions& options, int output) {
         confinements->documents.confineThisThread();
     }
     platform::messaging::setTransport(
-        [bus](const std::string& name, const platform::messaging::MessageServiceOptions&) {
+        [bus, guard](const std::string& name, const platform::messaging::MessageServiceOptions&) {
             // The bus is connected, so that this is no waiting.
-            futures::Promise<std::shared_ptr<platform::messaging::MessageService>> client;
-            client.setValue(tellingWhatIsNotSent(bus->connect(name).get()));
-            return client.getFuture();
+            futures::Promise<std::shared_ptr<platform::messaging::MessageService>> promise;
+            std::shared_ptr<platform::messaging::MessageService> client =
+                tellingWhatIsNotSent(bus->connect(name).get());
+            promise.setValue(guard.saves ? savingSafely(std::move(client), guard)
+                                         : std::move(client));
+            return promise.getFuture();
         });
     const TransportEnd transportEnd;
     const framework::BundleRunner bundle(options.bundle);

@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "host/guard/guard.h"
 #include "host/server/nats_server.h"
 #include "host/web/web_server.h"
 
@@ -46,6 +47,7 @@ struct ServeOptions {
 
     /// Whether the kernel keeps the host to these folders. Without, they have no effect.
     bool isConfined = true;
+    GuardOptions guard;
 };
 
 /// Serves the bundle's clients until the process is asked to end (StopSignals), and finishes then

@@ -110,8 +110,10 @@ int runStdio(const StdioOptions& options, int input, int output) {
     // Who is asked to end takes no more requests, but does not leave those half done that it took.
     blockStopSignals();
     FrameOutput frames(output);
-    BundleHost host(options.bundle, options.largestMessage,
-                    [&frames](const JsonMessage& message) { frames.write(message); });
+    const Guard guard = makeGuard(options.guard, {});
+    BundleHost host(
+        options.bundle, options.largestMessage,
+        [&frames](const JsonMessage& message) { frames.write(message); }, guard);
     const StopSignals signals([] {});
     FrameReader reader(
         [&](char* to, std::size_t room) {

@@ -5,11 +5,14 @@
 #include <cstddef>
 #include <filesystem>
 
+#include "host/guard/guard.h"
+
 namespace host {
 
 struct StdioOptions {
     std::filesystem::path bundle;
     std::size_t largestMessage = std::size_t{1} << 30;  ///< Of the input, in bytes.
+    GuardOptions guard{false};  ///< The command shows what the bundle does by itself.
 };
 
 /// Sends the messages that come framed on `input` to the bundle, and writes every message that the

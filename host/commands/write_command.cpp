@@ -162,12 +162,16 @@ int runWrite(const WriteOptions& options, int input, int output) {
     const StopSignals signals([] {});
     std::mutex mutex;
     std::optional<JsonMessage> answer;  // guarded by mutex
-    BundleHost host(options.bundle, request.length(), [&](const JsonMessage& message) {
-        if (message.channel().starts_with(platform::messaging::writeResponsePrefix)) {
-            const std::lock_guard lock(mutex);
-            answer = message;
-        }
-    });
+    const Guard guard = makeGuard(options.guard, {});
+    BundleHost host(
+        options.bundle, request.length(),
+        [&](const JsonMessage& message) {
+            if (message.channel().starts_with(platform::messaging::writeResponsePrefix)) {
+                const std::lock_guard lock(mutex);
+                answer = message;
+            }
+        },
+        guard);
     host.publish(platform::messaging::writeRequestChannel, std::move(request));
     host.waitUntilIdle(options.timeout, [&options] {
         spdlog::error("{}: no answer within {} seconds", options.file, options.timeout.count());

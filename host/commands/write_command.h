@@ -6,6 +6,8 @@
 #include <filesystem>
 #include <string>
 
+#include "host/guard/guard.h"
+
 namespace host {
 
 struct WriteOptions {
@@ -14,6 +16,7 @@ struct WriteOptions {
     std::string contentType;        ///< Of the request; empty: by the content.
     std::string encoding{"UTF-8"};  ///< The charset of a text, as it comes in and as it is stored.
     std::chrono::seconds timeout{300};  ///< How long to wait for the answer.
+    GuardOptions guard;
 };
 
 /// Reads the content from `input` to its end, sends a write request for it and writes the answer to

@@ -65,16 +65,19 @@ std::string followLinks(std::string path) {
     failForSystem("cannot be found");
 }
 
+constexpr std::string_view kNameBegin = ".~saving-";
+constexpr std::string_view kNameEnd = ".tmp";
+constexpr std::size_t kNameDigits = 16;
+
 // A name that no other save uses, short enough for every file system.
 std::string randomName() {
     std::uint64_t number = 0;
     if (uninterrupted([&] { return ::getrandom(&number, sizeof number, 0); }) != sizeof number) {
         failForSystem("cannot be saved: no random name for a temporary file");
     }
-    std::array<char, 32> name{};
-    std::snprintf(name.data(), name.size(), ".~saving-%016llx.tmp",
-                  static_cast<unsigned long long>(number));
-    return name.data();
+    std::array<char, kNameDigits + 1> digits{};
+    std::snprintf(digits.data(), digits.size(), "%016llx", static_cast<unsigned long long>(number));
+    return std::string(kNameBegin).append(digits.data()).append(kNameEnd);
 }
 
 // A path that leads to the file of `descriptor`, wherever that file is by now. Unlike the
@@ -182,7 +185,7 @@ void AtomicFile::createTemporary() {
     for (int i = 0; i < attempts && !temporary_; ++i) {
         std::string name = randomName();
         temporary_ = FileDescriptor(uninterrupted([&] {
-            return ::openat(folder_.get(), name.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC,
+            return ::openat(folder_.get(), name.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC,
                             mode);
         }));
         if (temporary_) {
@@ -194,6 +197,47 @@ void AtomicFile::createTemporary() {
     if (!temporary_) {
         failForSystem("cannot be saved: no file can be created in its folder");
     }
+}
+
+bool AtomicFile::isTemporaryName(std::string_view name) {
+    if (name.size() != kNameBegin.size() + kNameDigits + kNameEnd.size() ||
+        !name.starts_with(kNameBegin) || !name.ends_with(kNameEnd)) {
+        return false;
+    }
+    return name.substr(kNameBegin.size(), kNameDigits).find_first_not_of("0123456789abcdef") ==
+           std::string_view::npos;
+}
+
+bool AtomicFile::canStandForTarget() const {
+    if (!target_) {
+        return true;
+    }
+    struct statx status {};
+    const bool isMountPoint =
+        ::statx(target_.get(), "", AT_EMPTY_PATH, STATX_BASIC_STATS, &status) == 0 &&
+        (status.stx_attributes & STATX_ATTR_MOUNT_ROOT) != 0;
+    return targetStatus_.st_nlink == 1 && !isMountPoint &&
+           ::fchown(temporary_.get(), targetStatus_.st_uid, targetStatus_.st_gid) == 0;
+}
+
+FileDescriptor AtomicFile::openTarget() const {
+    FileDescriptor file(uninterrupted([&] {
+        return ::openat(folder_.get(), targetName_.c_str(),
+                        O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC);
+    }));
+    struct stat status {};
+    if (!file || ::fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode)) {
+        return {};
+    }
+    return file;
+}
+
+std::string AtomicFile::contentPath() const {
+    return pathTo(temporary_);
+}
+
+std::string AtomicFile::temporaryPath() const {
+    return pathTo(folder_) + "/" + temporaryName_;
 }
 
 void AtomicFile::write(std::string_view bytes) {

@@ -33,6 +33,34 @@ public:
     /// Removes the temporary file if there was no commit.
     ~AtomicFile();
 
+    /// Whether `name` is one that temporary files have.
+    static bool isTemporaryName(std::string_view name);
+
+    /// Whether there is a file to be replaced.
+    bool hasTarget() const noexcept { return static_cast<bool>(target_); }
+
+    /// Whether a new file can stand for the target in all: that has no other hard links, is no
+    /// mount point, and belongs to somebody whom the process may give files to. True without a
+    /// target.
+    bool canStandForTarget() const;
+
+    /// What is at the target's name now, opened to be read; none where there is no regular file, or
+    /// it may not be read.
+    FileDescriptor openTarget() const;
+
+    /// The temporary file, open for reading and writing until the commit.
+    int content() const noexcept { return temporary_.get(); }
+
+    /// A path by which others can write the new content until the commit, wherever the folder is by
+    /// then. Opening it gives the temporary file.
+    std::string contentPath() const;
+
+    /// The same for who replaces the temporary file by renaming another.
+    std::string temporaryPath() const;
+
+    /// Whether the new content is in the place of the old.
+    bool isCommitted() const noexcept { return temporaryName_.empty(); }
+
     /// Appends to the new content. Throws std::system_error when that fails, after which commit
     /// must not be called.
     void write(std::string_view bytes);

@@ -1,0 +1,18 @@
+// SPDX-License-Identifier: Apache-2.0
+// The version of a document: a token made from its content.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace host {
+
+/// 32 hexadecimal digits that two contents have in common only when they are the same: the first
+/// half of the SHA-256 sum of what can be read from `file` from its beginning. The file's position
+/// is left alone. Throws std::system_error when it cannot be read. Linear in the file's size.
+std::string versionOf(int file);
+
+/// The same digits for `bytes`.
+std::string digestOf(std::string_view bytes);
+
+}  // namespace host

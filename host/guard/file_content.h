@@ -1,0 +1,22 @@
+// SPDX-License-Identifier: Apache-2.0
+// The content of open files, compared and copied.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace host {
+
+/// Whether `file` holds just `bytes`. False also where it cannot be read.
+bool hasContent(int file, std::string_view bytes);
+
+/// Whether two files hold the same. False also where one cannot be read.
+bool haveSameContent(int one, int other);
+
+/// All that `file` holds. Throws std::system_error.
+std::string readContent(int file);
+
+/// Writes all that `from` holds to the beginning of `to`. Throws std::system_error.
+void copyContent(int from, int to);
+
+}  // namespace host

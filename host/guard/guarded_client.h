@@ -1,0 +1,20 @@
+// SPDX-License-Identifier: Apache-2.0
+// A client of the message service whose write requests are saved so that no fault can make them
+// lose a document.
+#pragma once
+
+#include <memory>
+
+#include "host/guard/guard.h"
+#include "platform/messaging/message_service.h"
+
+namespace host {
+
+/// A client that does what `client` does, except that write requests reach their handler by way of
+/// the saves of `guard`, and what that publishes for them is what has become of the document. A
+/// request that is malformed reaches the handler as it is. The handler of read requests is noted in
+/// `guard` when it is subscribed.
+std::shared_ptr<platform::messaging::MessageService> savingSafely(
+    std::shared_ptr<platform::messaging::MessageService> client, Guard guard);
+
+}  // namespace host

@@ -1,0 +1,359 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "host/guard/history.h"
+
+#include <fcntl.h>
+#include <linux/fs.h>
+#include <spdlog/spdlog.h>
+#include <sys/ioctl.h>
+#include <sys/stat.h>
+#include <sys/statvfs.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <charconv>
+#include <exception>
+#include <future>
+#include <memory>
+#include <optional>
+#include <stdexcept>
+#include <string_view>
+#include <system_error>
+#include <utility>
+
+#include "host/guard/document_version.h"
+#include "host/guard/file_content.h"
+
+namespace host {
+
+namespace {
+
+namespace fs = std::filesystem;
+using platform::FileDescriptor;
+
+constexpr std::chrono::hours longestAge{30 * 24};
+constexpr std::chrono::hours recount{1};
+constexpr std::size_t mostPending = 256;
+constexpr const char* unfinishedName = "unfinished-";
+
+std::int64_t now() {
+    return std::chrono::duration_cast<std::chrono::milliseconds>(
+               std::chrono::system_clock::now().time_since_epoch())
+        .count();
+}
+
+bool isTooOld(const EarlierVersion& version) {
+    return version.time < now() - std::chrono::milliseconds(longestAge).count();
+}
+
+std::string fileName(const std::string& digest, const EarlierVersion& version) {
+    return digest + "-" + std::to_string(version.time) + "-" + std::to_string(version.size);
+}
+
+template <typename Integer>
+bool readInteger(std::string_view text, Integer& target) {
+    const char* const end = text.data() + text.size();
+    const auto [last, error] = std::from_chars(text.data(), end, target);
+    return error == std::errc() && last == end;
+}
+
+struct NameParts {
+    std::string document;
+    EarlierVersion version;
+};
+
+std::optional<NameParts> partsOf(const std::string& fileName) {
+    const std::size_t first = fileName.find('-');
+    const std::size_t second = fileName.find('-', first + 1);
+    if (first == std::string::npos || second == std::string::npos) {
+        return std::nullopt;
+    }
+    NameParts parts{fileName.substr(0, first), {}};
+    const std::string_view name = fileName;
+    if (!readInteger(name.substr(first + 1, second - first - 1), parts.version.time) ||
+        !readInteger(name.substr(second + 1), parts.version.size)) {
+        return std::nullopt;
+    }
+    return parts;
+}
+
+// The paths in `folder`; none where there is no such folder.
+std::vector<fs::path> pathsIn(const fs::path& folder) {
+    std::vector<fs::path> paths;
+    std::error_code ignored;
+    for (fs::directory_iterator entry(folder, ignored), end; !ignored && entry != end;
+         entry.increment(ignored)) {
+        paths.push_back(entry->path());
+    }
+    return paths;
+}
+
+void removeFile(const fs::path& path) {
+    std::error_code ignored;
+    fs::remove(path, ignored);
+}
+
+// Removes a copy whose maker has ended before it was complete.
+void removeIfAbandoned(const fs::path& path) {
+    std::error_code error;
+    const fs::file_time_type changed = fs::last_write_time(path, error);
+    if (!error && changed + recount < fs::file_time_type::clock::now()) {
+        removeFile(path);
+    }
+}
+
+// Copies `from` to a new file at `path`, without its bytes being copied where the file system can
+// share them.
+void copyTo(const fs::path& path, int from) {
+    const FileDescriptor to(::open(path.c_str(), O_RDWR | O_CREAT | O_TRUNC | O_CLOEXEC, 0600));
+    if (!to) {
+        throw std::system_error(errno, std::generic_category(), path.string());
+    }
+    if (::ioctl(to.get(), FICLONE, from) != 0) {
+        copyContent(from, to.get());
+    }
+}
+
+}  // namespace
+
+History::History(HistoryOptions options) : options_(std::move(options)) {
+    fs::create_directories(options_.folder);
+    fs::permissions(options_.folder, fs::perms::owner_all);
+    for (fs::path& root : options_.roots) {
+        root = nameOf(root);
+    }
+    thread_ = std::thread([this] { run(); });
+}
+
+History::~History() {
+    {
+        const std::lock_guard lock(mutex_);
+        isEnding_ = true;
+    }
+    changed_.notify_all();
+    thread_.join();
+}
+
+std::string History::nameOf(const std::string& path) {
+    std::error_code error;
+    const fs::path absolute = fs::absolute(path, error);
+    const fs::path canonical = fs::weakly_canonical(absolute, error);
+    return error ? absolute.string() : canonical.string();
+}
+
+bool History::isBelow(const fs::path& path, const fs::path& folder) {
+    const fs::path inner = nameOf(path);
+    const fs::path outer = nameOf(folder);
+    return std::mismatch(outer.begin(), outer.end(), inner.begin(), inner.end()).first ==
+           outer.end();
+}
+
+void History::run() {
+    std::unique_lock lock(mutex_);
+    for (;;) {
+        changed_.wait(lock, [this] { return isEnding_ || !tasks_.empty(); });
+        if (tasks_.empty()) {
+            return;
+        }
+        const std::function<void()> task = std::move(tasks_.front());
+        tasks_.pop_front();
+        lock.unlock();
+        task();
+        lock.lock();
+    }
+}
+
+void History::post(std::function<void()> task) {
+    {
+        const std::lock_guard lock(mutex_);
+        tasks_.push_back(std::move(task));
+    }
+    changed_.notify_all();
+}
+
+void History::waitUntilIdle() {
+    std::promise<void> done;
+    post([&done] { done.set_value(); });
+    done.get_future().wait();
+}
+
+void History::keep(FileDescriptor old, std::string document) {
+    {
+        const std::lock_guard lock(mutex_);
+        if (tasks_.size() >= mostPending) {
+            spdlog::warn("{}: no earlier version is kept, since copies are too slow", document);
+            return;
+        }
+    }
+    post([this, old = std::make_shared<FileDescriptor>(std::move(old)),
+          document = std::move(document)] {
+        try {
+            copy(*old, document);
+        } catch (const std::exception& error) {
+            spdlog::warn("{}: no earlier version is kept: {}", document, error.what());
+        }
+    });
+}
+
+std::vector<EarlierVersion> History::versionsOf(const std::string& document) {
+    std::promise<std::vector<EarlierVersion>> promise;
+    post([&] {
+        try {
+            std::vector<EarlierVersion> versions;
+            for (const File& file : filesOf(document)) {
+                versions.push_back(file.version);
+            }
+            promise.set_value(std::move(versions));
+        } catch (...) {
+            promise.set_exception(std::current_exception());
+        }
+    });
+    return promise.get_future().get();
+}
+
+FileDescriptor History::open(const std::string& document, std::int64_t time) {
+    std::promise<FileDescriptor> promise;
+    post([&] {
+        try {
+            for (const File& file : filesOf(document)) {
+                FileDescriptor opened;
+                if (file.version.time == time) {
+                    opened = FileDescriptor(::open(file.path.c_str(), O_RDONLY | O_CLOEXEC));
+                }
+                if (opened) {
+                    promise.set_value(std::move(opened));
+                    return;
+                }
+            }
+            throw std::runtime_error("There is no such earlier version");
+        } catch (...) {
+            promise.set_exception(std::current_exception());
+        }
+    });
+    return promise.get_future().get();
+}
+
+// The root below which `document` lies; the file system's where all documents have versions.
+fs::path History::rootOf(const std::string& document) const {
+    if (options_.roots.empty()) {
+        return "/";
+    }
+    for (const fs::path& root : options_.roots) {
+        if (isBelow(document, root)) {
+            return root;
+        }
+    }
+    throw std::runtime_error("is below no folder whose documents have earlier versions");
+}
+
+// Where versions of `document` may be. Without roots of one's own, they may have been kept for any.
+std::vector<fs::path> History::foldersOf(const std::string& document) const {
+    std::vector<fs::path> roots;
+    if (options_.roots.empty()) {
+        roots = pathsIn(options_.folder);
+    } else {
+        roots.push_back(options_.folder / digestOf(rootOf(document).string()));
+    }
+    for (fs::path& root : roots) {
+        root /= digestOf(document).substr(0, 2);
+    }
+    return roots;
+}
+
+std::vector<History::File> History::filesOf(const std::string& document) const {
+    const std::string digest = digestOf(document);
+    std::vector<File> files;
+    for (const fs::path& folder : foldersOf(document)) {
+        for (const fs::path& path : pathsIn(folder)) {
+            const std::optional<NameParts> parts = partsOf(path.filename());
+            std::error_code error;
+            if (parts && parts->document == digest && !isTooOld(parts->version) &&
+                fs::file_size(path, error) == parts->version.size && !error) {
+                files.push_back({path, digest, parts->version});
+            }
+        }
+    }
+    std::sort(files.begin(), files.end(),
+              [](const File& a, const File& b) { return a.version.time > b.version.time; });
+    return files;
+}
+
+void History::copy(const FileDescriptor& old, const std::string& document) {
+    const fs::path root = rootOf(document);
+    const std::string digest = digestOf(document);
+    const fs::path folder = options_.folder / digestOf(root.string()) / digest.substr(0, 2);
+    fs::create_directories(folder);
+    const fs::path unfinished =
+        folder / (unfinishedName + std::to_string(::getpid()) + "." + std::to_string(now()));
+    try {
+        copyTo(unfinished, old.get());
+        EarlierVersion version{now(), fs::file_size(unfinished)};
+        // Two within a millisecond get times of their own.
+        const std::vector<File> others = filesOf(document);
+        if (!others.empty()) {
+            version.time = std::max(version.time, others.front().version.time + 1);
+        }
+        fs::rename(unfinished, folder / fileName(digest, version));
+        removeSurplus(document);
+        keepToShare(root, version.size);
+    } catch (...) {
+        removeFile(unfinished);
+        throw;
+    }
+}
+
+void History::removeSurplus(const std::string& document) {
+    const std::vector<File> files = filesOf(document);
+    for (std::size_t i = options_.versions; i < files.size(); ++i) {
+        removeFile(files[i].path);
+    }
+}
+
+// What was removed as surplus still counts until all is counted anew, which is done each hour and
+// when it is too much.
+void History::keepToShare(const fs::path& root, std::uint64_t added) {
+    Usage& usage = usage_[root];
+    usage.bytes += added;
+    const auto time = std::chrono::steady_clock::now();
+    const bool isCounted = usage.counted != std::chrono::steady_clock::time_point();
+    if (isCounted && usage.bytes <= usage.most && time - usage.counted < recount) {
+        return;
+    }
+    struct statvfs system {};
+    if (::statvfs(root.c_str(), &system) != 0) {
+        throw std::system_error(errno, std::generic_category(), root.string());
+    }
+    const auto size = static_cast<double>(system.f_blocks) * static_cast<double>(system.f_frsize);
+    usage.most = static_cast<std::uint64_t>(size * options_.share);
+    usage.counted = time;
+    usage.bytes = removeOldest(root, usage.most);
+}
+
+// Removes what is too old, and the oldest versions until the others take no more than `most` bytes,
+// and some less when they took more. Returns what they take.
+std::uint64_t History::removeOldest(const fs::path& root, std::uint64_t most) const {
+    std::vector<File> files;
+    std::uint64_t bytes = 0;
+    for (const fs::path& folder : pathsIn(options_.folder / digestOf(root.string()))) {
+        for (const fs::path& path : pathsIn(folder)) {
+            if (const std::optional<NameParts> parts = partsOf(path.filename())) {
+                files.push_back({path, parts->document, parts->version});
+                bytes += parts->version.size;
+            } else {
+                removeIfAbandoned(path);
+            }
+        }
+    }
+    std::sort(files.begin(), files.end(),
+              [](const File& a, const File& b) { return a.version.time < b.version.time; });
+    const std::uint64_t wanted = bytes > most ? most / 10 * 9 : bytes;
+    for (const File& file : files) {
+        if (bytes > wanted || isTooOld(file.version)) {
+            removeFile(file.path);
+            bytes -= file.version.size;
+        }
+    }
+    return bytes;
+}
+
+}  // namespace host

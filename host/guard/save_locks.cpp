@@ -1,0 +1,73 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "host/guard/save_locks.h"
+
+#include <fcntl.h>
+#include <spdlog/spdlog.h>
+
+#include <cerrno>
+#include <chrono>
+#include <stdexcept>
+#include <system_error>
+#include <thread>
+
+#include "host/guard/document_version.h"
+
+namespace host {
+
+namespace {
+
+constexpr std::chrono::seconds longestWait{30};
+constexpr std::chrono::milliseconds pause{2};
+
+int setLock(int file, short type, std::size_t number) {
+    struct flock lock {};
+    lock.l_type = type;
+    lock.l_whence = SEEK_SET;
+    lock.l_start = static_cast<off_t>(number);
+    lock.l_len = 1;
+    return ::fcntl(file, F_OFD_SETLK, &lock);
+}
+
+}  // namespace
+
+SaveLocks::SaveLocks(const std::filesystem::path& file) {
+    if (!file.empty()) {
+        file_ = platform::FileDescriptor(::open(file.c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600));
+    }
+    if (!file.empty() && !file_) {
+        spdlog::warn("saves are not kept apart from those of other workers: {}: {}", file.string(),
+                     std::generic_category().message(errno));
+    }
+}
+
+SaveLocks::Held::Held(int file, std::size_t number, std::mutex& mutex)
+    : file_(file), number_(number), lock_(mutex) {
+    if (file_ < 0) {
+        return;
+    }
+    // Asked for again and again, since there is no other way to wait for it no longer than so.
+    const auto end = std::chrono::steady_clock::now() + longestWait;
+    while (setLock(file_, F_WRLCK, number_) != 0) {
+        const bool isHeld = errno == EAGAIN || errno == EACCES || errno == EINTR;
+        if (!isHeld) {
+            throw std::system_error(errno, std::generic_category(), "cannot be locked");
+        }
+        if (std::chrono::steady_clock::now() > end) {
+            throw std::runtime_error("is locked by the save of another worker");
+        }
+        std::this_thread::sleep_for(pause);
+    }
+}
+
+SaveLocks::Held::~Held() {
+    if (lock_ && file_ >= 0) {
+        setLock(file_, F_UNLCK, number_);
+    }
+}
+
+SaveLocks::Held SaveLocks::hold(const std::string& path) {
+    const std::size_t number = std::stoul(digestOf(path).substr(0, 8), nullptr, 16) % count;
+    return {file_.get(), number, mutexes_.at(number)};
+}
+
+}  // namespace host

@@ -1,0 +1,54 @@
+// SPDX-License-Identifier: Apache-2.0
+// Keeps the saves of one document apart, also those of several workers.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <filesystem>
+#include <mutex>
+#include <string>
+
+#include "platform/posix/file_descriptor.h"
+
+namespace host {
+
+/// Locks for documents. Each document has one of a fixed number, by a digest of its path, so that
+/// some share one. Between processes they are locks on single bytes of one file that all of them
+/// open, which end with the process that holds them, however it ends. They bind nobody but those
+/// who ask for them here.
+class SaveLocks {
+public:
+    /// Without a `file`, or where it cannot be opened, the locks are those of this process alone;
+    /// the log says so.
+    explicit SaveLocks(const std::filesystem::path& file);
+
+    /// A lock, until the end of its life.
+    class Held {
+    public:
+        Held(Held&&) noexcept = default;
+        Held& operator=(Held&&) = delete;
+        Held(const Held&) = delete;
+        Held& operator=(const Held&) = delete;
+        ~Held();
+
+    private:
+        friend class SaveLocks;
+        Held(int file, std::size_t number, std::mutex& mutex);
+
+        int file_;
+        std::size_t number_;
+        std::unique_lock<std::mutex> lock_;
+    };
+
+    /// Waits for the lock of the document at `path`. Throws std::runtime_error when another process
+    /// has held it for half a minute.
+    Held hold(const std::string& path);
+
+private:
+    static constexpr std::size_t count = 1024;
+
+    platform::FileDescriptor file_;
+    std::array<std::mutex, count> mutexes_;
+};
+
+}  // namespace host

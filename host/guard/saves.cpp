@@ -1,0 +1,284 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "host/guard/saves.h"
+
+#include <fcntl.h>
+#include <spdlog/spdlog.h>
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <optional>
+#include <stdexcept>
+#include <system_error>
+#include <utility>
+
+#include "host/guard/document_version.h"
+#include "host/guard/file_content.h"
+#include "host/guard/in_place_file.h"
+#include "platform/i18n/codecvt.h"
+#include "platform/posix/atomic_file.h"
+
+namespace host {
+
+namespace {
+
+using platform::AtomicFile;
+using platform::FileDescriptor;
+
+// Whether the reason of a failure is one that a save in place may get round: it is not that the
+// disk is full or broken.
+bool isForbidden(const std::error_code& error) {
+    return error == std::errc::permission_denied || error == std::errc::operation_not_permitted ||
+           error == std::errc::read_only_file_system ||
+           error == std::errc::device_or_resource_busy || error == std::errc::cross_device_link;
+}
+
+// Whether the reason of a failure is that there can be no file, or that links go in a circle. The
+// bundle then finds the same.
+bool isNowhere(const std::error_code& error) {
+    return error == std::errc::no_such_file_or_directory || error == std::errc::not_a_directory ||
+           error == std::errc::filename_too_long ||
+           error == std::errc::too_many_symbolic_link_levels;
+}
+
+// The regular file at `path`, opened to read; none where there is no such thing.
+FileDescriptor openRegular(const std::string& path) {
+    FileDescriptor file(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+    struct stat status {};
+    if (!file || ::fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode)) {
+        return {};
+    }
+    return file;
+}
+
+// Whether the file holds the text that `request` asks for. The text is nearly always stored as it
+// comes; but some charsets can write the same text in several ways.
+bool holdsTextOf(const WriteRequest& request, int file) {
+    if (hasContent(file, request.text)) {
+        return true;
+    }
+    try {
+        platform::i18n::codecvt_string_to_ustring decoder(request.encoding, true);
+        platform::i18n::codecvt_ustring_to_string encoder(request.encoding, true);
+        const std::u16string text = platform::i18n::to_ustring(request.text, decoder);
+        return hasContent(file, platform::i18n::to_string(text, encoder));
+    } catch (const std::runtime_error&) {
+        return false;
+    }
+}
+
+// One save, of which the document's lock is held when its place is taken.
+class Save {
+public:
+    Save(const WriteRequest& request, const AskBundle& askBundle, SaveLocks& locks,
+         History* history)
+        : request_(request),
+          askBundle_(askBundle),
+          locks_(locks),
+          history_(history),
+          document_(History::nameOf(request.filePath)) {}
+
+    SaveResult make() {
+        std::error_code ignored;
+        existed_ = std::filesystem::exists(request_.filePath, ignored);
+        try {
+            if (!request_.baseVersion.is<json::Undefined>() &&
+                !request_.baseVersion.is<std::string>()) {
+                throw std::runtime_error("\"baseVersion\" is no string");
+            }
+            return {request_.isPackage ? savePackage() : saveText(), existed_};
+        } catch (const std::exception& error) {
+            spdlog::error("{}: {}", request_.filePath, error.what());
+            return {false, existed_};
+        }
+    }
+
+private:
+    bool saveText() {
+        std::optional<AtomicFile> file;
+        try {
+            file.emplace(request_.filePath);
+        } catch (const std::system_error& error) {
+            if (isForbidden(error.code())) {
+                return saveTextInPlace();
+            }
+            if (isNowhere(error.code())) {
+                return saveUnguarded();
+            }
+            throw;
+        } catch (const std::runtime_error&) {
+            return saveUnguarded();  // a folder, or a device
+        }
+        if (!file->canStandForTarget()) {
+            file.reset();
+            return saveTextInPlace();
+        }
+        try {
+            return saveTextBeside(*file);
+        } catch (const std::system_error& error) {
+            if (file->isCommitted() || !isForbidden(error.code())) {
+                throw;
+            }
+        }
+        file.reset();
+        return saveTextInPlace();
+    }
+
+    bool saveTextBeside(AtomicFile& file) {
+        existed_ = file.hasTarget();
+        if (!askBundle_(file.contentPath()).isWritten) {
+            throw std::runtime_error("the text is not valid in the charset");
+        }
+        if (!holdsTextOf(request_, file.content())) {
+            throw std::runtime_error("not all of the text could be written");
+        }
+        const SaveLocks::Held lock = locks_.hold(document_);
+        FileDescriptor old = file.openTarget();
+        if (!isBasedOn(old, file.hasTarget())) {
+            return isRepetition(old && haveSameContent(old.get(), file.content()));
+        }
+        file.commit();
+        keep(std::move(old));
+        return true;
+    }
+
+    bool saveTextInPlace() {
+        const SaveLocks::Held lock = locks_.hold(document_);
+        std::optional<InPlaceFile> opened;
+        try {
+            opened.emplace(request_.filePath);
+        } catch (const std::system_error& error) {
+            if (isForbidden(error.code()) || isNowhere(error.code())) {
+                return saveUnguarded();
+            }
+            throw;
+        }
+        return saveTextOver(*opened);
+    }
+
+    bool saveTextOver(InPlaceFile& file) {
+        if (!isBasedOn(openRegular(file.path()), true)) {
+            return isRepetition(holdsTextOf(request_, file.descriptor()));
+        }
+        try {
+            if (!askBundle_(file.path()).isWritten || !holdsTextOf(request_, file.descriptor())) {
+                throw std::runtime_error("the text is not valid in the charset, or the disk full");
+            }
+            file.sync();
+        } catch (...) {
+            file.putBack();
+            throw;
+        }
+        keep(file.releaseCopy());
+        return true;
+    }
+
+    // Where there is no document to lose.
+    bool saveUnguarded() {
+        if (request_.baseVersion.is<std::string>() && existed_) {
+            throw std::runtime_error("has no version");
+        }
+        const BundleAnswer answer = askBundle_({});
+        existed_ = answer.existed;
+        return answer.isWritten;
+    }
+
+    // The bundle saves packages whole or not at all.
+    bool savePackage() {
+        const SaveLocks::Held lock = locks_.hold(document_);
+        FileDescriptor old = openRegular(request_.filePath);
+        if (!isBasedOn(old, existed_)) {
+            return isRepetition(old && packageComesOutAs(old));
+        }
+        const BundleAnswer answer = askBundle_({});
+        existed_ = answer.existed;
+        if (answer.isWritten) {
+            keep(std::move(old));
+        }
+        return answer.isWritten;
+    }
+
+    // Whether the bundle, writing the package over a copy of `current`, leaves the copy as it is.
+    bool packageComesOutAs(const FileDescriptor& current) {
+        AtomicFile copy(request_.filePath);
+        copyContent(current.get(), copy.content());
+        // It writes by renaming another file, so that the copy has to be found by its name.
+        const std::string path = copy.temporaryPath();
+        if (!askBundle_(path).isWritten) {
+            return false;
+        }
+        const FileDescriptor written = openRegular(path);
+        return written && haveSameContent(written.get(), current.get());
+    }
+
+    // Whether the document has the version that the client knows, if it named one. Called with the
+    // lock held.
+    bool isBasedOn(const FileDescriptor& current, bool exists) const {
+        if (request_.baseVersion.is<json::Undefined>()) {
+            return true;
+        }
+        if (exists && !current) {
+            throw std::runtime_error("cannot be read, and so not be compared with a version");
+        }
+        const auto& expected = request_.baseVersion.get<std::string>();
+        return expected == (current ? versionOf(current.get()) : std::string());
+    }
+
+    // A client that had no answer asks again, and shall not take its own save for another's.
+    bool isRepetition(bool isSame) const {
+        if (!isSame) {
+            spdlog::warn("{}: not saved, since it has changed meanwhile", request_.filePath);
+        }
+        return isSame;
+    }
+
+    void keep(FileDescriptor old) {
+        if (history_ != nullptr && old) {
+            history_->keep(std::move(old), document_);
+        }
+    }
+
+    const WriteRequest& request_;
+    const AskBundle& askBundle_;
+    SaveLocks& locks_;
+    History* const history_;
+    const std::string document_;
+    bool existed_ = false;
+};
+
+}  // namespace
+
+Saves::Saves(const std::filesystem::path& lockFile, std::shared_ptr<History> history)
+    : locks_(lockFile), history_(std::move(history)) {}
+
+SaveResult Saves::save(const WriteRequest& request, const AskBundle& askBundle) {
+    const SaveResult result = Save(request, askBundle, locks_, history_.get()).make();
+    leftovers_.removeBeside(request.filePath);
+    return result;
+}
+
+void Saves::restore(const std::string& path, int version) {
+    const std::string document = History::nameOf(path);
+    const SaveLocks::Held lock = locks_.hold(document);
+    FileDescriptor old = openRegular(path);
+    std::optional<AtomicFile> file;
+    try {
+        file.emplace(path);
+    } catch (const std::system_error& error) {
+        if (!isForbidden(error.code())) {
+            throw;
+        }
+    }
+    if (file && file->canStandForTarget()) {
+        copyContent(version, file->content());
+        file->commit();
+    } else {
+        InPlaceFile inPlace(path);
+        inPlace.replaceContent(version);
+        old = inPlace.releaseCopy();
+    }
+    if (history_ && old) {
+        history_->keep(std::move(old), document);
+    }
+}
+
+}  // namespace host

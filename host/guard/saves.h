@@ -1,0 +1,69 @@
+// SPDX-License-Identifier: Apache-2.0
+// Saves that no fault can make lose a document.
+//
+// The bundle writes texts in place and tells only whether it could open the file. So it is given
+// another path, of a new file in the same folder, and what it wrote there is compared with what was
+// asked for, made safe on disk, and takes the old file's place by renaming. Where a new file cannot
+// stand for the old (it has other names, is a mount point, belongs to somebody else, or its folder
+// takes no new file) the bundle writes in place, while the old content is kept to be put back.
+// Packages are saved by renaming in any case.
+#pragma once
+
+#include <exception>
+#include <filesystem>
+#include <functional>
+#include <memory>
+#include <string>
+
+#include "host/guard/history.h"
+#include "host/guard/leftovers.h"
+#include "host/guard/save_locks.h"
+#include "host/guard/write_request.h"
+
+namespace host {
+
+/// What the bundle made of a write request.
+struct BundleAnswer {
+    bool isWritten = false;
+    bool existed = false;
+};
+
+/// Has the bundle handle the request, with another path in it unless that is empty. Throws
+/// BundleFailure.
+using AskBundle = std::function<BundleAnswer(const std::string& otherPath)>;
+
+/// The bundle ended a request with an exception, and so without an answer. It is no std::exception,
+/// which would be a failure of the save that has an answer.
+struct BundleFailure {
+    std::exception_ptr exception;
+};
+
+struct SaveResult {
+    bool isSaved = false;
+    bool existed = false;
+};
+
+/// Makes saves, several at once if need be.
+class Saves {
+public:
+    /// `history` gets what saves replace; it may be null. `lockFile` is that of SaveLocks.
+    Saves(const std::filesystem::path& lockFile, std::shared_ptr<History> history);
+
+    /// Makes the save that `request` asks for. It is made when isSaved is true; else the document
+    /// is as it was, but when only the folder could not be made safe on disk, and the log has the
+    /// reason. Throws BundleFailure where the bundle gives no answer; the document is as it was
+    /// then.
+    SaveResult save(const WriteRequest& request, const AskBundle& askBundle);
+
+    /// Makes the content of the open file `version` that of the document at `path`, which it
+    /// replaces as a save does. Throws std::runtime_error when that fails; the document is as it
+    /// was then, but when only the folder could not be made safe on disk.
+    void restore(const std::string& path, int version);
+
+private:
+    SaveLocks locks_;
+    Leftovers leftovers_;
+    std::shared_ptr<History> history_;
+};
+
+}  // namespace host

@@ -1,0 +1,33 @@
+// SPDX-License-Identifier: Apache-2.0
+// What a guard needs to know of a write request before the bundle gets it.
+#pragma once
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "json/value.h"
+
+namespace host {
+
+/// The members of a write request that say what is to be saved where. Of a text it holds the whole
+/// content.
+struct WriteRequest {
+    std::string rtcId;
+    std::string filePath;
+    bool isPackage = false;
+    std::string text;         // a text's bytes, in the charset `encoding`
+    std::string encoding;     // of a text
+    json::Value baseVersion;  // Undefined where there is none
+};
+
+/// The request that `payload` holds, or nothing where it is none that the bundle would answer: it
+/// is no object, or lacks a member or has one of another kind. The content of a package is passed
+/// over without a look at what is between its brackets. Linear in the size of `payload`.
+std::optional<WriteRequest> readWriteRequest(std::string_view payload);
+
+/// `payload`, which is an object with members, with a member "filePath" put in front of the others.
+/// Of two members of one name the first counts.
+std::string withFilePath(std::string_view payload, const std::string& filePath);
+
+}  // namespace host

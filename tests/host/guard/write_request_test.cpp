@@ -1,0 +1,86 @@
+// SPDX-License-Identifier: Apache-2.0
+// What the guard reads of a write request has to be what the bundle reads.
+#include "host/guard/write_request.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+
+#include "json/parser.h"
+
+namespace {
+
+using host::readWriteRequest;
+using host::withFilePath;
+
+TEST(WriteRequest, HasTheMembersOfATextWhateverTheirOrder) {
+    const auto request = readWriteRequest(
+        R"({ "encoding" : "UTF-8", "x": [{"filePath": "no"}, "}\""], "content":"a\"\u00e9",)"
+        R"("filePath":"/a","contentType":"text/plain","rtcId":"7" } behind)");
+    ASSERT_TRUE(request);
+    EXPECT_EQ(request->rtcId, "7");
+    EXPECT_EQ(request->filePath, "/a");
+    EXPECT_FALSE(request->isPackage);
+    EXPECT_EQ(request->text, "a\"é");
+    EXPECT_EQ(request->encoding, "UTF-8");
+    EXPECT_TRUE(request->baseVersion.is<json::Undefined>());
+}
+
+TEST(WriteRequest, HasTheFirstOfMembersOfOneName) {
+    const auto request = readWriteRequest(
+        R"({"rtcId":"1","contentType":"a","filePath":"/a","file\u0050ath":"/b","content":"",)"
+        R"("encoding":"","baseVersion":"v","baseVersion":1})");
+    ASSERT_TRUE(request);
+    EXPECT_EQ(request->filePath, "/a");
+    EXPECT_EQ(request->baseVersion, json::Value("v"));
+}
+
+TEST(WriteRequest, NeedsNoEncodingForAPackage) {
+    const auto request = readWriteRequest(
+        R"({"rtcId":"1","contentType":"text/xml","filePath":"/a","content":{"parts":[]}})");
+    ASSERT_TRUE(request);
+    EXPECT_TRUE(request->isPackage);
+}
+
+TEST(WriteRequest, IsNoneWhereTheBundleGivesNoAnswer) {
+    for (const char* payload : {
+             "",
+             "{}",
+             "{",
+             "[]",
+             R"( {"rtcId":"1","contentType":"a","filePath":"/a","content":"","encoding":""})",
+             R"({"contentType":"a","filePath":"/a","content":"","encoding":""})",
+             R"({"rtcId":1,"contentType":"a","filePath":"/a","content":"","encoding":""})",
+             R"({"rtcId":"1","contentType":"a","content":"","encoding":""})",
+             R"({"rtcId":"1","contentType":"a","filePath":"/a","content":[],"encoding":""})",
+             R"({"rtcId":"1","contentType":"a","filePath":"/a","content":""})",
+             R"({"rtcId":"1","contentType":"a","filePath":"/a\u0000","content":"","encoding":""})",
+             "{\"rtcId\":\"1\",\"contentType\":\"a\",\"filePath\":\"\xFF\",\"content\":\"\","
+             "\"encoding\":\"\"}",
+             R"({"rtcId":"1","contentType":"text/xml","filePath":"/a","content":""})",
+             R"({"rtcId":"1","contentType":"a","filePath":"/a","content":"","encoding":"")",
+             R"({"rtcId":"1","contentType":"a","filePath":"/a","content":"","encoding":""])",
+             R"({"rtcId":"1","contentType":"a","filePath":"/a","content":")",
+         }) {
+        EXPECT_FALSE(readWriteRequest(payload)) << payload;
+    }
+}
+
+// Two readers that disagree could have the guard compare one file and the bundle write another.
+TEST(WriteRequest, IsReadAsTheParserReadsItCutAtAnyByte) {
+    const std::string whole =
+        R"({"a":{"b":[1,"]"]},"rtcId":"1","contentType":"a","filePath":"/a\"","content":"\\",)"
+        R"("encoding":"x","kqdata":[1],"kqtype":"int8","baseVersion":null})";
+    ASSERT_TRUE(readWriteRequest(whole));
+    for (std::size_t length = 0; length < whole.size(); ++length) {
+        EXPECT_FALSE(readWriteRequest(whole.substr(0, length))) << length;
+    }
+}
+
+TEST(WriteRequest, GetsAnotherPathInFrontOfItsOwn) {
+    const std::string request = withFilePath(R"({"filePath":"/a","rtcId":"1"})", "/b\"c");
+    EXPECT_EQ(json::parse(request)["filePath"], json::Value("/b\"c"));
+    EXPECT_EQ(json::parse(request)["rtcId"], json::Value("1"));
+}
+
+}  // namespace
