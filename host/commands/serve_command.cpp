@@ -22,6 +22,7 @@
 #include "host/commands/exit_status.h"
 #include "host/commands/standard_streams.h"
 #include "host/commands/stop_signals.h"
+#include "host/files/file_service.h"
 #include "host/guard/guarded_client.h"
 #include "host/limits/confinement.h"
 #include "host/limits/open_files.h"
@@ -85,7 +86,8 @@ NatsOptions connectionTo(const OtherServers& servers) {
     options.tls.enabled = !servers.caFile.empty() || !servers.certificateFile.empty();
     options.queueGroup = servers.group;
     options.queueChannels = {platform::messaging::readRequestChannel,
-                             platform::messaging::writeRequestChannel};
+                             platform::messaging::writeRequestChannel,
+                             platform::messaging::filesRequestChannel};
     return options;
 }
 
@@ -94,7 +96,8 @@ std::shared_ptr<NatsBus> makeBus(NatsOptions options) {
     // Counting them takes files that the threads which ask may not be allowed to open.
     options.concurrency = std::max(2U, std::thread::hardware_concurrency());
     // A large document shall not hold up the small ones behind it.
-    options.concurrentChannels = {platform::messaging::readRequestChannel};
+    options.concurrentChannels = {platform::messaging::readRequestChannel,
+                                  platform::messaging::filesRequestChannel};
     return NatsBus::create(std::move(options));
 }
 
@@ -289,6 +292,7 @@ int runServe(const ServeOptions& options, int output) {
         });
     const TransportEnd transportEnd;
     const framework::BundleRunner bundle(options.bundle);
+    const FileService files(tellingWhatIsNotSent(bus->connect(clientName).get()), guard);
     tellHowToConnect(web.get(), server.get(), output);
     signals.first().wait();
     if (!bus->drain(longestDrain)) {

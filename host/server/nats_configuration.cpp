@@ -53,12 +53,14 @@ std::string userText(const Login& login, const std::string& permissions = {}) {
 }
 
 std::string editorPermissions(const std::string& user) {
-    const std::array<std::string, 2> publish = {platform::messaging::readRequestChannel,
-                                                platform::messaging::writeRequestChannel};
-    const std::array<std::string, 3> subscribe = {
+    const std::array<std::string, 3> publish = {platform::messaging::readRequestChannel,
+                                                platform::messaging::writeRequestChannel,
+                                                platform::messaging::filesRequestChannel};
+    const std::array<std::string, 4> subscribe = {
         platform::messaging::notificationChannel,
         platform::messaging::readResponsePrefix + user + ".>",
-        platform::messaging::writeResponsePrefix + user + ".>"};
+        platform::messaging::writeResponsePrefix + user + ".>",
+        platform::messaging::filesResponsePrefix + user + ".>"};
     return ", permissions: {\n      publish: " + list(publish) +
            "\n      subscribe: " + list(subscribe) + "\n    }";
 }

@@ -19,4 +19,10 @@ inline constexpr const char* writeResponsePrefix = "/zpr/service/writeResponse/"
 /// The channel on which the bundle tells that a file may have changed.
 inline constexpr const char* notificationChannel = "/zpr/service/notifyFileSystemRequest";
 
+/// The channel on which the host takes questions about files.
+inline constexpr const char* filesRequestChannel = "/zpr/service/filesRequest_host";
+
+/// What precedes the "rtcId" of such a question in the channel of its answer.
+inline constexpr const char* filesResponsePrefix = "/zpr/service/filesResponse/";
+
 }  // namespace platform::messaging

@@ -90,7 +90,7 @@ async function startWorkers(test, folder, documents, servers) {
     const perServer = servers.map(async ({ monitoringPort }) => {
       const response = await fetch(`http://127.0.0.1:${monitoringPort}/connz`);
       const { connections } = await response.json();
-      return connections.filter(({ subscriptions }) => subscriptions === 2).length;
+      return connections.filter(({ subscriptions }) => subscriptions === 3).length;
     });
     return (await Promise.all(perServer)).reduce((sum, count) => sum + count) === workers.length;
   });

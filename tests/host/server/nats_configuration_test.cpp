@@ -39,10 +39,12 @@ TEST(NatsConfiguration, LetsEditorsAskAndHearTheirAnswersAndNothingElse) {
                 HasSubstr("    {user: \"worker\", password: \"w\"}\n"
                           "    {user: \"editor\", password: \"e\", permissions: {\n"
                           "      publish: [\"/zpr/service/readRequest_cpp\", "
-                          "\"/zpr/service/writeRequest_cpp\"]\n"
+                          "\"/zpr/service/writeRequest_cpp\", "
+                          "\"/zpr/service/filesRequest_host\"]\n"
                           "      subscribe: [\"/zpr/service/notifyFileSystemRequest\", "
                           "\"/zpr/service/readResponse/editor.>\", "
-                          "\"/zpr/service/writeResponse/editor.>\"]\n"
+                          "\"/zpr/service/writeResponse/editor.>\", "
+                          "\"/zpr/service/filesResponse/editor.>\"]\n"
                           "    }}\n"));
 }
 

@@ -1,0 +1,274 @@
+// SPDX-License-Identifier: Apache-2.0
+// The bundle behind the guard with the file service beside it, on threads that are confined to a
+// folder where the kernel can do that: what clients learn, and what they cannot reach.
+#include "host/files/file_service.h"
+
+#include <dlfcn.h>
+#include <fcntl.h>
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstddef>
+#include <filesystem>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "framework/bundle_runner.h"
+#include "host/guard/document_version.h"
+#include "host/guard/guarded_client.h"
+#include "host/limits/confinement.h"
+#include "json/parser.h"
+#include "json/serialize.h"
+#include "json/value.h"
+#include "platform/messaging/channels.h"
+#include "platform/messaging/in_process_bus.h"
+#include "platform/messaging/transport.h"
+#include "tests/support/temporary_directory.h"
+
+namespace {
+
+namespace fs = std::filesystem;
+
+using platform::messaging::InProcessBus;
+using platform::messaging::JsonMessage;
+using test::readFile;
+using test::writeFile;
+using testing::ElementsAre;
+
+class FileServiceTest : public testing::Test {
+protected:
+    void SetUp() override {
+        fs::create_directory(root_);
+        fs::create_directory(outside_);
+        writeFile(outside_ / "secret.txt", "secret");
+        host::GuardOptions options;
+        options.folder = state_;
+        guard_ = host::makeGuard(options, {root_});
+        // What is loaded later would not be found.
+        ASSERT_NE(::dlopen(SERIALIZATION_BUNDLE, RTLD_NOW | RTLD_LOCAL), nullptr);
+        client_ = bus_->connect("client").get();
+        observation_ = bus_->observe([this](std::string_view, const JsonMessage& message) {
+            const std::lock_guard lock(mutex_);
+            published_.emplace_back(message.channel(), message.payload());
+        });
+        std::thread([this] { start(); }).join();
+    }
+
+    void TearDown() override { platform::messaging::setTransport({}); }
+
+    void start() {
+        if (!host::whyConfinementIsUnavailable()) {
+            host::Confinement({{root_}, {SERIALIZATION_BUNDLE}}).confineThisThread();
+        }
+        platform::messaging::setTransport(
+            [this](const std::string& name, const platform::messaging::MessageServiceOptions&) {
+                futures::Promise<std::shared_ptr<platform::messaging::MessageService>> promise;
+                promise.setValue(host::savingSafely(bus_->connect(name).get(), guard_));
+                return promise.getFuture();
+            });
+        bundle_ = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
+        service_ = std::make_unique<host::FileService>(bus_->connect("files").get(), guard_);
+    }
+
+    // The payload of the last message on a channel that begins like this, after a request.
+    std::string send(const char* channel, json::Object request, std::string_view answers) {
+        request.try_emplace("rtcId", "1");
+        client_
+            ->publish(channel, platform::DataBuffer::copyOf(
+                                   json::serialize(json::Value(std::move(request)))))
+            .get();
+        bus_->waitUntilIdle();
+        const std::lock_guard lock(mutex_);
+        std::string answer = "none";
+        for (const auto& [on, payload] : std::exchange(published_, {})) {
+            answer = on.starts_with(answers) ? payload : answer;
+        }
+        return answer;
+    }
+
+    json::Object ask(const std::string& operation, const fs::path& path, json::Object more = {}) {
+        more["operation"] = operation;
+        more["filePath"] = path.string();
+        return json::parse(send(platform::messaging::filesRequestChannel, std::move(more),
+                                platform::messaging::filesResponsePrefix));
+    }
+
+    std::string write(const fs::path& path, const std::string& text) {
+        return send(platform::messaging::writeRequestChannel,
+                    {{"contentType", "text/plain"},
+                     {"encoding", "UTF-8"},
+                     {"filePath", path.string()},
+                     {"content", text}},
+                    platform::messaging::writeResponsePrefix);
+    }
+
+    json::Array versionsOf(const fs::path& path) {
+        guard_.history->waitUntilIdle();
+        return ask("versions", path)["versions"].get<json::Array>();
+    }
+
+    const test::TemporaryDirectory scratch_;
+    const fs::path root_ = scratch_ / "root";
+    const fs::path outside_ = scratch_ / "outside";
+    const fs::path state_ = scratch_ / "state";
+    host::Guard guard_;
+    std::mutex mutex_;
+    std::vector<std::pair<std::string, std::string>> published_;  // guarded by mutex_
+    std::shared_ptr<InProcessBus> bus_ = InProcessBus::create();
+    std::shared_ptr<platform::messaging::MessageService> client_;
+    std::shared_ptr<platform::messaging::Subscription> observation_;
+    std::unique_ptr<framework::BundleRunner> bundle_;
+    std::unique_ptr<host::FileService> service_;
+};
+
+TEST_F(FileServiceTest, ListsAFolderInTheOrderOfItsNames) {
+    fs::create_directory(root_ / "b");
+    writeFile(root_ / "a.txt", "12345");
+    fs::create_symlink("a.txt", root_ / "c");
+    ::symlink("none", (root_ / "d").c_str());
+    writeFile(root_ / ".~saving-0123456789abcdef.tmp", "");
+    json::Object answer = ask("list", root_);
+    EXPECT_EQ(answer["status"], json::Value(true));
+    EXPECT_EQ(answer["isLast"], json::Value(true));
+    std::vector<std::string> entries;
+    for (json::Value& entry : answer["entries"].get<json::Array>()) {
+        auto& members = entry.get<json::Object>();
+        entries.push_back(
+            members["name"].get<std::string>() + " " + members["kind"].get<std::string>() +
+            (members["kind"] == json::Value("file") ? " " + json::serialize(members["size"]) : ""));
+        EXPECT_EQ(members["time"].get<double>() > 1.6e12, members["kind"] != json::Value("other"));
+    }
+    EXPECT_THAT(entries, ElementsAre("a.txt file 5", "b folder", "c file 5", "d other"));
+}
+
+TEST_F(FileServiceTest, ListsALargeFolderInPagesThatHaveEachEntryOnce) {
+    constexpr int count = 2500;
+    for (int i = 0; i < count; ++i) {
+        writeFile(root_ / std::to_string(i), "");
+    }
+    std::vector<std::string> names;
+    std::string after;
+    for (bool isLast = false; !isLast;) {
+        json::Object page = ask("list", root_, {{"after", after}});
+        for (json::Value& entry : page["entries"].get<json::Array>()) {
+            names.push_back(entry.get<json::Object>()["name"].get<std::string>());
+        }
+        isLast = page["isLast"] == json::Value(true);
+        ASSERT_GT(names.back(), after);
+        after = names.back();
+    }
+    EXPECT_EQ(names.size(), std::size_t{count});
+    EXPECT_TRUE(std::is_sorted(names.begin(), names.end()));
+}
+
+TEST_F(FileServiceTest, NamesTheCharsetAndTellsOfTheMark) {
+    writeFile(root_ / "plain.txt", "text");
+    writeFile(root_ / "marked.txt", "\xEF\xBB\xBFtext");
+    writeFile(root_ / "wide.txt", std::string("\xFF\xFEt\0e\0x\0t\0", 10));
+    EXPECT_EQ(ask("charset", root_ / "plain.txt"),
+              json::parse(R"({"byteOrderMark":false,"charset":"UTF-8","status":true})"));
+    EXPECT_EQ(ask("charset", root_ / "marked.txt")["byteOrderMark"], json::Value(true));
+    EXPECT_EQ(ask("charset", root_ / "wide.txt")["byteOrderMark"], json::Value(true));
+    EXPECT_EQ(ask("charset", root_ / "none.txt")["status"], json::Value(false));
+}
+
+TEST_F(FileServiceTest, GivesTheVersionThatASaveCanBeBasedOn) {
+    EXPECT_EQ(ask("version", root_ / "a.txt")["version"], json::Value(""));
+    writeFile(root_ / "a.txt", "one");
+    EXPECT_EQ(ask("version", root_ / "a.txt")["version"], json::Value(host::digestOf("one")));
+}
+
+TEST_F(FileServiceTest, ReadsAndRestoresEarlierVersions) {
+    EXPECT_EQ(write(root_ / "a.txt", "one"), "true");
+    EXPECT_EQ(write(root_ / "a.txt", "two"), "true");
+    json::Array versions = versionsOf(root_ / "a.txt");
+    ASSERT_EQ(versions.size(), 1U);
+    const json::Value time = versions[0].get<json::Object>()["time"];
+    EXPECT_EQ(versions[0].get<json::Object>()["size"], json::Value(3.0));
+    EXPECT_EQ(ask("readVersion", root_ / "a.txt", {{"time", time}, {"contentType", "text/plain"}}),
+              json::parse(R"({"data":"one","status":true})"));
+    EXPECT_EQ(ask("restore", root_ / "a.txt", {{"time", time}}), json::parse(R"({"status":true})"));
+    EXPECT_EQ(readFile(root_ / "a.txt"), "one");
+    EXPECT_EQ(versionsOf(root_ / "a.txt").size(), 2U);
+}
+
+TEST_F(FileServiceTest, TellsOfTheRestoredFile) {
+    write(root_ / "a.txt", "one");
+    write(root_ / "a.txt", "two");
+    const json::Value time = versionsOf(root_ / "a.txt")[0].get<json::Object>()["time"];
+    EXPECT_EQ(
+        json::parse(send(
+            platform::messaging::filesRequestChannel,
+            {{"operation", "restore"}, {"filePath", (root_ / "a.txt").string()}, {"time", time}},
+            platform::messaging::notificationChannel))["isExistingFile"],
+        json::Value(true));
+}
+
+TEST_F(FileServiceTest, SaysWhatIsWrongWithARequest) {
+    for (json::Object request : {
+             json::Object{{"operation", "none"}, {"filePath", "/"}},
+             json::Object{{"filePath", "/"}},
+             json::Object{{"operation", "list"}},
+             json::Object{{"operation", "list"}, {"filePath", std::string("/\0", 2)}},
+             json::Object{
+                 {"operation", "restore"}, {"filePath", (root_ / "a.txt").string()}, {"time", 1.0}},
+             json::Object{{"operation", "restore"},
+                          {"filePath", (root_ / "a.txt").string()},
+                          {"time", -1.0}},
+             json::Object{{"operation", "version"}, {"filePath", root_.string()}},
+         }) {
+        json::Object answer = json::parse(send(platform::messaging::filesRequestChannel, request,
+                                               platform::messaging::filesResponsePrefix));
+        EXPECT_EQ(answer["status"], json::Value(false)) << json::serialize(json::Value(request));
+        EXPECT_NE(answer["exception"], json::Value(""));
+    }
+}
+
+TEST_F(FileServiceTest, ShowsAndChangesNothingOutsideItsRoot) {
+    if (host::whyConfinementIsUnavailable()) {
+        GTEST_SKIP() << "this kernel cannot confine threads";
+    }
+    {
+        host::GuardOptions options;
+        options.folder = state_;
+        const host::Guard other = host::makeGuard(options, {outside_});
+        other.history->keep(
+            platform::FileDescriptor(::open((outside_ / "secret.txt").c_str(), O_RDONLY)),
+            host::History::nameOf(outside_ / "secret.txt"));
+    }
+    fs::create_directory_symlink(outside_, root_ / "link");
+    for (const fs::path& folder : {outside_, root_ / "link", root_ / "../outside"}) {
+        EXPECT_EQ(ask("list", folder)["status"], json::Value(false));
+        EXPECT_EQ(ask("version", folder / "secret.txt")["status"], json::Value(false));
+        EXPECT_EQ(ask("charset", folder / "secret.txt")["status"], json::Value(false));
+        EXPECT_EQ(ask("versions", folder / "secret.txt")["status"], json::Value(false));
+        EXPECT_EQ(write(folder / "secret.txt", "x"), "false");
+        EXPECT_EQ(write(folder / "new.txt", "x"), "false");
+    }
+    EXPECT_EQ(ask("list", state_)["status"], json::Value(false));
+    EXPECT_EQ(readFile(outside_ / "secret.txt"), "secret");
+    EXPECT_FALSE(fs::exists(outside_ / "new.txt"));
+    // What the process holds open of the state is closed to clients too.
+    for (const auto& entry : fs::directory_iterator("/proc/self/fd")) {
+        std::error_code ignored;
+        if (fs::read_symlink(entry, ignored).string().starts_with(state_.string())) {
+            EXPECT_EQ(write(entry.path(), "x"), "false") << entry;
+        }
+    }
+}
+
+TEST_F(FileServiceTest, SavesWithinItsRootWhileConfined) {
+    EXPECT_EQ(write(root_ / "a.txt", "one"), "true");
+    fs::create_hard_link(root_ / "a.txt", root_ / "b.txt");
+    EXPECT_EQ(write(root_ / "a.txt", "two"), "true");
+    EXPECT_EQ(readFile(root_ / "b.txt"), "two");
+    EXPECT_EQ(versionsOf(root_ / "a.txt").size(), 1U);
+}
+
+}  // namespace
