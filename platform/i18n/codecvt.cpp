@@ -41,7 +41,7 @@ std::string to_string(std::u16string_view text, codecvt_ustring_to_string& conve
 }
 
 bool comesBackUnchanged(std::string_view bytes, const std::string& charset) {
-    return detail::openCharset(charset, true)->keeps(bytes);
+    return detail::openCharset(charset, true)->roundTrips(bytes);
 }
 
 std::u16string to_ustring(std::string_view utf8) {

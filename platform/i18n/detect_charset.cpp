@@ -48,7 +48,7 @@ constexpr std::array<Mark, 5> marks{{
 bool decodesStrictly(const char* charset, std::string_view bytes) {
     try {
         const std::unique_ptr<detail::Charset> opened = detail::openCharset(charset, true);
-        if (!opened->keeps(bytes)) {
+        if (!opened->roundTrips(bytes)) {
             opened->decode(bytes);
         }
         return true;

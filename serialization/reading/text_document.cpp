@@ -16,6 +16,7 @@
 #include <utility>
 
 #include "platform/filesystem/filesystem.h"
+#include "platform/i18n/charsets/shift_jis.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/i18n/detect_charset.h"
 #include "platform/large_pages.h"
@@ -33,18 +34,13 @@ using platform::i18n::codecvt_ustring_to_string;
 using platform::i18n::comesBackUnchanged;
 using platform::i18n::detect_charset;
 using platform::i18n::requireTextLength;
+using platform::i18n::restoreEndOfFileMarks;
 using platform::i18n::to_string;
 using platform::i18n::to_ustring;
 
 namespace {
 
 constexpr char16_t kByteOrderMark = u'\uFEFF';
-
-// Conversion tables of the IBM family turn byte 1A, the end-of-file mark of DOS texts, into U+001C.
-// A text that came through one gets its mark back.
-constexpr const char* kCharsetOfDos = "Shift_JIS";
-constexpr char kEndOfDosText = 0x1A;
-constexpr char kEndOfDosTextOfIbm = 0x1C;
 
 /// The byte-order mark in `charset`; empty where there is none.
 std::string markIn(const std::string& charset) {
@@ -66,10 +62,7 @@ std::u16string decode(const std::string& bytes, const std::string& charset) {
     if (!text.empty() && text.front() == kByteOrderMark) {
         text.erase(0, 1);
     }
-    if (charset == kCharsetOfDos) {
-        std::replace(text.begin(), text.end(), char16_t{kEndOfDosTextOfIbm},
-                     char16_t{kEndOfDosText});
-    }
+    restoreEndOfFileMarks(text, charset);
     return text;
 }
 
@@ -79,14 +72,7 @@ std::string cleaned(std::string bytes, const std::string& charset) {
     if (const std::string mark = markIn(charset); !mark.empty() && bytes.starts_with(mark)) {
         bytes.erase(0, mark.size());
     }
-    if (charset == kCharsetOfDos) {
-        // Neither is a half of any other character. Hardly a text has one, and find() sees that
-        // soonest.
-        for (std::size_t at = bytes.find(kEndOfDosTextOfIbm); at != std::string::npos;
-             at = bytes.find(kEndOfDosTextOfIbm, at + 1)) {
-            bytes[at] = kEndOfDosText;
-        }
-    }
+    restoreEndOfFileMarks(bytes, charset);
     return bytes;
 }
 

@@ -17,7 +17,8 @@ public:
     virtual ~Charset() = default;
 
     /// The text that `bytes` spell. Malformed input throws std::runtime_error when the charset was
-    /// opened strict, else becomes U+FFFD.
+    /// opened strict, else becomes U+FFFD. Strict decoding also refuses what `encode` would then
+    /// refuse.
     virtual std::u16string decode(std::string_view bytes) = 0;
 
     /// The bytes of `text`. What the charset cannot hold throws std::runtime_error when the charset
@@ -26,7 +27,7 @@ public:
 
     /// Whether `bytes` are known to decode strictly and to be what their text encodes to, without
     /// converting them, which takes several times as long. False where only converting can tell.
-    virtual bool keeps(std::string_view bytes) {
+    virtual bool roundTrips(std::string_view bytes) {
         static_cast<void>(bytes);
         return false;
     }
@@ -34,5 +35,8 @@ public:
 
 /// Opens the charset that `name` means. Throws std::runtime_error naming it when it is not known.
 std::unique_ptr<Charset> openCharset(std::string_view name, bool strict);
+
+/// Whether both names mean the same charset, known to both converters.
+bool isSameCharset(std::string_view name, std::string_view other);
 
 }  // namespace platform::i18n::detail

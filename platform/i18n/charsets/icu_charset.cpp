@@ -3,6 +3,7 @@
 #include "platform/i18n/charsets/icu_charset.h"
 
 #include <unicode/ucnv.h>
+#include <unicode/ucnv_cb.h>
 #include <unicode/ucnv_err.h>
 #include <unicode/uset.h>
 #include <unicode/utf16.h>
@@ -18,7 +19,7 @@
 #include <utility>
 
 #include "platform/i18n/charsets/conversion_error.h"
-#include "platform/i18n/detection/kept_codes.h"
+#include "platform/i18n/charsets/round_trip_codes.h"
 
 namespace platform::i18n::detail {
 
@@ -111,11 +112,17 @@ bool isAsciiCompatible(UConverter* converter) {
            });
 }
 
-// Whether a character's code is the same in every text. It is not where sequences of escapes or
-// shifts change the meaning of bytes, and where two characters in a row have a code of their own.
+// Whether nothing but a table of codes makes the charset: no sequences of escapes or shifts that
+// change the meaning of bytes, and no arithmetic.
+bool isTable(UConverter* converter) {
+    constexpr std::array tables = {UCNV_SBCS, UCNV_DBCS, UCNV_MBCS, UCNV_LATIN_1, UCNV_US_ASCII};
+    return std::find(tables.begin(), tables.end(), ucnv_getType(converter)) != tables.end();
+}
+
+// Whether a character's code is the same in every text: where, in addition, no two characters in a
+// row have a code of their own.
 bool hasFixedCodes(UConverter* converter) {
-    constexpr std::array fixed = {UCNV_SBCS, UCNV_DBCS, UCNV_MBCS, UCNV_LATIN_1, UCNV_US_ASCII};
-    if (std::find(fixed.begin(), fixed.end(), ucnv_getType(converter)) == fixed.end()) {
+    if (!isTable(converter)) {
         return false;
     }
     const std::unique_ptr<USet, void (*)(USet*)> characters(uset_openEmpty(), uset_close);
@@ -124,25 +131,44 @@ bool hasFixedCodes(UConverter* converter) {
     return U_SUCCESS(error) && !uset_hasStrings(characters.get());
 }
 
-// What is known of the codes of a converter; null where they are not fixed. One for all the
-// charsets that the converter is opened for, alive as long as the program.
-KeptCodes* keptCodesOf(UConverter* converter) {
+// Which codes of a converter round-trip; null where they are not fixed. One for all the charsets
+// that the converter is opened for, alive as long as the program.
+RoundTripCodes* roundTripCodesOf(UConverter* converter) {
     static std::mutex mutex;
-    static std::map<std::string, std::unique_ptr<KeptCodes>> known;  // guarded by mutex
+    static std::map<std::string, std::unique_ptr<RoundTripCodes>> known;  // guarded by mutex
     UErrorCode error = U_ZERO_ERROR;
     const std::string name = ucnv_getName(converter, &error);
     const std::lock_guard lock(mutex);
     const auto [found, isNew] = known.try_emplace(name);
     if (isNew && hasFixedCodes(converter)) {
-        found->second = std::make_unique<KeptCodes>();
+        found->second = std::make_unique<RoundTripCodes>();
     }
     return found->second.get();
 }
 
+// Called by ICU for what a converter cannot encode; leaving `error` as it is stops the conversion.
+// ICU's own callbacks drop characters that are usually invisible (U+200B, U+FEFF, U+200E) without a
+// word, and with them what a person meant.
+void stopEncoding(const void*, UConverterFromUnicodeArgs*, const UChar*, std::int32_t, UChar32,
+                  UConverterCallbackReason, UErrorCode*) {}
+
+// The same, but writes the converter's substitution character instead.
+void substituteEncoding(const void*, UConverterFromUnicodeArgs* arguments, const UChar*,
+                        std::int32_t, UChar32, UConverterCallbackReason reason, UErrorCode* error) {
+    if (reason <= UCNV_IRREGULAR) {
+        *error = U_ZERO_ERROR;
+        ucnv_cbFromUWriteSub(arguments, 0, error);
+    }
+}
+
 class IcuCharset final : public Charset {
 public:
-    IcuCharset(std::string name, Converter converter, bool strict)
-        : name_(std::move(name)), converter_(std::move(converter)), strict_(strict) {
+    IcuCharset(std::string name, Converter converter, bool strict, std::u16string_view oneWay)
+        : name_(std::move(name)),
+          converter_(std::move(converter)),
+          strict_(strict),
+          oneWay_(oneWay),
+          isTable_(isTable(converter_.get())) {
         if (isAsciiCompatible(converter_.get())) {
             controls_.emplace(converter_.get());
         }
@@ -151,14 +177,37 @@ public:
         if (strict) {
             ucnv_setToUCallBack(converter_.get(), UCNV_TO_U_CALLBACK_STOP, nullptr, nullptr,
                                 nullptr, &error);
-            ucnv_setFromUCallBack(converter_.get(), UCNV_FROM_U_CALLBACK_STOP, nullptr, nullptr,
-                                  nullptr, &error);
         } else if (controls_) {
             ucnv_setSubstString(converter_.get(), u"?", 1, &error);
         }
+        ucnv_setFromUCallBack(converter_.get(), strict ? stopEncoding : substituteEncoding, nullptr,
+                              nullptr, nullptr, &error);
     }
 
     std::u16string decode(std::string_view bytes) override {
+        std::u16string text = decodeAll(bytes);
+        if (strict_) {
+            refuseOneWay(bytes, text);
+        }
+        return text;
+    }
+
+    std::string encode(std::u16string_view text) override {
+        std::string bytes;
+        if (const std::optional<EncodingFailure> failure = encodeAll(text, bytes)) {
+            checkOutOfMemory(failure->reason);
+            throwCannotEncode(name_, text, failure->place);
+        }
+        return bytes;
+    }
+
+    bool roundTrips(std::string_view bytes) override {
+        RoundTripCodes* const codes = strict_ ? roundTripCodesOf(converter_.get()) : nullptr;
+        return codes != nullptr && codes->holdAll(bytes, *this);
+    }
+
+private:
+    std::u16string decodeAll(std::string_view bytes) {
         std::u16string text;
         text.reserve(bytes.size());
         std::array<char16_t, pieceSize> piece;  // NOLINT(*-member-init): filled before it is read
@@ -185,33 +234,78 @@ public:
         return text;
     }
 
-    std::string encode(std::u16string_view text) override {
-        std::string bytes;
+    // Throws when `text`, which is that of `bytes`, would not survive encoding. Of tables it is
+    // known which characters do not. Elsewhere only encoding can tell: converters of several sets
+    // of characters decode sets which they do not encode.
+    void refuseOneWay(std::string_view bytes, std::u16string_view text) {
+        if (isTable_) {
+            const std::size_t place = oneWay_.empty() ? text.npos : text.find_first_of(oneWay_);
+            if (place != text.npos) {
+                throwMalformed(name_, byteOffset(bytes, place));
+            }
+            return;
+        }
+        std::string encoded;
+        if (const std::optional<EncodingFailure> failure = encodeAll(text, encoded)) {
+            checkOutOfMemory(failure->reason);
+            throwMalformed(name_, byteOffset(bytes, failure->place));
+        }
+        if (encoded != bytes && (text.empty() || decodeAll(encoded) != text)) {
+            // Another text, or nothing but shifts and escapes, of which nothing would be left.
+            const auto difference =
+                std::mismatch(bytes.begin(), bytes.end(), encoded.begin(), encoded.end());
+            throwMalformed(name_, static_cast<std::size_t>(difference.first - bytes.begin()));
+        }
+    }
+
+    // Where in `bytes` the character begins that is code unit `unit` of their text.
+    std::size_t byteOffset(std::string_view bytes, std::size_t unit) {
+        const char* position = bytes.data();
+        ucnv_resetToUnicode(converter_.get());
+        for (std::size_t done = 0; done < unit;) {
+            UErrorCode error = U_ZERO_ERROR;
+            const UChar32 character =
+                ucnv_getNextUChar(converter_.get(), &position, bytes.data() + bytes.size(), &error);
+            if (U_FAILURE(error)) {
+                break;
+            }
+            done += static_cast<std::size_t>(U16_LENGTH(character));
+        }
+        return static_cast<std::size_t>(position - bytes.data());
+    }
+
+    struct EncodingFailure {
+        UErrorCode reason;
+        std::size_t place;  // the code unit at which the character begins
+    };
+
+    std::optional<EncodingFailure> encodeAll(std::u16string_view text, std::string& bytes) {
+        if (text.empty()) {
+            // Some converters would begin even that with an escape sequence.
+            return std::nullopt;
+        }
         bytes.reserve(text.size());
         std::array<char16_t, pieceSize> piece;  // NOLINT(*-member-init): filled before it is read
-        std::size_t done = 0;
         ucnv_resetFromUnicode(converter_.get());
-        do {
+        for (std::size_t done = 0; done < text.size();) {
             const std::u16string_view source = text.substr(done, pieceSize);
             std::copy(source.begin(), source.end(), piece.begin());
             char16_t* const pieceEnd = piece.data() + source.size();
             if (controls_) {
                 controls_->fromAscii(piece.data(), pieceEnd);
             }
-            encodePiece(piece.data(), pieceEnd, done, done + source.size() == text.size(), bytes);
+            const bool isLast = done + source.size() == text.size();
+            if (auto failure = encodePiece(piece.data(), pieceEnd, done, isLast, bytes)) {
+                return failure;
+            }
             done += source.size();
-        } while (done < text.size());
-        return bytes;
+        }
+        return std::nullopt;
     }
 
-    bool keeps(std::string_view bytes) override {
-        KeptCodes* const codes = strict_ ? keptCodesOf(converter_.get()) : nullptr;
-        return codes != nullptr && codes->holdAll(bytes, *this);
-    }
-
-private:
-    void encodePiece(const char16_t* position, const char16_t* end, std::size_t offset, bool isLast,
-                     std::string& bytes) {
+    std::optional<EncodingFailure> encodePiece(const char16_t* position, const char16_t* end,
+                                               std::size_t offset, bool isLast,
+                                               std::string& bytes) {
         const char16_t* const begin = position;
         std::array<char, pieceSize> piece;  // NOLINT(*-member-init): filled before it is read
         bool more = true;
@@ -221,11 +315,22 @@ private:
             ucnv_fromUnicode(converter_.get(), &out, piece.data() + piece.size(), &position, end,
                              nullptr, static_cast<UBool>(isLast), &error);
             if (U_FAILURE(error) && error != U_BUFFER_OVERFLOW_ERROR) {
-                failEncoding(error, offset + static_cast<std::size_t>(position - begin));
+                return failureAt(error, offset + static_cast<std::size_t>(position - begin));
             }
             bytes.append(piece.data(), out);
             more = error == U_BUFFER_OVERFLOW_ERROR;
         }
+        return std::nullopt;
+    }
+
+    // `consumed` counts the code units read so far, those of the failing character included.
+    EncodingFailure failureAt(UErrorCode reason, std::size_t consumed) const {
+        std::array<char16_t, 32> invalid{};
+        auto length = static_cast<std::int8_t>(invalid.size());
+        UErrorCode error = U_ZERO_ERROR;
+        ucnv_getInvalidUChars(converter_.get(), invalid.data(), &length, &error);
+        const auto invalidLength = U_SUCCESS(error) ? static_cast<std::size_t>(length) : 0;
+        return {reason, consumed - std::min(invalidLength, consumed)};
     }
 
     // `consumed` counts the bytes read so far, those of the failing character included.
@@ -243,43 +348,26 @@ private:
         throwMalformed(name_, offset);
     }
 
-    [[noreturn]] void failEncoding(UErrorCode reason, std::size_t consumed) const {
-        checkOutOfMemory(reason);
-        std::array<char16_t, 32> invalid{};
-        auto length = static_cast<std::int8_t>(invalid.size());
-        UErrorCode error = U_ZERO_ERROR;
-        ucnv_getInvalidUChars(converter_.get(), invalid.data(), &length, &error);
-        const auto invalidLength = U_SUCCESS(error) ? static_cast<std::size_t>(length) : 0;
-        const std::size_t offset = consumed - std::min(invalidLength, consumed);
-        if (invalidLength == 2) {
-            throwUnmappable(name_,
-                            static_cast<char32_t>(U16_GET_SUPPLEMENTARY(invalid[0], invalid[1])),
-                            offset);
-        }
-        const char16_t unit = invalidLength == 0 ? u'\0' : invalid[0];
-        if (U16_IS_SURROGATE(unit)) {
-            throwUnpairedSurrogate(name_, offset);
-        }
-        throwUnmappable(name_, unit, offset);
-    }
-
     std::string name_;
     Converter converter_;
     bool strict_;
+    // Characters that are decoded and cannot be encoded.
+    std::u16string_view oneWay_;
+    bool isTable_;
     std::optional<ControlCodes> controls_;
 };
 
 }  // namespace
 
-std::unique_ptr<Charset> makeIcuCharset(std::string name, const std::string& converter,
-                                        bool strict) {
+std::unique_ptr<Charset> makeIcuCharset(std::string name, const char* converter, bool strict,
+                                        std::u16string_view oneWay) {
     UErrorCode error = U_ZERO_ERROR;
-    Converter opened(ucnv_open(converter.c_str(), &error));
+    Converter opened(ucnv_open(converter, &error));
     checkOutOfMemory(error);
     if (U_FAILURE(error)) {
         return nullptr;
     }
-    return std::make_unique<IcuCharset>(std::move(name), std::move(opened), strict);
+    return std::make_unique<IcuCharset>(std::move(name), std::move(opened), strict, oneWay);
 }
 
 }  // namespace platform::i18n::detail

@@ -10,8 +10,6 @@
 // bytes are 31 to 7E and 91 to FE. ASCII is itself.
 #include "platform/i18n/charsets/johab.h"
 
-#include <unicode/ucnv.h>
-
 #include <algorithm>
 #include <array>
 #include <initializer_list>
@@ -19,7 +17,6 @@
 #include <string_view>
 #include <utility>
 
-#include "platform/i18n/charsets/charset_names.h"
 #include "platform/i18n/charsets/conversion_error.h"
 #include "platform/i18n/charsets/row_table.h"
 
@@ -224,14 +221,6 @@ private:
 };
 
 }  // namespace
-
-bool isJohab(std::string_view name) {
-    constexpr std::array<const char*, 4> names{"Johab", "x-Johab", "cp1361", "ms1361"};
-    return isPlausibleName(name) &&
-           std::any_of(names.begin(), names.end(), [wanted = std::string(name)](const char* known) {
-               return ucnv_compareNames(known, wanted.c_str()) == 0;
-           });
-}
 
 std::unique_ptr<Charset> makeJohab(std::string name, bool strict) {
     return std::make_unique<Johab>(std::move(name), strict);

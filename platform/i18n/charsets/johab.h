@@ -4,14 +4,10 @@
 
 #include <memory>
 #include <string>
-#include <string_view>
 
 #include "platform/i18n/charsets/charset.h"
 
 namespace platform::i18n::detail {
-
-/// Whether `name` is Johab's: it, "x-Johab", "cp1361" or "ms1361", in any case.
-bool isJohab(std::string_view name);
 
 /// Opens Johab (KS X 1001 annex 3); `name` is what error texts call it.
 std::unique_ptr<Charset> makeJohab(std::string name, bool strict);

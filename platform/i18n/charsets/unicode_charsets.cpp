@@ -80,7 +80,7 @@ public:
     }
 
     // Every character has one form in UTF-8.
-    bool keeps(std::string_view bytes) override {
+    bool roundTrips(std::string_view bytes) override {
         return simdjson::validate_utf8(bytes.data(), bytes.size());
     }
 
@@ -212,7 +212,7 @@ public:
     }
 
     // Text without surrogates; whether those of other text are paired is left to the conversion.
-    bool keeps(std::string_view bytes) override {
+    bool roundTrips(std::string_view bytes) override {
         if (order_ == ByteOrder::fromMark || bytes.size() % 2 != 0) {
             return false;
         }

@@ -114,7 +114,7 @@ Candidate::Fit Candidate::fit(std::string_view bytes) const {
         });
         return {fits, fits ? charset_ : std::string()};
     }
-    if (openCharset(charset_, true)->keeps(bytes)) {
+    if (openCharset(charset_, true)->roundTrips(bytes)) {
         return {true, charset_};
     }
     const std::optional<std::u16string> text = decode(bytes);

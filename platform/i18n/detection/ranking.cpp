@@ -14,7 +14,7 @@
 #include <optional>
 #include <string>
 
-#include "platform/i18n/charsets/charset_names.h"
+#include "platform/i18n/charsets/charset.h"
 #include "platform/i18n/detection/declared_charset.h"
 #include "platform/i18n/detection/voices.h"
 
@@ -25,15 +25,6 @@ namespace {
 constexpr double declaredDiscount = 40;
 constexpr double uchardetDiscount = 1;
 constexpr double icuDiscount = 0.5;
-
-bool isSameCharset(const std::string& name, const Candidate& candidate) {
-    if (name.empty()) {
-        return false;
-    }
-    const std::optional<std::string> converter = converterName(name);
-    return name == candidate.charset() ||
-           (converter && converter == converterName(candidate.charset()));
-}
 
 // The text of the sample in `candidate`. A sample of a large file can end inside a character.
 std::optional<std::u16string> decodeSample(const Candidate& candidate, std::string_view sample) {
@@ -55,7 +46,7 @@ public:
         : sample_(sample), declared_(declaredCharset(head)) {}
 
     double declaredDiscountOf(const Candidate& candidate) const {
-        return isSameCharset(declared_, candidate) ? declaredDiscount : 0;
+        return isSameCharset(declared_, candidate.charset()) ? declaredDiscount : 0;
     }
 
     // The discount for what other detectors say, who are asked when this is called first.
@@ -66,8 +57,8 @@ public:
             icu_ = guesses.empty() ? std::string() : guesses.front();
             asked_ = true;
         }
-        return (isSameCharset(uchardet_, candidate) ? uchardetDiscount : 0) +
-               (isSameCharset(icu_, candidate) ? icuDiscount : 0);
+        return (isSameCharset(uchardet_, candidate.charset()) ? uchardetDiscount : 0) +
+               (isSameCharset(icu_, candidate.charset()) ? icuDiscount : 0);
     }
 
 private:

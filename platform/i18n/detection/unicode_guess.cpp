@@ -41,7 +41,7 @@ double bitsPerByte(const Form& form, std::string_view bytes, double limit) {
 bool isWhole(const Form& form, std::string_view bytes) {
     try {
         const std::unique_ptr<Charset> opened = openCharset(form.name, true);
-        if (!opened->keeps(bytes)) {
+        if (!opened->roundTrips(bytes)) {
             opened->decode(bytes);
         }
         return true;

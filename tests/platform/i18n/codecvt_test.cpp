@@ -538,21 +538,6 @@ TEST(TableCharsets, HoldTheLettersThatTheyAreFor) {
     }
 }
 
-TEST(DuplicateCodes, AreEncodedByTheVariantThatPrefersThem) {
-    EXPECT_EQ(encode("Shift_JIS", u"a\u2252\u9AD9\u2160"), "a\x81\xE0\xFB\xFC\x87\x54");
-    EXPECT_EQ(encode("x-Shift_JIS-nec", u"a\u2252\u9AD9\u2160"), "a\x87\x90\xEE\xE0\x87\x54");
-    EXPECT_EQ(encode("x-Shift_JIS-ibm", u"\u2252\u9AD9\u2160z"), "\x81\xE0\xFB\xFC\xFA\x4Az");
-    EXPECT_EQ(encode("x-EUC-JP-nec", u"\u2252"), "\xAD\xF0");
-    EXPECT_EQ(encode("x-Big5-eten", u"\u2550"), "\xA2\xA4");
-    EXPECT_NE(encodingError("x-Big5-eten", u"\u2550\u0E01"), "no error");
-    for (const char* charset : {"Shift_JIS", "EUC-JP", "Big5"}) {
-        const std::string variant = charset == "Big5"sv ? "x-Big5-eten" : "x-"s + charset + "-nec";
-        const std::string bytes =
-            testing::iconvEncode(charset, "\xE3\x80\x81 \xE4\xB8\x80").value();
-        EXPECT_EQ(decode(variant, bytes), decode(charset, bytes));
-    }
-}
-
 TEST(Johab, HoldsWhatTheCLibrarySaysThatItHolds) {
     int characters = 0;
     for (unsigned lead = 0x84; lead <= 0xF9; ++lead) {

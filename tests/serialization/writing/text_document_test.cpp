@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <filesystem>
 #include <string>
+#include <utility>
 
 #include "platform/i18n/codecvt.h"
 #include "serialization/serialization.h"
@@ -102,6 +103,25 @@ TEST_F(TextDocumentWriting, OfHzStoresItsBytes) {
     for (const char* text : {"abc", "~~", "~{::~}", "a~{::VW~}~~\n~{::~}\n"}) {
         EXPECT_TRUE(write(text, "HZ-GB-2312")) << text;
         EXPECT_EQ(readFile(path), text);
+    }
+}
+
+TEST_F(TextDocumentWriting, OfTextThatDecodesAndDoesNotEncodeAgainIsRefusedWithTheFileUntouched) {
+    writeFile(path, "KEEP");
+    const std::pair<std::string, std::string> texts[] = {
+        {"SCSU", std::string("\x0E\xD8\0", 3)},  // half of a surrogate pair
+        {"UTF-7", "+2AA-"},                      // the same
+        {"UTF-7", "a+"},
+        {"UTF-7", "+"},
+        {"ISO-2022-JP", "\x1B(IE"},  // a set that is read and not written
+        {"EUC-JP", "\x8E\xE0"},
+        {"ibm-1250", "\x80"},
+        {"BOCU-1", "\x50"},
+        {"gsm-03.38-2009", "\x1B"},
+    };
+    for (const auto& [charset, text] : texts) {
+        EXPECT_FALSE(write(text, charset)) << charset << ' ' << text;
+        EXPECT_EQ(readFile(path), "KEEP") << charset << ' ' << text;
     }
 }
 

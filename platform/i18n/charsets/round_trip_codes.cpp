@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "platform/i18n/detection/kept_codes.h"
+// Which codes of a charset round-trip.
+#include "platform/i18n/charsets/round_trip_codes.h"
 
 #include <unicode/utf16.h>
 
@@ -24,14 +25,14 @@ bool isOneCharacter(const std::u16string& text) {
 
 }  // namespace
 
-bool KeptCodes::holdAll(std::string_view bytes, Charset& charset) {
+bool RoundTripCodes::holdAll(std::string_view bytes, Charset& charset) {
     for (std::size_t i = 0; i < bytes.size(); ++i) {
         const auto byte = static_cast<std::uint8_t>(bytes[i]);
         Kind kind = bytes_[byte].load(relaxed);
         if (kind == unknown) {
             kind = kindOfByte(byte, charset);
         }
-        if (kind == kept) {
+        if (kind == roundTrips) {
             continue;
         }
         if (kind != lead || ++i == bytes.size()) {
@@ -42,19 +43,19 @@ bool KeptCodes::holdAll(std::string_view bytes, Charset& charset) {
         if (kind == unknown) {
             kind = kindOfPair(byte, second, charset);
         }
-        if (kind != kept) {
+        if (kind != roundTrips) {
             return false;
         }
     }
     return true;
 }
 
-KeptCodes::Kind KeptCodes::kindOfByte(std::uint8_t byte, Charset& charset) {
+RoundTripCodes::Kind RoundTripCodes::kindOfByte(std::uint8_t byte, Charset& charset) {
     const std::string code(1, static_cast<char>(byte));
     Kind kind = lead;
     try {
         const std::u16string text = charset.decode(code);
-        kind = isOneCharacter(text) && charset.encode(text) == code ? kept : notKept;
+        kind = isOneCharacter(text) && charset.encode(text) == code ? roundTrips : changes;
     } catch (const std::runtime_error&) {
         // No character by itself: it may be the first half of one. If it is not, no pair that it
         // begins will be a character either.
@@ -63,12 +64,13 @@ KeptCodes::Kind KeptCodes::kindOfByte(std::uint8_t byte, Charset& charset) {
     return kind;
 }
 
-KeptCodes::Kind KeptCodes::kindOfPair(std::uint8_t first, std::uint8_t second, Charset& charset) {
+RoundTripCodes::Kind RoundTripCodes::kindOfPair(std::uint8_t first, std::uint8_t second,
+                                                Charset& charset) {
     const std::string code{static_cast<char>(first), static_cast<char>(second)};
-    Kind kind = notKept;
+    Kind kind = changes;
     try {
         const std::u16string text = charset.decode(code);
-        kind = isOneCharacter(text) && charset.encode(text) == code ? kept : notKept;
+        kind = isOneCharacter(text) && charset.encode(text) == code ? roundTrips : changes;
     } catch (const std::runtime_error&) {
         // malformed, or the beginning of a longer code
     }

@@ -4,14 +4,13 @@
 
 #include <memory>
 #include <string>
-#include <string_view>
 
 #include "platform/i18n/charsets/charset.h"
 
 namespace platform::i18n::detail {
 
-/// Opens the charset called `name`, in any case and with or without its hyphens; null when it is
-/// none of these: ISO-8859-16, VISCII.
-std::unique_ptr<Charset> makeTableCharset(std::string_view name, bool strict);
+/// Open these charsets; `name` is what error texts call them.
+std::unique_ptr<Charset> makeIso8859_16(std::string name, bool strict);
+std::unique_ptr<Charset> makeViscii(std::string name, bool strict);
 
 }  // namespace platform::i18n::detail

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Which codes of a charset come back as they are when they are decoded and encoded again.
+// Which codes of a charset round-trip: encode back to themselves once decoded.
 #pragma once
 
 #include <array>
@@ -11,20 +11,21 @@
 
 namespace platform::i18n::detail {
 
-/// The codes of one charset in which every character is one or two bytes whose meaning does not
-/// depend on what is around them; longer codes are never found to be kept. The table starts empty
-/// and learns each code from the charset when it first turns up. May be used by several threads.
-class KeptCodes {
+/// The round-tripping codes of one charset in which every character is one or two bytes whose
+/// meaning does not depend on what is around them; longer codes are taken for ones that do not. The
+/// table starts empty and learns each code from the charset when it first turns up. May be used by
+/// several threads.
+class RoundTripCodes {
 public:
-    /// Whether each code in `bytes` is kept. `charset`, opened strict, is asked about those that
-    /// have not turned up before.
+    /// Whether each code in `bytes` round-trips. `charset`, opened strict, is asked about those
+    /// that have not turned up before.
     bool holdAll(std::string_view bytes, Charset& charset);
 
 private:
     enum Kind : std::uint8_t {
         unknown,
-        kept,
-        notKept,
+        roundTrips,
+        changes,
         lead,  // a byte that begins codes of two
     };
 

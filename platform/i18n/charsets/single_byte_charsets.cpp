@@ -1,15 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
 // Charsets of single bytes that ICU lacks.
-#include "platform/i18n/charsets/table_charset.h"
-
-#include <unicode/ucnv.h>
+#include "platform/i18n/charsets/single_byte_charsets.h"
 
 #include <algorithm>
 #include <array>
 #include <cstddef>
 #include <utility>
 
-#include "platform/i18n/charsets/charset_names.h"
 #include "platform/i18n/charsets/conversion_error.h"
 
 namespace platform::i18n::detail {
@@ -64,9 +61,9 @@ constexpr Table viscii = [] {
     return table;
 }();
 
-class TableCharset final : public Charset {
+class SingleByteCharset final : public Charset {
 public:
-    TableCharset(std::string name, const Table& table, bool strict)
+    SingleByteCharset(std::string name, const Table& table, bool strict)
         : name_(std::move(name)), table_(table), strict_(strict) {}
 
     std::u16string decode(std::string_view bytes) override {
@@ -112,25 +109,12 @@ private:
 
 }  // namespace
 
-std::unique_ptr<Charset> makeTableCharset(std::string_view name, bool strict) {
-    struct Known {
-        const char* name;
-        const Table& table;
-    };
-    constexpr std::array<Known, 4> known{{{"ISO-8859-16", iso8859_16},
-                                          {"latin10", iso8859_16},
-                                          {"VISCII", viscii},
-                                          {"csVISCII", viscii}}};
-    if (!isPlausibleName(name)) {
-        return nullptr;
-    }
-    const std::string wanted(name);
-    for (const Known& charset : known) {
-        if (ucnv_compareNames(charset.name, wanted.c_str()) == 0) {
-            return std::make_unique<TableCharset>(wanted, charset.table, strict);
-        }
-    }
-    return nullptr;
+std::unique_ptr<Charset> makeIso8859_16(std::string name, bool strict) {
+    return std::make_unique<SingleByteCharset>(std::move(name), iso8859_16, strict);
+}
+
+std::unique_ptr<Charset> makeViscii(std::string name, bool strict) {
+    return std::make_unique<SingleByteCharset>(std::move(name), viscii, strict);
 }
 
 }  // namespace platform::i18n::detail

@@ -1,0 +1,57 @@
+// SPDX-License-Identifier: Apache-2.0
+// Charsets in which a text has one right spelling, and whose converters take others too.
+#include "platform/i18n/charsets/canonical_charset.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <string_view>
+#include <utility>
+
+#include "platform/i18n/charsets/conversion_error.h"
+#include "platform/i18n/charsets/icu_charset.h"
+
+namespace platform::i18n::detail {
+
+namespace {
+
+class CanonicalCharset final : public Charset {
+public:
+    CanonicalCharset(std::string name, const char* converter, bool strict)
+        : name_(std::move(name)),
+          strict_(strict),
+          base_(makeIcuCharset(name_, converter, strict)) {}
+
+    std::u16string decode(std::string_view bytes) override {
+        std::u16string text = base_->decode(bytes);
+        if (strict_) {
+            const std::string encoded = base_->encode(text);
+            if (encoded != bytes) {
+                const auto difference =
+                    std::mismatch(bytes.begin(), bytes.end(), encoded.begin(), encoded.end());
+                throwMalformed(name_, static_cast<std::size_t>(difference.first - bytes.begin()));
+            }
+        }
+        return text;
+    }
+
+    std::string encode(std::u16string_view text) override { return base_->encode(text); }
+
+private:
+    std::string name_;
+    bool strict_;
+    std::unique_ptr<Charset> base_;
+};
+
+}  // namespace
+
+std::unique_ptr<Charset> makeBocu1(std::string name, bool strict) {
+    // ICU takes trail bytes for lead bytes at the beginning of a text.
+    return std::make_unique<CanonicalCharset>(std::move(name), "BOCU-1", strict);
+}
+
+std::unique_ptr<Charset> makeGsm0338(std::string name, bool strict) {
+    // ICU takes an escape that begins no character for a space.
+    return std::make_unique<CanonicalCharset>(std::move(name), "gsm-03.38-2009", strict);
+}
+
+}  // namespace platform::i18n::detail
