@@ -16,10 +16,8 @@ namespace {
 
 class CanonicalCharset final : public Charset {
 public:
-    CanonicalCharset(std::string name, const char* converter, bool strict)
-        : name_(std::move(name)),
-          strict_(strict),
-          base_(makeIcuCharset(name_, converter, strict)) {}
+    CanonicalCharset(std::string name, std::unique_ptr<Charset> base, bool strict)
+        : name_(std::move(name)), base_(std::move(base)), strict_(strict) {}
 
     std::u16string decode(std::string_view bytes) override {
         std::u16string text = base_->decode(bytes);
@@ -38,20 +36,26 @@ public:
 
 private:
     std::string name_;
-    bool strict_;
     std::unique_ptr<Charset> base_;
+    bool strict_;
 };
+
+std::unique_ptr<Charset> makeCanonical(std::string name, const char* converter, bool strict) {
+    std::unique_ptr<Charset> base = makeIcuCharset(name, converter, strict);
+    return base ? std::make_unique<CanonicalCharset>(std::move(name), std::move(base), strict)
+                : nullptr;
+}
 
 }  // namespace
 
 std::unique_ptr<Charset> makeBocu1(std::string name, bool strict) {
     // ICU takes trail bytes for lead bytes at the beginning of a text.
-    return std::make_unique<CanonicalCharset>(std::move(name), "BOCU-1", strict);
+    return makeCanonical(std::move(name), "BOCU-1", strict);
 }
 
 std::unique_ptr<Charset> makeGsm0338(std::string name, bool strict) {
     // ICU takes an escape that begins no character for a space.
-    return std::make_unique<CanonicalCharset>(std::move(name), "gsm-03.38-2009", strict);
+    return makeCanonical(std::move(name), "gsm-03.38-2009", strict);
 }
 
 }  // namespace platform::i18n::detail

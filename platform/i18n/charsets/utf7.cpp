@@ -13,6 +13,7 @@
 
 #include <unicode/utf16.h>
 
+#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <string_view>
@@ -34,8 +35,20 @@ bool isDirect(char16_t character) {
            character == '\r';
 }
 
+constexpr std::uint32_t noDigit = 64;
+
+// The value of each ASCII character as a digit of base64.
+constexpr std::array<std::uint32_t, 0x80> digitValues = [] {
+    std::array<std::uint32_t, 0x80> values{};
+    values.fill(noDigit);
+    for (std::size_t i = 0; i < alphabet.size(); ++i) {
+        values[static_cast<std::size_t>(alphabet[i])] = static_cast<std::uint32_t>(i);
+    }
+    return values;
+}();
+
 bool isBase64(char16_t character) {
-    return character < 0x80 && alphabet.find(static_cast<char>(character)) != alphabet.npos;
+    return character < digitValues.size() && digitValues[character] != noDigit;
 }
 
 // Decodes one text.
@@ -88,7 +101,7 @@ private:
         std::uint32_t bits = 0;
         int count = 0;
         for (const char digit : run) {
-            bits = bits << 6U | static_cast<std::uint32_t>(alphabet.find(digit));
+            bits = bits << 6U | digitValues[static_cast<unsigned char>(digit)];
             count += 6;
             if (count >= 16) {
                 count -= 16;
