@@ -98,6 +98,10 @@ std::shared_ptr<NatsBus> makeBus(NatsOptions options) {
     // A large document shall not hold up the small ones behind it.
     options.concurrentChannels = {platform::messaging::readRequestChannel,
                                   platform::messaging::filesRequestChannel};
+    options.longMessages.answerPrefixes = {
+        {platform::messaging::readRequestChannel, platform::messaging::readResponsePrefix},
+        {platform::messaging::writeRequestChannel, platform::messaging::writeResponsePrefix},
+        {platform::messaging::filesRequestChannel, platform::messaging::filesResponsePrefix}};
     return NatsBus::create(std::move(options));
 }
 

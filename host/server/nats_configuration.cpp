@@ -53,9 +53,18 @@ std::string userText(const Login& login, const std::string& permissions = {}) {
 }
 
 std::string editorPermissions(const std::string& user) {
-    const std::array<std::string, 3> publish = {platform::messaging::readRequestChannel,
-                                                platform::messaging::writeRequestChannel,
-                                                platform::messaging::filesRequestChannel};
+    using platform::messaging::filesRequestChannel;
+    using platform::messaging::offerSuffix;
+    using platform::messaging::readRequestChannel;
+    using platform::messaging::writeRequestChannel;
+    const std::array<std::string, 7> publish = {
+        readRequestChannel,
+        writeRequestChannel,
+        filesRequestChannel,
+        std::string(readRequestChannel) + offerSuffix,
+        std::string(writeRequestChannel) + offerSuffix,
+        std::string(filesRequestChannel) + offerSuffix,
+        platform::messaging::piecesPrefix + ("*." + user) + ".>"};
     const std::array<std::string, 4> subscribe = {
         platform::messaging::notificationChannel,
         platform::messaging::readResponsePrefix + user + ".>",

@@ -25,4 +25,12 @@ inline constexpr const char* filesRequestChannel = "/zpr/service/filesRequest_ho
 /// What precedes the "rtcId" of such a question in the channel of its answer.
 inline constexpr const char* filesResponsePrefix = "/zpr/service/filesResponse/";
 
+/// What follows a request channel in the one on which requests are offered that are too long for
+/// one message.
+inline constexpr const char* offerSuffix = "/offer";
+
+/// What precedes "<worker>.<rtcId>" in the channel on which a client speaks to one worker about a
+/// message in pieces.
+inline constexpr const char* piecesPrefix = "/zpr/service/piece.";
+
 }  // namespace platform::messaging

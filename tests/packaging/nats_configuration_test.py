@@ -18,6 +18,9 @@ READ_REQUESTS = "/zpr/service/readRequest_cpp"
 WRITE_REQUESTS = "/zpr/service/writeRequest_cpp"
 READ_RESPONSE = "/zpr/service/readResponse/"
 WRITE_RESPONSE = "/zpr/service/writeResponse/"
+OFFERS = tuple(f"/zpr/service/{requests}/offer"
+               for requests in ("readRequest_cpp", "writeRequest_cpp", "filesRequest_host"))
+PIECE = "/zpr/service/piece."
 NOTIFICATIONS = "/zpr/service/notifyFileSystemRequest"
 LARGEST = 64 * 1024 * 1024
 
@@ -63,9 +66,11 @@ class Permissions:
 
     def test_clients_publish_on_the_request_channels_and_nowhere_else(self):
         ada = self.connect("ada")
-        for channel in (READ_REQUESTS, WRITE_REQUESTS):
+        for channel in (READ_REQUESTS, WRITE_REQUESTS, *OFFERS, PIECE + "worker.ada.1",
+                        PIECE + "worker.ada.tab.7"):
             self.assertEqual(ada.publish(channel), [])
         for channel in (READ_RESPONSE + "ada.1", READ_RESPONSE + "ben.1", WRITE_RESPONSE + "ben.1",
+                        PIECE + "worker.ben.1", PIECE + "worker.ada", PIECE + "ada.1",
                         READ_RESPONSE, NOTIFICATIONS, "anything", "_INBOX.1",
                         "$SYS.REQ.SERVER.PING"):
             self.assert_refused(ada.publish(channel), "Publish", channel)
@@ -81,7 +86,8 @@ class Permissions:
         for channel in (">", "*", "*.>", "*.*", READ_RESPONSE + "ben.>", READ_RESPONSE + "ben.1",
                         WRITE_RESPONSE + "ben.>", READ_RESPONSE + ">", READ_RESPONSE + "*",
                         READ_RESPONSE + "ada", READ_RESPONSE + "adam.>", READ_REQUESTS,
-                        WRITE_REQUESTS, "_INBOX.>", "$SYS.>"):
+                        WRITE_REQUESTS, *OFFERS, PIECE + ">", PIECE + "*.ada.>", "_INBOX.>",
+                        "$SYS.>"):
             self.assert_refused(ada.subscribe(channel), "Subscription", channel)
 
     def test_clients_cannot_get_anothers_answers_by_joining_a_group(self):
@@ -91,9 +97,10 @@ class Permissions:
 
     def test_workers_subscribe_to_the_request_channels_and_nothing_else(self):
         worker = self.connect("worker")
-        for channel in (READ_REQUESTS, WRITE_REQUESTS):
+        for channel in (READ_REQUESTS, WRITE_REQUESTS, *OFFERS):
             self.assertEqual(worker.subscribe(channel), [])
             self.assertEqual(worker.subscribe(channel, "group"), [])
+        self.assertEqual(worker.subscribe(PIECE + "worker.>"), [])
         for channel in (">", "*", "*.>", READ_RESPONSE + "ada.>", WRITE_RESPONSE + "ada.1",
                         NOTIFICATIONS, "$SYS.>"):
             self.assert_refused(worker.subscribe(channel), "Subscription", channel)
@@ -102,7 +109,7 @@ class Permissions:
         worker = self.connect("worker")
         for channel in (READ_RESPONSE + "ada.1", WRITE_RESPONSE + "ben.tab.7", NOTIFICATIONS):
             self.assertEqual(worker.publish(channel), [], channel)
-        for channel in (READ_REQUESTS, WRITE_REQUESTS, "anything"):
+        for channel in (READ_REQUESTS, WRITE_REQUESTS, *OFFERS, "anything"):
             self.assert_refused(worker.publish(channel), "Publish", channel)
 
     def test_an_answer_reaches_whose_name_it_bears_and_nobody_else(self):

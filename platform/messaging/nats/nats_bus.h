@@ -4,6 +4,7 @@
 
 #include <chrono>
 #include <cstddef>
+#include <map>
 #include <memory>
 #include <string>
 #include <vector>
@@ -12,6 +13,22 @@
 #include "platform/messaging/message_service.h"
 
 namespace platform::messaging {
+
+/// Messages that travel in pieces, between this bus and clients that say that they can
+/// (docs/protocol.md).
+struct LongMessageOptions {
+    /// The channels of requests, each with what precedes a request's id in the channel of its
+    /// answer. Empty: no message is long.
+    std::map<std::string, std::string> answerPrefixes;
+
+    /// The longest message.
+    std::size_t maxMessage = std::size_t{1} << 30;
+
+    /// Bounds on the bytes that are held at once: of requests until they are handled, and of
+    /// answers until their clients have taken them.
+    std::size_t maxIncomingBytes = std::size_t{2} << 30;
+    std::size_t maxOutgoingBytes = std::size_t{2} << 30;
+};
 
 /// The servers of a bus, how it identifies itself to them, and how it delivers.
 struct NatsOptions {
@@ -58,6 +75,8 @@ struct NatsOptions {
     /// Bound on the bytes that are published while no server is reached, and sent when one is. The
     /// message that takes them past it is still taken.
     std::size_t maxUnsentBytes = std::size_t{64} << 20;
+
+    LongMessageOptions longMessages;
 };
 
 /// A bus over NATS servers: channels are subjects, verbatim. Messages are delivered at most once.
@@ -69,7 +88,8 @@ struct NatsOptions {
 /// When the connection is lost, another is made to the same server or the next one, for as long as
 /// it takes, and the subscriptions are made again. A publish future holds an exception when the
 /// channel is no valid subject (white space, empty), when the message is larger than the server
-/// takes, and when it cannot be sent; it does not tell whether anyone got the message.
+/// takes and its receiver does not take pieces, and when it cannot be sent; it does not tell
+/// whether anyone got the message.
 ///
 /// Losses of the connection, dropped messages, messages that were not published and failures of
 /// handlers are logged to spdlog's logger "messaging", as by InProcessBus.

@@ -20,13 +20,6 @@ namespace {
 // libnats wants some time limit.
 constexpr std::int64_t oneHourInMilliseconds = 3'600'000;
 
-QueuedMessage makeMessage(std::shared_ptr<const std::string> channel, natsMsg* received) {
-    const std::shared_ptr<natsMsg> owner(received, Destroy());
-    const std::string_view payload(natsMsg_GetData(received),
-                                   static_cast<std::size_t>(natsMsg_GetDataLength(received)));
-    return {JsonMessage(std::move(channel), payload, owner), nullptr, nullptr};
-}
-
 // `bound` as the library takes limits.
 int asLimit(std::size_t bound) {
     return static_cast<int>(std::clamp<std::size_t>(bound, 1, std::numeric_limits<int>::max()));
@@ -34,14 +27,25 @@ int asLimit(std::size_t bound) {
 
 }  // namespace
 
+QueuedMessage makeMessage(const std::shared_ptr<const std::string>& channel,
+                          ReceivedMessage received, std::shared_ptr<const void> companion) {
+    const std::string_view payload(natsMsg_GetData(received.get()),
+                                   static_cast<std::size_t>(natsMsg_GetDataLength(received.get())));
+    std::shared_ptr<const void> owner(
+        received.release(),
+        [companion = std::move(companion)](natsMsg* message) { Destroy()(message); });
+    return {JsonMessage(channel, payload, std::move(owner)), nullptr, nullptr};
+}
+
 NatsSource::NatsSource(const std::string& channel, std::string queueGroup,
                        std::size_t maxPendingMessages, std::size_t maxPendingBytes,
-                       std::size_t threads)
+                       std::size_t threads, Receive receive)
     : channel_(std::make_shared<const std::string>(channel)),
       queueGroup_(std::move(queueGroup)),
       maxPendingMessages_(asLimit(maxPendingMessages)),
       maxPendingBytes_(asLimit(maxPendingBytes)),
-      threads_(threads) {}
+      threads_(threads),
+      receive_(std::move(receive)) {}
 
 void NatsSource::attach(const ConnectionHandle& connection) {
     natsSubscription* made = nullptr;
@@ -68,7 +72,10 @@ std::optional<QueuedMessage> NatsSource::next() {
         natsMsg* message = nullptr;
         switch (natsSubscription_NextMsg(&message, subscription.get(), oneHourInMilliseconds)) {
             case NATS_OK:
-                return makeMessage(channel_, message);
+                if (std::optional<QueuedMessage> made = receive_(ReceivedMessage(message))) {
+                    return made;
+                }
+                break;
             case NATS_TIMEOUT:
             case NATS_NO_RESPONDERS:  // a message that says no more than that
                 break;

@@ -6,6 +6,7 @@
 #include <condition_variable>
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -13,16 +14,26 @@
 
 #include "platform/messaging/delivery_threads.h"
 #include "platform/messaging/nats/connection.h"
+#include "platform/messaging/nats/handles.h"
 
 namespace platform::messaging::nats {
+
+using ReceivedMessage = std::unique_ptr<natsMsg, Destroy>;
+
+/// Makes a message of what a server has sent; none when it is not one for the handler.
+using Receive = std::function<std::optional<QueuedMessage>(ReceivedMessage)>;
+
+/// A message of all that `received` holds, which also keeps `companion`.
+QueuedMessage makeMessage(const std::shared_ptr<const std::string>& channel,
+                          ReceivedMessage received, std::shared_ptr<const void> companion);
 
 /// Takes the messages of a channel straight from libnats, on the delivery threads themselves. It
 /// outlives connections: each new one is made known with `attach`.
 class NatsSource final : public MessageSource {
 public:
-    /// `threads`: how many threads call `next`.
+    /// `threads`: how many threads call `next`. `receive` is called by one of them at a time.
     NatsSource(const std::string& channel, std::string queueGroup, std::size_t maxPendingMessages,
-               std::size_t maxPendingBytes, std::size_t threads);
+               std::size_t maxPendingBytes, std::size_t threads, Receive receive);
 
     /// Subscribes on `connection`, in the place of an earlier one that is closed. Nothing happens
     /// after `end` or `drain`. Throws NatsError.
@@ -52,6 +63,7 @@ private:
     const int maxPendingMessages_;
     const int maxPendingBytes_;
     const std::size_t threads_;
+    const Receive receive_;
 
     std::mutex taking_;  // held by the one thread that waits for a message
 

@@ -1,0 +1,203 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "platform/messaging/nats/incoming_transfers.h"
+
+#include <algorithm>
+#include <cstring>
+#include <exception>
+#include <utility>
+
+namespace platform::messaging::nats {
+namespace {
+
+// How often a client that waits hears that it does.
+constexpr std::chrono::seconds reminderInterval{5};
+
+}  // namespace
+
+Notes IncomingTransfers::offer(const std::string& channel, const ReturnAddress& address,
+                               std::uint64_t length, Time now) {
+    if (const auto known = transfers_.find(address.id); known != transfers_.end()) {
+        Transfer& transfer = known->second;
+        if (transfer.channel != channel || transfer.length != length) {
+            return {stopNote(address, "another offer has this id")};
+        }
+        return {tellRoom(transfer, now)};
+    }
+    if (length == 0 || length > limits_.longestRequest) {
+        return {stopNote(
+            address, "requests have 1 to " + std::to_string(limits_.longestRequest) + " bytes")};
+    }
+    const std::string user = address.user();
+    if (isFull(user)) {
+        return {stopNote(address, "too many offers wait")};
+    }
+    Transfer& transfer = transfers_[address.id];
+    transfer.channel = channel;
+    transfer.address = address;
+    transfer.length = static_cast<std::size_t>(length);
+    ++offersOf_[user];
+    if (waiting_.contains(user) || !start(transfer, now)) {
+        waiting_[user].push_back(address.id);
+    }
+    return {tellRoom(transfer, now)};
+}
+
+IncomingTransfers::Progress IncomingTransfers::piece(const std::string& id, std::uint64_t offset,
+                                                     std::string_view bytes, Time now) {
+    const auto found = transfers_.find(id);
+    if (found == transfers_.end()) {
+        return {};
+    }
+    Transfer& transfer = found->second;
+    const std::size_t received = transfer.payload ? transfer.payload->length() : 0;
+    if (offset != received || bytes.empty() || bytes.size() > pieceSize ||
+        bytes.size() > transfer.room - received) {
+        Progress progress{{stopNote(transfer.address, "a piece is out of turn")}, {}};
+        remove(found);
+        std::ranges::move(admitWaiting(now), std::back_inserter(progress.notes));
+        return progress;
+    }
+    std::memcpy(transfer.payload->data() + received, bytes.data(), bytes.size());
+    transfer.payload->setLength(received + bytes.size());
+    if (received + bytes.size() == transfer.length) {
+        WholeRequest request{transfer.channel, transfer.address, std::move(transfer.payload),
+                             std::move(transfer.reservation)};
+        remove(found);
+        return {admitWaiting(now), std::move(request)};
+    }
+    if (received + bytes.size() >= transfer.progress + leastProgress) {
+        transfer.progress = received + bytes.size();
+        transfer.moved = now;
+    }
+    const std::size_t room = std::min(transfer.length, received + bytes.size() + windowSize);
+    // Not for every piece, where they are small.
+    if (room == transfer.room || (room < transfer.room + pieceSize && room != transfer.length)) {
+        return {};
+    }
+    transfer.room = room;
+    return {{tellRoom(transfer, now)}, {}};
+}
+
+Notes IncomingTransfers::stop(const std::string& id, Time now) {
+    const auto found = transfers_.find(id);
+    if (found == transfers_.end()) {
+        return {};
+    }
+    remove(found);
+    return admitWaiting(now);
+}
+
+// One of each user in turn, until nothing more fits.
+Notes IncomingTransfers::admitWaiting(Time now) {
+    Notes notes;
+    std::size_t refused = 0;
+    while (refused < waiting_.size()) {
+        auto next = waiting_.upper_bound(lastUser_);
+        if (next == waiting_.end()) {
+            next = waiting_.begin();
+        }
+        lastUser_ = next->first;
+        refused = admitOneOf(next->second, notes, now) ? 0 : refused + 1;
+        if (next->second.empty()) {
+            waiting_.erase(next);
+        }
+    }
+    return notes;
+}
+
+bool IncomingTransfers::admitOneOf(std::deque<std::string>& ids, Notes& notes, Time now) {
+    const auto first = std::ranges::find_if(
+        ids, [&](const std::string& id) { return start(transfers_.at(id), now); });
+    if (first == ids.end()) {
+        return false;
+    }
+    notes.push_back(tellRoom(transfers_.at(*first), now));
+    ids.erase(first);
+    return true;
+}
+
+// Reserves what `transfer` needs; false when there is not enough.
+bool IncomingTransfers::start(Transfer& transfer, Time now) {
+    if (ahead_ + aheadOf(transfer) > limits_.mostAhead) {
+        return false;
+    }
+    Reservation reservation = reserve_(transfer.length);
+    if (!reservation) {
+        return false;
+    }
+    try {
+        transfer.payload = std::make_shared<DataBuffer>(transfer.length);
+    } catch (const std::exception&) {
+        return false;  // the system has less than was counted on
+    }
+    transfer.reservation = std::move(reservation);
+    transfer.room = aheadOf(transfer);
+    transfer.moved = now;
+    ahead_ += aheadOf(transfer);
+    return true;
+}
+
+Notes IncomingTransfers::tick(Time now) {
+    Notes notes;
+    const auto standstill = waiting_.empty() ? longestStandstill : longestStandstillInTheWay;
+    for (auto next = transfers_.begin(); next != transfers_.end();) {
+        const auto position = next++;
+        Transfer& transfer = position->second;
+        if (!transfer.payload) {
+            if (now - transfer.told >= reminderInterval) {
+                notes.push_back(tellRoom(transfer, now));
+            }
+        } else if (now - transfer.moved >= standstill) {
+            notes.push_back(stopNote(transfer.address, "nothing came for too long"));
+            remove(position);
+        }
+    }
+    std::ranges::move(admitWaiting(now), std::back_inserter(notes));
+    return notes;
+}
+
+Notes IncomingTransfers::stopAll(std::string_view reason) {
+    Notes notes;
+    while (!transfers_.empty()) {
+        notes.push_back(stopNote(transfers_.begin()->second.address, reason));
+        remove(transfers_.begin());
+    }
+    return notes;
+}
+
+bool IncomingTransfers::isFull(const std::string& user) const {
+    const auto offers = offersOf_.find(user);
+    return transfers_.size() >= limits_.mostOffers ||
+           (offers != offersOf_.end() && offers->second >= limits_.mostOffersOfAUser);
+}
+
+void IncomingTransfers::remove(Position position) {
+    const Transfer& transfer = position->second;
+    const std::string user = transfer.address.user();
+    if (transfer.room > 0) {
+        ahead_ -= aheadOf(transfer);
+    } else if (const auto waiting = waiting_.find(user); waiting != waiting_.end()) {
+        std::erase(waiting->second, position->first);
+        if (waiting->second.empty()) {
+            waiting_.erase(waiting);
+        }
+    }
+    if (const auto offers = offersOf_.find(user); --offers->second == 0) {
+        offersOf_.erase(offers);
+    }
+    transfers_.erase(position);
+}
+
+Note IncomingTransfers::tellRoom(Transfer& transfer, Time now) const {
+    transfer.told = now;
+    return {transfer.address.channel,
+            "room " + worker_ + " " + std::to_string(transfer.room),
+            {},
+            nullptr};
+}
+
+std::size_t IncomingTransfers::aheadOf(const Transfer& transfer) const {
+    return std::min(transfer.length, windowSize);
+}
+
+}  // namespace platform::messaging::nats

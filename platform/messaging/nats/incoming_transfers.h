@@ -1,0 +1,121 @@
+// SPDX-License-Identifier: Apache-2.0
+// Requests that come in pieces. A state machine without clock, threads or network: what happens is
+// told by calls, and what it wants sent is their result.
+//
+//   client                                  worker
+//     offer 9000000          ------------>    there is no memory for it yet: it waits
+//                            <------------  room <worker> 0         again every five seconds
+//                            <------------  room <worker> 4194304   its memory is reserved
+//     piece 0, 1 MiB         ------------>
+//     piece 1048576, 1 MiB   ------------>
+//                            <------------  room <worker> 5242880
+//     ...
+//     piece 8388608, the rest ----------->    whole: it is handed on
+//
+// Either may send "stop" at any time. A piece out of turn or past the room, and a transfer that
+// stands still, end with "stop": nothing is handled and the memory is free again.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <deque>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <utility>
+
+#include "platform/data_buffer.h"
+#include "platform/messaging/nats/pieces.h"
+
+namespace platform::messaging::nats {
+
+/// A request that has come whole.
+struct WholeRequest {
+    std::string channel;
+    ReturnAddress address;
+    std::shared_ptr<const DataBuffer> payload;
+    Reservation reservation;  ///< For the payload.
+};
+
+/// Those whose turn it is have their memory reserved whole. The others wait; when there is memory,
+/// the users take turns, and of each user the first offer that fits is next. A large one waits
+/// until there is memory for it at once, so that nobody fills memory with halves of requests.
+/// Belongs to one thread at a time.
+class IncomingTransfers {
+public:
+    struct Limits {
+        std::size_t longestRequest = std::size_t{1} << 30;
+        std::size_t mostOffers = 4096;
+        std::size_t mostOffersOfAUser = 1024;
+
+        /// What all clients together may be ahead: less than a server holds for a worker.
+        std::size_t mostAhead = std::size_t{128} << 20;
+    };
+
+    /// `worker`: what names this worker in subjects.
+    IncomingTransfers(std::string worker, Limits limits, Reserve reserve)
+        : worker_(std::move(worker)), limits_(limits), reserve_(std::move(reserve)) {}
+
+    /// A client offers a request of `length` bytes on `channel`. One that is known already is
+    /// told its room again.
+    Notes offer(const std::string& channel, const ReturnAddress& address, std::uint64_t length,
+                Time now);
+
+    struct Progress {
+        Notes notes;
+        std::optional<WholeRequest> request;
+    };
+
+    /// A piece has come for the offer `id`. What belongs to no offer is dropped.
+    Progress piece(const std::string& id, std::uint64_t offset, std::string_view bytes, Time now);
+
+    /// The client `id` has given up.
+    Notes stop(const std::string& id, Time now);
+
+    /// There may be memory again.
+    Notes admitWaiting(Time now);
+
+    /// To be called about every second: ends what stands still, and tells those who wait that they
+    /// have not been forgotten.
+    Notes tick(Time now);
+
+    /// Ends all of them.
+    Notes stopAll(std::string_view reason);
+
+    /// How many there are, waiting or not.
+    std::size_t count() const noexcept { return transfers_.size(); }
+
+private:
+    struct Transfer {
+        std::string channel;
+        ReturnAddress address;
+        std::size_t length = 0;
+        std::shared_ptr<DataBuffer> payload;  // none while it waits
+        Reservation reservation;
+        std::size_t room = 0;      // up to where the client may send
+        std::size_t progress = 0;  // what had come when it was last seen to move
+        Time moved;
+        Time told;
+    };
+    using Position = std::map<std::string, Transfer>::iterator;
+
+    bool isFull(const std::string& user) const;
+    bool start(Transfer& transfer, Time now);
+    bool admitOneOf(std::deque<std::string>& ids, Notes& notes, Time now);
+    void remove(Position position);
+    Note tellRoom(Transfer& transfer, Time now) const;
+    std::size_t aheadOf(const Transfer& transfer) const;
+
+    const std::string worker_;
+    const Limits limits_;
+    const Reserve reserve_;
+    std::map<std::string, Transfer> transfers_;               // by the client's id
+    std::map<std::string, std::deque<std::string>> waiting_;  // ids by user; none is empty
+    std::map<std::string, std::size_t> offersOf_;             // by user
+    std::string lastUser_;                                    // whose turn it was
+    std::size_t ahead_ = 0;  // what the clients whose turn it is may be ahead, together
+};
+
+}  // namespace platform::messaging::nats

@@ -1,0 +1,344 @@
+// SPDX-License-Identifier: Apache-2.0
+// The transfers are asked under the mutex; what they want sent is sent without it, so that a server
+// that does not read holds up no thread that only has an answer to leave here. Pieces stay in
+// order, because all of them are sent by the one thread that handles what clients say.
+#include "platform/messaging/nats/long_messages.h"
+
+#include <spdlog/logger.h>
+
+#include <algorithm>
+#include <exception>
+#include <iterator>
+#include <random>
+#include <utility>
+
+#include "platform/messaging/log.h"
+#include "platform/messaging/nats/subject.h"
+
+namespace platform::messaging::nats {
+namespace {
+
+constexpr std::chrono::seconds tickInterval{1};
+
+constexpr const char* workerEnds = "this worker ends";
+
+std::string makeWorkerName() {
+    std::random_device random;
+    constexpr std::string_view digits = "0123456789abcdef";
+    std::string name;
+    while (name.size() < 24) {
+        name += digits[random() % digits.size()];
+    }
+    return name;
+}
+
+std::optional<ClientWord> wordOf(natsMsg* received) {
+    const char* header = nullptr;
+    if (natsMsgHeader_Get(received, piecesHeader, &header) != NATS_OK || header == nullptr) {
+        return std::nullopt;
+    }
+    return parseClientWord(header);
+}
+
+std::string_view payloadOf(natsMsg* received) {
+    return {natsMsg_GetData(received), static_cast<std::size_t>(natsMsg_GetDataLength(received))};
+}
+
+}  // namespace
+
+// A bound on the memory of one direction, and within it of the whole process's.
+class LongMessages::Share : public std::enable_shared_from_this<Share> {
+public:
+    Share(std::size_t size, std::function<void()> onRoom)
+        : size_(size), onRoom_(std::move(onRoom)) {}
+
+    Reservation reserve(std::size_t bytes) {
+        std::size_t used = used_;
+        do {
+            if (bytes > size_ - used) {
+                return nullptr;
+            }
+        } while (!used_.compare_exchange_weak(used, used + bytes));
+        return {this, [self = shared_from_this(), bytes](const void*) {
+                    self->used_ -= bytes;
+                    self->onRoom_();
+                }};
+    }
+
+private:
+    const std::size_t size_;
+    const std::function<void()> onRoom_;
+    std::atomic<std::size_t> used_ = 0;
+};
+
+// The requests on one channel that came in pieces.
+class LongMessages::WholeRequests final : public MessageSource {
+public:
+    WholeRequests(std::shared_ptr<LongMessages> all, const std::string& channel)
+        : all_(std::move(all)), channel_(std::make_shared<const std::string>(channel)) {}
+
+    std::optional<QueuedMessage> next() override {
+        std::optional<WholeRequest> request = nextRequest();
+        if (!request) {
+            return std::nullopt;
+        }
+        struct Owner {
+            std::shared_ptr<const DataBuffer> payload;
+            std::shared_ptr<const void> expectation;
+        };
+        const std::string_view payload = request->payload->view();
+        auto owner = std::make_shared<Owner>();
+        owner->payload = std::move(request->payload);
+        owner->expectation = all_->expectAnswer(request->address);
+        // The reservation ends with the waiting: whoever handles the request has its memory
+        // admitted together with what else that takes.
+        return QueuedMessage{JsonMessage(channel_, payload, std::move(owner)),
+                             std::move(request->reservation), nullptr};
+    }
+
+    void end() override {
+        {
+            const std::lock_guard lock(all_->mutex_);
+            ended_ = true;
+        }
+        all_->changed_.notify_all();
+    }
+
+private:
+    std::optional<WholeRequest> nextRequest() {
+        std::unique_lock lock(all_->mutex_);
+        std::deque<WholeRequest>& waiting = all_->whole_[*channel_];
+        all_->changed_.wait(lock, [&] { return ended_ || !waiting.empty(); });
+        if (ended_) {
+            return std::nullopt;
+        }
+        std::optional<WholeRequest> request(std::move(waiting.front()));
+        waiting.pop_front();
+        return request;
+    }
+
+    const std::shared_ptr<LongMessages> all_;
+    const std::shared_ptr<const std::string> channel_;
+    bool ended_ = false;  // guarded by the mutex of all
+};
+
+std::shared_ptr<LongMessages> LongMessages::create(const LongMessageOptions& options, Send send) {
+    std::shared_ptr<LongMessages> made(new LongMessages(options, std::move(send)));
+    made->timer_ = std::thread([all = made.get()] { all->runTimer(); });
+    return made;
+}
+
+LongMessages::LongMessages(const LongMessageOptions& options, Send send)
+    : options_(options),
+      worker_(makeWorkerName()),
+      send_(std::move(send)),
+      incoming_(worker_, {.longestRequest = std::min(options.maxMessage, options.maxIncomingBytes)},
+                [share = std::make_shared<Share>(options.maxIncomingBytes, [this] { onRoom(); })](
+                    std::size_t bytes) { return share->reserve(bytes); }),
+      outgoing_(worker_, [share = std::make_shared<Share>(options.maxOutgoingBytes, [] {})](
+                             std::size_t bytes) { return share->reserve(bytes); }) {}
+
+LongMessages::~LongMessages() {
+    close();
+}
+
+void LongMessages::takeWord(natsMsg* received) {
+    const std::string_view subject = natsMsg_GetSubject(received);
+    const std::optional<ClientWord> word = wordOf(received);
+    if (!word || subject.size() < this->subject().size()) {
+        return;
+    }
+    const std::string client(subject.substr(this->subject().size() - 1));
+    const Time now = std::chrono::steady_clock::now();
+    Notes notes;
+    bool hasChanged = false;
+    {
+        const std::lock_guard lock(mutex_);
+        const std::size_t before = incoming_.count() + outgoing_.count();
+        switch (word->kind) {
+            case ClientWord::Kind::piece: {
+                IncomingTransfers::Progress progress =
+                    incoming_.piece(client, word->number, payloadOf(received), now);
+                notes = std::move(progress.notes);
+                if (progress.request) {
+                    whole_[progress.request->channel].push_back(std::move(*progress.request));
+                }
+                break;
+            }
+            case ClientWord::Kind::room:
+                notes = outgoing_.room(client, word->number, now);
+                break;
+            case ClientWord::Kind::stop:
+                notes = incoming_.stop(client, now);
+                outgoing_.stop(client);
+                break;
+            default:
+                break;  // is said elsewhere
+        }
+        hasChanged = incoming_.count() + outgoing_.count() != before;
+    }
+    if (hasChanged) {
+        changed_.notify_all();
+    }
+    sendAll(notes);
+}
+
+void LongMessages::takeOffer(const std::string& channel, natsMsg* received) {
+    const std::optional<ClientWord> word = wordOf(received);
+    const std::optional<ReturnAddress> address = addressOf(channel, received);
+    if (!word || word->kind != ClientWord::Kind::offer || !address) {
+        return;
+    }
+    Notes notes;
+    {
+        const std::lock_guard lock(mutex_);
+        notes = refusing_ ? Notes{stopNote(*address, workerEnds)}
+                          : incoming_.offer(channel, *address, word->number,
+                                            std::chrono::steady_clock::now());
+    }
+    timerWakes_.notify_one();
+    sendAll(notes);
+}
+
+std::shared_ptr<const void> LongMessages::takeRequest(const std::string& channel,
+                                                      natsMsg* received) {
+    const std::optional<ClientWord> word = wordOf(received);
+    if (!word || word->kind != ClientWord::Kind::yes) {
+        return nullptr;
+    }
+    const std::optional<ReturnAddress> address = addressOf(channel, received);
+    return address ? expectAnswer(*address) : nullptr;
+}
+
+std::shared_ptr<MessageSource> LongMessages::wholeRequests(const std::string& channel) {
+    return std::make_shared<WholeRequests>(shared_from_this(), channel);
+}
+
+std::optional<std::size_t> LongMessages::longestAnswer(const std::string& channel) {
+    const std::lock_guard lock(mutex_);
+    return expected_.contains(channel)
+               ? std::optional(std::min(options_.maxMessage, options_.maxOutgoingBytes))
+               : std::nullopt;
+}
+
+bool LongMessages::publish(const std::string& channel, DataBuffer& payload) {
+    Notes notes;
+    {
+        const std::lock_guard lock(mutex_);
+        const auto expected = expected_.find(channel);
+        if (payload.length() <= pieceSize || expected == expected_.end() ||
+            payload.length() > options_.maxMessage) {
+            return false;
+        }
+        notes = outgoing_.answer(expected->second, std::move(payload),
+                                 std::chrono::steady_clock::now());
+    }
+    timerWakes_.notify_one();
+    sendAll(notes);
+    return true;
+}
+
+bool LongMessages::drain(Time deadline) {
+    Notes notes;
+    {
+        const std::lock_guard lock(mutex_);
+        refusing_ = true;
+        notes = incoming_.stopAll(workerEnds);
+    }
+    sendAll(notes);
+    std::unique_lock lock(mutex_);
+    return changed_.wait_until(lock, deadline, [this] {
+        const bool isHandled =
+            std::ranges::all_of(whole_, [](const auto& each) { return each.second.empty(); });
+        return isHandled && expected_.empty() && outgoing_.count() == 0;
+    });
+}
+
+void LongMessages::close() {
+    Notes notes;
+    {
+        const std::lock_guard lock(mutex_);
+        refusing_ = true;
+        closed_ = true;
+        notes = incoming_.stopAll(workerEnds);
+        std::ranges::move(outgoing_.stopAll(workerEnds), std::back_inserter(notes));
+    }
+    changed_.notify_all();
+    timerWakes_.notify_one();
+    sendAll(notes);
+    if (timer_.joinable()) {
+        timer_.join();
+    }
+}
+
+void LongMessages::runTimer() {
+    std::unique_lock lock(mutex_);
+    while (!closed_) {
+        timerWakes_.wait(
+            lock, [this] { return closed_ || incoming_.count() > 0 || outgoing_.count() > 0; });
+        timerWakes_.wait_for(lock, tickInterval, [this] { return closed_ || hasRoom_.load(); });
+        hasRoom_ = false;
+        const Time now = std::chrono::steady_clock::now();
+        Notes notes = incoming_.tick(now);
+        std::ranges::move(outgoing_.tick(now), std::back_inserter(notes));
+        lock.unlock();
+        changed_.notify_all();  // drain may wait for it
+        sendAll(notes);
+        lock.lock();
+    }
+}
+
+// The answers to a request are published nowhere but where those of its channel are, whatever a
+// client has written into the request.
+std::optional<ReturnAddress> LongMessages::addressOf(const std::string& channel,
+                                                     natsMsg* received) const {
+    const char* const reply = natsMsg_GetReply(received);
+    const std::string& prefix = options_.answerPrefixes.at(channel);
+    const std::string_view answers = reply != nullptr ? reply : "";
+    if (!answers.starts_with(prefix)) {
+        return std::nullopt;
+    }
+    ReturnAddress address{std::string(answers.substr(prefix.size())), std::string(answers)};
+    try {
+        requireSubject(piecesPrefix + worker_ + "." + address.id);
+        requireSubject(address.channel);
+    } catch (const std::exception&) {
+        return std::nullopt;
+    }
+    return address;
+}
+
+// Until what is returned is let go, answers on the channel may go in pieces.
+std::shared_ptr<const void> LongMessages::expectAnswer(const ReturnAddress& address) {
+    const std::lock_guard lock(mutex_);
+    const auto position = expected_.emplace(address.channel, address);
+    return {this, [all = weak_from_this(), position](const void*) {
+                if (const auto alive = all.lock()) {
+                    {
+                        const std::lock_guard lockAgain(alive->mutex_);
+                        alive->expected_.erase(position);
+                    }
+                    alive->changed_.notify_all();
+                }
+            }};
+}
+
+void LongMessages::sendAll(const Notes& notes) {
+    for (const Note& note : notes) {
+        try {
+            send_(note);
+        } catch (const std::exception& error) {
+            // The client hears nothing and asks again.
+            logger().warn("A piece of a message was not sent: {}", error.what());
+            return;
+        }
+    }
+}
+
+// Called by whoever gives memory back, with the mutex or without.
+void LongMessages::onRoom() {
+    hasRoom_ = true;
+    timerWakes_.notify_one();
+}
+
+}  // namespace platform::messaging::nats
