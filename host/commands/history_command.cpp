@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "host/commands/history_command.h"
 
+#include <unistd.h>
+
 #include <array>
 #include <cstdint>
 #include <ctime>
@@ -62,7 +64,7 @@ int runHistory(const HistoryCommandOptions& options, int output) {
     read.bundle = options.bundle;
     read.contentType = options.contentType;
     read.files = {"/proc/self/fd/" + std::to_string(version.get())};
-    return runRead(read, output);
+    return runRead(read, STDIN_FILENO, output);
 }
 
 }  // namespace host

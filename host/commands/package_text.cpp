@@ -1,7 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "host/commands/package_text.h"
 
+#include <simdjson.h>
+
 #include <algorithm>
+#include <utility>
 
 #include "json/parser.h"
 #include "json/value.h"
@@ -28,23 +31,49 @@ std::string faultOf(json::Object& object) {
     return "it lacks the arrays \"parts\" and \"relationships\"";
 }
 
+// Which part keeps `package` from being written, as the bundle takes only text for the bodies of
+// application/ types; empty when there is none.
+std::string refusalOf(json::Object& package) {
+    for (json::Value& part : package["parts"].get<json::Array>()) {
+        if (!part.is<json::Object>()) {
+            return "a part is no JSON object";
+        }
+        auto& members = part.get<json::Object>();
+        for (const char* key : {"partUri", "contentType", "content"}) {
+            if (!members[key].is<std::string>()) {
+                return std::string("a part lacks the text \"") + key + "\"";
+            }
+        }
+        const auto& content = members["content"].get<std::string>();
+        if (members["contentType"].get<std::string>().starts_with("application/") &&
+            !simdjson::validate_utf8(content.data(), content.size())) {
+            return "the part " + members["partUri"].get<std::string>() +
+                   " is no text, as one of an application/ type has to be; spell its type "
+                   "\"Application/...\" to have its bytes stored as they are";
+        }
+    }
+    return "";
+}
+
 }  // namespace
 
 PackageText findPackage(std::string_view text) {
     text = withoutLeadingSpace(text);
     if (text.empty()) {
-        return {{}, "it is empty"};
+        return {{}, "it is empty", {}};
     }
     json::Input input{text.data(), text.data() + text.size()};
     json::Object object;
     if (json::parseObject(input, object) != json::Status::success) {
-        return {{}, "it is no JSON object, or only the beginning of one"};
+        return {{}, "it is no JSON object, or only the beginning of one", {}};
     }
     const auto length = static_cast<std::size_t>(input.position - text.data());
     if (!withoutLeadingSpace(text.substr(length)).empty()) {
-        return {{}, "more follows the first JSON object"};
+        return {{}, "more follows the first JSON object", {}};
     }
-    return {text.substr(0, length), faultOf(object)};
+    std::string fault = faultOf(object);
+    std::string refusal = fault.empty() ? refusalOf(object) : "";
+    return {text.substr(0, length), std::move(fault), std::move(refusal)};
 }
 
 }  // namespace host

@@ -11,6 +11,7 @@ namespace host {
 struct PackageText {
     std::string_view json;  ///< The JSON object of the package, in the text that was looked at.
     std::string fault;      ///< Why there is no package, for people; empty when there is one.
+    std::string refusal;    ///< Why it cannot be written, as far as can be seen; for people.
 };
 
 /// Looks for one JSON object with the arrays "parts" and "relationships" in `text`, with nothing

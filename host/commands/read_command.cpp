@@ -3,23 +3,30 @@
 
 #include <simdjson.h>
 #include <spdlog/spdlog.h>
+#include <sys/mman.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <cstddef>
 #include <map>
 #include <mutex>
 #include <optional>
 #include <span>
 #include <string_view>
+#include <system_error>
 #include <utility>
 
 #include "host/bus/bundle_host.h"
 #include "host/commands/document_kind.h"
 #include "host/commands/exit_status.h"
+#include "host/commands/file_faults.h"
+#include "host/commands/progress.h"
 #include "host/commands/standard_streams.h"
+#include "host/commands/text_file.h"
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "json/value.h"
+#include "platform/posix/file_descriptor.h"
 
 namespace host {
 
@@ -65,78 +72,208 @@ std::string rtcIdOf(const ReadOptions& options, const std::string& file) {
     return std::to_string(&file - options.files.data());
 }
 
-std::string requestFor(const ReadOptions& options, const std::string& file) {
-    const std::string contentType = !options.contentType.empty() ? options.contentType
-                                    : isDocumentPackage(file)    ? "text/xml"
-                                                                 : "text/plain";
-    return json::serialize(json::Value(json::Object{
-        {"rtcId", rtcIdOf(options, file)}, {"contentType", contentType}, {"filePath", file}}));
+// The member `key` of `object` when it is a T, else nullptr.
+template <typename T>
+const T* find(const json::Object& object, const char* key) {
+    const auto member = object.find(key);
+    return member != object.end() && member->second.is<T>() ? &member->second.get<T>() : nullptr;
 }
 
-// Whether the response tells of success; tells of a failure on standard error.
-bool tellsOfSuccess(const std::string& file, std::string_view response) {
-    json::Object result = json::parse(response);
-    if (result["status"] == json::Value(true)) {
-        return true;
+// A file in memory that holds what `input` does. The bundle finds it by its path as any other.
+platform::FileDescriptor copyInput(int input) {
+    platform::FileDescriptor copy(::memfd_create("standard input", MFD_CLOEXEC));
+    if (!copy) {
+        throw std::system_error(errno, std::generic_category(), "cannot keep the standard input");
     }
-    const json::Value& exception = result["exception"];
-    spdlog::error("{}: {}", file,
-                  exception.is<std::string>() ? exception.get<std::string>() : "cannot be read");
-    return false;
+    std::string piece(std::size_t{1} << 20U, '\0');
+    while (const std::size_t count = readSome(input, piece.data(), piece.size())) {
+        writeAll(copy.get(), {std::string_view(piece).substr(0, count)});
+    }
+    return copy;
+}
+
+// What a text is that begins as other files do; empty when it begins as none of these.
+std::string otherKindOf(std::string_view text, const std::string& path) {
+    if (text.starts_with("PK\3\4")) {
+        return isDocumentPackage(path) ? "a document package"
+                                       : "a zip archive, and no document package";
+    }
+    if (text.starts_with("\xD0\xCF\x11\xE0\xA1\xB1\x1A\xE1")) {
+        return "a document of an older kind, or one with a password";
+    }
+    return text.starts_with("%PDF-") ? "a PDF document" : "";
+}
+
+// `value` with all its strings in valid UTF-8.
+json::Value inUtf8(const json::Value& value) {
+    if (value.is<std::string>()) {
+        return json::Value(asValidUtf8(value.get<std::string>()));
+    }
+    if (value.is<json::Array>()) {
+        json::Array array;
+        for (const json::Value& element : value.get<json::Array>()) {
+            array.push_back(inUtf8(element));
+        }
+        return json::Value(std::move(array));
+    }
+    if (value.is<json::Object>()) {
+        json::Object object;
+        for (const auto& [key, member] : value.get<json::Object>()) {
+            object.emplace(asValidUtf8(key), inUtf8(member));
+        }
+        return json::Value(std::move(object));
+    }
+    return value;
 }
 
 // One run of the command.
 class Reading {
 public:
-    Reading(const ReadOptions& options, int output)
+    Reading(const ReadOptions& options, int input, int output)
         : options_(options),
           output_(output),
+          input_(std::find(options.files.begin(), options.files.end(), standardInput) !=
+                         options.files.end()
+                     ? copyInput(input)
+                     : platform::FileDescriptor()),
           host_(options.bundle, largestRequest,
                 [this](const JsonMessage& message) { responses_.add(message); }) {}
 
     // Reads the files of one batch. Returns whether all could be read.
     bool read(std::span<const std::string> batch) {
+        progress_.tell("reading file " +
+                       std::to_string(&batch.front() - options_.files.data() + 1) + " of " +
+                       std::to_string(options_.files.size()));
         for (const std::string& file : batch) {
             if (isUtf8(file)) {
                 host_.publish(platform::messaging::readRequestChannel,
-                              platform::DataBuffer::copyOf(requestFor(options_, file)));
+                              platform::DataBuffer::copyOf(requestFor(file)));
             }
         }
         host_.waitUntilIdle(options_.timeout, [this, batch] {
-            printResponses(
-                batch, "no answer within " + std::to_string(options_.timeout.count()) + " seconds");
+            printAll(batch,
+                     "no answer within " + std::to_string(options_.timeout.count()) + " seconds");
         });
-        return printResponses(batch, "no answer");
+        return printAll(batch, "no answer");
     }
 
 private:
-    bool printResponses(std::span<const std::string> batch, const std::string& reasonForNone) {
+    static constexpr const char* standardInput = "-";
+
+    std::string pathOf(const std::string& file) const {
+        return file == standardInput ? "/proc/self/fd/" + std::to_string(input_.get()) : file;
+    }
+
+    std::string requestFor(const std::string& file) const {
+        const std::string path = pathOf(file);
+        const std::string contentType = !options_.contentType.empty() ? options_.contentType
+                                        : isDocumentPackage(path)     ? "text/xml"
+                                                                      : "text/plain";
+        return json::serialize(json::Value(json::Object{
+            {"rtcId", rtcIdOf(options_, file)}, {"contentType", contentType}, {"filePath", path}}));
+    }
+
+    bool printAll(std::span<const std::string> batch, const std::string& reasonForNone) {
+        progress_.clear();
         bool allSucceeded = true;
         for (const std::string& file : batch) {
             const std::optional<JsonMessage> response = responses_.take(rtcIdOf(options_, file));
-            if (response) {
-                writeAll(output_, {response->payload(), "\n"});
-                allSucceeded &= tellsOfSuccess(file, response->payload());
-            } else {
-                spdlog::error(
-                    "{}: {}", file,
-                    isUtf8(file) ? reasonForNone : "the name is not UTF-8, as a request needs it");
+            const std::string fault =
+                response ? print(file, response->payload())
+                         : printNone(file, isUtf8(file)
+                                               ? reasonForNone
+                                               : "the name is not UTF-8, as a request needs it");
+            if (!fault.empty()) {
+                spdlog::error("{}: {}", file, fault);
                 allSucceeded = false;
             }
         }
         return allSucceeded;
     }
 
+    // Prints, in the place of a response that did not come, one that says so.
+    std::string printNone(const std::string& file, const std::string& reason) {
+        if (options_.form != ReadOptions::Form::text) {
+            json::Object result{{"exception", reason}, {"status", false}};
+            printObject(file, std::move(result));
+        }
+        return reason;
+    }
+
+    // Prints the response to the request for `file` in the form that is wanted. Returns what is
+    // wrong with it; nothing when it tells of success.
+    std::string print(const std::string& file, std::string_view response) {
+        if (options_.form == ReadOptions::Form::response) {
+            writeAll(output_, {response, "\n"});
+            return faultOf(file, json::parse(response));
+        }
+        json::Object result = json::parse(response);
+        std::string fault = faultOf(file, result);
+        if (const std::string* const text = find<std::string>(result, "data")) {
+            try {
+                const std::string charset = charsetOf(readRegularFile(pathOf(file)).value_or(""));
+                result["data"] = toUtf8(*text, charset);
+                result["encoding"] = charset;
+            } catch (const std::runtime_error&) {
+                return printNone(file, "the file has changed while it was read");
+            }
+        }
+        if (options_.form == ReadOptions::Form::utf8) {
+            printObject(file, std::move(result));
+            return fault;
+        }
+        return fault.empty() ? printText(result) : fault;
+    }
+
+    std::string printText(const json::Object& result) {
+        const std::string* const text = find<std::string>(result, "data");
+        if (text == nullptr) {
+            return "is a document package, which is more than one text; read it without --text";
+        }
+        writeAll(output_, {*text});
+        return "";
+    }
+
+    void printObject(const std::string& file, json::Object result) {
+        if (options_.form == ReadOptions::Form::utf8) {
+            result["filePath"] = file;
+        }
+        writeAll(output_, {json::serialize(inUtf8(json::Value(std::move(result)))), "\n"});
+    }
+
+    // What is wrong with the response; nothing when it tells of success. Tells of a text that may
+    // not be meant to be read as one.
+    std::string faultOf(const std::string& file, const json::Object& result) const {
+        if (const bool* const status = find<bool>(result, "status");
+            status == nullptr || !*status) {
+            const std::string* const exception = find<std::string>(result, "exception");
+            return exception != nullptr ? *exception : "cannot be read";
+        }
+        const std::string* const text = find<std::string>(result, "data");
+        if (text == nullptr) {
+            return "";
+        }
+        const std::string path = pathOf(file);
+        if (const std::string kind = otherKindOf(*text, path); !kind.empty()) {
+            spdlog::warn("{} is {}, and was read as a text", file, kind);
+        }
+        // What cannot be opened reads as an empty text.
+        const std::string reason = text->empty() ? whyNotReadable(path) : "";
+        return reason.empty() ? "" : "nothing could be read: " + reason;
+    }
+
     const ReadOptions& options_;
     int output_;
+    platform::FileDescriptor input_;  // none unless a file is the standard input
     Responses responses_;
     BundleHost host_;
+    Progress progress_{"reading"};
 };
 
 }  // namespace
 
-int runRead(const ReadOptions& options, int output) {
-    Reading reading(options, output);
+int runRead(const ReadOptions& options, int input, int output) {
+    Reading reading(options, input, output);
     bool allRead = true;
     for (std::span<const std::string> rest(options.files); !rest.empty();) {
         const auto batch = rest.first(std::min(batchSize, rest.size()));

@@ -88,7 +88,11 @@ void writeAll(int fd, std::initializer_list<std::string_view> pieces) {
         if (written >= 0) {
             first = skipWritten(rest, first, static_cast<std::size_t>(written));
         } else if (!shallRetry(fd, POLLOUT)) {
-            throwSystemError("cannot write to the standard output");
+            constexpr const char* what = "cannot write to the standard output";
+            if (errno == EPIPE) {
+                throw ReaderGone(errno, std::generic_category(), what);
+            }
+            throwSystemError(what);
         }
     }
 }

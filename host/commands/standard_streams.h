@@ -9,10 +9,16 @@
 #include <cstddef>
 #include <initializer_list>
 #include <string_view>
+#include <system_error>
 
 #include "platform/posix/file_descriptor.h"
 
 namespace host {
+
+/// Nobody reads any more what is written to the standard output.
+class ReaderGone : public std::system_error {
+    using std::system_error::system_error;
+};
 
 /// Makes sure that no file opened later takes the place of a standard stream that is closed.
 /// Reading or writing such a stream stays an error. Throws std::system_error.
@@ -22,7 +28,8 @@ void openMissingStandardStreams();
 platform::FileDescriptor divertStandardOutput();
 
 /// Writes all `pieces`, one after the other, waiting where `fd` takes nothing more for now. Throws
-/// std::system_error when it cannot; part of the bytes may have been written by then.
+/// std::system_error when it cannot, ReaderGone when that is for good; part of the bytes may have
+/// been written by then.
 void writeAll(int fd, std::initializer_list<std::string_view> pieces);
 
 /// Reads up to `room` bytes to `to`, waiting for the first of them. Returns how many there were;

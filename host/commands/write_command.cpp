@@ -2,6 +2,7 @@
 #include "host/commands/write_command.h"
 
 #include <malloc.h>
+#include <simdjson.h>
 #include <spdlog/spdlog.h>
 
 #include <algorithm>
@@ -21,20 +22,23 @@
 #include "host/bus/bundle_host.h"
 #include "host/commands/document_kind.h"
 #include "host/commands/exit_status.h"
+#include "host/commands/file_faults.h"
 #include "host/commands/package_text.h"
+#include "host/commands/progress.h"
 #include "host/commands/standard_streams.h"
 #include "host/commands/stop_signals.h"
+#include "host/commands/text_file.h"
 #include "json/serialize.h"
 #include "json/value.h"
 #include "platform/data_buffer.h"
+#include "platform/i18n/codecvt.h"
 
 namespace host {
 
 namespace {
 
+using platform::i18n::codecvt_string_to_ustring;
 using platform::messaging::JsonMessage;
-
-constexpr const char* packageContentType = "text/xml";
 
 struct Free {
     void operator()(char* memory) const noexcept { std::free(memory); }
@@ -43,7 +47,7 @@ struct Free {
 // All that the standard input holds. Grows without copies where the system can move memory.
 class Content {
 public:
-    explicit Content(int input) {
+    Content(int input, Progress& progress) {
         constexpr std::size_t smallestRoom = std::size_t{64} * 1024;
         for (std::size_t room = 0;;) {
             if (length_ == room) {
@@ -55,6 +59,7 @@ public:
                 return;
             }
             length_ += count;
+            progress.tell("reading the input, " + std::to_string(length_ >> 20U) + " MB");
         }
     }
 
@@ -115,78 +120,143 @@ bool isForADocument(std::filesystem::path file) {
     return false;
 }
 
-// The package in `content`; nothing when it is to be written as a text. Throws std::runtime_error
-// when it may be written as neither: a text in the place of a document would destroy that.
-std::optional<std::string_view> packageToWrite(const WriteOptions& options,
-                                               std::string_view content) {
-    if (!options.contentType.empty() && options.contentType != packageContentType) {
-        return std::nullopt;
-    }
-    PackageText package = findPackage(content);
-    if (package.fault.empty()) {
-        return package.json;
-    }
-    if (options.contentType == packageContentType) {
-        throw std::runtime_error("the content is no document package: " + package.fault);
-    }
-    if (isForADocument(options.file)) {
+// Throws std::runtime_error when a text may not take the place of `file`, for the reason `why`.
+void requireNoDocument(const WriteOptions& options, const std::string& why) {
+    if (options.contentType.empty() && isForADocument(options.file)) {
         throw std::runtime_error(options.file +
                                  " is a document package, or named as one, and the content is "
                                  "none: " +
-                                 package.fault +
+                                 why +
                                  ". To write it as a text nevertheless: --content-type text/plain");
     }
-    return std::nullopt;
 }
 
-platform::DataBuffer requestFor(const WriteOptions& options, const Content& content) {
-    json::Object request{{"rtcId", "0"}, {"filePath", options.file}};
-    if (const auto package = packageToWrite(options, content.text())) {
-        request["contentType"] = packageContentType;
-        return withContent(std::move(request), *package);
+struct Request {
+    platform::DataBuffer text;  // empty when it is known to fail
+    std::string refusal;        // why it fails; empty when nothing is seen that speaks against it
+};
+
+Request makePackageRequest(const WriteOptions& options, PackageText package) {
+    return {withContent(
+                {{"rtcId", "0"}, {"filePath", options.file}, {"contentType", packageContentType}},
+                package.json),
+            std::move(package.refusal)};
+}
+
+// A request for a text of `bytes` in `encoding`.
+Request makeTextRequest(const WriteOptions& options, std::string bytes,
+                        const std::string& encoding) {
+    if (std::string fault = faultOfText(bytes, encoding); !fault.empty()) {
+        // Not sent: of a text that decodes and does not encode again, an empty file is made.
+        return {platform::DataBuffer(), std::move(fault)};
     }
-    request["contentType"] = options.contentType.empty() ? "text/plain" : options.contentType;
-    request["encoding"] = options.encoding;
-    return withContent(std::move(request),
-                       json::serialize(json::Value(std::string(content.text()))));
+    const std::string contentType =
+        options.contentType.empty() ? "text/plain" : options.contentType;
+    return {withContent({{"rtcId", "0"},
+                         {"filePath", options.file},
+                         {"contentType", contentType},
+                         {"encoding", encoding}},
+                        json::serialize(json::Value(std::move(bytes)))),
+            ""};
 }
 
-}  // namespace
+// A request for a text that came in as UTF-8.
+Request makeUtf8TextRequest(const WriteOptions& options, std::string_view content) {
+    codecvt_string_to_ustring utf8("UTF-8", true);
+    std::u16string text = platform::i18n::to_ustring(content, utf8);
+    TextFile file = readTextFile(options.file);
+    const std::string& charset = options.encoding.empty() ? file.charset : options.encoding;
+    if (charset == file.charset && text == file.withoutMark()) {
+        // Some charsets have several spellings of one text: the file keeps its own, which a
+        // charset that means bytes stores as it is.
+        return makeTextRequest(options, std::move(file.bytes), "ISO-8859-1");
+    }
+    constexpr std::u16string_view mark = u"\uFEFF";
+    if (file.hasMark() && (charset == file.charset || canHold(mark, charset))) {
+        text.insert(0, mark);
+    }
+    return makeTextRequest(options, encode(text, charset), charset);
+}
 
-int runWrite(const WriteOptions& options, int input, int output) {
-    platform::DataBuffer request = requestFor(options, Content(input));
+// Throws std::runtime_error when the content is not what the options say.
+Request makeRequest(const WriteOptions& options, std::string_view content) {
+    if (options.isUtf8Text) {
+        requireNoDocument(options, "--text was given");
+        return makeUtf8TextRequest(options, content);
+    }
+    if (options.contentType.empty() || options.contentType == packageContentType) {
+        PackageText package = findPackage(content);
+        if (package.fault.empty()) {
+            return makePackageRequest(options, std::move(package));
+        }
+        if (options.contentType == packageContentType) {
+            throw std::runtime_error("the content is no document package: " + package.fault);
+        }
+        requireNoDocument(options, package.fault);
+    }
+    return makeTextRequest(options, std::string(content),
+                           options.encoding.empty() ? "UTF-8" : options.encoding);
+}
+
+// Why the bundle answered false, after `refusal`, what was seen in the request before.
+std::string whyRefused(const std::string& refusal, const WriteOptions& options) {
+    const std::string reason = refusal.empty() ? whyNotWritable(options.file) : refusal;
+    return reason.empty() ? "cannot be written" : "cannot be written: " + reason;
+}
+
+std::string whyNoAnswer(const std::string& file) {
+    const std::string reason = simdjson::validate_utf8(file.data(), file.size())
+                                   ? whyNotWritable(file)
+                                   : "the name is not UTF-8, as a request needs it";
+    return reason.empty() ? "no answer" : "no answer: " + reason;
+}
+
+// Has the bundle do what `request` says. Returns its answer; nothing when there is none.
+std::optional<std::string> send(const WriteOptions& options, platform::DataBuffer request) {
     // What the look at the content took, the threads that answer the request cannot use.
     ::malloc_trim(0);
-    // A save is not left half done by who asks the program to end, unless asking again.
+    // A signal that asks the program to end does not cut a save short, unless it comes again.
     blockStopSignals();
     const StopSignals signals([] {});
     std::mutex mutex;
-    std::optional<JsonMessage> answer;  // guarded by mutex
-    const Guard guard = makeGuard(options.guard, {});
+    std::optional<std::string> answer;  // guarded by mutex
     BundleHost host(
         options.bundle, request.length(),
         [&](const JsonMessage& message) {
             if (message.channel().starts_with(platform::messaging::writeResponsePrefix)) {
                 const std::lock_guard lock(mutex);
-                answer = message;
+                answer = message.payload();
             }
         },
-        guard);
+        makeGuard(options.guard, {}));
     host.publish(platform::messaging::writeRequestChannel, std::move(request));
     host.waitUntilIdle(options.timeout, [&options] {
         spdlog::error("{}: no answer within {} seconds", options.file, options.timeout.count());
     });
-
     const std::lock_guard lock(mutex);
+    return answer;
+}
+
+}  // namespace
+
+int runWrite(const WriteOptions& options, int input, int output) {
+    Progress progress("reading the input");
+    Request request = makeRequest(options, Content(input, progress).text());
+    std::optional<std::string> answer = "false";
+    if (request.text.length() > 0) {
+        progress.tell("writing");
+        answer = send(options, std::move(request.text));
+    }
+    progress.clear();
     if (!answer) {
-        spdlog::error("{}: no answer", options.file);
+        spdlog::error("{}: {}", options.file, whyNoAnswer(options.file));
         return exitRequestFailed;
     }
-    writeAll(output, {answer->payload(), "\n"});
-    if (answer->payload() == "true") {
+    writeAll(output, {*answer, "\n"});
+    if (*answer == "true") {
         return exitDone;
     }
-    spdlog::error("{}: cannot be written", options.file);
+    spdlog::error("{}: {}", options.file, whyRefused(request.refusal, options));
     return exitRequestFailed;
 }
 

@@ -2,6 +2,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <filesystem>
 #include <sstream>
@@ -53,6 +54,13 @@ std::string successOf(const std::string& text) {
     json::Object response;
     response["data"] = text;
     response["status"] = true;
+    return json::serialize(response);
+}
+
+std::string failureOf(const std::string& reason) {
+    json::Object response;
+    response["exception"] = reason;
+    response["status"] = false;
     return json::serialize(response);
 }
 
@@ -146,7 +154,8 @@ TEST_F(ReadCommand, TakesFileNamesWithAnyCharacters) {
 TEST_F(ReadCommand, TellsOfANameThatIsNotUtf8AndReadsTheOthers) {
     const Outcome outcome = read({makeFile("caf\xE9", "x"), makeFile("file", "y")});
     EXPECT_EQ(outcome.status, 1);
-    EXPECT_EQ(outcome.output, successOf("y") + "\n");
+    EXPECT_EQ(outcome.output, failureOf("the name is not UTF-8, as a request needs it") + "\n" +
+                                  successOf("y") + "\n");
     EXPECT_THAT(outcome.errors, AllOf(HasSubstr("caf\\xE9"), HasSubstr("not UTF-8")));
     EXPECT_THAT(outcome.errors, Not(HasSubstr("no answer")));
 }
@@ -177,7 +186,7 @@ TEST_F(ReadCommand, AsksForTheContentTypeThatItIsGiven) {
 TEST_F(ReadCommand, KnowsThatNoAnswerComesOnceTheBusIsIdle) {
     const Outcome outcome = read({makeFile("file", "x")}, {"--bundle", UNRESPONSIVE_BUNDLE});
     EXPECT_EQ(outcome.status, 1);
-    EXPECT_THAT(outcome.output, IsEmpty());
+    EXPECT_EQ(outcome.output, failureOf("no answer") + "\n");
     EXPECT_THAT(outcome.errors, HasSubstr("file: no answer\n"));
 }
 
@@ -185,7 +194,7 @@ TEST_F(ReadCommand, TakesAResponseThatIsNoneForAFailure) {
     const Outcome outcome =
         read({makeFile("file", ""), makeFile("garbled", "")}, {"--bundle", UNRESPONSIVE_BUNDLE});
     EXPECT_EQ(outcome.status, 1);
-    EXPECT_EQ(outcome.output, "no JSON\n");
+    EXPECT_EQ(outcome.output, failureOf("no answer") + "\nno JSON\n");
     EXPECT_THAT(outcome.errors, HasSubstr("garbled: cannot be read"));
 }
 
@@ -193,17 +202,142 @@ TEST_F(ReadCommand, GivesUpAfterTheTimeoutAndPrintsWhatHasCome) {
     const Outcome outcome = read({makeFile("stuck", ""), makeFile("answered", "")},
                                  {"--bundle", UNRESPONSIVE_BUNDLE, "--timeout", "1"});
     EXPECT_EQ(outcome.status, 1);
-    EXPECT_EQ(outcome.output, successOf("x") + "\n");
+    EXPECT_EQ(outcome.output,
+              failureOf("no answer within 1 seconds") + "\n" + successOf("x") + "\n");
     EXPECT_THAT(outcome.errors, HasSubstr("stuck: no answer within 1 second"));
 }
 
 // A pipe that nobody writes to, a device, a folder.
-TEST_F(ReadCommand, DoesNotHangOnWhatIsNoFile) {
+TEST_F(ReadCommand, SaysThatNothingCanBeReadFromWhatIsNoFile) {
     const std::filesystem::path pipe = folder_ / "pipe";
     ASSERT_EQ(::mkfifo(pipe.c_str(), 0600), 0);
-    const Outcome outcome = read({pipe, "/dev/null", folder_.path()});
+    for (const char* form : {"", "--utf8", "--text"}) {
+        std::vector<std::string> options;
+        if (*form != '\0') {
+            options.emplace_back(form);
+        }
+        const Outcome outcome = read({pipe, "/dev/null", folder_.path()}, options);
+        EXPECT_EQ(outcome.status, 1);
+        EXPECT_THAT(linesOf(outcome.output), SizeIs(std::string(form) == "--text" ? 0 : 3));
+        EXPECT_THAT(
+            outcome.errors,
+            AllOf(HasSubstr("pipe: nothing could be read: is a pipe"),
+                  HasSubstr("/dev/null: nothing could be read: is a device"),
+                  HasSubstr(folder_.path().string() + ": nothing could be read: is a folder")));
+    }
+}
+
+TEST_F(ReadCommand, SaysThatAFileMayNotBeRead) {
+    if (::geteuid() != 0 || !std::filesystem::exists("/usr/bin/setpriv")) {
+        GTEST_SKIP() << "needs root, who reads every file, and setpriv to become somebody else";
+    }
+    std::filesystem::permissions(folder_.path(), std::filesystem::perms(0755));
+    const std::filesystem::path file = makeFile("file", "secret");
+    std::filesystem::permissions(file, std::filesystem::perms(0600));
+    const Outcome outcome =
+        test::run({"/usr/bin/setpriv", "--reuid=65534", "--regid=65534", "--clear-groups",
+                   SERIALIZATION_HOST, "read", file.string()});
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_EQ(outcome.output, successOf("") + "\n");
+    EXPECT_THAT(outcome.errors, HasSubstr("nothing could be read: Permission denied"));
+}
+
+TEST_F(ReadCommand, SaysNothingOfAnEmptyFile) {
+    const Outcome outcome = read({makeFile("file", "")});
     EXPECT_EQ(outcome.status, 0);
-    EXPECT_EQ(outcome.output, successOf("") + "\n" + successOf("") + "\n" + successOf("") + "\n");
+    EXPECT_THAT(outcome.errors, IsEmpty());
+}
+
+TEST_F(ReadCommand, WarnsOfADocumentThatIsReadAsText) {
+    const std::string package = test::zipArchive({"[Content_Types].xml", "part.xml"});
+    const auto warning = [&](const std::string& bytes) {
+        const Outcome outcome = read({makeFile("file", bytes)}, {"--content-type", "text/plain"});
+        EXPECT_EQ(outcome.status, 0);
+        return outcome.errors;
+    };
+    EXPECT_THAT(warning(package), HasSubstr("file is a document package, and was read as a text"));
+    EXPECT_THAT(warning("\xD0\xCF\x11\xE0\xA1\xB1\x1A\xE1 and so on"), HasSubstr("older kind"));
+    EXPECT_THAT(warning("%PDF-1.7\n"), HasSubstr("PDF"));
+    EXPECT_THAT(warning("PK"), IsEmpty());
+}
+
+// A pattern of the shell expands to such names as well.
+TEST_F(ReadCommand, TakesAnArgumentForAFileThatHasTheNameOfNoOption) {
+    makeFile("-dash.txt", "a");
+    makeFile("--utf9", "b");
+    makeFile("c", "c");
+    const Outcome outcome = test::run({"/bin/sh", "-c", "cd \"$1\" && exec \"$0\" read *",
+                                       SERIALIZATION_HOST, folder_.path().string()});
+    EXPECT_EQ(outcome.status, 0) << outcome.errors;
+    const std::vector<std::string> lines = linesOf(outcome.output);
+    EXPECT_THAT(lines,
+                ::testing::UnorderedElementsAre(successOf("a"), successOf("b"), successOf("c")));
+}
+
+TEST_F(ReadCommand, ReadsTheStandardInput) {
+    const std::filesystem::path file = makeFile("file", "x");
+    EXPECT_EQ(test::run(hostCommand({"read", "-", file.string(), "-"}), "piped").output,
+              successOf("piped") + "\n" + successOf("x") + "\n" + successOf("piped") + "\n");
+    const std::string report = test::sourceRoot() + "/examples/report.docx";
+    EXPECT_EQ(test::run(hostCommand({"read", "-"}), readFile(report)).output,
+              read({report}).output);
+}
+
+TEST_F(ReadCommand, PrintsValidUtf8WithPathAndCharsetWhenAsked) {
+    const auto printed = [&](const std::string& bytes) {
+        return read({makeFile("file", bytes)}, {"--utf8"}).output;
+    };
+    const std::string path = (folder_ / "file").string();
+    const auto expected = [&](const std::string& text, const std::string& charset) {
+        return R"({"data":")" + text + R"(","encoding":")" + charset + R"(","filePath":")" + path +
+               "\",\"status\":true}\n";
+    };
+    EXPECT_EQ(printed("plain"), expected("plain", "UTF-8"));
+    EXPECT_EQ(printed("\xEF\xBB\xBF\xC3\xA9"), expected("\xC3\xA9", "UTF-8"));
+    EXPECT_EQ(printed(std::string("\xFE\xFF\x00\xE9", 4)), expected("\xC3\xA9", "UTF-16BE"));
+    EXPECT_EQ(printed(""), expected("", "UTF-8"));
+    EXPECT_EQ(read({folder_ / "caf\xE9"}, {"--utf8"}).output,
+              R"({"exception":"the name is not UTF-8, as a request needs it","filePath":")" +
+                  (folder_ / "caf\xEF\xBF\xBD").string() + "\",\"status\":false}\n");
+}
+
+TEST_F(ReadCommand, PrintsAPackageInValidUtf8WhenAsked) {
+    const std::string report = test::sourceRoot() + "/examples/report.docx";
+    const Outcome outcome = read({report}, {"--utf8"});
+    EXPECT_EQ(outcome.status, 0);
+    json::Object response = json::parse(outcome.output);
+    EXPECT_EQ(response["filePath"].get<std::string>(), report);
+    EXPECT_FALSE(response.contains("encoding"));
+    response.erase("filePath");
+    EXPECT_EQ(json::serialize(response) + "\n", read({report}).output);
+}
+
+TEST_F(ReadCommand, PrintsTheTextItselfWhenAsked) {
+    const Outcome outcome = read({makeFile("a", "\xEF\xBB\xBFone\n"), folder_ / "missing",
+                                  makeFile("b", std::string("\xFF\xFEt\0w\0o\0", 8))},
+                                 {"--text"});
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_EQ(outcome.output, "one\ntwo");
+    EXPECT_THAT(outcome.errors, HasSubstr("missing: File does not exist"));
+}
+
+TEST_F(ReadCommand, HasNoTextOfAPackage) {
+    const Outcome outcome = read({test::sourceRoot() + "/examples/report.docx"}, {"--text"});
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_THAT(outcome.output, IsEmpty());
+    EXPECT_THAT(outcome.errors, HasSubstr("read it without --text"));
+}
+
+// The program on a terminal, by the program `script`.
+TEST_F(ReadCommand, ShowsOnATerminalThatItIsAtWork) {
+    const std::string command = std::string(SERIALIZATION_HOST) + " read --bundle " +
+                                UNRESPONSIVE_BUNDLE + " --timeout 2 stuck";
+    const Outcome slow = test::run({"/usr/bin/script", "-qec", command, "/dev/null"});
+    EXPECT_THAT(slow.output, HasSubstr("reading file 1 of 1, 1 s"));
+    const std::string quick =
+        std::string(SERIALIZATION_HOST) + " read " + test::sourceRoot() + "/examples/empty.txt";
+    EXPECT_EQ(test::run({"/usr/bin/script", "-qec", quick, "/dev/null"}).output,
+              successOf("") + "\r\n");
 }
 
 }  // namespace

@@ -2,14 +2,17 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <signal.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <filesystem>
+#include <optional>
 #include <string>
 #include <vector>
 
 #include "tests/host/host_program.h"
 #include "tests/host/subprocess.h"
+#include "tests/platform/i18n/detection/corpus.h"
 #include "tests/support/source_root.h"
 #include "tests/support/temporary_directory.h"
 
@@ -146,6 +149,139 @@ TEST_F(WriteCommand, TakesAPackageWithWhiteSpaceAroundIt) {
     const std::string json = test::run(hostCommand({"read", report})).output;
     EXPECT_EQ(write(file, " \n\t" + json + "\r\n").output, "true\n");
     EXPECT_EQ(test::run(hostCommand({"read", file.string()})).output, json);
+}
+
+TEST_F(WriteCommand, SaysWhyItCannotWrite) {
+    const auto reason = [&](const std::filesystem::path& file, const std::string& content,
+                            const std::vector<std::string>& options) {
+        const Outcome outcome = write(file, content, options);
+        EXPECT_EQ(outcome.status, 1);
+        EXPECT_EQ(outcome.output, "false\n");
+        return outcome.errors;
+    };
+    writeFile(folder_ / "file", "KEEP");
+    const std::filesystem::path file = folder_ / "file";
+    EXPECT_THAT(reason(file, "x", {"--encoding", "klingon"}),
+                HasSubstr("Unknown charset \"klingon\""));
+    EXPECT_THAT(reason(file, "ab\xE9", {}), HasSubstr("as UTF-8: malformed input at byte 2"));
+    EXPECT_EQ(readFile(file), "KEEP");
+    EXPECT_THAT(reason(folder_ / "none/file", "x", {}),
+                HasSubstr("the folder " + (folder_ / "none").string() + " does not exist"));
+    EXPECT_THAT(reason(file / "file", "x", {}), HasSubstr("Not a directory"));
+    EXPECT_THAT(reason(folder_.path(), "x", {}), HasSubstr("is a folder"));
+    const Outcome outcome = write(folder_ / std::string(300, 'x'), "x");
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_THAT(outcome.errors, HasSubstr("no answer: File name too long"));
+}
+
+TEST_F(WriteCommand, SaysThatAFileMayNotBeWritten) {
+    if (::geteuid() != 0 || !std::filesystem::exists("/usr/bin/setpriv")) {
+        GTEST_SKIP() << "needs root, who writes every file, and setpriv to become somebody else";
+    }
+    std::filesystem::permissions(folder_.path(), std::filesystem::perms(0755));
+    writeFile(folder_ / "file", "KEEP");
+    for (const char* name : {"file", "new file"}) {
+        const Outcome outcome =
+            test::run({"/usr/bin/setpriv", "--reuid=65534", "--regid=65534", "--clear-groups",
+                       SERIALIZATION_HOST, "write", (folder_ / name).string()},
+                      "text");
+        EXPECT_EQ(outcome.status, 1);
+        EXPECT_THAT(outcome.errors, HasSubstr("Permission denied"));
+    }
+    EXPECT_EQ(readFile(folder_ / "file"), "KEEP");
+}
+
+TEST_F(WriteCommand, NamesThePartThatItCannotWrite) {
+    const std::string json =
+        "{\"parts\":[{\"partUri\":\"/macros.bin\",\"contentType\":\"application/x-macros\","
+        "\"content\":\"\xFF\",\"relationship\":null}],\"relationships\":[]}";
+    const Outcome outcome = write(folder_ / "file.docx", json);
+    EXPECT_EQ(outcome.output, "false\n");
+    EXPECT_THAT(outcome.errors, HasSubstr("the part /macros.bin is no text"));
+}
+
+TEST_F(WriteCommand, StoresUtf8TextInTheFilesOwnCharsetWithItsMark) {
+    writeFile(folder_ / "file", std::string("\xFF\xFE"
+                                            "a\0b\0",
+                                            6));
+    EXPECT_EQ(write(folder_ / "file", "c\xC3\xA9", {"--text"}).output, "true\n");
+    EXPECT_EQ(readFile(folder_ / "file"), std::string("\xFF\xFE"
+                                                      "c\0\xE9\0",
+                                                      6));
+    EXPECT_EQ(write(folder_ / "file", "\xC3\xA8", {"--text", "--encoding", "ISO-8859-1"}).output,
+              "true\n");
+    EXPECT_EQ(readFile(folder_ / "file"), "\xE8");
+    EXPECT_EQ(write(folder_ / "new", "\xC3\xA9", {"--text"}).output, "true\n");
+    EXPECT_EQ(readFile(folder_ / "new"), "\xC3\xA9");
+}
+
+TEST_F(WriteCommand, NamesTheCharactersThatDoNotFitAndKeepsTheFile) {
+    writeFile(folder_ / "file", "KEEP");
+    const Outcome outcome =
+        write(folder_ / "file", "caf\xC3\xA9\n10 \xE2\x82\xAC, \xE2\x82\xAC and \xF0\x9F\x98\x80",
+              {"--text", "--encoding", "ISO-8859-1"});
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_THAT(outcome.output, IsEmpty());
+    EXPECT_THAT(outcome.errors,
+                HasSubstr("ISO-8859-1 has no \"\xE2\x82\xAC\" (U+20AC) at line 2, column 4, "
+                          "\"\xF0\x9F\x98\x80\" (U+1F600) at line 2, column 13\n"));
+    EXPECT_EQ(readFile(folder_ / "file"), "KEEP");
+}
+
+TEST_F(WriteCommand, RefusesATextThatIsNotTheUtf8ItIsSaidToBe) {
+    writeFile(folder_ / "file", "KEEP");
+    const Outcome outcome = write(folder_ / "file", "caf\xE9 ", {"--text"});
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_THAT(outcome.errors, HasSubstr("UTF-8: malformed input at byte 3"));
+    EXPECT_EQ(readFile(folder_ / "file"), "KEEP");
+}
+
+TEST_F(WriteCommand, PutsNoTextInThePlaceOfADocument) {
+    const std::string report = readFile(test::sourceRoot() + "/examples/report.docx");
+    writeFile(folder_ / "report", report);
+    EXPECT_EQ(write(folder_ / "report", "text", {"--text"}).status, 1);
+    EXPECT_TRUE(readFile(folder_ / "report") == report);
+}
+
+// What read --text prints of a file, written back to it.
+std::string writtenBack(const std::filesystem::path& file, const std::string& bytes) {
+    writeFile(file, bytes);
+    const Outcome text = test::run(hostCommand({"read", "--text", "--", file.string()}));
+    EXPECT_EQ(text.status, 0) << text.errors;
+    const Outcome written =
+        test::run(hostCommand({"write", "--text", "--", file.string()}), text.output);
+    EXPECT_EQ(written.output, "true\n") << written.errors;
+    return readFile(file);
+}
+
+TEST_F(WriteCommand, LeavesAFileAsItWasWhenItsTextIsWrittenBack) {
+    for (const auto& entry : platform::i18n::testing::corpusEntries()) {
+        const std::optional<std::string> bytes = platform::i18n::testing::iconvEncode(
+            entry.iconvName, platform::i18n::testing::corpusText(entry.language));
+        if (bytes) {
+            EXPECT_TRUE(writtenBack(folder_ / "file", *bytes) == *bytes)
+                << entry.language << " in " << entry.charset;
+        }
+    }
+}
+
+TEST_F(WriteCommand, LeavesMarksAndStrayBytesAsTheyWereWhenATextIsWrittenBack) {
+    using namespace std::string_literals;
+    for (const std::string& bytes :
+         {""s, "\xEF\xBB\xBF"s, "\xEF\xBB\xBFtext"s, "\xEF\xBB\xBF\xEF\xBB\xBFtwo marks"s,
+          "\xFF\xFEx\0"s, "\xFE\xFF\0x"s, "\xFF\xFE\0\0x\0\0\0"s, "\0\0\xFE\xFF\0\0\0x"s,
+          "one\r\ntwo\rthree"s, "zero\0byte"s, "\x80\x81\xFE\xFF\x90"s,
+          "{\"parts\":[],\"relationships\":[]}"s, "\x1B$B$3$l\x1B(J and Roman"s}) {
+        EXPECT_EQ(writtenBack(folder_ / "file", bytes), bytes);
+    }
+}
+
+// The end-of-file mark of DOS, as tables of the IBM family have it, is given its usual code.
+TEST_F(WriteCommand, MendsTheEndOfADosTextInShiftJis) {
+    const std::string text = "\x83\x65\x83\x4C\x83\x58\x83\x67\x82\xC5\x82\xB7\x81\x42\x1C";
+    const std::string again = writtenBack(folder_ / "file", text);
+    EXPECT_EQ(again.substr(0, text.size() - 1), text.substr(0, text.size() - 1));
+    EXPECT_EQ(again.back(), '\x1A');
 }
 
 TEST_F(WriteCommand, FinishesTheSaveInWhichItIsAskedToEnd) {

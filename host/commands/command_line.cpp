@@ -1,0 +1,466 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "host/commands/command_line.h"
+
+#include <algorithm>
+#include <chrono>
+#include <functional>
+#include <memory>
+#include <numeric>
+#include <optional>
+#include <regex>
+#include <sstream>
+#include <stdexcept>
+#include <string_view>
+#include <utility>
+
+#include "host/server/nats_configuration.h"
+
+namespace host {
+
+namespace {
+
+// Prints options with the names of their values and nothing else, in lines that fit a terminal.
+class HelpFormatter final : public CLI::Formatter {
+public:
+    std::string make_option_opts(const CLI::Option* option) const override {
+        return option->get_positional() || option->get_type_size() == 0
+                   ? ""
+                   : " " + option->get_type_name();
+    }
+
+    std::string make_option_desc(const CLI::Option* option) const override {
+        constexpr std::size_t width = 79;
+        std::istringstream words(option->get_description());
+        std::string text;
+        std::size_t room = width - get_column_width();
+        for (std::string word; words >> word; room -= word.size() + 1) {
+            if (word.size() + 1 > room) {
+                text += '\n';
+                room = width - get_column_width();
+            } else if (!text.empty()) {
+                text += ' ';
+            }
+            text += word;
+        }
+        return text;
+    }
+};
+
+// `validator` without its text in the help, where the description says what is valid.
+CLI::Validator untold(CLI::Validator validator) {
+    return validator.description("");
+}
+
+// A check of an option's value by `fault`, which tells what is wrong with it; nothing if nothing
+// is.
+CLI::Validator check(const std::function<std::string(std::string&)>& fault) {
+    return CLI::Validator(fault, "");
+}
+
+void declareTimeout(CLI::App& command, std::chrono::seconds& timeout) {
+    command
+        .add_option_function<unsigned>(
+            "--timeout", [&timeout](unsigned seconds) { timeout = std::chrono::seconds(seconds); },
+            "How long to wait for an answer (default: " + std::to_string(timeout.count()) + ")")
+        ->type_name("SECONDS")
+        ->check(untold(CLI::Range(1U, 1'000'000'000U)));
+}
+
+void declareContentType(CLI::App& command, std::string& contentType, const std::string& usual) {
+    command
+        .add_option("--content-type", contentType,
+                    "The content type of the request: text/xml for a document package, anything "
+                    "else for a text (default: " +
+                        usual + ")")
+        ->type_name("TYPE");
+}
+
+void declareRead(CLI::App& command, ReadOptions& options) {
+    command.add_option("FILE", options.files, "The files to read; - is the standard input")
+        ->required();
+    declareContentType(command, options.contentType, "by what the file is");
+    CLI::Option* const utf8 = command.add_flag_callback(
+        "--utf8", [&options] { options.form = ReadOptions::Form::utf8; },
+        "Print each response as valid UTF-8, with \"filePath\" and, of a text, \"encoding\", the "
+        "file's charset, added");
+    command
+        .add_flag_callback(
+            "--text", [&options] { options.form = ReadOptions::Form::text; },
+            "Print the texts themselves, in UTF-8 and without byte-order marks")
+        ->excludes(utf8);
+    declareTimeout(command, options.timeout);
+}
+
+std::string faultOfServerUrl(const std::string& url) {
+    if (url.find('@') != std::string::npos) {
+        // Command lines can be seen by every user of the machine.
+        return "a URL of --nats may hold no user and password; there are --nats-user and "
+               "--nats-password-file, --nats-token-file and --creds";
+    }
+    static const std::regex form(
+        R"((nats|tls)://(\[[0-9A-Fa-f:.]+\]|[^/:\[\]\s]+)(:[0-9]{1,5})?/?)");
+    return std::regex_match(url, form)
+               ? ""
+               : "\"" + url + "\" is no address of a server such as nats://127.0.0.1:4222";
+}
+
+void declareOwnServer(CLI::App& command, NatsServerOptions& options, CLI::Option& others) {
+    command
+        .add_option("--port", options.port,
+                    "The port of the host's own message server (default: any that is free)")
+        ->excludes(&others);
+    command
+        .add_option("--websocket-port", options.webSocketPort,
+                    "Its port for browsers (default: any that is free)")
+        ->excludes(&others);
+    command
+        .add_option("--allow-origin", options.allowedOrigins,
+                    "The origin of other web pages that may connect, such as http://localhost:3000")
+        ->type_name("ORIGIN")
+        ->allow_extra_args(false)
+        ->excludes(&others)
+        ->check(check([](const std::string& origin) {
+            return isOrigin(origin) ? ""
+                                    : "\"" + origin +
+                                          "\" is no origin such as "
+                                          "http://localhost:3000";
+        }));
+    command
+        .add_option("--nats-server", options.program,
+                    "The program of the server (default: nats-server, where programs are)")
+        ->type_name("PATH")
+        ->excludes(&others);
+}
+
+CLI::Option& declareOtherServers(CLI::App& command, OtherServers& options) {
+    CLI::Option& servers =
+        *command
+             .add_option("--nats", options.urls,
+                         "Message servers to work for, in place of one of the host's own")
+             ->type_name("URL,...")
+             ->delimiter(',')
+             ->allow_extra_args(false)
+             ->check(check(faultOfServerUrl));
+    const auto declareFile = [&](const std::string& name, std::filesystem::path& file,
+                                 const std::string& description) {
+        return command.add_option(name, file, description)
+            ->type_name("FILE")
+            ->check(untold(CLI::ExistingFile))
+            ->needs(&servers);
+    };
+    declareFile("--creds", options.credentialsFile, "The credentials to show them");
+    declareFile("--nats-token-file", options.tokenFile, "Holds the token to show them");
+    CLI::Option* const user =
+        command.add_option("--nats-user", options.user, "The user to be there")
+            ->type_name("NAME")
+            ->needs(&servers);
+    user->needs(
+        declareFile("--nats-password-file", options.passwordFile, "Holds the password of that user")
+            ->needs(user));
+    declareFile("--tls-ca", options.caFile,
+                "The authorities to trust, in PEM (default: the system's)");
+    CLI::Option* const certificate =
+        declareFile("--tls-cert", options.certificateFile, "The host's own certificate, in PEM");
+    certificate->needs(
+        declareFile("--tls-key", options.keyFile, "Its key, in PEM")->needs(certificate));
+    command
+        .add_option("--group", options.group,
+                    "The group of workers that share the requests (default: " + options.group + ")")
+        ->type_name("NAME")
+        ->needs(&servers);
+    return servers;
+}
+
+void declareWeb(CLI::App& command, WebOptions& options) {
+    CLI::Option* const none = command.add_flag("!--no-web", options.isServed, "Serve no web page");
+    command
+        .add_option("--web", options.folder,
+                    "The folder to serve to browsers (default: a page that reads documents; none "
+                    "with --nats)")
+        ->type_name("DIR")
+        ->check(untold(CLI::ExistingDirectory))
+        ->excludes(none);
+    command
+        .add_option_function<std::string>(
+            "--listen",
+            [&options](const std::string& text) {
+                try {
+                    options.address = ListenAddress::parse(text);
+                } catch (const std::invalid_argument& error) {
+                    throw CLI::ValidationError("--listen", error.what());
+                }
+            },
+            "Where browsers find it (default: 127.0.0.1:8080)")
+        ->type_name("HOST:PORT")
+        ->excludes(none);
+    command
+        .add_option("--web-connections", options.connectionsOfAddress,
+                    "The most connections that one address may have to it (default: no limit of "
+                    "its own, for all who come through one proxy share an address)")
+        ->type_name("COUNT")
+        ->excludes(none);
+}
+
+// The host's own server can let pages of one origin of each host in, the web page's included.
+void requireDistinctHosts(const ServeOptions& options) {
+    std::vector<std::string> origins = options.ownServer.allowedOrigins;
+    if (options.web.isServed) {
+        origins.push_back(options.web.address.origin());
+    }
+    if (const std::string host = commonHost(origins); !host.empty()) {
+        throw CLI::ValidationError("--allow-origin",
+                                   "only one origin of the host " + host +
+                                       " can be let in, that of the web page included");
+    }
+}
+
+// Options of the commands that save documents. `isOn` is what they do without.
+void declareGuard(CLI::App& command, GuardOptions& options) {
+    if (options.isOn) {
+        command.add_flag("!--no-safe-saves", options.isOn,
+                         "Have texts written in place, as the bundle does by itself");
+    } else {
+        command.add_flag("--safe-saves", options.isOn,
+                         "Have no fault of the machine make a save lose a text");
+    }
+    command
+        .add_option("--history", options.folder,
+                    "Where earlier versions of documents are kept (default: the user's folder for "
+                    "states)")
+        ->type_name("DIR");
+    command
+        .add_option("--keep", options.versions,
+                    "The earlier versions to keep of each document (default: " +
+                        std::to_string(options.versions) + ")")
+        ->type_name("N")
+        ->check(untold(CLI::Range(1U, 1'000'000U)));
+    command.add_flag("!--no-history", options.keepsVersions, "Keep no earlier versions");
+}
+
+void declareServe(CLI::App& command, ServeOptions& options) {
+    command
+        .add_option("--root", options.roots,
+                    "A folder that clients may use; may be given several times (default: all)")
+        ->type_name("DIR")
+        ->allow_extra_args(false)
+        ->check(untold(CLI::ExistingDirectory));
+    command.add_flag("!--no-confinement", options.isConfined,
+                     "Go without the kernel's help to keep clients to the folders of --root");
+    declareGuard(command, options.guard);
+    declareWeb(command, options.web);
+    declareOwnServer(command, options.ownServer,
+                     declareOtherServers(command, options.otherServers));
+    command.final_callback([&command, &options] {
+        // A worker among others need not be where browsers go.
+        if (!options.otherServers.urls.empty() && command.count("--web") == 0 &&
+            command.count("--listen") == 0) {
+            options.web.isServed = false;
+        }
+        requireDistinctHosts(options);
+    });
+}
+
+void declareStdio(CLI::App& command, StdioOptions& options) {
+    command
+        .add_option(
+            "--max-message", options.largestMessage,
+            "The largest message to take, in bytes or with a unit such as MB (default: 1 GB)")
+        ->type_name("SIZE")
+        ->transform(untold(CLI::AsSizeValue(false)));
+    declareGuard(command, options.guard);
+}
+
+void declareWrite(CLI::App& command, WriteOptions& options) {
+    command.add_option("FILE", options.file, "The file to write")
+        ->required()
+        ->check(check([](const std::string& file) {
+            return file == "-" ? "\"-\" cannot be written to; a file of that name is ./-" : "";
+        }));
+    declareContentType(command, options.contentType,
+                       "by whether the input is a package's JSON, as read prints it");
+    command
+        .add_option("--encoding", options.encoding,
+                    "The charset in which a text is stored, and without --text comes in (default: "
+                    "UTF-8; with --text that of the file, if there is one)")
+        ->type_name("CHARSET");
+    command.add_flag("--text", options.isUtf8Text,
+                     "Take the input for a text in UTF-8, as read --text prints it");
+    declareGuard(command, options.guard);
+    declareTimeout(command, options.timeout);
+    command.final_callback([&options] {
+        if (options.isUtf8Text && options.contentType == packageContentType) {
+            throw CLI::ExcludesError("--text", "--content-type " + options.contentType);
+        }
+    });
+}
+
+void declareHistory(CLI::App& command, HistoryCommandOptions& options) {
+    command.add_option("FILE", options.file, "The document")->required();
+    command
+        .add_option("--history", options.guard.folder,
+                    "Where the versions are (default: the user's folder for states)")
+        ->type_name("DIR");
+    CLI::Option* const shown =
+        command.add_option("--show", options.shown, "Print a version, as read does")
+            ->type_name("N")
+            ->check(untold(CLI::PositiveNumber));
+    command.add_option("--restore", options.restored, "Save a version as the newest")
+        ->type_name("N")
+        ->check(untold(CLI::PositiveNumber))
+        ->excludes(shown);
+    command
+        .add_option("--content-type", options.contentType,
+                    "The content type to show it as (default: by its content)")
+        ->type_name("TYPE");
+}
+
+// How many characters have to be put in, taken out or replaced to make `to` of `from`.
+std::size_t editDistance(std::string_view from, std::string_view to) {
+    // That from the beginning of `from` up to here, to each beginning of `to`.
+    std::vector<std::size_t> row(to.size() + 1);
+    std::iota(row.begin(), row.end(), std::size_t{0});
+    for (std::size_t i = 0; i < from.size(); ++i) {
+        std::size_t diagonal = std::exchange(row[0], i + 1);
+        for (std::size_t j = 0; j < to.size(); ++j) {
+            const std::size_t replaced = diagonal + (from[i] == to[j] ? 0 : 1);
+            diagonal = row[j + 1];
+            row[j + 1] = std::min({replaced, diagonal + 1, row[j] + 1});
+        }
+    }
+    return row.back();
+}
+
+// The one of `names` that somebody probably meant who wrote `word`.
+std::optional<std::string> nearest(const std::string& word, const std::vector<std::string>& names) {
+    const auto distance = [&word](const std::string& name) { return editDistance(word, name); };
+    const auto best = std::min_element(
+        names.begin(), names.end(),
+        [&](const auto& one, const auto& other) { return distance(one) < distance(other); });
+    const bool isNear = best != names.end() && distance(*best) <= word.size() / 2;
+    return isNear ? std::optional(*best) : std::nullopt;
+}
+
+std::vector<std::string> optionsOf(const CLI::App& app) {
+    std::vector<std::string> names;
+    for (const CLI::Option* option : app.get_options()) {
+        for (const std::string& name : option->get_lnames()) {
+            names.push_back("--" + name);
+        }
+    }
+    return names;
+}
+
+std::string question(const std::optional<std::string>& name) {
+    return name ? "; did you mean \"" + *name + "\"?" : "";
+}
+
+// What is wrong with the word that `app` could not make anything of.
+std::string unknown(const CLI::App& app, const std::string& word) {
+    const std::vector<CLI::App*> commands = app.get_subcommands();
+    if (word.starts_with("-")) {
+        std::vector<std::string> names = optionsOf(app);
+        for (const CLI::App* command : commands) {
+            const std::vector<std::string> more = optionsOf(*command);
+            names.insert(names.end(), more.begin(), more.end());
+        }
+        const std::string name = word.substr(0, word.find('='));
+        return "there is no option \"" + name + "\"" + question(nearest(name, names));
+    }
+    if (commands.empty()) {
+        std::vector<std::string> names;
+        for (const CLI::App* command : app.get_subcommands({})) {
+            names.push_back(command->get_name());
+        }
+        return "there is no command \"" + word + "\"" + question(nearest(word, names));
+    }
+    return "the argument \"" + word + "\" is one too many";
+}
+
+bool isOption(const CLI::App& app, const std::string& argument) {
+    const std::string name = argument.substr(0, argument.find('='));
+    const std::vector<const CLI::App*> commands =
+        app.get_subcommands([](const CLI::App*) { return true; });
+    return app.get_option_no_throw(name) != nullptr ||
+           std::any_of(commands.begin(), commands.end(), [&name](const CLI::App* command) {
+               return command->get_option_no_throw(name) != nullptr;
+           });
+}
+
+}  // namespace
+
+void describe(CLI::App& app, CommandLine& line) {
+    app.formatter(std::make_shared<HelpFormatter>());
+    app.get_formatter()->label("SUBCOMMAND", "COMMAND");
+    app.get_formatter()->label("Subcommands", "Commands");
+    app.get_formatter()->label("Positionals", "Arguments");
+    app.name(programName);
+    app.description(
+        "Reads and writes documents through the document-serialization bundle, and serves it to "
+        "other programs.");
+    app.set_version_flag("--version", std::string(programName) + " " + PROGRAM_VERSION);
+    app.add_option("--bundle", line.bundle,
+                   "The bundle to load (default: the one that belongs to the program)")
+        ->type_name("PATH");
+    app.add_option("--log-level", line.logLevel,
+                   "The least serious messages to tell on standard error: trace, debug, info, "
+                   "warning, error, critical or off (default: " +
+                       line.logLevel + ")")
+        ->type_name("LEVEL")
+        ->check(untold(
+            CLI::IsMember({"trace", "debug", "info", "warning", "error", "critical", "off"})));
+    app.add_option("--memory-limit", line.memoryLimit,
+                   "The most memory to take, in bytes or with a unit such as GB; what needs more "
+                   "fails (default: three quarters of the machine's; 0: no limit)")
+        ->type_name("SIZE")
+        ->transform(untold(CLI::AsSizeValue(false)));
+    app.require_subcommand(1);
+    app.fallthrough();
+    declareRead(*app.add_subcommand("read", "Read files and print the response for each on a line"),
+                line.read);
+    declareHistory(*app.add_subcommand("history",
+                                       "List earlier versions of a document, or show or "
+                                       "restore one"),
+                   line.history);
+    declareServe(*app.add_subcommand("serve", "Serve browsers and other programs, over NATS"),
+                 line.serve);
+    declareStdio(*app.add_subcommand("stdio", "Carry framed messages on standard input and output"),
+                 line.stdio);
+    declareWrite(*app.add_subcommand(
+                     "write", "Write standard input to a file and print the answer, true or false"),
+                 line.write);
+    app.footer(
+        "Exit status: 0 when all was done, 1 when a request failed, 2 when the command line is "
+        "wrong.\n"
+        "COMMAND --help tells the options of a command.");
+}
+
+void parse(CLI::App& app, std::vector<std::string> arguments) {
+    const auto dashes = std::find(arguments.begin(), arguments.end(), "--");
+    for (auto argument = arguments.begin(); argument != arguments.end(); ++argument) {
+        std::error_code isNone;
+        const bool looksLikeOption = argument->size() > 1 && argument->front() == '-';
+        const bool isFile = argument > dashes || (!isOption(app, *argument) &&
+                                                  std::filesystem::exists(*argument, isNone));
+        if (looksLikeOption && argument != dashes && isFile) {
+            argument->insert(0, "./");
+        }
+    }
+    if (dashes != arguments.end()) {
+        arguments.erase(dashes);  // Now that nothing behind it looks like an option.
+    }
+    std::reverse(arguments.begin(), arguments.end());  // as the parser takes them
+    app.parse(std::move(arguments));
+}
+
+std::string complaint(const CLI::App& app, const CLI::ParseError& error) {
+    const std::vector<std::string> notUnderstood = app.remaining(true);
+    std::string text = error.what();
+    if (!notUnderstood.empty()) {
+        text = unknown(app, notUnderstood.front());
+    } else if (app.get_subcommands().empty() && dynamic_cast<const CLI::RequiredError*>(&error)) {
+        text = "a command is missing";
+    }
+    return std::string(programName) + ": " + text + "\nRun with --help for more information.\n";
+}
+
+}  // namespace host

@@ -1,0 +1,46 @@
+// SPDX-License-Identifier: Apache-2.0
+// The program's command line: the one description of its commands and options, from which the
+// parser, the texts of --help and the hints at mistakes are made.
+#pragma once
+
+#include <CLI/CLI.hpp>
+#include <cstdint>
+#include <filesystem>
+#include <string>
+#include <vector>
+
+#include "host/commands/history_command.h"
+#include "host/commands/read_command.h"
+#include "host/commands/serve_command.h"
+#include "host/commands/stdio_command.h"
+#include "host/commands/write_command.h"
+
+namespace host {
+
+inline constexpr const char* programName = "serialization_host";
+
+/// What a command line says.
+struct CommandLine {
+    std::string logLevel = "warning";
+    std::uint64_t memoryLimit = 0;  ///< In bytes; 0: none.
+    std::filesystem::path bundle;   ///< Empty: the one that belongs to the program.
+    HistoryCommandOptions history;
+    ReadOptions read;
+    ServeOptions serve;
+    StdioOptions stdio;
+    WriteOptions write;
+};
+
+/// Declares the program's commands and options in `app`, a parse of which fills in `line`; its
+/// values by then are the defaults. Both have to outlive each other's use.
+void describe(CLI::App& app, CommandLine& line);
+
+/// Has `app` parse `arguments`, those of the program without its own name. One that looks like an
+/// option, but is none and names a file, is taken for that file, since a pattern of the shell may
+/// expand to such names; so is everything behind "--". Throws CLI::ParseError.
+void parse(CLI::App& app, std::vector<std::string> arguments);
+
+/// What to tell somebody whose command line could not be parsed by `app`, in whole lines.
+std::string complaint(const CLI::App& app, const CLI::ParseError& error);
+
+}  // namespace host
