@@ -11,16 +11,39 @@ step() {
 }
 
 # quietly LOG COMMAND...: runs the command with its output in the file LOG of the build folder, and
-# prints that file only when the command fails, which ends the script.
+# prints that file only when the command fails, which ends the script. The command finds the script's
+# standard error as descriptor 3.
 quietly() {
     local log="$root/build/$1.log"
     shift
     mkdir -p "$root/build"
-    if ! "$@" >"$log" 2>&1; then
+    if ! "$@" 3>&2 >"$log" 2>&1; then
         cat "$log" >&2
         step "failed: $*"
         exit 1
     fi
+}
+
+# showing_progress COMMAND...: runs the command and copies its output, in which lines begin with how many
+# steps of how many are done, "[12/345] ". Tells how far it is on the terminal of standard error, or where
+# that is none at each tenth of the way. For use below quietly, which keeps standard error for a log.
+showing_progress() {
+    "$@" 2>&1 | {
+        local line percent told=0
+        while IFS= read -r line; do
+            printf '%s\n' "$line"
+            if [[ $line =~ ^\[([0-9]+)/([0-9]+)\] ]]; then
+                percent=$((100 * BASH_REMATCH[1] / BASH_REMATCH[2]))
+                if [[ -t 3 ]]; then
+                    printf '\r== %s of %s steps' "${BASH_REMATCH[1]}" "${BASH_REMATCH[2]}" >&3
+                    ((percent < 100)) || printf '\n' >&3
+                elif ((percent >= told + 10)); then
+                    told=$((percent - percent % 10))
+                    printf '== %s %% are built\n' "$told" >&3
+                fi
+            fi
+        done
+    }
 }
 
 # as_root COMMAND...: runs the command as root.
@@ -98,7 +121,10 @@ build() {
     # One at a time: two scripts in one build folder would spoil each other's work.
     mkdir -p "$folder"
     exec 9>"$root/build/$name.lock"
-    flock 9
+    if ! flock -n 9; then
+        step "waiting for another build of $name to end"
+        flock 9
+    fi
     if [[ ! -f $folder/build.ninja ]]; then
         step "configuring $name"
         # cmake takes presets from the folder it is started in.
@@ -106,7 +132,8 @@ build() {
     fi
     if [[ $(ninja -C "$folder" -n "${targets[@]}" 2>&1) != *"no work to do"* ]]; then
         step "building $name"
-        quietly "$name-build" cmake --build "$folder" ${targets[@]+--target "${targets[@]}"}
+        NINJA_STATUS='[%f/%t] ' quietly "$name-build" showing_progress \
+            cmake --build "$folder" ${targets[@]+--target "${targets[@]}"}
     fi
     exec 9>&-
 }

@@ -93,15 +93,12 @@ platform::FileDescriptor copyInput(int input) {
 }
 
 // What a text is that begins as other files do; empty when it begins as none of these.
-std::string otherKindOf(std::string_view text, const std::string& path) {
-    if (text.starts_with("PK\3\4")) {
-        return isDocumentPackage(path) ? "a document package"
-                                       : "a zip archive, and no document package";
-    }
-    if (text.starts_with("\xD0\xCF\x11\xE0\xA1\xB1\x1A\xE1")) {
-        return "a document of an older kind, or one with a password";
-    }
-    return text.starts_with("%PDF-") ? "a PDF document" : "";
+std::string otherKindOf(std::string_view text) {
+    return text.starts_with("PK\3\4") ? "a zip archive, as document packages are"
+           : text.starts_with("\xD0\xCF\x11\xE0\xA1\xB1\x1A\xE1")
+               ? "a document of an older kind, or one with a password"
+           : text.starts_with("%PDF-") ? "a PDF document"
+                                       : "";
 }
 
 // `value` with all its strings in valid UTF-8.
@@ -253,12 +250,11 @@ private:
         if (text == nullptr) {
             return "";
         }
-        const std::string path = pathOf(file);
-        if (const std::string kind = otherKindOf(*text, path); !kind.empty()) {
+        if (const std::string kind = otherKindOf(*text); !kind.empty()) {
             spdlog::warn("{} is {}, and was read as a text", file, kind);
         }
         // What cannot be opened reads as an empty text.
-        const std::string reason = text->empty() ? whyNotReadable(path) : "";
+        const std::string reason = text->empty() ? whyNotReadable(pathOf(file)) : "";
         return reason.empty() ? "" : "nothing could be read: " + reason;
     }
 

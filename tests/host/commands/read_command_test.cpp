@@ -255,7 +255,8 @@ TEST_F(ReadCommand, WarnsOfADocumentThatIsReadAsText) {
         EXPECT_EQ(outcome.status, 0);
         return outcome.errors;
     };
-    EXPECT_THAT(warning(package), HasSubstr("file is a document package, and was read as a text"));
+    EXPECT_THAT(warning(package),
+                HasSubstr("file is a zip archive, as document packages are, and was read"));
     EXPECT_THAT(warning("\xD0\xCF\x11\xE0\xA1\xB1\x1A\xE1 and so on"), HasSubstr("older kind"));
     EXPECT_THAT(warning("%PDF-1.7\n"), HasSubstr("PDF"));
     EXPECT_THAT(warning("PK"), IsEmpty());
