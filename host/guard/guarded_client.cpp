@@ -65,6 +65,11 @@ class GuardedClient final : public MessageService {
 public:
     GuardedClient(std::shared_ptr<MessageService> client, Guard guard)
         : client_(std::move(client)), guard_(std::move(guard)) {}
+    GuardedClient(const GuardedClient&) = delete;
+    GuardedClient& operator=(const GuardedClient&) = delete;
+
+    // The code of the bundle's handler goes with the bundle, which owns its client.
+    ~GuardedClient() override { *guard_.read = nullptr; }
 
     futures::Future<std::shared_ptr<Subscription>> subscribe(const std::string& channel,
                                                              MessageHandler handler) override {
