@@ -1,8 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Reads text files: bytes, detected charset, UTF-16, and back to the file's own charset.
 
-#include <fcntl.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -21,12 +19,14 @@
 #include "platform/i18n/detect_charset.h"
 #include "platform/large_pages.h"
 #include "platform/posix/file_descriptor.h"
+#include "platform/posix/open_regular_file.h"
 #include "serialization/reading/result_keys.h"
 #include "serialization/serialization.h"
 
 namespace EditorServices {
 
 using platform::FileDescriptor;
+using platform::OpenedFile;
 using platform::filesystem::exists;
 using platform::filesystem::make_native_access_form_with_cleanup;
 using platform::i18n::codecvt_string_to_ustring;
@@ -76,29 +76,16 @@ std::string cleaned(std::string bytes, const std::string& charset) {
     return bytes;
 }
 
-/// What cannot be opened as such reads as empty, but these errors say nothing of the file: there
-/// was no memory, or another program is just giving up its lease of the file. It may hold a text,
-/// which must not pass for empty.
-bool saysNothingOfTheFile(int error) {
-    return error == ENOMEM || error == EWOULDBLOCK;
-}
-
-/// Opens `path` if there is a regular file; else returns nothing. Looks before it opens, because
-/// opening a device can have effects, and opens without waiting, in case the file has become a pipe
-/// in between or is one of the system's that wait for something to tell.
-/// Throws std::system_error where nothing can be said of the file.
-FileDescriptor openRegularFile(const std::string& path, struct stat& status) {
-    if (::stat(path.c_str(), &status) != 0 || !S_ISREG(status.st_mode)) {
-        return {};
+/// Opens `path` if there is a regular file; what cannot be opened as such reads as empty, so it
+/// returns nothing then. But some errors say nothing of the file: there was no memory, or another
+/// program did not give up its lease of the file. It may hold a text, which must not pass for
+/// empty: throws std::system_error then.
+OpenedFile openText(const std::string& path) {
+    OpenedFile opened = platform::openRegularFile(path);
+    if (opened.error == ENOMEM || opened.error == EWOULDBLOCK) {
+        throw std::system_error(opened.error, std::generic_category(), "The file cannot be opened");
     }
-    FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
-    if (!file && saysNothingOfTheFile(errno)) {
-        throw std::system_error(errno, std::generic_category(), "The file cannot be opened");
-    }
-    if (!file || ::fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode)) {
-        return {};
-    }
-    return file;
+    return opened;
 }
 
 /// Everything that `file` still holds, which is probably `expectedSize` bytes.
@@ -170,15 +157,14 @@ std::u16string Serialization::readTextFile(std::u16string path, std::string& cha
 
 std::string Serialization::readFileBytes(std::u16string path) const {
     const std::string nativePath = make_native_access_form_with_cleanup(path);
-    struct stat status = {};
-    const FileDescriptor file = openRegularFile(nativePath, status);
-    if (!file) {
+    const OpenedFile opened = openText(nativePath);
+    if (!opened.descriptor) {
         return {};
     }
     // Before memory is taken for a file that no text is made of.
-    const auto size = static_cast<std::size_t>(status.st_size);
+    const auto size = static_cast<std::size_t>(opened.status.st_size);
     requireTextLength(size);
-    return readToEnd(file, size);
+    return readToEnd(opened.descriptor, size);
 }
 
 }  // namespace EditorServices

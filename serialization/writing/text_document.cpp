@@ -17,6 +17,7 @@
 #include "platform/filesystem/filesystem.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/posix/file_descriptor.h"
+#include "platform/posix/open_regular_file.h"
 #include "serialization/serialization.h"
 
 namespace EditorServices {
@@ -34,14 +35,14 @@ bool isPipe(const struct stat& status) {
 }
 
 /// Opens the file at `path`, which is truncated, or made. A pipe is not opened, for nobody might
-/// ever read it; in case the file becomes one just now, this does not wait either.
+/// ever read it; in case the file becomes one just now, this does not wait either. Another
+/// program's lease of the file is waited for.
 FileDescriptor openForWriting(const std::string& path) {
     struct stat status = {};
     if (::stat(path.c_str(), &status) == 0 && isPipe(status)) {
         return {};
     }
-    FileDescriptor file(::open(
-        path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NONBLOCK | O_NOCTTY, 0666));
+    FileDescriptor file = platform::openWithoutHanging(path, O_WRONLY | O_CREAT | O_TRUNC, 0666);
     if (file && ::fstat(file.get(), &status) == 0 && isPipe(status)) {
         return {};
     }
