@@ -168,9 +168,10 @@ TEST_F(ReadCommand, AsksForAPackageWhereThereIsOne) {
     EXPECT_FALSE(json::parse(lines[0]).contains("data"));
 }
 
-TEST_F(ReadCommand, AsksForTextWhereThereIsNoPackage) {
-    const std::string archive = test::zipArchive({"part.xml"});
-    EXPECT_EQ(read({makeFile("archive", archive)}).output, successOf(archive) + "\n");
+TEST_F(ReadCommand, SaysThatAnotherArchiveIsNoPackage) {
+    const Outcome outcome = read({makeFile("archive", test::zipArchive({"part.xml"}))});
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_THAT(outcome.output, HasSubstr("is not a document package"));
 }
 
 TEST_F(ReadCommand, AsksForTheContentTypeThatItIsGiven) {
