@@ -14,8 +14,8 @@
 namespace platform::package {
 namespace {
 
-constexpr std::string_view kRelationshipsExtension = "rels";
-constexpr std::string_view kXmlMediaType = "application/xml";
+constexpr std::string_view relationshipsExtension = "rels";
+constexpr std::string_view xmlMediaType = "application/xml";
 
 // Enters a type under `key`. Saying the same twice does no harm, saying two things is refused.
 // Media types mean the same in any case.
@@ -84,8 +84,8 @@ std::map<std::string, std::string> ContentTypesBuilder::defaults() const {
     std::map<std::string, std::string> result;
     for (const Named& part : parts_) {
         const bool isXml = part.extension == "xml";
-        if (!canHaveDefault(part.extension) || part.extension == kRelationshipsExtension ||
-            (isXml && part.mediaType != kXmlMediaType)) {
+        if (!canHaveDefault(part.extension) || part.extension == relationshipsExtension ||
+            (isXml && part.mediaType != xmlMediaType)) {
             continue;
         }
         const auto [current, isNew] = result.try_emplace(part.extension, part.mediaType);
@@ -95,7 +95,7 @@ std::map<std::string, std::string> ContentTypesBuilder::defaults() const {
         }
     }
     if (hasRelationships_) {
-        result.emplace(kRelationshipsExtension, kRelationshipsMediaType);
+        result.emplace(relationshipsExtension, relationshipsMediaType);
     }
     return result;
 }

@@ -9,8 +9,8 @@
 namespace platform::package {
 namespace {
 
-constexpr std::string_view kRelationshipsFolder = "_rels";
-constexpr std::string_view kRelationshipsExtension = ".rels";
+constexpr std::string_view relationshipsFolder = "_rels";
+constexpr std::string_view relationshipsExtension = ".rels";
 
 constexpr char lowered(char c) {
     return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
@@ -151,21 +151,21 @@ std::string extensionOf(std::string_view name) {
 std::optional<std::string> relationshipsSource(std::string_view name) {
     const std::string_view file = lastSegment(name);
     const std::string_view folder = name.substr(0, name.size() - file.size());
-    if (!endsWithIgnoringCase(file, kRelationshipsExtension) ||
+    if (!endsWithIgnoringCase(file, relationshipsExtension) ||
         !endsWithIgnoringCase(folder, "/_rels/")) {
         return std::nullopt;
     }
-    return std::string(folder.substr(0, folder.size() - kRelationshipsFolder.size() - 1))
-        .append(file.substr(0, file.size() - kRelationshipsExtension.size()));
+    return std::string(folder.substr(0, folder.size() - relationshipsFolder.size() - 1))
+        .append(file.substr(0, file.size() - relationshipsExtension.size()));
 }
 
 std::string relationshipsPartName(std::string_view source) {
     const std::string_view file = lastSegment(source);
     return std::string(source.substr(0, source.size() - file.size()))
-        .append(kRelationshipsFolder)
+        .append(relationshipsFolder)
         .append("/")
         .append(file)
-        .append(kRelationshipsExtension);
+        .append(relationshipsExtension);
 }
 
 std::optional<Piece> pieceNamed(std::string_view name) {

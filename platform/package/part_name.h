@@ -11,10 +11,10 @@
 namespace platform::package {
 
 /// The part that says which content type each part has.
-constexpr std::string_view kContentTypesName = "/[Content_Types].xml";
+constexpr std::string_view contentTypesName = "/[Content_Types].xml";
 
 /// The source of package-level relationships, which is the package and not a part.
-constexpr std::string_view kPackageRoot = "/";
+constexpr std::string_view packageRoot = "/";
 
 /// `text` with its ASCII letters in lower case.
 std::string toLowerAscii(std::string_view text);
@@ -32,7 +32,7 @@ std::string_view partNameProblem(std::string_view name);
 std::string extensionOf(std::string_view name);
 
 /// The source of the relationships that a part named `name` holds ("/word/_rels/document.xml.rels"
-/// holds those of "/word/document.xml", "/_rels/.rels" those of kPackageRoot), or nothing if `name`
+/// holds those of "/word/document.xml", "/_rels/.rels" those of packageRoot), or nothing if `name`
 /// is not the name of a relationships part.
 std::optional<std::string> relationshipsSource(std::string_view name);
 

@@ -16,11 +16,11 @@
 #include "platform/i18n/codecvt.h"
 #include "platform/package/about.h"
 #include "platform/package/content_types.h"
-#include "platform/package/limits.h"
 #include "platform/package/package_xml.h"
 #include "platform/package/part_name.h"
 #include "platform/package/relationships.h"
-#include "platform/package/zip/zip_archive.h"
+#include "platform/package/zip/archive.h"
+#include "platform/package/zip/limits.h"
 
 namespace platform::package {
 namespace {
@@ -32,7 +32,7 @@ using Relationship = QuilletFilePackage::Relationship;
 struct Fragment {
     std::uint64_t number;
     bool isLast;
-    const ZipArchive::Entry* entry;
+    const zip::Archive::Entry* entry;
 };
 
 // What the archive holds under one part name.
@@ -42,7 +42,7 @@ struct Item {
 };
 
 // Entry names have no slash before them, but some producers write one, or backslashes for slashes.
-std::string partNameOf(const ZipArchive::Entry& entry) {
+std::string partNameOf(const zip::Archive::Entry& entry) {
     std::string name = entry.name;
     std::replace(name.begin(), name.end(), '\\', '/');
     return name.starts_with('/') ? name : "/" + name;
@@ -71,7 +71,7 @@ std::vector<Fragment> orderedFragments(const Item& item) {
 class PackageFile {
 public:
     explicit PackageFile(const std::string& path) : archive_(path) {
-        for (const ZipArchive::Entry& entry : archive_.entries()) {
+        for (const zip::Archive::Entry& entry : archive_.entries()) {
             const std::string name = partNameOf(entry);
             if (!name.ends_with('/') && !isTrash(name)) {
                 add(name, entry);
@@ -80,7 +80,7 @@ public:
     }
 
     QuilletFilePackage read() {
-        const Item* typesItem = find(kContentTypesName);
+        const Item* typesItem = find(contentTypesName);
         if (typesItem == nullptr) {
             throw std::runtime_error("is not a document package: it has no [Content_Types].xml");
         }
@@ -94,12 +94,12 @@ public:
                 parts.push_back(readPart(item, *mediaType));
             }
         }
-        std::vector<Relationship> relationships = readRelationships(kPackageRoot);
+        std::vector<Relationship> relationships = readRelationships(packageRoot);
         return {parts, relationships};
     }
 
 private:
-    void add(const std::string& name, const ZipArchive::Entry& entry) {
+    void add(const std::string& name, const zip::Archive::Entry& entry) {
         const Piece fragment = pieceNamed(name).value_or(Piece{name, 0, true});
         const auto [place, isNew] =
             byKey_.try_emplace(partNameKey(fragment.partName), items_.size());
@@ -139,7 +139,7 @@ private:
                 throw std::runtime_error("is not a valid part name: " + std::string(problem));
             }
             Part part;
-            part.content = contentOf(item, limits::kMaxPartBytes);
+            part.content = contentOf(item, zip::maxEntryBytes);
             part.contentType = i18n::to_ustring(mediaType);
             part.partUri = i18n::to_ustring(item.name);
             part.relationships = readRelationships(item.name);
@@ -157,7 +157,7 @@ private:
                      [&] { return parseRelationships(contentOf(*item, maxPackageXmlBytes)); });
     }
 
-    ZipArchive archive_;
+    zip::Archive archive_;
     std::vector<Item> items_;  // in the archive's order
     std::unordered_map<std::string, std::size_t> byKey_;
 };

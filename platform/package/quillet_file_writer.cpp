@@ -16,11 +16,12 @@
 #include "platform/i18n/codecvt.h"
 #include "platform/package/about.h"
 #include "platform/package/content_types.h"
-#include "platform/package/limits.h"
 #include "platform/package/package_xml.h"
 #include "platform/package/part_name.h"
 #include "platform/package/relationships.h"
-#include "platform/package/zip/zip_writer.h"
+#include "platform/package/zip/limits.h"
+#include "platform/package/zip/reusable_entries.h"
+#include "platform/package/zip/writer.h"
 #include "platform/posix/atomic_file.h"
 
 namespace platform::package {
@@ -29,22 +30,22 @@ namespace {
 using Part = QuilletFilePackage::Part;
 using Relationship = QuilletFilePackage::Relationship;
 
-constexpr std::u16string_view kCorePropertiesName = u"/docProps/core.xml";
-constexpr std::u16string_view kCorePropertiesMediaType =
+constexpr std::u16string_view corePropertiesName = u"/docProps/core.xml";
+constexpr std::u16string_view corePropertiesMediaType =
     u"application/vnd.openxmlformats-package.core-properties+xml";
-constexpr std::u16string_view kCorePropertiesRelationship =
+constexpr std::u16string_view corePropertiesRelationship =
     u"http://schemas.openxmlformats.org/package/2006/relationships/metadata/core-properties";
 
 // Media types whose content is compressed already.
-constexpr std::array<std::string_view, 13> kCompressedTypes = {
+constexpr std::array<std::string_view, 13> compressedTypes = {
     "image/png",  "image/jpeg",      "image/jpg",       "image/gif", "image/webp",
     "image/avif", "image/heic",      "audio/mpeg",      "audio/mp4", "audio/ogg",
     "video/mp4",  "application/zip", "application/gzip"};
 
 bool isCompressed(std::string_view mediaType) {
     const std::string withoutParameters = toLowerAscii(mediaType.substr(0, mediaType.find(';')));
-    return std::find(kCompressedTypes.begin(), kCompressedTypes.end(), withoutParameters) !=
-           kCompressedTypes.end();
+    return std::find(compressedTypes.begin(), compressedTypes.end(), withoutParameters) !=
+           compressedTypes.end();
 }
 
 std::string withLowerCaseTopLevel(const std::string& mediaType) {
@@ -57,7 +58,7 @@ std::string_view nameProblem(std::string_view name) {
     if (const std::string_view problem = partNameProblem(name); !problem.empty()) {
         return problem;
     }
-    if (partNameKey(name) == partNameKey(kContentTypesName)) {
+    if (partNameKey(name) == partNameKey(contentTypesName)) {
         return "it is reserved for the content types";
     }
     if (relationshipsSource(name)) {
@@ -80,8 +81,8 @@ Part corePropertiesPart(const std::string& creator, const std::string& title) {
     xml.append("</dc:title></cp:coreProperties>");
     Part part;
     part.content.assign(xml.begin(), xml.end());
-    part.contentType = kCorePropertiesMediaType;
-    part.partUri = kCorePropertiesName;
+    part.contentType = corePropertiesMediaType;
+    part.partUri = corePropertiesName;
     return part;
 }
 
@@ -102,7 +103,7 @@ public:
                                [&](const Relationship& r) { return r.relationshipId == id; });
         };
         for (const Relationship& relationship : relationships_) {
-            if (relationship.relationshipType == kCorePropertiesRelationship) {
+            if (relationship.relationshipType == corePropertiesRelationship) {
                 throw std::runtime_error("has core properties already");
             }
         }
@@ -112,21 +113,22 @@ public:
         while (hasId(id)) {
             id += u'_';
         }
-        relationships_.push_back({std::u16string(kCorePropertiesRelationship),
-                                  std::u16string(kCorePropertiesName), id, 1});
+        relationships_.push_back({std::u16string(corePropertiesRelationship),
+                                  std::u16string(corePropertiesName), id, 1});
     }
 
-    void write(AtomicFile& file) {
-        ZipWriter zip(file);
-        addXml(zip, kContentTypesName, contentTypes());
-        addRelationships(zip, kPackageRoot, relationships_);
+    // Takes over what it can of `previous`.
+    void write(AtomicFile& file, zip::ReusableEntries& previous) {
+        zip::Writer archive(file, previous);
+        addXml(archive, contentTypesName, contentTypes());
+        addRelationships(archive, packageRoot, relationships_);
         for (const Item& item : items_) {
             about("part " + quoted(item.name), [&] {
-                addEntry(zip, item.name, item.part->content, !isCompressed(item.mediaType));
-                addRelationships(zip, item.name, item.part->relationships);
+                addEntry(archive, item.name, item.part->content, !isCompressed(item.mediaType));
+                addRelationships(archive, item.name, item.part->relationships);
             });
         }
-        zip.finish();
+        archive.finish();
     }
 
 private:
@@ -168,7 +170,7 @@ private:
         return builder.xml();
     }
 
-    void addRelationships(ZipWriter& zip, std::string_view source,
+    void addRelationships(zip::Writer& archive, std::string_view source,
                           const std::vector<Relationship>& relationships) {
         if (relationships.empty()) {
             return;
@@ -177,19 +179,20 @@ private:
             const std::optional<std::string> key = targetPartKey(source, target);
             return relationship.targetMode == 0 || !key || !keys_.contains(*key);
         };
-        addXml(zip, relationshipsPartName(source), relationshipsXml(relationships, isExternal));
+        addXml(archive, relationshipsPartName(source), relationshipsXml(relationships, isExternal));
     }
 
-    static void addXml(ZipWriter& zip, std::string_view name, const std::string& xml) {
+    static void addXml(zip::Writer& archive, std::string_view name, const std::string& xml) {
         if (xml.size() > maxPackageXmlBytes) {
             throw std::runtime_error("has too many parts or relationships");
         }
-        addEntry(zip, name, {reinterpret_cast<const std::uint8_t*>(xml.data()), xml.size()}, true);
+        addEntry(archive, name, {reinterpret_cast<const std::uint8_t*>(xml.data()), xml.size()},
+                 true);
     }
 
-    static void addEntry(ZipWriter& zip, std::string_view name,
+    static void addEntry(zip::Writer& archive, std::string_view name,
                          std::span<const std::uint8_t> content, bool mayDeflate) {
-        zip.add(name.substr(1), content, mayDeflate);
+        archive.add(name.substr(1), content, mayDeflate);
     }
 
     // For names that are no valid text, which an error has to show all the same.
@@ -218,7 +221,8 @@ void QuilletFileWriter::write(const QuilletFilePackage& package) {
             writer.addCoreProperties(i18n::to_string(creator), i18n::to_string(title));
         }
         auto file = std::make_unique<AtomicFile>(path);
-        writer.write(*file);
+        zip::ReusableEntries previous(path);
+        writer.write(*file, previous);
         file_ = std::move(file);
     });
 }

@@ -29,9 +29,11 @@ public:
     /// Drops what was written and not closed.
     ~QuilletFileWriter();
 
-    /// Writes `package` beside the target, in place of what an earlier call wrote. Equal packages
-    /// give equal bytes: the content types, the package's relationships, then the parts in their
-    /// order, each followed by its relationships.
+    /// Writes `package` beside the target, in place of what an earlier call wrote: the content
+    /// types, the package's relationships, then the parts in their order, each followed by its
+    /// relationships. Equal packages give equal bytes if both are written to new files or over
+    /// equal ones: where the target has an entry of the same name and content, the deflated bytes
+    /// of that are taken over, whoever wrote them.
     ///
     /// A relationship becomes external if its flag is 0 and also if its target can be no part of
     /// the package: an absolute URI, or a reference that leads to none of its parts. The top-level
@@ -40,9 +42,9 @@ public:
     /// Throws std::runtime_error, beginning with the path and naming the part, when the package is
     /// one that could not be read back (an invalid or reserved part name, two that are equal but
     /// for case or escapes, no content type, a relationship without id or type, two of one id, text
-    /// that XML or UTF-8 cannot hold, more than limits.h allows), when it has core properties and
-    /// others are given, and when the target may not be written or the file system refuses. Time in
-    /// proportion to the content; memory for the largest part once more.
+    /// that XML or UTF-8 cannot hold, more than zip/limits.h allows), when it has core properties
+    /// and others are given, and when the target may not be written or the file system refuses.
+    /// Time in proportion to the content; memory for the largest part once or twice more.
     void write(const QuilletFilePackage& package);
 
     /// Ends the writing: puts what was written in the place of the target, safe on disk when it

@@ -13,7 +13,7 @@
 
 namespace platform::package {
 
-constexpr std::string_view kRelationshipsMediaType =
+constexpr std::string_view relationshipsMediaType =
     "application/vnd.openxmlformats-package.relationships+xml";
 
 /// Reads a relationships part. Targets are kept as they stand. Throws std::runtime_error saying

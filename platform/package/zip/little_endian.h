@@ -7,7 +7,7 @@
 #include <span>
 #include <string>
 
-namespace platform::package {
+namespace platform::package::zip {
 
 /// The number of `count` bytes at `offset`, which lie within `bytes`.
 inline std::uint64_t readNumber(std::span<const std::uint8_t> bytes, std::size_t offset,
@@ -41,4 +41,4 @@ inline void append32(std::string& bytes, std::uint32_t value) {
     append16(bytes, static_cast<std::uint16_t>(value >> 16U));
 }
 
-}  // namespace platform::package
+}  // namespace platform::package::zip

@@ -8,7 +8,7 @@
 namespace platform::package {
 namespace {
 
-constexpr std::string_view kStart =
+constexpr std::string_view documentStart =
     "<?xml version=\"1.0\" encoding=\"UTF-8\" standalone=\"yes\"?>\n"
     "<Types xmlns=\"http://schemas.openxmlformats.org/package/2006/content-types\">";
 
@@ -22,9 +22,9 @@ std::string built(const std::vector<std::pair<std::string, std::string>>& parts,
         builder.addRelationships();
     }
     const std::string xml = builder.xml();
-    EXPECT_TRUE(xml.starts_with(kStart)) << xml;
+    EXPECT_TRUE(xml.starts_with(documentStart)) << xml;
     EXPECT_TRUE(xml.ends_with("</Types>")) << xml;
-    const std::string body = xml.substr(kStart.size());
+    const std::string body = xml.substr(documentStart.size());
     return body.substr(0, body.size() - 8);
 }
 

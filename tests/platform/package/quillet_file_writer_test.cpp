@@ -21,19 +21,18 @@
 #include <sstream>
 #include <stdexcept>
 
-#include "platform/package/limits.h"
 #include "platform/package/quillet_file_reader.h"
-#include "platform/package/zip/zip_archive.h"
+#include "platform/package/zip/archive.h"
+#include "platform/package/zip/limits.h"
 #include "tests/platform/package/package_test_support.h"
 #include "tests/support/source_root.h"
 
 namespace testing_package {
 namespace {
 
-namespace limits = platform::package::limits;
+namespace zip = platform::package::zip;
 using platform::package::QuilletFileReader;
 using platform::package::QuilletFileWriter;
-using platform::package::ZipArchive;
 using testing::AllOf;
 using testing::ElementsAre;
 using testing::HasSubstr;
@@ -106,8 +105,8 @@ protected:
 
     // What the archive holds under `entry`.
     std::string entryOf(const std::string& file, const std::string& name) {
-        ZipArchive archive(pathOf(file).string());
-        for (const ZipArchive::Entry& entry : archive.entries()) {
+        zip::Archive archive(pathOf(file).string());
+        for (const zip::Archive::Entry& entry : archive.entries()) {
             if (entry.name == name) {
                 std::vector<std::uint8_t> out(entry.size);
                 archive.read(entry, out);
@@ -263,7 +262,7 @@ TEST_F(QuilletFileWriterTest, OrdersTheArchiveTheSameWayAlways) {
              {part(u"/b.txt", "b", u"text/plain", {{u"t", u"a.txt", u"r", 1}}), part(u"/a.txt")},
              {{u"t", u"a.txt", u"r", 1}}));
     std::vector<std::string> names;
-    const ZipArchive archive(pathOf("a.docx").string());
+    const zip::Archive archive(pathOf("a.docx").string());
     for (const auto& entry : archive.entries()) {
         names.push_back(entry.name);
     }
@@ -277,6 +276,66 @@ TEST_F(QuilletFileWriterTest, WritesEqualBytesForEqualPackages) {
     save(folder_.at("a.docx"), package);
     save(folder_.at("b.docx"), package);
     EXPECT_EQ(folder_.bytesOf("a.docx"), folder_.bytesOf("b.docx"));
+}
+
+TEST_F(QuilletFileWriterTest, TakesOverWhatThePreviousArchiveHasOfTheSameContent) {
+    std::string text;
+    for (int i = 0; i < 1000; ++i) {
+        text += std::to_string(i * i) + " ";
+    }
+    const std::string byAnother = deflate(text, 1);
+    save(folder_.at("new.docx"), packageOf({part(u"/a.txt", text)}));
+    ASSERT_THAT(folder_.bytesOf("new.docx"), Not(HasSubstr(byAnother)));
+
+    ZipEntry same{"a.txt", byAnother};
+    same.method = 8;
+    same.size = text.size();
+    same.checksum = checksum(text);
+    ZipEntry changed = same;
+    changed.name = "b.txt";
+    folder_.file("a.docx", usualPackage({same, changed}));
+    save(folder_.at("a.docx"),
+         packageOf({part(u"/a.txt", text), part(u"/b.txt", text + "changed")}));
+    EXPECT_THAT(folder_.bytesOf("a.docx"), HasSubstr("a.txt" + byAnother));
+    EXPECT_THAT(folder_.bytesOf("a.docx"), Not(HasSubstr("b.txt" + byAnother)));
+    EXPECT_EQ(entryOf("a.docx", "a.txt"), text);
+    EXPECT_EQ(entryOf("a.docx", "b.txt"), text + "changed");
+}
+
+TEST_F(QuilletFileWriterTest, WritesEqualBytesForEqualPackagesOverEqualArchives) {
+    const QuilletFilePackage package = packageOf(
+        {part(u"/a.txt", std::string(5000, 'a') + "b"), part(u"/c.txt", std::string(50, 'c'))});
+    const std::string previous = usualPackage({{"c.txt", std::string(50, 'c'), true}});
+    folder_.file("a.docx", previous);
+    folder_.file("b.docx", previous);
+    save(folder_.at("a.docx"), package);
+    save(folder_.at("b.docx"), package);
+    EXPECT_EQ(folder_.bytesOf("a.docx"), folder_.bytesOf("b.docx"));
+    save(folder_.at("a.docx"), package);
+    EXPECT_EQ(folder_.bytesOf("a.docx"), folder_.bytesOf("b.docx"));
+}
+
+TEST_F(QuilletFileWriterTest, WritesWhatItIsGivenOverAnyDamagedArchive) {
+    std::mt19937 random(3);
+    const QuilletFilePackage package =
+        packageOf({part(u"/a.txt", std::string(3000, 'a') + "b"),
+                   part(u"/c.txt", std::string(2000, 'c') + "d"),
+                   part(u"/d.png", std::string(1000, 'e') + "f", u"image/png")});
+    save(folder_.at("whole.docx"), package);
+    const std::string whole = folder_.bytesOf("whole.docx");
+    for (int run = 0; run < 150; ++run) {
+        std::string damaged = whole;
+        for (int i = 0; i < 3; ++i) {
+            damaged[random() % damaged.size()] = static_cast<char>(random());
+        }
+        damaged.resize(damaged.size() - (run % 5 == 0 ? random() % damaged.size() : 0));
+        folder_.file("a.docx", damaged);
+        const QuilletFilePackage read = saveAndRead(package);
+        ASSERT_EQ(read.parts().size(), package.parts().size());
+        for (std::size_t i = 0; i < read.parts().size(); ++i) {
+            ASSERT_EQ(read.parts()[i].content, package.parts()[i].content);
+        }
+    }
 }
 
 TEST_F(QuilletFileWriterTest, StoresTheTopLevelTypeInLowerCase) {
@@ -369,12 +428,12 @@ TEST_F(QuilletFileWriterTest, RefusesRelationshipsThatCouldNotBeReadBack) {
 
 TEST_F(QuilletFileWriterTest, RefusesMoreThanReadersAccept) {
     std::vector<Part> parts;
-    for (std::size_t i = 0; i < limits::kMaxEntries; ++i) {
+    for (std::size_t i = 0; i < zip::maxEntries; ++i) {
         parts.push_back({{}, u"a/b", numbered(u"/", i), {}});
     }
     expectRefused(packageOf(parts), "has one part too many");
     parts.pop_back();
-    EXPECT_EQ(saveAndRead(packageOf(parts)).parts().size(), limits::kMaxEntries - 1);
+    EXPECT_EQ(saveAndRead(packageOf(parts)).parts().size(), zip::maxEntries - 1);
 }
 
 TEST_F(QuilletFileWriterTest, WritesCreatorAndTitleIntoTheCoreProperties) {
@@ -428,7 +487,7 @@ TEST_F(QuilletFileWriterTest, StoresWhatDoesNotGetSmaller) {
                     part(u"/pic.jpg", text, u"image/jpeg"),
                     part(u"/vector.svg", text, u"image/svg+xml"),
                     part(u"/blank.txt", std::string(1'000'000, ' '))}));
-    const ZipArchive archive(pathOf("a.docx").string());
+    const zip::Archive archive(pathOf("a.docx").string());
     const auto methodOf = [&](const std::string& name) {
         for (const auto& entry : archive.entries()) {
             if (entry.name == name) {

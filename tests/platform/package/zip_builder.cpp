@@ -17,7 +17,7 @@ std::string littleEndian(std::uint64_t value, int count) {
     return bytes;
 }
 
-constexpr std::uint64_t kAllOnes = 0xFFFFFFFF;
+constexpr std::uint64_t allOnes = 0xFFFFFFFF;
 
 struct Header {
     std::uint16_t flags;
@@ -52,7 +52,7 @@ std::string directoryEntry(const ZipEntry& entry, Header header, std::uint64_t o
     if (entry.isZip64) {
         extra += bytes16(1) + bytes16(24) + bytes64(header.size) + bytes64(header.compressedSize) +
                  bytes64(offset);
-        header.size = header.compressedSize = offset = kAllOnes;
+        header.size = header.compressedSize = offset = allOnes;
     }
     return "PK\1\2" + bytes16(20) + bytes16(20) + middle(header) + bytes16(entry.name.size()) +
            bytes16(extra.size()) + bytes16(0) + bytes16(0) + bytes16(0) + bytes32(0) +
@@ -73,8 +73,8 @@ std::string bytes64(std::uint64_t value) {
     return littleEndian(value, 8);
 }
 
-std::string deflate(const std::string& data) {
-    libdeflate_compressor* compressor = libdeflate_alloc_compressor(9);
+std::string deflate(const std::string& data, int level) {
+    libdeflate_compressor* compressor = libdeflate_alloc_compressor(level);
     std::string deflated(libdeflate_deflate_compress_bound(compressor, data.size()), '\0');
     deflated.resize(libdeflate_deflate_compress(compressor, data.data(), data.size(),
                                                 deflated.data(), deflated.size()));
@@ -113,7 +113,7 @@ std::string buildZip(const std::vector<ZipEntry>& entries, const ZipOptions& opt
                    bytes64(count) + bytes64(count) + bytes64(size) + bytes64(offset);
         archive += "PK\6\7" + bytes32(0) + bytes64(end) + bytes32(1);
         archive += "PK\5\6" + bytes16(0) + bytes16(0) + bytes16(0xFFFF) + bytes16(0xFFFF) +
-                   bytes32(kAllOnes) + bytes32(kAllOnes);
+                   bytes32(allOnes) + bytes32(allOnes);
     } else {
         archive += "PK\5\6" + bytes16(options.disk) + bytes16(options.disk) + bytes16(count) +
                    bytes16(count) + bytes32(size) + bytes32(offset);

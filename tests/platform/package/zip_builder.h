@@ -45,8 +45,8 @@ struct ZipOptions {
 
 std::string buildZip(const std::vector<ZipEntry>& entries, const ZipOptions& options = {});
 
-/// `data` as a raw deflate stream.
-std::string deflate(const std::string& data);
+/// `data` as a raw deflate stream, made at `level` of libdeflate's.
+std::string deflate(const std::string& data, int level = 9);
 
 /// The CRC-32 of `data`.
 std::uint32_t checksum(const std::string& data);

@@ -11,13 +11,13 @@
 
 #include "json/parser.h"
 #include "json/serialize.h"
-#include "platform/package/zip/zip_archive.h"
+#include "platform/package/zip/archive.h"
 #include "tests/serialization/activator/elf_file.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
 
-using platform::package::ZipArchive;
+namespace zip = platform::package::zip;
 using testing::Contains;
 using testing::Each;
 using testing::ElementsAre;
@@ -62,14 +62,14 @@ class ManifestArchive : public testing::Test {
 protected:
     std::vector<std::string> entries() const {
         std::vector<std::string> names;
-        for (const ZipArchive::Entry& entry : archive_.entries()) {
+        for (const zip::Archive::Entry& entry : archive_.entries()) {
             names.push_back(entry.name);
         }
         return names;
     }
 
     std::string manifest() {
-        const ZipArchive::Entry& entry = archive_.entries().at(1);
+        const zip::Archive::Entry& entry = archive_.entries().at(1);
         std::vector<std::uint8_t> bytes(entry.size);
         archive_.read(entry, bytes);
         return {bytes.begin(), bytes.end()};
@@ -84,7 +84,7 @@ private:
     }
 
     const test::TemporaryDirectory folder_;
-    ZipArchive archive_{extracted()};
+    zip::Archive archive_{extracted()};
 };
 
 TEST_F(ManifestArchive, HoldsTheFolderAndTheManifest) {

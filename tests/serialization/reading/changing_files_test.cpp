@@ -5,18 +5,19 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <malloc.h>
-#include <signal.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <atomic>
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <filesystem>
 #include <functional>
 #include <iterator>
+#include <optional>
 #include <stdexcept>
 #include <string>
 #include <system_error>
@@ -26,6 +27,7 @@
 #include "json/serialize.h"
 #include "platform/i18n/codecvt.h"
 #include "serialization/serialization.h"
+#include "tests/support/lease_holder.h"
 #include "tests/support/system_call_supervisor.h"
 #include "tests/support/temporary_directory.h"
 
@@ -284,20 +286,42 @@ TEST_F(FilesThatChange, LeaveNothingWhenTheirFolderIsDeletedDuringASave) {
     EXPECT_FALSE(std::filesystem::exists(folder.path()));
 }
 
-TEST_F(FilesThatChange, AreNotReadWhenAnotherProgramGivesUpItsLease) {
+// While another program has a lease of the file, which it gives up shortly after it is asked to.
+class FilesUnderALease : public FilesThatChange {
+protected:
+    bool takeLease() {
+        holder_.emplace(path, std::chrono::milliseconds(50));
+        return holder_->hasLease();
+    }
+
+    std::optional<test::LeaseHolder> holder_;
+};
+
+TEST_F(FilesUnderALease, AreReadWhenItIsGivenUp) {
     test::writeFile(path, "text");
-    const int holder = ::open(path.c_str(), O_RDWR | O_CLOEXEC);
-    ASSERT_GE(holder, 0);
-    // The kernel asks for the lease by a signal, of which this process wants nothing.
-    ::signal(SIGIO, SIG_IGN);
-    if (::fcntl(holder, F_SETLEASE, F_WRLCK) != 0) {
-        ::close(holder);
+    if (!takeLease()) {
         GTEST_SKIP() << "this file system has no leases";
     }
-    const std::string answer = json::serialize(json::Value(service.readTextDocument(name)));
-    ::close(holder);
-    EXPECT_THAT(answer, testing::HasSubstr("The file cannot be opened"));
     EXPECT_EQ(json::serialize(json::Value(service.readTextDocument(name))), successOf("text"));
+}
+
+TEST_F(FilesUnderALease, AreWrittenWhenItIsGivenUp) {
+    test::writeFile(path, "old");
+    if (!takeLease()) {
+        GTEST_SKIP() << "this file system has no leases";
+    }
+    EXPECT_TRUE(service.writeTextDocument(name, "new", "UTF-8"));
+    EXPECT_EQ(test::readFile(path), "new");
+}
+
+TEST_F(FilesUnderALease, AreReadAsPackagesWhenItIsGivenUp) {
+    ASSERT_TRUE(service.writePackageDocument(
+        name, {{"parts", json::Array()}, {"relationships", json::Array()}}));
+    if (!takeLease()) {
+        GTEST_SKIP() << "this file system has no leases";
+    }
+    EXPECT_EQ(json::serialize(json::Value(service.readPackageDocument(name))),
+              R"({"parts":[],"relationships":[],"status":true})");
 }
 
 }  // namespace

@@ -7,32 +7,32 @@
 #include <cstddef>
 #include <cstdint>
 
-namespace platform::package::limits {
+namespace platform::package::zip {
 
-constexpr std::uint64_t kMebibyte = std::uint64_t{1} << 20U;
+constexpr std::uint64_t mebibyte = std::uint64_t{1} << 20U;
 
 /// Entries of an archive. As many as an end record can count without ZIP64; office documents have
 /// some hundreds.
-constexpr std::uint64_t kMaxEntries = 65'534;
+constexpr std::uint64_t maxEntries = 65'534;
 
-/// Bytes of an archive's directory: room for kMaxEntries names of a thousand bytes.
-constexpr std::uint64_t kMaxDirectoryBytes = 64 * kMebibyte;
+/// Bytes of an archive's directory: room for maxEntries names of a thousand bytes.
+constexpr std::uint64_t maxDirectoryBytes = 64 * mebibyte;
 
 /// Bytes of one part, expanded. Several copies of a part exist while it becomes JSON.
-constexpr std::uint64_t kMaxPartBytes = 1024 * kMebibyte;
+constexpr std::uint64_t maxEntryBytes = 1024 * mebibyte;
 
 /// Bytes of all entries together, expanded.
-constexpr std::uint64_t kMaxTotalBytes = 2048 * kMebibyte;
+constexpr std::uint64_t maxTotalBytes = 2048 * mebibyte;
 
 /// Expanded bytes per byte of the archive. Sheets full of equal cells reach 150, archives made to
 /// fill memory 1000 and more.
-constexpr std::uint64_t kMaxExpansionRatio = 256;
+constexpr std::uint64_t maxExpansionRatio = 256;
 
 /// Expanded bytes that are accepted whatever the ratio.
-constexpr std::uint64_t kHarmlessBytes = 64 * kMebibyte;
+constexpr std::uint64_t harmlessBytes = 64 * mebibyte;
 
 /// What one byte of deflated data can expand to at most: 258 bytes take two bits. A declared size
 /// beyond that is wrong.
-constexpr std::uint64_t kMaxDeflateRatio = 1032;
+constexpr std::uint64_t maxDeflateRatio = 1032;
 
-}  // namespace platform::package::limits
+}  // namespace platform::package::zip

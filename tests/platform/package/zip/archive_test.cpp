@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "platform/package/zip/zip_archive.h"
+#include "platform/package/zip/archive.h"
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
@@ -14,16 +14,15 @@
 #include <random>
 #include <stdexcept>
 
-#include "platform/package/limits.h"
+#include "platform/package/zip/limits.h"
 #include "tests/platform/package/package_test_support.h"
 
 namespace testing_package {
 namespace {
 
-using platform::package::ZipArchive;
 using testing::HasSubstr;
 using testing::ThrowsMessage;
-namespace limits = platform::package::limits;
+namespace zip = platform::package::zip;
 
 class ZipArchiveTest : public testing::Test {
 protected:
@@ -37,8 +36,8 @@ protected:
     }
 
     static std::string readFrom(const std::string& path, std::size_t index = 0) {
-        ZipArchive archive(path);
-        const ZipArchive::Entry& entry = archive.entries().at(index);
+        zip::Archive archive(path);
+        const zip::Archive::Entry& entry = archive.entries().at(index);
         std::vector<std::uint8_t> out(entry.size);
         archive.read(entry, out);
         return textOf(out);
@@ -46,7 +45,7 @@ protected:
 
     void expectRefusedAtOpening(const std::string& bytes, const std::string& message) {
         const std::string path = write(bytes);
-        EXPECT_THAT([&] { ZipArchive{path}; },
+        EXPECT_THAT([&] { zip::Archive{path}; },
                     ThrowsMessage<std::runtime_error>(HasSubstr(message)));
     }
 
@@ -70,7 +69,7 @@ std::string randomText(std::size_t length) {
 TEST_F(ZipArchiveTest, ReadsStoredAndDeflatedEntriesInOrder) {
     const std::string text = randomText(100'000);
     const std::string bytes = buildZip({{"b", text, false}, {"a", text, true}, {"c", "", true}});
-    ZipArchive archive(write(bytes));
+    zip::Archive archive(write(bytes));
     ASSERT_EQ(archive.entries().size(), 3U);
     EXPECT_EQ(archive.entries()[0].name, "b");
     EXPECT_EQ(archive.entries()[1].name, "a");
@@ -86,7 +85,7 @@ TEST_F(ZipArchiveTest, ReadsAnEmptyDeflatedEntryWithoutData) {
 }
 
 TEST_F(ZipArchiveTest, ReadsAnArchiveWithoutEntries) {
-    EXPECT_TRUE(ZipArchive(write(buildZip({}))).entries().empty());
+    EXPECT_TRUE(zip::Archive(write(buildZip({}))).entries().empty());
 }
 
 TEST_F(ZipArchiveTest, ReadsDataDescriptors) {
@@ -133,12 +132,12 @@ TEST_F(ZipArchiveTest, FindsTheDirectoryBeforeACommentAndBytesBehindIt) {
 TEST_F(ZipArchiveTest, ReadsNamesInUtf8WhetherFlaggedOrNot) {
     ZipEntry flagged{"m\xC3\xA9", "x"};
     flagged.flags = 1 << 11;
-    EXPECT_EQ(ZipArchive(write(buildZip({flagged}))).entries()[0].name, "m\xC3\xA9");
-    EXPECT_EQ(ZipArchive(write(buildZip({{"m\xC3\xA9", "x"}}))).entries()[0].name, "m\xC3\xA9");
+    EXPECT_EQ(zip::Archive(write(buildZip({flagged}))).entries()[0].name, "m\xC3\xA9");
+    EXPECT_EQ(zip::Archive(write(buildZip({{"m\xC3\xA9", "x"}}))).entries()[0].name, "m\xC3\xA9");
 }
 
 TEST_F(ZipArchiveTest, ReadsOtherNamesAsCodePage437) {
-    EXPECT_EQ(ZipArchive(write(buildZip({{"m\x82\xE1", "x"}}))).entries()[0].name,
+    EXPECT_EQ(zip::Archive(write(buildZip({{"m\x82\xE1", "x"}}))).entries()[0].name,
               "m\xC3\xA9\xC3\x9F");
 }
 
@@ -147,9 +146,9 @@ TEST_F(ZipArchiveTest, PrefersTheUnicodeNameMadeForTheOtherName) {
     const std::string unicode = "\xD0\xBC";
     entry.extra = bytes16(0x1234) + bytes16(1) + "?" + bytes16(0x7075) + bytes16(7) + "\1" +
                   bytes32(checksum(entry.name)) + unicode;
-    EXPECT_EQ(ZipArchive(write(buildZip({entry}))).entries()[0].name, unicode);
+    EXPECT_EQ(zip::Archive(write(buildZip({entry}))).entries()[0].name, unicode);
     entry.name = "n\x82";  // the extra field is no longer about this name
-    EXPECT_EQ(ZipArchive(write(buildZip({entry}))).entries()[0].name, "n\xC3\xA9");
+    EXPECT_EQ(zip::Archive(write(buildZip({entry}))).entries()[0].name, "n\xC3\xA9");
 }
 
 TEST_F(ZipArchiveTest, RefusesANameThatIsNotTheUtf8ItClaims) {
@@ -177,7 +176,7 @@ TEST_F(ZipArchiveTest, RefusesEveryTruncation) {
     const std::string bytes = buildZip({{"a", randomText(300), true}, {"b", "text"}});
     for (std::size_t length = 0; length < bytes.size(); ++length) {
         const std::string path = write(bytes.substr(0, length));
-        EXPECT_THROW(ZipArchive{path}, std::runtime_error) << length;
+        EXPECT_THROW(zip::Archive{path}, std::runtime_error) << length;
     }
     expectRefusedAtOpening(bytes.substr(0, bytes.size() - 1), "truncated");
     expectRefusedAtOpening(bytes.substr(0, 100), "truncated");
@@ -186,7 +185,7 @@ TEST_F(ZipArchiveTest, RefusesEveryTruncation) {
 TEST_F(ZipArchiveTest, RefusesAnArchiveWithBytesMissingInTheMiddle) {
     const std::string bytes = buildZip({{"a", randomText(3000)}, {"b", "text"}});
     const std::string path = write(bytes.substr(0, 500) + bytes.substr(1500));
-    EXPECT_THROW(ZipArchive{path}, std::runtime_error);
+    EXPECT_THROW(zip::Archive{path}, std::runtime_error);
 }
 
 TEST_F(ZipArchiveTest, NeverReturnsChangedContentWhicheverByteIsDamaged) {
@@ -196,8 +195,8 @@ TEST_F(ZipArchiveTest, NeverReturnsChangedContentWhicheverByteIsDamaged) {
         std::string damaged = bytes;
         damaged[at] = static_cast<char>(damaged[at] ^ 0x55);
         try {
-            ZipArchive archive(write(damaged));
-            for (const ZipArchive::Entry& entry : archive.entries()) {
+            zip::Archive archive(write(damaged));
+            for (const zip::Archive::Entry& entry : archive.entries()) {
                 std::vector<std::uint8_t> out(entry.size);
                 archive.read(entry, out);
                 EXPECT_EQ(textOf(out), text) << "byte " << at;
@@ -318,7 +317,7 @@ TEST_F(ZipArchiveTest, RefusesArchivesInSeveralFiles) {
 }
 
 TEST_F(ZipArchiveTest, RefusesMoreEntriesThanTheLimit) {
-    std::vector<ZipEntry> entries(limits::kMaxEntries + 1);
+    std::vector<ZipEntry> entries(zip::maxEntries + 1);
     expectRefusedAtOpening(buildZip(entries), "has too many entries: 65535");
     ZipOptions options;
     options.isZip64 = true;
@@ -330,13 +329,13 @@ TEST_F(ZipArchiveTest, RefusesMoreEntriesThanTheLimit) {
 
 TEST_F(ZipArchiveTest, AcceptsAsManyEntriesAsTheLimit) {
     EXPECT_EQ(
-        ZipArchive(write(buildZip(std::vector<ZipEntry>(limits::kMaxEntries)))).entries().size(),
-        limits::kMaxEntries);
+        zip::Archive(write(buildZip(std::vector<ZipEntry>(zip::maxEntries)))).entries().size(),
+        zip::maxEntries);
 }
 
 TEST_F(ZipArchiveTest, RefusesAHugeDirectory) {
     ZipOptions options;
-    options.prefix = std::string(limits::kMaxDirectoryBytes + 1, ' ');
+    options.prefix = std::string(zip::maxDirectoryBytes + 1, ' ');
     options.directoryOffset = 0;
     options.directorySize = options.prefix.size();
     expectRefusedAtOpening(buildZip({}, options), "has a directory of 67108865 bytes");
@@ -345,7 +344,7 @@ TEST_F(ZipArchiveTest, RefusesAHugeDirectory) {
 TEST_F(ZipArchiveTest, RefusesAnEntryBeyondTheLimitByItsDeclaredSize) {
     ZipEntry entry{"a", std::string(5'000'000, 'x')};
     entry.method = 8;
-    entry.size = limits::kMaxPartBytes + 1;
+    entry.size = zip::maxEntryBytes + 1;
     expectRefusedAtOpening(buildZip({entry}), "\"a\" is too large: 1073741825 bytes");
     entry.isZip64 = true;
     entry.size = std::uint64_t{4} << 30;
@@ -356,7 +355,7 @@ TEST_F(ZipArchiveTest, RefusesATotalBeyondTheLimit) {
     std::vector<ZipEntry> entries(3, {"a", std::string(5'000'000, 'x')});
     for (ZipEntry& entry : entries) {
         entry.method = 8;
-        entry.size = limits::kMaxPartBytes * 3 / 4;
+        entry.size = zip::maxEntryBytes * 3 / 4;
     }
     expectRefusedAtOpening(buildZip(entries), "is too large: it expands to 2415919104 bytes");
 }
@@ -380,27 +379,27 @@ TEST_F(ZipArchiveTest, RefusesABombBeforeExpandingAnyOfIt) {
 
 TEST_F(ZipArchiveTest, LooksForTheDirectoryOnceHoweverManyEndRecordsThereAre) {
     // The directory is 3 MB, and 2900 end records name it: reading it for each would take minutes.
-    std::string bytes = buildZip(std::vector<ZipEntry>(limits::kMaxEntries));
+    std::string bytes = buildZip(std::vector<ZipEntry>(zip::maxEntries));
     const std::string end = bytes.substr(bytes.size() - 22);
     for (int i = 0; i < 2900; ++i) {
         bytes += end;
     }
-    EXPECT_EQ(ZipArchive(write(bytes)).entries().size(), limits::kMaxEntries);
+    EXPECT_EQ(zip::Archive(write(bytes)).entries().size(), zip::maxEntries);
 }
 
 TEST_F(ZipArchiveTest, RefusesFilesThatCannotBeOpened) {
-    EXPECT_THAT([&] { ZipArchive((folder_.path() / "none").string()); },
+    EXPECT_THAT([&] { zip::Archive((folder_.path() / "none").string()); },
                 ThrowsMessage<std::runtime_error>(HasSubstr("No such file")));
-    EXPECT_THAT([&] { ZipArchive(folder_.path().string()); },
+    EXPECT_THAT([&] { zip::Archive(folder_.path().string()); },
                 ThrowsMessage<std::runtime_error>(HasSubstr("is a folder")));
 }
 
 TEST_F(ZipArchiveTest, RefusesPipesAndDevicesWithoutWaiting) {
     const std::string pipe = (folder_.path() / "pipe").string();
     ASSERT_EQ(mkfifo(pipe.c_str(), 0600), 0);
-    EXPECT_THAT([&] { ZipArchive{pipe}; },
+    EXPECT_THAT([&] { zip::Archive{pipe}; },
                 ThrowsMessage<std::runtime_error>(HasSubstr("is not a regular file")));
-    EXPECT_THAT([&] { ZipArchive("/dev/zero"); },
+    EXPECT_THAT([&] { zip::Archive("/dev/zero"); },
                 ThrowsMessage<std::runtime_error>(HasSubstr("is not a regular file")));
 }
 

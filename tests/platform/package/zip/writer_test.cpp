@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "platform/package/zip/zip_writer.h"
+#include "platform/package/zip/writer.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -9,17 +9,15 @@
 #include <stdexcept>
 #include <string>
 
-#include "platform/package/limits.h"
-#include "platform/package/zip/zip_archive.h"
+#include "platform/package/zip/archive.h"
+#include "platform/package/zip/limits.h"
 #include "tests/platform/package/package_test_support.h"
 
 namespace testing_package {
 namespace {
 
-namespace limits = platform::package::limits;
+namespace zip = platform::package::zip;
 using platform::AtomicFile;
-using platform::package::ZipArchive;
-using platform::package::ZipWriter;
 using testing::HasSubstr;
 using testing::ThrowsMessage;
 
@@ -29,16 +27,16 @@ public:
     LargestPart() {
         const int file = ::memfd_create("block", MFD_CLOEXEC);
         std::string block;
-        for (int i = 0; block.size() < kBlockSize; ++i) {
+        for (int i = 0; block.size() < blockSize; ++i) {
             block.append(std::to_string(i * 7919)).append(1500, ' ');
         }
-        block.resize(kBlockSize);
-        start_ = static_cast<char*>(::mmap(nullptr, limits::kMaxPartBytes, PROT_NONE,
+        block.resize(blockSize);
+        start_ = static_cast<char*>(::mmap(nullptr, zip::maxEntryBytes, PROT_NONE,
                                            MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0));
-        bool isMapped = start_ != MAP_FAILED &&
-                        ::write(file, block.data(), block.size()) == ssize_t{kBlockSize};
-        for (std::size_t at = 0; isMapped && at < limits::kMaxPartBytes; at += kBlockSize) {
-            isMapped = ::mmap(start_ + at, kBlockSize, PROT_READ, MAP_PRIVATE | MAP_FIXED, file,
+        bool isMapped =
+            start_ != MAP_FAILED && ::write(file, block.data(), block.size()) == ssize_t{blockSize};
+        for (std::size_t at = 0; isMapped && at < zip::maxEntryBytes; at += blockSize) {
+            isMapped = ::mmap(start_ + at, blockSize, PROT_READ, MAP_PRIVATE | MAP_FIXED, file,
                               0) != MAP_FAILED;
         }
         ::close(file);
@@ -48,14 +46,14 @@ public:
     }
     LargestPart(const LargestPart&) = delete;
     LargestPart& operator=(const LargestPart&) = delete;
-    ~LargestPart() { ::munmap(start_, limits::kMaxPartBytes); }
+    ~LargestPart() { ::munmap(start_, zip::maxEntryBytes); }
 
     std::span<const std::uint8_t> bytes() const {
-        return {reinterpret_cast<const std::uint8_t*>(start_), limits::kMaxPartBytes};
+        return {reinterpret_cast<const std::uint8_t*>(start_), zip::maxEntryBytes};
     }
 
 private:
-    static constexpr std::size_t kBlockSize = 16 << 20;
+    static constexpr std::size_t blockSize = 16 << 20;
     char* start_;
 };
 
@@ -64,32 +62,34 @@ TEST(ZipWriter, WritesAsMuchAsReadersAcceptAndNoMore) {
     const std::string path = (folder.path() / "a.zip").string();
     const LargestPart part;
     AtomicFile file(path);
-    ZipWriter zip(file);
-    zip.add("a", part.bytes(), true);
-    zip.add("b", part.bytes(), true);
-    static_assert(2 * limits::kMaxPartBytes == limits::kMaxTotalBytes);
-    EXPECT_THAT([&] { zip.add("c", part.bytes().first(1), true); },
+    zip::ReusableEntries nothing{std::string()};
+    zip::Writer writer(file, nothing);
+    writer.add("a", part.bytes(), true);
+    writer.add("b", part.bytes(), true);
+    static_assert(2 * zip::maxEntryBytes == zip::maxTotalBytes);
+    EXPECT_THAT([&] { writer.add("c", part.bytes().first(1), true); },
                 ThrowsMessage<std::runtime_error>(HasSubstr("makes the package larger than")));
-    zip.add("d", {}, true);
-    zip.finish();
+    writer.add("d", {}, true);
+    writer.finish();
     file.commit();
-    EXPECT_EQ(ZipArchive(path).entries().size(), 3U);
+    EXPECT_EQ(zip::Archive(path).entries().size(), 3U);
 }
 
 TEST(ZipWriter, RefusesAPartThatIsTooLarge) {
     const TemporaryFolder folder;
-    void* memory = ::mmap(nullptr, limits::kMaxPartBytes + 1, PROT_NONE,
+    void* memory = ::mmap(nullptr, zip::maxEntryBytes + 1, PROT_NONE,
                           MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
     ASSERT_NE(memory, MAP_FAILED);
     AtomicFile file((folder.path() / "a.zip").string());
-    ZipWriter zip(file);
+    zip::ReusableEntries nothing{std::string()};
+    zip::Writer writer(file, nothing);
     EXPECT_THAT(
         [&] {
-            zip.add("a", {static_cast<const std::uint8_t*>(memory), limits::kMaxPartBytes + 1},
-                    true);
+            writer.add("a", {static_cast<const std::uint8_t*>(memory), zip::maxEntryBytes + 1},
+                       true);
         },
         ThrowsMessage<std::runtime_error>(HasSubstr("is too large: 1073741825 bytes")));
-    ::munmap(memory, limits::kMaxPartBytes + 1);
+    ::munmap(memory, zip::maxEntryBytes + 1);
 }
 
 }  // namespace

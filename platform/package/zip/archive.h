@@ -1,12 +1,19 @@
 // SPDX-License-Identifier: Apache-2.0
 // Reads zip archives: the directory when the archive is opened, and each entry's bytes on demand.
 //
+// The code of this folder is our own because the libraries for zip archives do not do three things
+// that documents need. They take memory before they look whether entries overlap or claim more than
+// their data can expand to; they say that an archive is bad, not what is wrong with which entry;
+// and they give no way to have the same bytes for the same entries, or to take over an entry's
+// deflated bytes only where these are known to be the very content.
+//
 // The archive is believed in nothing. Opening it takes time and memory in proportion to its
 // directory, whose size is limited, and refuses archives whose entries overlap, or claim more than
 // their data can expand to or than the limits allow (limits.h). So reading all entries takes no
 // more than that either.
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <memory>
 #include <span>
@@ -14,12 +21,13 @@
 #include <vector>
 
 #include "platform/posix/file_descriptor.h"
+#include "platform/posix/open_regular_file.h"
 
 struct libdeflate_decompressor;
 
-namespace platform::package {
+namespace platform::package::zip {
 
-class ZipArchive {
+class Archive {
 public:
     struct Entry {
         std::string name;  ///< as it stands, in UTF-8
@@ -31,10 +39,11 @@ public:
         std::uint16_t flags = 0;
     };
 
-    /// Opens the archive at the UTF-8 `path` and reads its directory. Never waits: what is no
-    /// regular file is refused. Throws std::runtime_error saying what is wrong with the file
-    /// (without its path) or, about one entry, with its name.
-    explicit ZipArchive(const std::string& path);
+    /// Opens the archive at the UTF-8 `path` and reads its directory. What is no regular file is
+    /// refused, and not waited for; a lease of another program's is, for `patience`. Throws
+    /// std::runtime_error saying what is wrong with the file (without its path) or, about one
+    /// entry, with its name.
+    explicit Archive(const std::string& path, std::chrono::milliseconds patience = leasePatience);
 
     /// All entries, folders included, in the order of the directory.
     const std::vector<Entry>& entries() const noexcept { return entries_; }
@@ -43,6 +52,14 @@ public:
     /// checks the result against its checksum. Throws std::runtime_error saying what is wrong with
     /// the entry (without its name).
     void read(const Entry& entry, std::span<std::uint8_t> out);
+
+    /// The deflated bytes of `entry` of this archive if they are a stream that ends exactly at
+    /// their end and expands to exactly `content`; else nothing. Valid until the next call. The
+    /// entry is expanded into `scratch`, which has at least the size of `content`. Throws
+    /// std::runtime_error when the entry cannot be read.
+    std::span<const std::uint8_t> readDeflatedForm(const Entry& entry,
+                                                   std::span<const std::uint8_t> content,
+                                                   std::span<std::uint8_t> scratch);
 
 private:
     struct Directory {
@@ -61,13 +78,15 @@ private:
     void checkSizes() const;
     std::uint64_t dataOffset(const Entry& entry) const;
     void expand(const Entry& entry, std::uint64_t offset, std::span<std::uint8_t> out);
+    std::span<const std::uint8_t> readCompressed(const Entry& entry, std::uint64_t offset);
     void readAt(std::uint64_t offset, std::span<std::uint8_t> out) const;
 
     std::uint64_t fileSize_ = 0;
     FileDescriptor file_;
     std::vector<Entry> entries_;
-    std::vector<std::uint8_t> compressed_;  // the deflated bytes of the entry being read
+    std::unique_ptr<std::uint8_t[]> compressed_;  // the deflated bytes of the entry being read
+    std::uint64_t compressedCapacity_ = 0;
     std::unique_ptr<libdeflate_decompressor, FreeDecompressor> decompressor_;
 };
 
-}  // namespace platform::package
+}  // namespace platform::package::zip

@@ -1,9 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "platform/package/zip/zip_archive.h"
+#include "platform/package/zip/archive.h"
 
-#include <fcntl.h>
 #include <libdeflate.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -17,15 +15,16 @@
 #include <system_error>
 #include <utility>
 
-#include "platform/i18n/codecvt.h"
-#include "platform/package/about.h"
-#include "platform/package/limits.h"
+#include "platform/package/zip/format.h"
+#include "platform/package/zip/limits.h"
 #include "platform/package/zip/little_endian.h"
-#include "platform/package/zip/zip_format.h"
+#include "platform/package/zip/names.h"
+#include "platform/text/quoted.h"
 
-namespace platform::package {
+namespace platform::package::zip {
 namespace {
 
+using text::quoted;
 using Bytes = std::span<const std::uint8_t>;
 
 [[noreturn]] void fail(const std::string& problem) {
@@ -36,38 +35,17 @@ using Bytes = std::span<const std::uint8_t>;
     fail("entry " + quoted(name) + " " + problem);
 }
 
-[[noreturn]] void failForSystem(const char* what) {
-    throw std::system_error(errno, std::generic_category(), what);
-}
-
-// Looks before it opens, because opening a device can have effects, and opens without waiting, in
-// case the file has become a pipe in between.
-FileDescriptor openRegularFile(const std::string& path, std::uint64_t& size) {
-    struct stat status {};
-    if (::stat(path.c_str(), &status) != 0) {
-        failForSystem("cannot be opened");
+FileDescriptor openArchive(const std::string& path, std::chrono::milliseconds patience,
+                           std::uint64_t& size) {
+    OpenedFile opened = openRegularFile(path, patience);
+    if (opened.error != 0) {
+        throw std::system_error(opened.error, std::generic_category(), "cannot be opened");
     }
-    FileDescriptor file;
-    if (S_ISREG(status.st_mode)) {
-        file = FileDescriptor(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
-        if (!file || ::fstat(file.get(), &status) != 0) {
-            failForSystem("cannot be opened");
-        }
+    if (!opened.descriptor) {
+        fail(S_ISDIR(opened.status.st_mode) ? "is a folder" : "is not a regular file");
     }
-    if (!S_ISREG(status.st_mode)) {
-        fail(S_ISDIR(status.st_mode) ? "is a folder" : "is not a regular file");
-    }
-    size = static_cast<std::uint64_t>(status.st_size);
-    return file;
-}
-
-bool isUtf8(std::string_view bytes) {
-    try {
-        i18n::to_ustring(bytes);
-        return true;
-    } catch (const std::runtime_error&) {
-        return false;
-    }
+    size = static_cast<std::uint64_t>(opened.status.st_size);
+    return std::move(opened.descriptor);
 }
 
 std::string_view asText(Bytes bytes) {
@@ -89,26 +67,20 @@ std::optional<Bytes> extraField(Bytes extra, std::uint16_t id) {
     return std::nullopt;
 }
 
-// `name` for an error, which must be valid text.
-std::string printable(Bytes name) {
-    i18n::codecvt_string_to_ustring converter("UTF-8", false);
-    return i18n::to_string(i18n::to_ustring(asText(name), converter));
-}
-
 // Names are UTF-8 if they say so or are valid UTF-8 (many producers do not say so), otherwise code
 // page 437, unless an extra field made for this very name has its Unicode form.
 std::string decodeName(Bytes name, Bytes extra, std::uint16_t flags) {
     constexpr std::size_t versionAndChecksum = 5;
     if (asText(name).find('\0') != std::string_view::npos) {
-        failForEntry(printable(name), "has a zero in its name");
+        failForEntry(printable(asText(name)), "has a zero in its name");
     }
     if (isUtf8(asText(name))) {
         return std::string(asText(name));
     }
-    if ((flags & zip::kUtf8Flag) != 0) {
-        failForEntry(printable(name), "has a name that is not valid UTF-8");
+    if ((flags & utf8Flag) != 0) {
+        failForEntry(printable(asText(name)), "has a name that is not valid UTF-8");
     }
-    const std::optional<Bytes> unicode = extraField(extra, zip::kUnicodePathExtra);
+    const std::optional<Bytes> unicode = extraField(extra, unicodePathExtra);
     if (unicode && unicode->size() > versionAndChecksum && (*unicode)[0] == 1 &&
         read32(*unicode, 1) == libdeflate_crc32(0, name.data(), name.size())) {
         const std::string_view text = asText(unicode->subspan(versionAndChecksum));
@@ -116,16 +88,15 @@ std::string decodeName(Bytes name, Bytes extra, std::uint16_t flags) {
             return std::string(text);
         }
     }
-    i18n::codecvt_string_to_ustring converter("IBM437", true);
-    return i18n::to_string(i18n::to_ustring(asText(name), converter));
+    return fromCodePage437(asText(name));
 }
 
 // Replaces the numbers of `entry` that did not fit their fields by those of the ZIP64 extra field.
-void readZip64Numbers(ZipArchive::Entry& entry, Bytes extra) {
-    const Bytes numbers = extraField(extra, zip::kZip64Extra).value_or(Bytes());
+void readZip64Numbers(Archive::Entry& entry, Bytes extra) {
+    const Bytes numbers = extraField(extra, zip64Extra).value_or(Bytes());
     std::size_t at = 0;
     for (std::uint64_t* number : {&entry.size, &entry.compressedSize, &entry.offset}) {
-        if (*number != zip::kNotIn32Bits) {
+        if (*number != notIn32Bits) {
             continue;
         }
         if (numbers.size() < at + 8) {
@@ -154,24 +125,24 @@ void readZip64Numbers(ZipArchive::Entry& entry, Bytes extra) {
 
 }  // namespace
 
-void ZipArchive::FreeDecompressor::operator()(
-    libdeflate_decompressor* decompressor) const noexcept {
+void Archive::FreeDecompressor::operator()(libdeflate_decompressor* decompressor) const noexcept {
     libdeflate_free_decompressor(decompressor);
 }
 
-ZipArchive::ZipArchive(const std::string& path)
-    : file_(openRegularFile(path, fileSize_)), decompressor_(libdeflate_alloc_decompressor()) {
+Archive::Archive(const std::string& path, std::chrono::milliseconds patience)
+    : file_(openArchive(path, patience, fileSize_)),
+      decompressor_(libdeflate_alloc_decompressor()) {
     if (!decompressor_) {
         throw std::bad_alloc();
     }
     const Directory directory = findDirectory();
-    if (directory.entryCount > limits::kMaxEntries) {
+    if (directory.entryCount > maxEntries) {
         fail("has too many entries: " + std::to_string(directory.entryCount) + ", at most " +
-             std::to_string(limits::kMaxEntries) + " are accepted");
+             std::to_string(maxEntries) + " are accepted");
     }
-    if (directory.size > limits::kMaxDirectoryBytes) {
+    if (directory.size > maxDirectoryBytes) {
         fail("has a directory of " + std::to_string(directory.size) + " bytes, at most " +
-             std::to_string(limits::kMaxDirectoryBytes) + " are accepted");
+             std::to_string(maxDirectoryBytes) + " are accepted");
     }
     readDirectory(directory);
     checkLayout(directory.offset);
@@ -180,24 +151,22 @@ ZipArchive::ZipArchive(const std::string& path)
 
 // The end record is the last thing in the file but for its comment, in which its signature may
 // occur by chance: the last record whose directory lies before it is taken.
-ZipArchive::Directory ZipArchive::findDirectory() const {
+Archive::Directory Archive::findDirectory() const {
     constexpr std::uint64_t maxCommentSize = 0xFFFF;
-    const std::uint64_t tailSize =
-        std::min(fileSize_, zip::kZip64LocatorSize + zip::kEndSize + maxCommentSize);
+    const std::uint64_t tailSize = std::min(fileSize_, zip64LocatorSize + endSize + maxCommentSize);
     std::vector<std::uint8_t> bytes(tailSize);
     const std::uint64_t tailOffset = fileSize_ - tailSize;
     readAt(tailOffset, bytes);
 
-    for (std::size_t at = bytes.size() < zip::kEndSize ? 0 : bytes.size() - zip::kEndSize + 1;
-         at-- > 0;) {
+    for (std::size_t at = bytes.size() < endSize ? 0 : bytes.size() - endSize + 1; at-- > 0;) {
         const Bytes tail = bytes;
-        if (read32(tail, at) != zip::kEndSignature) {
+        if (read32(tail, at) != endSignature) {
             continue;
         }
-        const Bytes record = tail.subspan(at, zip::kEndSize);
-        if (at >= zip::kZip64LocatorSize &&
-            read32(tail, at - zip::kZip64LocatorSize) == zip::kZip64LocatorSignature) {
-            return findZip64Directory(tailOffset + at - zip::kZip64LocatorSize);
+        const Bytes record = tail.subspan(at, endSize);
+        if (at >= zip64LocatorSize &&
+            read32(tail, at - zip64LocatorSize) == zip64LocatorSignature) {
+            return findZip64Directory(tailOffset + at - zip64LocatorSize);
         }
         const Directory directory{read16(record, 10), read32(record, 16), read32(record, 12)};
         if (directory.offset + directory.size > tailOffset + at) {
@@ -213,16 +182,16 @@ ZipArchive::Directory ZipArchive::findDirectory() const {
     failWithoutEndRecord(start);
 }
 
-ZipArchive::Directory ZipArchive::findZip64Directory(std::uint64_t locatorOffset) const {
-    std::array<std::uint8_t, zip::kZip64LocatorSize> locator{};
+Archive::Directory Archive::findZip64Directory(std::uint64_t locatorOffset) const {
+    std::array<std::uint8_t, zip64LocatorSize> locator{};
     readAt(locatorOffset, locator);
     const std::uint64_t offset = read64(locator, 8);
-    if (offset > locatorOffset || locatorOffset - offset < zip::kZip64EndSize) {
+    if (offset > locatorOffset || locatorOffset - offset < zip64EndSize) {
         fail("is a damaged zip archive: its ZIP64 end record is missing");
     }
-    std::array<std::uint8_t, zip::kZip64EndSize> record{};
+    std::array<std::uint8_t, zip64EndSize> record{};
     readAt(offset, record);
-    if (read32(record, 0) != zip::kZip64EndSignature) {
+    if (read32(record, 0) != zip64EndSignature) {
         fail("is a damaged zip archive: its ZIP64 end record is missing");
     }
     const Directory directory{read64(record, 32), read64(record, 48), read64(record, 40)};
@@ -235,19 +204,19 @@ ZipArchive::Directory ZipArchive::findZip64Directory(std::uint64_t locatorOffset
     return directory;
 }
 
-void ZipArchive::readDirectory(const Directory& directory) {
+void Archive::readDirectory(const Directory& directory) {
     std::vector<std::uint8_t> bytes(directory.size);
     readAt(directory.offset, bytes);
     Bytes rest = bytes;
     entries_.reserve(directory.entryCount);
     for (std::uint64_t i = 0; i < directory.entryCount; ++i) {
-        if (rest.size() < zip::kDirectoryEntrySize || read32(rest, 0) != zip::kDirectorySignature) {
+        if (rest.size() < directoryEntrySize || read32(rest, 0) != directorySignature) {
             fail("is a damaged zip archive: its directory has no entry " + std::to_string(i + 1) +
                  " of " + std::to_string(directory.entryCount));
         }
         const std::size_t nameSize = read16(rest, 28);
         const std::size_t extraSize = read16(rest, 30);
-        const std::size_t size = zip::kDirectoryEntrySize + nameSize + extraSize + read16(rest, 32);
+        const std::size_t size = directoryEntrySize + nameSize + extraSize + read16(rest, 32);
         if (rest.size() < size) {
             fail("is a damaged zip archive: its directory is cut off");
         }
@@ -258,27 +227,26 @@ void ZipArchive::readDirectory(const Directory& directory) {
         entry.compressedSize = read32(rest, 20);
         entry.size = read32(rest, 24);
         entry.offset = read32(rest, 42);
-        const Bytes extra = rest.subspan(zip::kDirectoryEntrySize + nameSize, extraSize);
-        if ((entry.flags & zip::kMaskedDirectoryFlag) != 0) {
+        const Bytes extra = rest.subspan(directoryEntrySize + nameSize, extraSize);
+        if ((entry.flags & maskedDirectoryFlag) != 0) {
             fail("is encrypted");
         }
-        entry.name =
-            decodeName(rest.subspan(zip::kDirectoryEntrySize, nameSize), extra, entry.flags);
+        entry.name = decodeName(rest.subspan(directoryEntrySize, nameSize), extra, entry.flags);
         readZip64Numbers(entry, extra);
         rest = rest.subspan(size);
     }
-    if (rest.size() >= 4 && read32(rest, 0) == zip::kDirectorySignature) {
+    if (rest.size() >= 4 && read32(rest, 0) == directorySignature) {
         fail("is a damaged zip archive: its directory has more entries than it says");
     }
 }
 
 // Refuses entries that share bytes, with which a small archive could claim any amount of data.
-void ZipArchive::checkLayout(std::uint64_t dataEnd) const {
+void Archive::checkLayout(std::uint64_t dataEnd) const {
     std::vector<const Entry*> byOffset;
     byOffset.reserve(entries_.size());
     for (const Entry& entry : entries_) {
         if (entry.offset > dataEnd || entry.compressedSize > dataEnd ||
-            zip::kLocalHeaderSize + entry.compressedSize > dataEnd - entry.offset) {
+            localHeaderSize + entry.compressedSize > dataEnd - entry.offset) {
             failForEntry(entry.name, "reaches behind the end of the archive's data");
         }
         byOffset.push_back(&entry);
@@ -290,46 +258,45 @@ void ZipArchive::checkLayout(std::uint64_t dataEnd) const {
         if (entry->offset < end) {
             failForEntry(entry->name, "overlaps another entry");
         }
-        end = entry->offset + zip::kLocalHeaderSize + entry->compressedSize;
+        end = entry->offset + localHeaderSize + entry->compressedSize;
     }
 }
 
-void ZipArchive::checkSizes() const {
+void Archive::checkSizes() const {
     std::uint64_t total = 0;
     for (const Entry& entry : entries_) {
-        if (entry.size > limits::kMaxPartBytes) {
+        if (entry.size > maxEntryBytes) {
             failForEntry(entry.name, "is too large: " + std::to_string(entry.size) +
-                                         " bytes, at most " +
-                                         std::to_string(limits::kMaxPartBytes) + " are accepted");
+                                         " bytes, at most " + std::to_string(maxEntryBytes) +
+                                         " are accepted");
         }
-        if (entry.method == zip::kDeflated &&
-            entry.size / limits::kMaxDeflateRatio > entry.compressedSize) {
+        if (entry.method == methodDeflated && entry.size / maxDeflateRatio > entry.compressedSize) {
             failForEntry(entry.name, "has a wrong size: its data cannot expand to " +
                                          std::to_string(entry.size) + " bytes");
         }
         total += entry.size;
     }
-    if (total > limits::kMaxTotalBytes) {
+    if (total > maxTotalBytes) {
         fail("is too large: it expands to " + std::to_string(total) + " bytes, at most " +
-             std::to_string(limits::kMaxTotalBytes) + " are accepted");
+             std::to_string(maxTotalBytes) + " are accepted");
     }
-    if (total > limits::kHarmlessBytes && total / limits::kMaxExpansionRatio >= fileSize_) {
+    if (total > harmlessBytes && total / maxExpansionRatio >= fileSize_) {
         fail("expands too much: from " + std::to_string(fileSize_) + " to " +
              std::to_string(total) + " bytes");
     }
 }
 
-void ZipArchive::read(const Entry& entry, std::span<std::uint8_t> out) {
-    if ((entry.flags & zip::kEncryptedFlag) != 0) {
+void Archive::read(const Entry& entry, std::span<std::uint8_t> out) {
+    if ((entry.flags & encryptedFlag) != 0) {
         fail("is encrypted");
     }
     const std::uint64_t offset = dataOffset(entry);
-    if (entry.method == zip::kStored) {
+    if (entry.method == methodStored) {
         if (entry.size != entry.compressedSize) {
             fail("is damaged (wrong size)");
         }
         readAt(offset, out);
-    } else if (entry.method == zip::kDeflated) {
+    } else if (entry.method == methodDeflated) {
         expand(entry, offset, out);
     } else {
         fail("is compressed with the unknown method " + std::to_string(entry.method));
@@ -340,23 +307,22 @@ void ZipArchive::read(const Entry& entry, std::span<std::uint8_t> out) {
 }
 
 // The name and the extra field of the local header may be other ones than the directory's.
-std::uint64_t ZipArchive::dataOffset(const Entry& entry) const {
-    std::array<std::uint8_t, zip::kLocalHeaderSize> header{};
+std::uint64_t Archive::dataOffset(const Entry& entry) const {
+    std::array<std::uint8_t, localHeaderSize> header{};
     readAt(entry.offset, header);
-    if (read32(header, 0) != zip::kLocalSignature) {
+    if (read32(header, 0) != localSignature) {
         fail("is damaged (no header where the directory says)");
     }
-    return entry.offset + zip::kLocalHeaderSize + read16(header, 26) + read16(header, 28);
+    return entry.offset + localHeaderSize + read16(header, 26) + read16(header, 28);
 }
 
-void ZipArchive::expand(const Entry& entry, std::uint64_t offset, std::span<std::uint8_t> out) {
+void Archive::expand(const Entry& entry, std::uint64_t offset, std::span<std::uint8_t> out) {
     if (entry.compressedSize == 0 && out.empty()) {
         return;  // some producers write nothing at all for no content
     }
-    compressed_.resize(entry.compressedSize);
-    readAt(offset, compressed_);
-    switch (libdeflate_deflate_decompress(decompressor_.get(), compressed_.data(),
-                                          compressed_.size(), out.data(), out.size(), nullptr)) {
+    const Bytes compressed = readCompressed(entry, offset);
+    switch (libdeflate_deflate_decompress(decompressor_.get(), compressed.data(), compressed.size(),
+                                          out.data(), out.size(), nullptr)) {
         case LIBDEFLATE_SUCCESS:
             return;
         case LIBDEFLATE_SHORT_OUTPUT:
@@ -367,7 +333,35 @@ void ZipArchive::expand(const Entry& entry, std::uint64_t offset, std::span<std:
     }
 }
 
-void ZipArchive::readAt(std::uint64_t offset, std::span<std::uint8_t> out) const {
+Bytes Archive::readDeflatedForm(const Entry& entry, Bytes content,
+                                std::span<std::uint8_t> scratch) {
+    if ((entry.flags & (encryptedFlag | strongEncryptionFlag)) != 0 ||
+        entry.method != methodDeflated || entry.size != content.size()) {
+        return {};
+    }
+    const Bytes compressed = readCompressed(entry, dataOffset(entry));
+    std::size_t streamSize = 0;
+    const libdeflate_result result =
+        libdeflate_deflate_decompress_ex(decompressor_.get(), compressed.data(), compressed.size(),
+                                         scratch.data(), content.size(), &streamSize, nullptr);
+    const bool isSame = result == LIBDEFLATE_SUCCESS && streamSize == compressed.size() &&
+                        std::equal(content.begin(), content.end(), scratch.begin());
+    return isSame ? compressed : Bytes();
+}
+
+Bytes Archive::readCompressed(const Entry& entry, std::uint64_t offset) {
+    if (compressedCapacity_ < entry.compressedSize) {
+        compressed_.reset();
+        compressedCapacity_ = 0;
+        compressed_ = std::make_unique_for_overwrite<std::uint8_t[]>(entry.compressedSize);
+        compressedCapacity_ = entry.compressedSize;
+    }
+    const std::span<std::uint8_t> compressed(compressed_.get(), entry.compressedSize);
+    readAt(offset, compressed);
+    return compressed;
+}
+
+void Archive::readAt(std::uint64_t offset, std::span<std::uint8_t> out) const {
     while (!out.empty()) {
         const ssize_t count =
             ::pread(file_.get(), out.data(), out.size(), static_cast<off_t>(offset));
@@ -375,7 +369,7 @@ void ZipArchive::readAt(std::uint64_t offset, std::span<std::uint8_t> out) const
             continue;
         }
         if (count < 0) {
-            failForSystem("cannot be read");
+            throw std::system_error(errno, std::generic_category(), "cannot be read");
         }
         if (count == 0) {
             fail("is truncated");
@@ -385,4 +379,4 @@ void ZipArchive::readAt(std::uint64_t offset, std::span<std::uint8_t> out) const
     }
 }
 
-}  // namespace platform::package
+}  // namespace platform::package::zip

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "platform/package/zip/zip_writer.h"
+#include "platform/package/zip/writer.h"
 
 #include <libdeflate.h>
 
@@ -7,20 +7,20 @@
 #include <new>
 #include <stdexcept>
 
-#include "platform/package/limits.h"
+#include "platform/package/zip/format.h"
+#include "platform/package/zip/limits.h"
 #include "platform/package/zip/little_endian.h"
-#include "platform/package/zip/zip_format.h"
 
-namespace platform::package {
+namespace platform::package::zip {
 namespace {
 
-constexpr int kCompressionLevel = 6;
-constexpr std::uint16_t kVersion = 20;
-constexpr std::uint16_t kDate = 1U << 5U | 1U;  // 1 January 1980, the first that there is
+constexpr int compressionLevel = 6;
+constexpr std::uint16_t versionNeeded = 20;
+constexpr std::uint16_t dosDate = 1U << 5U | 1U;  // 1 January 1980, the first that there is
 
 // All offsets fit their fields: content, and names in local headers and in the directory.
-static_assert(limits::kMaxTotalBytes + 2 * limits::kMaxDirectoryBytes < zip::kNotIn32Bits);
-static_assert(limits::kMaxEntries < zip::kNotIn16Bits);
+static_assert(maxTotalBytes + 2 * maxDirectoryBytes < notIn32Bits);
+static_assert(maxEntries < notIn16Bits);
 
 bool isAscii(std::string_view text) {
     return std::all_of(text.begin(), text.end(), [](char c) { return (c & 0x80) == 0; });
@@ -28,46 +28,47 @@ bool isAscii(std::string_view text) {
 
 }  // namespace
 
-void ZipWriter::FreeCompressor::operator()(libdeflate_compressor* compressor) const noexcept {
+void Writer::FreeCompressor::operator()(libdeflate_compressor* compressor) const noexcept {
     libdeflate_free_compressor(compressor);
 }
 
-ZipWriter::ZipWriter(AtomicFile& file)
-    : file_(file), compressor_(libdeflate_alloc_compressor(kCompressionLevel)) {
+Writer::Writer(AtomicFile& file, ReusableEntries& previous)
+    : file_(file), previous_(previous), compressor_(libdeflate_alloc_compressor(compressionLevel)) {
     if (!compressor_) {
         throw std::bad_alloc();
     }
 }
 
-void ZipWriter::add(std::string_view name, std::span<const std::uint8_t> content, bool mayDeflate) {
+void Writer::add(std::string_view name, std::span<const std::uint8_t> content, bool mayDeflate) {
     checkLimits(name, content.size());
-    const std::size_t deflatedSize = mayDeflate ? deflateIfWorthIt(content) : 0;
-    const bool isDeflated = deflatedSize != 0;
-    const std::span<const std::uint8_t> data =
-        isDeflated ? std::span<const std::uint8_t>(deflated_.get(), deflatedSize) : content;
+    const std::uint32_t checksum = libdeflate_crc32(0, content.data(), content.size());
+    const std::span<const std::uint8_t> deflated =
+        deflatedForm(name, content, checksum, mayDeflate);
+    const bool isDeflated = !deflated.empty();
+    const std::span<const std::uint8_t> data = isDeflated ? deflated : content;
 
     // What the local header and the directory's entry have in common.
     std::string common;
-    append16(common, kVersion);
-    append16(common, isAscii(name) ? 0 : zip::kUtf8Flag);
-    append16(common, isDeflated ? zip::kDeflated : zip::kStored);
+    append16(common, versionNeeded);
+    append16(common, isAscii(name) ? 0 : utf8Flag);
+    append16(common, isDeflated ? methodDeflated : methodStored);
     append16(common, 0);  // midnight
-    append16(common, kDate);
-    append32(common, libdeflate_crc32(0, content.data(), content.size()));
+    append16(common, dosDate);
+    append32(common, checksum);
     append32(common, static_cast<std::uint32_t>(data.size()));
     append32(common, static_cast<std::uint32_t>(content.size()));
     append16(common, static_cast<std::uint16_t>(name.size()));
     append16(common, 0);  // extra
 
-    append32(directory_, zip::kDirectorySignature);
-    append16(directory_, kVersion);
+    append32(directory_, directorySignature);
+    append16(directory_, versionNeeded);
     directory_.append(common);
     directory_.append(10, '\0');  // comment length, disk, attributes
     append32(directory_, static_cast<std::uint32_t>(offset_));
     directory_.append(name);
 
     std::string header;
-    append32(header, zip::kLocalSignature);
+    append32(header, localSignature);
     header.append(common).append(name);
     write(header);
     write({reinterpret_cast<const char*>(data.data()), data.size()});
@@ -75,11 +76,11 @@ void ZipWriter::add(std::string_view name, std::span<const std::uint8_t> content
     contentSize_ += content.size();
 }
 
-void ZipWriter::finish() {
+void Writer::finish() {
     const std::uint64_t directoryOffset = offset_;
     write(directory_);
     std::string end;
-    append32(end, zip::kEndSignature);
+    append32(end, endSignature);
     append32(end, 0);  // disks
     append16(end, static_cast<std::uint16_t>(entryCount_));
     append16(end, static_cast<std::uint16_t>(entryCount_));
@@ -89,9 +90,20 @@ void ZipWriter::finish() {
     write(end);
 }
 
+// The deflated form of `content`, or nothing if it is to be stored.
+std::span<const std::uint8_t> Writer::deflatedForm(std::string_view name,
+                                                   std::span<const std::uint8_t> content,
+                                                   std::uint32_t checksum, bool mayDeflate) {
+    if (const auto known = previous_.find(name, content, checksum); !known.empty()) {
+        return known;
+    }
+    const std::size_t size = mayDeflate ? deflateIfWorthIt(content) : 0;
+    return {deflated_.get(), size};
+}
+
 // Deflates `content` into deflated_. Returns the size, or zero if that exceeds `maxSize`. What of
 // the buffer is not written to takes no memory.
-std::size_t ZipWriter::deflate(std::span<const std::uint8_t> content, std::size_t maxSize) {
+std::size_t Writer::deflate(std::span<const std::uint8_t> content, std::size_t maxSize) {
     if (deflatedCapacity_ < maxSize) {
         deflated_.reset();
         deflated_ = std::make_unique_for_overwrite<std::uint8_t[]>(maxSize);
@@ -104,7 +116,7 @@ std::size_t ZipWriter::deflate(std::span<const std::uint8_t> content, std::size_
 // Returns the size of the deflated form in deflated_, or zero to store the content. Large content
 // is tried on a sample first, taken from the middle because headers compress even where the rest
 // does not.
-std::size_t ZipWriter::deflateIfWorthIt(std::span<const std::uint8_t> content) {
+std::size_t Writer::deflateIfWorthIt(std::span<const std::uint8_t> content) {
     constexpr std::size_t sampleSize = 65'536;
     constexpr std::size_t worthwhile = sampleSize - sampleSize / 32;
     if (content.empty()) {
@@ -115,28 +127,28 @@ std::size_t ZipWriter::deflateIfWorthIt(std::span<const std::uint8_t> content) {
         return 0;
     }
     const std::size_t size = deflate(content, content.size() - 1);
-    return content.size() / limits::kMaxExpansionRatio < size ? size : 0;
+    return content.size() / maxExpansionRatio < size ? size : 0;
 }
 
-void ZipWriter::checkLimits(std::string_view name, std::uint64_t size) const {
+void Writer::checkLimits(std::string_view name, std::uint64_t size) const {
     constexpr std::size_t maxNameSize = 0xFFFF;
-    if (size > limits::kMaxPartBytes) {
+    if (size > maxEntryBytes) {
         throw std::runtime_error("is too large: " + std::to_string(size) + " bytes, at most " +
-                                 std::to_string(limits::kMaxPartBytes) + " are accepted");
+                                 std::to_string(maxEntryBytes) + " are accepted");
     }
-    if (size > limits::kMaxTotalBytes - contentSize_) {
-        throw std::runtime_error("makes the package larger than " +
-                                 std::to_string(limits::kMaxTotalBytes) + " bytes");
+    if (size > maxTotalBytes - contentSize_) {
+        throw std::runtime_error("makes the package larger than " + std::to_string(maxTotalBytes) +
+                                 " bytes");
     }
-    if (entryCount_ == limits::kMaxEntries || name.size() > maxNameSize ||
-        directory_.size() + zip::kDirectoryEntrySize + name.size() > limits::kMaxDirectoryBytes) {
+    if (entryCount_ == maxEntries || name.size() > maxNameSize ||
+        directory_.size() + directoryEntrySize + name.size() > maxDirectoryBytes) {
         throw std::runtime_error("has one part too many, or too long a name");
     }
 }
 
-void ZipWriter::write(std::string_view bytes) {
+void Writer::write(std::string_view bytes) {
     file_.write(bytes);
     offset_ += bytes.size();
 }
 
-}  // namespace platform::package
+}  // namespace platform::package::zip

@@ -31,29 +31,30 @@
 
 namespace platform::package::zip {
 
-constexpr std::uint32_t kLocalSignature = 0x04034B50;
-constexpr std::uint32_t kDirectorySignature = 0x02014B50;
-constexpr std::uint32_t kEndSignature = 0x06054B50;
-constexpr std::uint32_t kZip64LocatorSignature = 0x07064B50;
-constexpr std::uint32_t kZip64EndSignature = 0x06064B50;
+constexpr std::uint32_t localSignature = 0x04034B50;
+constexpr std::uint32_t directorySignature = 0x02014B50;
+constexpr std::uint32_t endSignature = 0x06054B50;
+constexpr std::uint32_t zip64LocatorSignature = 0x07064B50;
+constexpr std::uint32_t zip64EndSignature = 0x06064B50;
 
-constexpr std::size_t kLocalHeaderSize = 30;
-constexpr std::size_t kDirectoryEntrySize = 46;
-constexpr std::size_t kEndSize = 22;
-constexpr std::size_t kZip64LocatorSize = 20;
-constexpr std::size_t kZip64EndSize = 56;
+constexpr std::size_t localHeaderSize = 30;
+constexpr std::size_t directoryEntrySize = 46;
+constexpr std::size_t endSize = 22;
+constexpr std::size_t zip64LocatorSize = 20;
+constexpr std::size_t zip64EndSize = 56;
 
-constexpr std::uint16_t kStored = 0;
-constexpr std::uint16_t kDeflated = 8;
+constexpr std::uint16_t methodStored = 0;
+constexpr std::uint16_t methodDeflated = 8;
 
-constexpr std::uint16_t kEncryptedFlag = 1U << 0U;
-constexpr std::uint16_t kUtf8Flag = 1U << 11U;
-constexpr std::uint16_t kMaskedDirectoryFlag = 1U << 13U;
+constexpr std::uint16_t encryptedFlag = 1U << 0U;
+constexpr std::uint16_t strongEncryptionFlag = 1U << 6U;
+constexpr std::uint16_t utf8Flag = 1U << 11U;
+constexpr std::uint16_t maskedDirectoryFlag = 1U << 13U;
 
-constexpr std::uint16_t kNotIn16Bits = 0xFFFF;
-constexpr std::uint32_t kNotIn32Bits = 0xFFFFFFFF;
+constexpr std::uint16_t notIn16Bits = 0xFFFF;
+constexpr std::uint32_t notIn32Bits = 0xFFFFFFFF;
 
-constexpr std::uint16_t kZip64Extra = 0x0001;
-constexpr std::uint16_t kUnicodePathExtra = 0x7075;
+constexpr std::uint16_t zip64Extra = 0x0001;
+constexpr std::uint16_t unicodePathExtra = 0x7075;
 
 }  // namespace platform::package::zip

@@ -1,0 +1,45 @@
+// SPDX-License-Identifier: Apache-2.0
+// Deflating is nearly all of what a save takes, and nearly every save changes one part of a
+// document that is on disk already: what is the same is taken over from there as it is.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+
+#include "platform/package/zip/archive.h"
+
+namespace platform::package::zip {
+
+/// The deflated entries of an archive that is about to be replaced, whoever wrote it. The file may
+/// be anything, and may vanish, be cut short or written to at any time: what cannot be had from it,
+/// for whatever reason, is as if it were not there.
+class ReusableEntries {
+public:
+    /// Looks at the archive at the UTF-8 `path`, without waiting for a lease of it. Takes time and
+    /// memory in proportion to its directory.
+    explicit ReusableEntries(const std::string& path);
+
+    /// The deflated bytes of the entry `name` if they expand to exactly `content`, of which
+    /// `checksum` is the CRC-32, and are such as the writer would write: smaller, but not so small
+    /// that readers would take them for a bomb. Else nothing. Valid until the next call. All bytes
+    /// are compared: the checksum only spares expanding what has changed. Takes memory for the
+    /// largest content once more.
+    std::span<const std::uint8_t> find(std::string_view name, std::span<const std::uint8_t> content,
+                                       std::uint32_t checksum) noexcept;
+
+private:
+    std::span<std::uint8_t> scratch(std::size_t size);
+
+    std::optional<Archive> archive_;
+    std::unordered_map<std::string_view, const Archive::Entry*> byName_;  // in archive_
+    std::unique_ptr<std::uint8_t[]> scratch_;
+    std::size_t scratchCapacity_ = 0;
+};
+
+}  // namespace platform::package::zip
