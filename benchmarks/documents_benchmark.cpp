@@ -3,7 +3,9 @@
 // on its bus and by what programs in other languages use. All do the same jobs on the same files:
 //
 //   read_package   a package file to the text of the response
-//   write_package  the text of a request to a package file
+//   write_package  the text of a request to a new package file
+//   save_unchanged the same over a package file with the same content
+//   save_one_word  the same over a package file in which one word of one part is another one
 //   read_text      a text file to the text of the response
 //   write_text     the text of a request to a text file
 //   expand_only    the entries of a package expanded with libdeflate as libzip finds them, and
@@ -86,12 +88,15 @@ json::Object answerTo(const std::string& request) {
     return json::parse(bundle().answer(readRequests, request));
 }
 
-std::string writePackageRequest(const std::string& source, const std::string& target) {
-    json::Object document = answerTo(readRequest(source, "text/xml"));
+std::string writePackageRequest(json::Object document, const std::string& target) {
     return json::serialize(json::Value(json::Object{{"rtcId", "1"},
                                                     {"contentType", "text/xml"},
                                                     {"filePath", target},
                                                     {"content", std::move(document)}}));
+}
+
+std::string writePackageRequest(const std::string& source, const std::string& target) {
+    return writePackageRequest(answerTo(readRequest(source, "text/xml")), target);
 }
 
 std::string writeTextRequest(const std::string& source, const std::string& charset,
@@ -177,7 +182,41 @@ void bundleWrites(benchmark::State& state, const std::string& request, const std
 
 void bundleWritesPackage(benchmark::State& state, const std::string& path) {
     const std::string target = scratch() / "written.docx";
+    const std::string request = writePackageRequest(path, target);
+    measure(state, request.size(), [&] {
+        std::filesystem::remove(target);
+        return bundle().time(writeRequests, DataBuffer::copyOf(request));
+    });
+    state.counters["fileBytes"] = static_cast<double>(std::filesystem::file_size(target));
+    state.counters["originalBytes"] = static_cast<double>(std::filesystem::file_size(path));
+}
+
+void bundleSavesUnchanged(benchmark::State& state, const std::string& path) {
+    const std::string target = scratch() / "written.docx";
+    std::filesystem::remove(target);
     bundleWrites(state, writePackageRequest(path, target), target, path);
+}
+
+// Adds a word to the main text, or to one of the sheets, that is changed with each save.
+void bundleSavesOneWord(benchmark::State& state, const std::string& path) {
+    const std::string target = scratch() / "written.docx";
+    json::Object document = answerTo(readRequest(path, "text/xml"));
+    for (json::Value& value : document["parts"].get<json::Array>()) {
+        auto& part = value.get<json::Object>();
+        const auto& name = part["partUri"].get<std::string>();
+        if (name == "/word/document.xml" || name == "/xl/worksheets/sheet1.xml") {
+            part["content"].get<std::string>() += "<!-- word -->";
+        }
+    }
+    const std::string changed = writePackageRequest(std::move(document), target);
+    const std::string original = writePackageRequest(path, target);
+    bool isChanged = false;
+    require(changed.size() > original.size(), "no part was changed");
+    require(bundle().answer(writeRequests, original) == "true", "the bundle cannot write the file");
+    measure(state, original.size(), [&] {
+        isChanged = !isChanged;
+        return bundle().time(writeRequests, DataBuffer::copyOf(isChanged ? changed : original));
+    });
 }
 
 void bundleWritesText(benchmark::State& state, const std::string& path,
@@ -317,6 +356,16 @@ void addPackages() {
     }
 }
 
+void addSaves() {
+    for (const char* name : {"small.docx", "text-heavy.docx", "mixed.docx", "image-heavy.docx",
+                             "sheets.xlsx", "many-sheets.xlsx"}) {
+        const std::string path = inputs / name;
+        const std::string file = std::string("/") + name;
+        add("save_unchanged/bundle" + file, bundleSavesUnchanged, path);
+        add("save_one_word/bundle" + file, bundleSavesOneWord, path);
+    }
+}
+
 void addTexts() {
     for (const char* size : {"100KB", "5MB", "50MB"}) {
         for (const auto& [name, charset] :
@@ -354,6 +403,7 @@ int main(int argc, char** argv) {
         return 1;
     }
     benchmarks::addPackages();
+    benchmarks::addSaves();
     benchmarks::addTexts();
     benchmarks::addSmallRequests();
     benchmark::RunSpecifiedBenchmarks();

@@ -68,6 +68,9 @@ class Growth:
     unit: str
     inputs: str = ""
 
+    def more_is_better(self):
+        return False
+
 
 @dataclasses.dataclass
 class Section:
@@ -115,6 +118,8 @@ SECTIONS = {
             Row("read_package", "MB/s", [Ratio(4, ("python",), "4 × Python"),
                                          Ratio(0.6, ("expand_only",), "60 % of expanding only")]),
             Row("write_package", "MB/s", [Ratio(3, text="3 × the best")]),
+            Row("save_unchanged", "MB/s", []),
+            Row("save_one_word", "MB/s", []),
             Row("read_text", "MB/s", [Ratio(10, ("node",), "10 × Node"), Limit(1000, "1 GB/s")],
                 inputs="utf-8"),
             Row("read_text", "MB/s", [Ratio(3, text="3 × the best")], inputs="shift_jis|windows"),
@@ -150,8 +155,8 @@ SECTIONS = {
 # ---- Running ----
 
 
-def build():
-    """Installs what the benchmarks need, and builds them as the product is built."""
+def build(root=ROOT, peers=True):
+    """Installs what the benchmarks of the sources in `root` need, and builds them as the product is built."""
     script = """
         set -euo pipefail
         root=$1
@@ -160,27 +165,31 @@ def build():
         install_packages "$root/packaging/debian-packages-benchmarks.txt"
         build benchmarks -DCMAKE_BUILD_TYPE=Release -DBUILD_TESTING=OFF \\
             -DEDITOR_SERIALIZATION_BENCHMARKS=ON
-        [[ -d $root/benchmarks/peers/node_modules ]] ||
+        [[ -z $2 || -d $root/benchmarks/peers/node_modules ]] ||
             (cd "$root/benchmarks/peers" && quietly npm npm ci)
     """
-    subprocess.run(["bash", "-c", script, "build", str(ROOT)], check=True)
+    subprocess.run(["bash", "-c", script, "build", str(root), "peers" if peers else ""], check=True)
 
 
-def command_of(program, repetitions):
+def command_of(program, repetitions, root, only):
+    """The command of a program of the sources in `root`; `only` is the one of whom it tells, if not all."""
     if isinstance(program, list):
-        return [str(repetitions) if word == REPETITIONS else word for word in program]
-    return [str(BUILD / "bin" / program), f"--benchmark_repetitions={repetitions}",
+        return [str(repetitions) if word == REPETITIONS else word.replace(str(ROOT), str(root))
+                for word in program]
+    return [str(root / BUILD.relative_to(ROOT) / "bin" / program), f"--benchmark_repetitions={repetitions}",
             "--benchmark_enable_random_interleaving=true", "--benchmark_format=json",
-            "--benchmark_min_time=0.1"]
+            "--benchmark_min_time=0.1"] + ([f"--benchmark_filter=/{only}(/|$)"] if only else [])
 
 
-def results_of(section, repetitions):
+def results_of(section, repetitions, root=ROOT, only_ours=False):
     """All that the section's programs print about single repetitions."""
     results = []
     for program in section.programs:
-        command = command_of(program, repetitions)
+        if only_ours and isinstance(program, list) and program[0] == "node":
+            continue
+        command = command_of(program, repetitions, root, section.ours if only_ours else "")
         print("== " + " ".join(command), file=sys.stderr)
-        output = subprocess.run(command, cwd=ROOT, check=True, stdout=subprocess.PIPE, text=True).stdout
+        output = subprocess.run(command, cwd=root, check=True, stdout=subprocess.PIPE, text=True).stdout
         repetitions_of_all = [result for result in json.loads(output)["benchmarks"]
                               if result.get("run_type", "iteration") == "iteration"]
         for result in repetitions_of_all:
@@ -215,15 +224,20 @@ def split(name, order):
     return collections.defaultdict(str, zip(order, words, strict=True))
 
 
-def medians(section, row, results):
-    """The median of each <who>, for each <input> in the order of the results."""
-    figures = collections.defaultdict(lambda: collections.defaultdict(list))
+def figures(section, row, results):
+    """All figures of each <who>, for each <input> in the order of the results."""
+    found = collections.defaultdict(lambda: collections.defaultdict(list))
     for result in results:
         name = split(result["name"], section.order)
         if name["what"] == row.what and re.search(row.inputs, name["input"]):
-            figures[name["input"]][name["who"]].append(figure_of(result, row.unit))
+            found[name["input"]][name["who"]].append(figure_of(result, row.unit))
+    return found
+
+
+def medians(section, row, results):
+    """The median of each <who>, for each <input> in the order of the results."""
     return {given: {who: statistics.median(values) for who, values in by_who.items()}
-            for given, by_who in figures.items()}
+            for given, by_who in figures(section, row, results).items()}
 
 
 def shown(figure):
@@ -266,11 +280,11 @@ def growth_lines(section, row, results):
     by_size = medians(section, row, results)
     if not by_size:
         return []
-    figures = [by_who[section.ours] for by_who in by_size.values()]
+    ours = [by_who[section.ours] for by_who in by_size.values()]
     return ["", f"{row.what}, {row.unit}:", "",
             "| " + " | ".join(by_size) + " |",
-            "|" + "---:|" * len(figures),
-            "| " + " | ".join(shown(figure) for figure in figures) + " |"]
+            "|" + "---:|" * len(ours),
+            "| " + " | ".join(shown(figure) for figure in ours) + " |"]
 
 
 def table_of(section, results):
@@ -327,4 +341,5 @@ def main():
             write(name, text)
 
 
-main()
+if __name__ == "__main__":
+    main()

@@ -163,11 +163,11 @@ def word_document(seed, text_size, image_count, image_side):
     return package("word/document.xml", WORD + "document.main+xml", parts, images)
 
 
-def workbook(seed, rows):
+def workbook(seed, rows, sheets=3):
     rng = random.Random(seed)
     parts = [("xl/workbook.xml", SHEET + "sheet.main+xml", sheet_xml(rng, 5))]
     parts += [(f"xl/worksheets/sheet{i}.xml", SHEET + "worksheet+xml", sheet_xml(rng, rows))
-              for i in range(1, 4)]
+              for i in range(1, sheets + 1)]
     return package("xl/workbook.xml", SHEET + "sheet.main+xml", parts, [])
 
 
@@ -177,6 +177,7 @@ def make_packages(folder):
     write(folder / "mixed.docx", lambda: word_document("mixed", 4_000_000, 8, 400))
     write(folder / "image-heavy.docx", lambda: word_document("images", 300_000, 20, 600))
     write(folder / "sheets.xlsx", lambda: workbook("sheets", 8_000))
+    write(folder / "many-sheets.xlsx", lambda: workbook("many sheets", 1_000, 24))
 
 
 def write(path, make):
