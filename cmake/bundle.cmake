@@ -8,14 +8,19 @@
 function(project_bundle target)
   cmake_parse_arguments(arg "" "NAME;MANIFEST" "SOURCES;LINKS" ${ARGN})
   cmake_path(ABSOLUTE_PATH arg_MANIFEST NORMALIZE)
-  set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS "${arg_MANIFEST}")
-
   set(BUNDLE_NAME "${arg_NAME}")
-  file(READ "${arg_MANIFEST}" BUNDLE_MANIFEST)
+  set(BUNDLE_ARCHIVE "${CMAKE_CURRENT_BINARY_DIR}/${arg_NAME}_resources.zip")
   set(resources "${CMAKE_CURRENT_BINARY_DIR}/${arg_NAME}_resources.cpp")
   set(exports "${CMAKE_CURRENT_BINARY_DIR}/${arg_NAME}_exports.map")
   configure_file("${PROJECT_SOURCE_DIR}/framework/bundle_resources.cpp.in" "${resources}" @ONLY)
   configure_file("${PROJECT_SOURCE_DIR}/framework/bundle_exports.map.in" "${exports}" @ONLY)
+
+  add_custom_command(
+    OUTPUT "${BUNDLE_ARCHIVE}"
+    COMMAND make_manifest_archive "${arg_NAME}" "${arg_MANIFEST}" "${BUNDLE_ARCHIVE}"
+    DEPENDS make_manifest_archive "${arg_MANIFEST}"
+    VERBATIM)
+  set_source_files_properties("${resources}" PROPERTIES OBJECT_DEPENDS "${BUNDLE_ARCHIVE}")
 
   add_library(${target} MODULE ${arg_SOURCES} "${resources}")
   set_target_properties(${target} PROPERTIES OUTPUT_NAME "${arg_NAME}" LINK_DEPENDS "${exports}")

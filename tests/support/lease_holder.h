@@ -20,7 +20,7 @@ public:
     LeaseHolder& operator=(const LeaseHolder&) = delete;
     ~LeaseHolder();
 
-    /// Whether it could be had: not all file systems know leases.
+    /// Whether the lease was granted: not all file systems know leases.
     bool hasLease() const noexcept { return hasLease_; }
 
 private:
