@@ -17,8 +17,8 @@
 namespace platform::package::zip {
 
 /// The deflated entries of an archive that is about to be replaced, whoever wrote it. The file may
-/// be anything, and may vanish, be cut short or written to at any time: what cannot be read from it,
-/// for whatever reason, counts as not there.
+/// be anything, and may vanish, be cut short or written to at any time: what cannot be read from
+/// it, for whatever reason, counts as not there.
 class ReusableEntries {
 public:
     /// Looks at the archive at the UTF-8 `path`, without waiting for a lease of it. Takes time and
