@@ -9,7 +9,7 @@ round runs both, one after the other and in changing order, so that what else th
 falls on both. SECTION is one or more of those of benchmarks/run.py; without any, all are run.
 
 A figure has changed when the middle halves of its values, from the first to the third quartile, do not
-overlap, and the medians differ by more than 3 %. Whatever changes less is noise, or cannot be told from
+overlap, and the medians differ by more than 5 %. Whatever changes less is noise, or cannot be told from
 it. The exit status is 1 when something became slower.
 """
 import argparse
@@ -22,7 +22,7 @@ import tempfile
 
 import run
 
-SMALLEST_CHANGE = 0.03
+SMALLEST_CHANGE = 0.05
 
 
 def checkout(commit, folder):
