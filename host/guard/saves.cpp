@@ -14,6 +14,7 @@
 #include "host/guard/document_version.h"
 #include "host/guard/file_content.h"
 #include "host/guard/in_place_file.h"
+#include "json/parser.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/posix/atomic_file.h"
 
@@ -53,13 +54,18 @@ FileDescriptor openRegular(const std::string& path) {
 // Whether the file holds the text that `request` asks for. The text is nearly always stored as it
 // comes; but some charsets can write the same text in several ways.
 bool holdsTextOf(const WriteRequest& request, int file) {
-    if (hasContent(file, request.text)) {
+    if (hasContentOf(file, request.text)) {
         return true;
+    }
+    json::Input input{request.text.data(), request.text.data() + request.text.size()};
+    std::string bytes;
+    if (json::parseString(input, bytes) != json::Status::success) {
+        return false;
     }
     try {
         platform::i18n::codecvt_string_to_ustring decoder(request.encoding, true);
         platform::i18n::codecvt_ustring_to_string encoder(request.encoding, true);
-        const std::u16string text = platform::i18n::to_ustring(request.text, decoder);
+        const std::u16string text = platform::i18n::to_ustring(bytes, decoder);
         return hasContent(file, platform::i18n::to_string(text, encoder));
     } catch (const std::runtime_error&) {
         return false;

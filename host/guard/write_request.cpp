@@ -12,6 +12,7 @@
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "json/string_kernels.h"
+#include "platform/large_pages.h"
 
 namespace host {
 
@@ -125,12 +126,15 @@ std::optional<WriteRequest> readWriteRequest(std::string_view payload) {
         return std::nullopt;
     }
     request.isPackage = contentType == packageContentType;
-    const bool hasContent = request.isPackage
-                                ? textOf(*members, "content").starts_with('{')
-                                : readString(*members, "encoding", request.encoding) &&
-                                      readString(*members, "content", request.text);
-    if (!hasContent) {
+    const std::string_view content = textOf(*members, "content");
+    if (!content.starts_with(request.isPackage ? '{' : '"')) {
         return std::nullopt;
+    }
+    if (!request.isPackage) {
+        request.text = content.substr(0, content.rfind('"') + 1);
+        if (!readString(*members, "encoding", request.encoding)) {
+            return std::nullopt;
+        }
     }
     if (const std::string_view text = textOf(*members, "baseVersion"); !text.empty()) {
         json::Input input{text.data(), text.data() + text.size()};
@@ -143,7 +147,7 @@ std::optional<WriteRequest> readWriteRequest(std::string_view payload) {
 
 std::string withFilePath(std::string_view payload, const std::string& filePath) {
     std::string result = "{\"filePath\":" + json::serialize(json::Value(filePath)) + ",";
-    result.reserve(result.size() + payload.size());
+    platform::reserveLarge(result, result.size() + payload.size());
     return result.append(payload.substr(1));
 }
 

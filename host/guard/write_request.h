@@ -10,8 +10,7 @@
 
 namespace host {
 
-/// The members of a write request that say what is to be saved where. Of a text it holds the whole
-/// content.
+/// The members of a write request that say what is to be saved where.
 struct WriteRequest {
     std::string rtcId;
     std::string filePath;

@@ -21,7 +21,7 @@ TEST(WriteRequest, HasTheMembersOfATextWhateverTheirOrder) {
     EXPECT_EQ(request->rtcId, "7");
     EXPECT_EQ(request->filePath, "/a");
     EXPECT_FALSE(request->isPackage);
-    EXPECT_EQ(request->text, "a\"é");
+    EXPECT_EQ(request->text, R"("a\"\u00e9")");
     EXPECT_EQ(request->encoding, "UTF-8");
     EXPECT_TRUE(request->baseVersion.is<json::Undefined>());
 }
