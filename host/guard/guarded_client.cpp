@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "host/guard/guarded_client.h"
 
+#include <cstddef>
 #include <exception>
 #include <optional>
 #include <stdexcept>
@@ -92,6 +93,10 @@ public:
         futures::Promise<void> promise;
         promise.setValue();
         return promise.getFuture();
+    }
+
+    std::size_t maxPayload(const std::string& channel) const override {
+        return client_->maxPayload(channel);
     }
 
 private:
