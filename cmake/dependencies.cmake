@@ -3,8 +3,7 @@
 
 find_package(Threads REQUIRED)
 find_package(PkgConfig REQUIRED)
-find_package(ICU REQUIRED COMPONENTS uc i18n)
-pkg_check_modules(uchardet REQUIRED IMPORTED_TARGET uchardet)
+find_package(ICU REQUIRED COMPONENTS uc)
 find_package(simdjson REQUIRED)
 pkg_check_modules(libdeflate REQUIRED IMPORTED_TARGET libdeflate)
 find_package(EXPAT REQUIRED)

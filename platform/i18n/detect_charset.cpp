@@ -1,9 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 // Detection of the charset of a text file.
 //
-// In this order: a byte-order mark; UTF-16 and UTF-32 without one; charsets of escape sequences;
-// UTF-8; the legacy charsets, ranked by how plausible their text is. Whatever is returned decodes
-// the whole file and encodes it back to the same bytes.
+// In this order: a byte-order mark; ASCII, charsets of escape sequences, UTF-8, and UTF-16 and
+// UTF-32 without a mark; the legacy charsets, by what the text costs in each
+// (detection/likeliest_charset.cpp). Whatever is returned decodes the whole file and, but for
+// escape sequences that no converter writes, encodes it back to the same bytes.
 #include "platform/i18n/detect_charset.h"
 
 #include <simdjson.h>
@@ -19,11 +20,11 @@
 #include <vector>
 
 #include "platform/i18n/charsets/charset.h"
-#include "platform/i18n/charsets/escape_charsets.h"
 #include "platform/i18n/codecvt.h"
-#include "platform/i18n/detection/ranking.h"
+#include "platform/i18n/detection/escape_sequences.h"
+#include "platform/i18n/detection/likeliest_charset.h"
 #include "platform/i18n/detection/sample.h"
-#include "platform/i18n/detection/unicode_guess.h"
+#include "platform/i18n/detection/unmarked_unicode.h"
 
 namespace platform::i18n {
 
@@ -112,24 +113,27 @@ bool isDamagedUtf8(std::string_view sample) {
 
 std::string legacyCharset(std::string_view bytes) {
     const std::string sample = detail::charsetSample(bytes);
-    const std::optional<detail::UnicodeGuess> unicode = detail::unmarkedUnicode(bytes);
+    const std::optional<detail::UnmarkedUnicode> unicode = detail::unmarkedUnicode(bytes);
+    const std::string otherwise = unicode ? unicode->charset : "";
     if (isBinary(sample) || isDamagedUtf8(sample)) {
-        return unicode ? unicode->charset : std::string();
+        return otherwise;
     }
-    detail::Ranking ranking(sample, bytes);
-    const detail::Candidate* candidate = ranking.next();
-    if (unicode && (candidate == nullptr ||
-                    unicode->bitsPerByte < ranking.cost() / static_cast<double>(sample.size()))) {
-        return unicode->charset;
-    }
-    for (; candidate != nullptr; candidate = ranking.next()) {
-        const detail::Candidate::Fit fit = candidate->fit(bytes);
-        // Where the right charset would not give the bytes back, no other is right either.
-        if (fit.decodes) {
-            return fit.charset;
+    std::vector<const detail::LegacyCharset*> excluded;
+    while (const auto likely = detail::likeliestCharset(sample, bytes, excluded)) {
+        if (unicode && unicode->bitsPerByte * static_cast<double>(sample.size()) <
+                           static_cast<double>(likely->cost) / detail::bits(1)) {
+            return otherwise;
         }
+        const detail::LegacyCharset::Fit fit = likely->charset->fit(bytes);
+        if (fit.decodes) {
+            // Where the right charset would not give the bytes back, no other is right either.
+            return fit.name == likely->charset->name()
+                       ? detail::largestThatAgrees(*likely->charset, bytes).name()
+                       : fit.name;
+        }
+        excluded.push_back(likely->charset);
     }
-    return {};
+    return otherwise;
 }
 
 std::string findCharset(std::string_view bytes) {
@@ -146,7 +150,7 @@ std::string findCharset(std::string_view bytes) {
         }
     }
     if (bytes.find('\0') != std::string_view::npos || isBinary(bytes)) {
-        const std::optional<detail::UnicodeGuess> unicode = detail::unmarkedUnicode(bytes);
+        const std::optional<detail::UnmarkedUnicode> unicode = detail::unmarkedUnicode(bytes);
         return unicode ? unicode->charset : "UTF-8";
     }
     return "UTF-8";

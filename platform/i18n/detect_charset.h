@@ -19,10 +19,12 @@ void requireTextLength(std::uintmax_t length);
 
 /// The charset of the `length` bytes at `data`, by its IANA preferred name ("UTF-8", "Shift_JIS",
 /// "windows-1251"); always one that both converters accept and in which all the bytes decode
-/// strictly. A byte-order mark decides; empty, ASCII and valid UTF-8 input is "UTF-8"; what fits
-/// nothing is "ISO-8859-1", which holds every byte, and only then one line that names `sourceName`
-/// is written to `diagnostics`. Throws std::runtime_error when `length` is above maxTextLength.
-/// Linear in `length`.
+/// strictly; they also encode back to the same bytes, except where escape sequences of ISO-2022 or
+/// HZ are spelt in a way that no converter writes. A byte-order mark decides; empty, ASCII and
+/// valid UTF-8 input is "UTF-8"; of charsets that agree on all bytes, the one that holds more
+/// characters is named; what fits nothing is "ISO-8859-1", which holds every byte, and only then
+/// one line that names `sourceName` is written to `diagnostics`. Throws std::runtime_error when
+/// `length` is above maxTextLength. Linear in `length`.
 std::string detect_charset(const char* data, std::size_t length, std::ostream& diagnostics,
                            std::u16string_view sourceName);
 

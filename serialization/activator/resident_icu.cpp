@@ -4,14 +4,13 @@
 // bundle, they would be lost, and made anew with the next loading.
 
 #include <dlfcn.h>
-#include <unicode/ucsdet.h>
+#include <unicode/ucnv.h>
 
 namespace {
 
 [[gnu::constructor]] void keepIcuLoaded() {
-    // The library of the detector needs that of the converters, and so keeps it too.
     Dl_info icu;
-    if (dladdr(reinterpret_cast<void*>(&ucsdet_open), &icu) != 0) {
+    if (dladdr(reinterpret_cast<void*>(&ucnv_open), &icu) != 0) {
         dlopen(icu.dli_fname, RTLD_LAZY | RTLD_NOLOAD | RTLD_NODELETE);
     }
 }

@@ -1,14 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "tests/support/failing_malloc.h"
 
-#include <link.h>
-
-#include <algorithm>
-#include <array>
 #include <atomic>
 #include <cerrno>
-#include <cstdint>
-#include <cstring>
 #include <limits>
 
 namespace {
@@ -27,25 +21,11 @@ std::atomic<long> lastFailing = kNever;
 
 thread_local int sparing = 0;
 
-// Where the spared libraries lie.
-struct Range {
-    std::uintptr_t begin = 0;
-    std::uintptr_t end = 0;
-};
-std::array<Range, 8> sparedRanges;
-
-bool isSpared(const void* caller) {
-    const auto address = reinterpret_cast<std::uintptr_t>(caller);
-    return std::any_of(sparedRanges.begin(), sparedRanges.end(), [&](const Range& range) {
-        return address >= range.begin && address < range.end;
-    });
-}
-
-bool fails(std::size_t size, const void* caller) {
+bool fails(std::size_t size) {
     if (size != 0 && size == failingSize && allocationsToSpare-- <= 0) {
         return true;
     }
-    if (!isCounting || sparing > 0 || isSpared(caller)) {
+    if (!isCounting || sparing > 0) {
         return false;
     }
     const long index = allocations++;
@@ -63,7 +43,7 @@ void* __libc_realloc(void* block, std::size_t size);
 // Visible, or clang would keep them from what the program loads.
 
 [[gnu::visibility("default")]] void* malloc(std::size_t size) {
-    if (fails(size, __builtin_return_address(0))) {
+    if (fails(size)) {
         errno = ENOMEM;
         return nullptr;
     }
@@ -71,7 +51,7 @@ void* __libc_realloc(void* block, std::size_t size);
 }
 
 [[gnu::visibility("default")]] void* calloc(std::size_t count, std::size_t size) {
-    if (fails(count * size, __builtin_return_address(0))) {
+    if (fails(count * size)) {
         errno = ENOMEM;
         return nullptr;
     }
@@ -79,7 +59,7 @@ void* __libc_realloc(void* block, std::size_t size);
 }
 
 [[gnu::visibility("default")]] void* realloc(void* block, std::size_t size) {
-    if (fails(size, __builtin_return_address(0))) {
+    if (fails(size)) {
         errno = ENOMEM;
         return nullptr;
     }
@@ -100,30 +80,6 @@ void failAllocation(long index, Failing which) {
     firstFailing = index;
     lastFailing = which == Failing::one ? index : kNever;
     isCounting = true;
-}
-
-void spareLibraries(const char* name) {
-    struct Search {
-        const char* name;
-        std::size_t found;
-    } search{name, 0};
-    sparedRanges = {};
-    const auto visit = [](dl_phdr_info* library, std::size_t, void* data) {
-        auto& sought = *static_cast<Search*>(data);
-        if (std::strstr(library->dlpi_name, sought.name) != nullptr) {
-            Range& range = sparedRanges.at(sought.found++);
-            range.begin = library->dlpi_addr;
-            for (int i = 0; i < library->dlpi_phnum; ++i) {
-                const auto& segment = library->dlpi_phdr[i];
-                range.end = std::max<std::uintptr_t>(
-                    range.end, library->dlpi_addr + segment.p_vaddr + segment.p_memsz);
-            }
-        }
-        return 0;
-    };
-    if (name != nullptr) {
-        dl_iterate_phdr(visit, &search);
-    }
 }
 
 long stopFailing() {

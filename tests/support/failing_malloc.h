@@ -17,10 +17,6 @@ enum class Failing { one, allFromThere };
 /// follow. Threads with a SparedThread neither fail nor count.
 void failAllocation(long index, Failing which);
 
-/// Keeps what the libraries that are loaded now, with `name` in their path, allocate from failing
-/// and from being counted; nullptr ends that. To be called while nothing fails.
-void spareLibraries(const char* name);
-
 /// Ends what failAllocation began, and returns how many allocations it counted.
 long stopFailing();
 

@@ -61,6 +61,35 @@ constexpr Table viscii = [] {
     return table;
 }();
 
+// Kazakh, as Windows and as older systems of Central Asia write it; the bytes from 80. Byte 98
+// stands for nothing in KZ-1048: it is a control code, as in windows-1251.
+constexpr Table kz1048 = tableOf(
+    u"\u0402\u0403\u201A\u0453\u201E\u2026\u2020\u2021\u20AC\u2030\u0409\u2039"
+    u"\u040A\u049A\u04BA\u040F\u0452\u2018\u2019\u201C\u201D\u2022\u2013\u2014"
+    u"\x98\u2122\u0459\u203A\u045A\u049B\u04BB\u045F\u00A0\u04B0\u04B1\u04D8"
+    u"\u00A4\u04E8\u00A6\u00A7\u0401\u00A9\u0492\u00AB\u00AC\u00AD\u00AE\u04AE"
+    u"\u00B0\u00B1\u0406\u0456\u04E9\u00B5\u00B6\u00B7\u0451\u2116\u0493\u00BB"
+    u"\u04D9\u04A2\u04A3\u04AF\u0410\u0411\u0412\u0413\u0414\u0415\u0416\u0417"
+    u"\u0418\u0419\u041A\u041B\u041C\u041D\u041E\u041F\u0420\u0421\u0422\u0423"
+    u"\u0424\u0425\u0426\u0427\u0428\u0429\u042A\u042B\u042C\u042D\u042E\u042F"
+    u"\u0430\u0431\u0432\u0433\u0434\u0435\u0436\u0437\u0438\u0439\u043A\u043B"
+    u"\u043C\u043D\u043E\u043F\u0440\u0441\u0442\u0443\u0444\u0445\u0446\u0447"
+    u"\u0448\u0449\u044A\u044B\u044C\u044D\u044E\u044F",
+    0x80);
+constexpr Table ptcp154 = tableOf(
+    u"\u0496\u0492\u04EE\u0493\u201E\u2026\u04B6\u04AE\u04B2\u04AF\u04A0\u04E2"
+    u"\u04A2\u049A\u04BA\u04B8\u0497\u2018\u2019\u201C\u201D\u2022\u2013\u2014"
+    u"\u04B3\u04B7\u04A1\u04E3\u04A3\u049B\u04BB\u04B9\u00A0\u040E\u045E\u0408"
+    u"\u04E8\u0498\u04B0\u00A7\u0401\u00A9\u04D8\u00AB\u00AC\u04EF\u00AE\u049C"
+    u"\u00B0\u04B1\u0406\u0456\u0499\u04E9\u00B6\u00B7\u0451\u2116\u04D9\u00BB"
+    u"\u0458\u04AA\u04AB\u049D\u0410\u0411\u0412\u0413\u0414\u0415\u0416\u0417"
+    u"\u0418\u0419\u041A\u041B\u041C\u041D\u041E\u041F\u0420\u0421\u0422\u0423"
+    u"\u0424\u0425\u0426\u0427\u0428\u0429\u042A\u042B\u042C\u042D\u042E\u042F"
+    u"\u0430\u0431\u0432\u0433\u0434\u0435\u0436\u0437\u0438\u0439\u043A\u043B"
+    u"\u043C\u043D\u043E\u043F\u0440\u0441\u0442\u0443\u0444\u0445\u0446\u0447"
+    u"\u0448\u0449\u044A\u044B\u044C\u044D\u044E\u044F",
+    0x80);
+
 class SingleByteCharset final : public Charset {
 public:
     SingleByteCharset(std::string name, const Table& table, bool strict)
@@ -115,6 +144,14 @@ std::unique_ptr<Charset> makeIso8859_16(std::string name, bool strict) {
 
 std::unique_ptr<Charset> makeViscii(std::string name, bool strict) {
     return std::make_unique<SingleByteCharset>(std::move(name), viscii, strict);
+}
+
+std::unique_ptr<Charset> makeKz1048(std::string name, bool strict) {
+    return std::make_unique<SingleByteCharset>(std::move(name), kz1048, strict);
+}
+
+std::unique_ptr<Charset> makePtcp154(std::string name, bool strict) {
+    return std::make_unique<SingleByteCharset>(std::move(name), ptcp154, strict);
 }
 
 }  // namespace platform::i18n::detail

@@ -12,5 +12,7 @@ namespace platform::i18n::detail {
 /// Open these charsets; `name` is what error texts call them.
 std::unique_ptr<Charset> makeIso8859_16(std::string name, bool strict);
 std::unique_ptr<Charset> makeViscii(std::string name, bool strict);
+std::unique_ptr<Charset> makeKz1048(std::string name, bool strict);
+std::unique_ptr<Charset> makePtcp154(std::string name, bool strict);
 
 }  // namespace platform::i18n::detail

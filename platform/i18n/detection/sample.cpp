@@ -12,11 +12,15 @@ namespace platform::i18n::detail {
 
 namespace {
 
-constexpr std::size_t wholeFileLimit = std::size_t{24} * 1024;
+// Four times as much decides no differently on 16,164 texts in 60 charsets.
+constexpr std::size_t wholeFileLimit = std::size_t{6} * 1024;
 constexpr std::size_t pieceCount = 16;
-constexpr std::size_t pieceSize = 1024;
+constexpr std::size_t pieceSize = 256;
+// How far a piece may grow to begin and end where no character is cut: some texts have neither
+// blanks nor ends of lines for pages. A word around a rare byte is shorter.
 constexpr std::size_t boundarySearch = std::size_t{16} * 1024;
 constexpr std::size_t wordSearch = 64;
+// Of each byte value: one may be a slip.
 constexpr int wantedOccurrences = 2;
 
 bool isBeyondAscii(char byte) {

@@ -9,10 +9,13 @@ whose message catalogues and translated help pages serve as samples of each lang
 letters and pairs of letters are kept.
 
     apt coreutils dpkg freeciv-data gettext gimp-data gnome-user-docs gnucash-common iso-codes
-    libglib2.0-data libgtk-3-common stellarium-data vlc-l10n
+    libglib2.0-data libgtk-3-common mediawiki stellarium-data vlc-l10n
+
+Of mediawiki, only languages/i18n/*.json serves, and only for languages of which the others hold little.
 """
 import collections
 import html
+import json
 import math
 import os
 import re
@@ -24,13 +27,21 @@ import unicodedata
 ALPHABETIC = {
     'en': ['en_GB', 'en_CA', 'en_AU'], 'fr': ['fr'], 'de': ['de'], 'es': ['es', 'es_MX'],
     'pt': ['pt', 'pt_BR'], 'it': ['it'], 'nl': ['nl'], 'sv': ['sv'], 'da': ['da'],
-    'nb': ['nb', 'nn'], 'fi': ['fi'], 'is': ['is'], 'ga': ['ga', 'gd'], 'cy': ['cy'], 'ca': ['ca'],
-    'gl': ['gl'], 'eu': ['eu'], 'br': ['br'], 'af': ['af'], 'pl': ['pl'], 'cs': ['cs'], 'sk': ['sk'],
-    'hu': ['hu'], 'sl': ['sl'], 'hr': ['hr', 'bs', 'sr@latin'], 'ro': ['ro'], 'sq': ['sq'],
+    'nb': ['nb', 'nn'], 'fi': ['fi'], 'is': ['is'], 'ga': ['ga', 'gd'], 'cy': ['cy', 'wiki-cy'],
+    'ca': ['ca'],
+    'gl': ['gl'], 'eu': ['eu'], 'br': ['br', 'wiki-br'], 'af': ['af', 'wiki-af'],
+    'pl': ['pl'], 'cs': ['cs'], 'sk': ['sk'],
+    'hu': ['hu'], 'sl': ['sl'], 'hr': ['hr', 'bs', 'sr@latin'], 'ro': ['ro'], 'sq': ['sq', 'wiki-sq'],
     'tr': ['tr'], 'et': ['et'], 'lv': ['lv'], 'lt': ['lt'], 'eo': ['eo'], 'vi': ['vi'],
-    'ru': ['ru'], 'uk': ['uk'], 'be': ['be'], 'bg': ['bg'], 'mk': ['mk'], 'sr': ['sr', 'sr@ije'],
-    'el': ['el'], 'he': ['he'], 'ar': ['ar'], 'fa': ['fa'], 'ur': ['ur'], 'th': ['th'],
+    'mt': ['mt', 'wiki-mt'],
+    'ru': ['ru'], 'uk': ['uk'], 'be': ['be'], 'bg': ['bg'], 'mk': ['mk', 'wiki-mk'],
+    'sr': ['sr', 'sr@ije'], 'kk': ['kk', 'wiki-kk-cyrl'],
+    'el': ['el'], 'he': ['he'], 'ar': ['ar'], 'fa': ['fa'], 'ur': ['ur', 'wiki-ur'], 'th': ['th'],
 }
+# One page in many languages: about as much of each.
+WESTERN = ['en', 'fr', 'de', 'es', 'pt', 'it', 'nl', 'sv', 'da', 'nb', 'fi', 'is', 'ga', 'ca', 'gl', 'eu',
+           'br', 'af', 'sq']
+WESTERN_SHARE = 100000
 # The languages written with thousands of characters, and how many of them are kept.
 IDEOGRAPHIC = {
     'zh-Hans': (['zh_CN'], 3000), 'zh-Hant': (['zh_TW', 'zh_HK'], 3000), 'ja': (['ja'], 2200),
@@ -72,11 +83,14 @@ LETTERS = {
     'lv': '\u0101\u010d\u0113\u0123\u012b\u0137\u013c\u0146\u0161\u016b\u017e\u014d\u0157',
     'lt': '\u0105\u010d\u0119\u0117\u012f\u0161\u0173\u016b\u017e',
     'eo': '\u0109\u011d\u0125\u0135\u015d\u016d',
+    'mt': '\u0121\u0127\u010b\u017c\u00e0\u00e8\u00ec\u00f2\u00f9\u00e9',
 }
+LETTERS['western'] = ''.join(sorted(set(''.join(LETTERS[language] for language in WESTERN)) -
+                                    set('\u0161\u017e')))
 
 SCRIPTS = {
     'ru': 'CYRILLIC', 'uk': 'CYRILLIC', 'be': 'CYRILLIC', 'bg': 'CYRILLIC', 'mk': 'CYRILLIC',
-    'sr': 'CYRILLIC', 'el': 'GREEK', 'he': 'HEBREW', 'ar': 'ARABIC', 'fa': 'ARABIC', 'ur': 'ARABIC',
+    'sr': 'CYRILLIC', 'kk': 'CYRILLIC', 'el': 'GREEK', 'he': 'HEBREW', 'ar': 'ARABIC', 'fa': 'ARABIC', 'ur': 'ARABIC',
     'th': 'THAI',
 }
 
@@ -121,6 +135,10 @@ def read_texts(folder):
                 texts[locale.group(1)] += map(plain, catalogue_messages(path))
             elif name.endswith('.page') and locale:
                 texts[locale.group(1)].append(plain(open(path, encoding='utf-8').read()))
+            elif name.endswith('.json') and where.endswith('/languages/i18n'):
+                with open(path, encoding='utf-8') as file:
+                    messages = json.load(file).values()
+                texts['wiki-' + name[:-5]] += [plain(m) for m in messages if isinstance(m, str)]
             elif suffix:
                 texts[suffix.group(1)].append(plain(open(path, encoding='utf-8').read()))
     return {locale: '\n'.join(parts) for locale, parts in texts.items()}
@@ -222,14 +240,17 @@ def wrapped(text, per_line):
 
 def main():
     texts = read_texts(sys.argv[1])
-    print('// How often letters follow each other in each language. Made by\n'
+    print('// SPDX-License-Identifier: Apache-2.0\n'
+          '// How often letters follow each other in each language. Made by\n'
           '// tools/make_language_tables.py, which says from what; not to be edited.\n'
           '#include "platform/i18n/detection/language_tables.h"\n\n'
           '#include <array>\n\n'
           'namespace platform::i18n::detail {\n\nnamespace {\n\n// clang-format off\n')
     tables = []
-    for language, locales in ALPHABETIC.items():
-        sample = fold('\n'.join(texts.get(l, '') for l in locales))
+    samples = {language: fold('\n'.join(texts.get(l, '') for l in locales))
+               for language, locales in ALPHABETIC.items()}
+    samples['western'] = '\n'.join(samples[l][:WESTERN_SHARE] for l in WESTERN)
+    for language, sample in samples.items():
         print(language, len(sample), file=sys.stderr)
         for spelling in spellings(sample, language):
             tables.append((language,) + bigram_table(spelling, language))

@@ -8,7 +8,9 @@
 namespace platform::i18n::detail {
 
 /// The name of the charset of `bytes`, which are all ASCII, when escape sequences in them spell
-/// other characters, and encoding these again gives the same bytes; else empty.
+/// other characters: the first of the ISO-2022 family and HZ in which they decode strictly and
+/// encode again to the same bytes or, if there is none, to other bytes for the same text. Else
+/// empty.
 std::string escapedCharset(std::string_view bytes);
 
 }  // namespace platform::i18n::detail

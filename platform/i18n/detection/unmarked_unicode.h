@@ -3,20 +3,19 @@
 #pragma once
 
 #include <optional>
-#include <string>
 #include <string_view>
 
 namespace platform::i18n::detail {
 
-/// One of UTF-16LE, UTF-16BE, UTF-32LE and UTF-32BE, and the bits that a byte of the file costs in
+/// One of UTF-16LE, UTF-16BE, UTF-32LE and UTF-32BE, and the bits that a byte of the text costs in
 /// it.
-struct UnicodeGuess {
-    std::string charset;
+struct UnmarkedUnicode {
+    const char* charset;
     double bitsPerByte;
 };
 
 /// The encoding form in which `bytes`, as a whole, are the most plausible text; none when they are
 /// not plausible in any. Linear in the size.
-std::optional<UnicodeGuess> unmarkedUnicode(std::string_view bytes);
+std::optional<UnmarkedUnicode> unmarkedUnicode(std::string_view bytes);
 
 }  // namespace platform::i18n::detail

@@ -1,0 +1,282 @@
+// SPDX-License-Identifier: Apache-2.0
+// Which legacy charset a text is most likely in.
+//
+//     cost(charset) = prior(charset) - hint(charset) + beside words(charset)
+//                   + least over languages: prior(language) + words(charset, language)
+//
+// All are bits: the number in which a reader of the language would write the text down. The charset
+// with the lowest cost is taken. README.md tells where the figures come from.
+//
+// Costs only grow as more of a text is looked at, and words are looked at in the order of how
+// common they are, so what cannot win is given up early. Charsets of several bytes come first: they
+// fail at once on other text, and on their own no other charset comes near them.
+#include "platform/i18n/detection/likeliest_charset.h"
+
+#include <algorithm>
+#include <limits>
+#include <map>
+#include <string>
+
+#include "platform/i18n/charsets/charset.h"
+#include "platform/i18n/detection/declared_charset.h"
+#include "platform/i18n/detection/text_counts.h"
+
+namespace platform::i18n::detail {
+
+namespace {
+
+// What a text saves in the charset that it names: as much as ten letters or so say. Declarations
+// are wrong often enough, as documents are converted without them.
+constexpr Cost hintBits = bits(40);
+
+constexpr Cost infinite = std::numeric_limits<Cost>::max() / 2;
+
+Cost hintFor(const LegacyCharset& charset, const std::string& declared) {
+    return isSameCharset(charset.name(), declared) ? hintBits : 0;
+}
+
+bool isWordByte(char byte) {
+    return static_cast<unsigned char>(byte) >= 0x80 || (byte >= 'a' && byte <= 'z') ||
+           (byte >= 'A' && byte <= 'Z');
+}
+
+// What the plain ASCII words of a text say about the language of the others.
+class LanguagePriors {
+public:
+    // A word says half of what it would if all words were of one language: there is code, markup
+    // and English everywhere. And a few words beyond ASCII outweigh any number of others.
+    static constexpr Cost share = 2;
+    static constexpr Cost most = bits(12);
+    static constexpr std::size_t enoughLetters = 4000;
+
+    explicit LanguagePriors(std::string_view sample) {
+        const AsciiWords words = asciiWordsOf(sample);
+        const TextCounts counts(words.text, TextCounts::Runs::all);
+        Cost least = infinite;
+        for (const BigramModel& model : bigramModels()) {
+            if (model.isLatin()) {
+                const Cost cost = costOfWords(
+                    counts.pairs, model, [&](char16_t c) { return model.classOf(c); }, infinite);
+                least = std::min(least, costs_[&model] = cost / share);
+            }
+        }
+        // Languages in other scripts suffer by how much of the text is Latin.
+        const auto ascii = static_cast<Cost>(words.text.size());
+        otherScripts_ = most * ascii / (ascii + 4 * static_cast<Cost>(words.beyondAscii) + 1);
+        for (auto& [model, cost] : costs_) {
+            cost = std::min(most, cost - least);
+        }
+    }
+
+    Cost of(const BigramModel& model) const {
+        return model.isLatin() ? costs_.at(&model) : otherScripts_;
+    }
+    Cost ofIdeographs() const { return otherScripts_; }
+
+private:
+    struct AsciiWords {
+        std::u16string text;  // the words, apart
+        std::size_t beyondAscii = 0;
+    };
+
+    static AsciiWords asciiWordsOf(std::string_view sample);
+
+    std::map<const BigramModel*, Cost> costs_;
+    Cost otherScripts_;
+};
+
+LanguagePriors::AsciiWords LanguagePriors::asciiWordsOf(std::string_view sample) {
+    AsciiWords found;
+    for (std::size_t begin = 0; begin < sample.size() && found.text.size() < enoughLetters;) {
+        if (sample[begin] == '<') {
+            const std::size_t end = sample.find('>', begin);
+            begin = end == std::string_view::npos ? begin + 1 : end + 1;
+            continue;
+        }
+        std::size_t end = begin;
+        bool isAscii = true;
+        for (; end < sample.size() && isWordByte(sample[end]); ++end) {
+            isAscii = isAscii && static_cast<unsigned char>(sample[end]) < 0x80;
+        }
+        if (!isAscii) {
+            found.beyondAscii += end - begin;
+        } else if (end - begin > 1) {
+            found.text.append(sample.begin() + static_cast<std::ptrdiff_t>(begin),
+                              sample.begin() + static_cast<std::ptrdiff_t>(end));
+            found.text += u' ';
+        }
+        begin = std::max(end, begin + 1);
+    }
+    return found;
+}
+
+// The search for the cheapest charset.
+class Search {
+public:
+    Search(std::string_view sample, std::string_view bytes,
+           const std::vector<const LegacyCharset*>& excluded)
+        : sample_(sample),
+          values_(bytesIn(bytes)),
+          declared_(declaredCharset(bytes)),
+          excluded_(excluded),
+          priors_(sample) {}
+
+    std::optional<LikelyCharset> cheapest() {
+        const bool mayBeEbcdic = looksLikeEbcdic(sample_);
+        for (const LegacyCharset& charset : legacyCharsets()) {
+            const bool isTried = charset.kind() == CharsetKind::multiByte ||
+                                 (charset.kind() == CharsetKind::ebcdic && mayBeEbcdic);
+            if (isTried && !isExcluded(charset)) {
+                tryDecoded(charset);
+            }
+        }
+        trySingleBytes();
+        return best_.charset == nullptr ? std::nullopt : std::optional(best_);
+    }
+
+private:
+    // A charset of single bytes with one of its languages, on the way through the words.
+    struct Reading {
+        const LegacyCharset* charset;
+        const LegacyCharset::Language* language;
+        Cost cost;
+    };
+
+    // In EBCDIC the blank is 40, and 20 is a control.
+    static bool looksLikeEbcdic(std::string_view sample) {
+        const auto blanks = std::count(sample.begin(), sample.end(), '\x40');
+        return blanks > std::count(sample.begin(), sample.end(), '\x20') &&
+               static_cast<std::size_t>(blanks) > sample.size() / 20;
+    }
+
+    bool isExcluded(const LegacyCharset& charset) const {
+        return std::find(excluded_.begin(), excluded_.end(), &charset) != excluded_.end();
+    }
+
+    Cost priorOf(const LegacyCharset& charset) const {
+        return charset.prior() - hintFor(charset, declared_);
+    }
+
+    void consider(const LegacyCharset& charset, Cost cost) {
+        if (cost < best_.cost) {
+            best_ = {&charset, cost};
+        }
+    }
+
+    // The text of the sample, which may end inside a character.
+    std::optional<std::u16string> decodeSample(const LegacyCharset& charset) const {
+        constexpr std::size_t longestCharacter = 4;
+        for (std::size_t cut = 0; cut < longestCharacter && cut <= sample_.size(); ++cut) {
+            if (auto text = charset.decode(sample_.substr(0, sample_.size() - cut))) {
+                return text;
+            }
+        }
+        return std::nullopt;
+    }
+
+    void tryDecoded(const LegacyCharset& charset) {
+        const std::optional<std::u16string> text = decodeSample(charset);
+        if (!text) {
+            return;
+        }
+        const TextCounts counts(*text);
+        const auto itself = [](char16_t c) { return c; };
+        const Cost prior = priorOf(charset);
+        const Cost cost = prior + costBesideWords(counts, itself, allTraits(), best_.cost - prior);
+        if (charset.kind() == CharsetKind::multiByte) {
+            for (const UnigramModel& model : unigramModels()) {
+                const Cost before = cost + priors_.ofIdeographs();
+                consider(charset, before + costOfWords(counts, model, best_.cost - before));
+            }
+            return;
+        }
+        for (const auto& [model, classes] : charset.languages()) {
+            const auto classOf = [&model = *model](char16_t c) { return model.classOf(c); };
+            const Cost before = cost + priors_.of(*model);
+            consider(charset,
+                     before + costOfWords(counts.pairs, *model, classOf, best_.cost - before));
+        }
+    }
+
+    void trySingleBytes() {
+        std::u16string units(sample_.size(), u'\0');
+        std::transform(sample_.begin(), sample_.end(), units.begin(),
+                       [](char byte) { return static_cast<unsigned char>(byte); });
+        const TextCounts counts(units);
+        // The commonest pairs tell which readings are worth while, the rest which is best.
+        const std::span<const UnitPair> pairs(counts.pairs);
+        const std::size_t few = std::min<std::size_t>(pairs.size(), 64);
+        std::vector<Reading> readings = readingsOf(counts);
+        for (Reading& reading : readings) {
+            reading.cost += costIn(reading, pairs.first(few));
+        }
+        std::stable_sort(readings.begin(), readings.end(),
+                         [](const Reading& a, const Reading& b) { return a.cost < b.cost; });
+        for (const Reading& reading : readings) {
+            consider(*reading.charset, reading.cost + costIn(reading, pairs.subspan(few)));
+        }
+    }
+
+    // The readings that are not too dear before a word is looked at.
+    std::vector<Reading> readingsOf(const TextCounts& counts) const {
+        std::vector<Reading> readings;
+        for (const LegacyCharset& charset : legacyCharsets()) {
+            if (charset.kind() != CharsetKind::singleByte || !charset.decodes(values_) ||
+                isExcluded(charset)) {
+                continue;
+            }
+            const auto characterOf = [&](char16_t byte) {
+                return byte == 0 ? u'\0' : charset.characterOf(byte);
+            };
+            const Cost prior = priorOf(charset);
+            const Cost cost =
+                prior + costBesideWords(counts, characterOf, charset.traits(), best_.cost - prior);
+            if (cost > best_.cost) {
+                continue;
+            }
+            for (const LegacyCharset::Language& language : charset.languages()) {
+                readings.push_back({&charset, &language, cost + priors_.of(*language.model)});
+            }
+        }
+        return readings;
+    }
+
+    Cost costIn(const Reading& reading, std::span<const UnitPair> pairs) const {
+        const auto classOf = [&classes = reading.language->classes](char16_t byte) {
+            return classes[byte];
+        };
+        return costOfWords(pairs, *reading.language->model, classOf, best_.cost - reading.cost);
+    }
+
+    std::string_view sample_;
+    ByteSet values_;
+    std::string declared_;
+    const std::vector<const LegacyCharset*>& excluded_;
+    LanguagePriors priors_;
+    LikelyCharset best_{nullptr, infinite};
+};
+
+}  // namespace
+
+std::optional<LikelyCharset> likeliestCharset(std::string_view sample, std::string_view bytes,
+                                              const std::vector<const LegacyCharset*>& excluded) {
+    return Search(sample, bytes, excluded).cheapest();
+}
+
+const LegacyCharset& largestThatAgrees(const LegacyCharset& charset, std::string_view bytes) {
+    const LegacyCharset* largest = &charset;
+    if (charset.kind() == CharsetKind::multiByte ||
+        isSameCharset(charset.name(), declaredCharset(bytes))) {
+        return charset;
+    }
+    const ByteSet values = bytesIn(bytes);
+    for (const LegacyCharset& other : legacyCharsets()) {
+        if (other.prior() <= charset.prior() && other.repertoire() > largest->repertoire() &&
+            other.agreesWith(charset, values) && other.holdsLettersOf(charset)) {
+            largest = &other;
+        }
+    }
+    return *largest;
+}
+
+}  // namespace platform::i18n::detail

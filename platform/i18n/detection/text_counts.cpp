@@ -1,0 +1,111 @@
+// SPDX-License-Identifier: Apache-2.0
+// How often which units of a text stand next to each other.
+#include "platform/i18n/detection/text_counts.h"
+
+#include <algorithm>
+#include <bit>
+#include <cstddef>
+
+namespace platform::i18n::detail {
+
+namespace {
+
+// What ASCII costs, whichever: about the entropy of letters by themselves, punctuation included.
+constexpr Cost asciiBits = bits(5);
+// A control that no text holds.
+constexpr Cost strayControlBits = bits(20);
+
+// Counts keys: a hash table with open addressing, sized for the number of keys that may come.
+class Tally {
+public:
+    struct Entry {
+        std::uint64_t key;
+        std::uint32_t count;
+    };
+
+    explicit Tally(std::size_t keys) : places_(std::bit_ceil(2 * keys + 1)) {}
+
+    void add(std::uint64_t key) {
+        std::size_t slot = (key * 0x9E3779B97F4A7C15U >> 32U) & (places_.size() - 1);
+        while (places_[slot] != 0 && entries_[places_[slot] - 1].key != key) {
+            slot = (slot + 1) & (places_.size() - 1);
+        }
+        if (places_[slot] == 0) {
+            entries_.push_back({key, 0});
+            places_[slot] = static_cast<std::uint32_t>(entries_.size());
+        }
+        ++entries_[places_[slot] - 1].count;
+    }
+
+    const std::vector<Entry>& entries() const { return entries_; }
+
+    void sortByCount() {
+        std::sort(entries_.begin(), entries_.end(), [](const Entry& a, const Entry& b) {
+            return a.count != b.count ? a.count > b.count : a.key < b.key;
+        });
+    }
+
+private:
+    std::vector<Entry> entries_;
+    std::vector<std::uint32_t> places_;  // in `entries_`, from one; zero where there is none
+};
+
+bool isWordUnit(char16_t unit) {
+    return unit >= 0x80 || (unit >= u'a' && unit <= u'z') || (unit >= u'A' && unit <= u'Z');
+}
+
+Cost costOfAscii(char16_t unit) {
+    const bool isStray =
+        (unit < 0x20 && !(unit >= '\t' && unit <= '\r') && unit != 0x1B && unit != 0x1A) ||
+        unit == 0x7F;
+    return isStray ? strayControlBits : asciiBits;
+}
+
+std::uint64_t keyOf(char16_t first, char16_t second, char16_t third = 0) {
+    return (std::uint64_t{first} << 32U) | (std::uint64_t{second} << 16U) | third;
+}
+
+}  // namespace
+
+TextCounts::TextCounts(std::u16string_view units, Runs runs) {
+    Tally pairTally(2 * units.size());
+    Tally tripleTally(units.size());
+    for (std::size_t begin = 0; begin < units.size();) {
+        if (!isWordUnit(units[begin])) {
+            asciiCost += costOfAscii(units[begin++]);
+            continue;
+        }
+        std::size_t end = begin;
+        char16_t highest = 0;
+        for (; end < units.size() && isWordUnit(units[end]); ++end) {
+            highest = std::max(highest, units[end]);
+        }
+        if (highest < 0x80 && runs == Runs::beyondAscii) {
+            asciiCost += asciiBits * static_cast<Cost>(end - begin);
+        } else {
+            char16_t before = 0;
+            for (std::size_t i = begin; i < end; ++i) {
+                pairTally.add(keyOf(before, units[i]));
+                before = units[i];
+                if (before >= 0x80) {
+                    tripleTally.add(keyOf(i == 0 ? u'\0' : units[i - 1], before,
+                                          i + 1 == units.size() ? u'\0' : units[i + 1]));
+                }
+            }
+            pairTally.add(keyOf(before, 0));
+        }
+        begin = end;
+    }
+    pairTally.sortByCount();
+    for (const Tally::Entry& entry : pairTally.entries()) {
+        pairs.push_back({static_cast<char16_t>(entry.key >> 32U),
+                         static_cast<char16_t>(entry.key >> 16U), entry.count});
+    }
+    for (const Tally::Entry& entry : tripleTally.entries()) {
+        triples.push_back({static_cast<char16_t>(entry.key >> 32U),
+                           static_cast<char16_t>(entry.key >> 16U),
+                           static_cast<char16_t>(entry.key), entry.count});
+    }
+}
+
+}  // namespace platform::i18n::detail

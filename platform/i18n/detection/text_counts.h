@@ -1,0 +1,47 @@
+// SPDX-License-Identifier: Apache-2.0
+// How often which units of a text stand next to each other: all that the language models ask.
+#pragma once
+
+#include <cstdint>
+#include <string_view>
+#include <vector>
+
+#include "platform/i18n/detection/character_traits.h"
+
+namespace platform::i18n::detail {
+
+/// Two neighbours, and how often they are that.
+struct UnitPair {
+    char16_t before;
+    char16_t current;
+    std::uint32_t count;
+};
+
+/// A unit between its neighbours, and how often that is so.
+struct UnitTriple {
+    char16_t before;
+    char16_t current;
+    char16_t after;
+    std::uint32_t count;
+};
+
+/// Counts over a text. Its units are characters or, for charsets of single bytes, bytes: each of
+/// those charsets then costs only a look at the counts, however long the text is.
+///
+/// Only runs of units that hold something beyond ASCII tell charsets apart: ASCII letters and
+/// units from 0x80 on. Everything else costs the same in every charset.
+struct TextCounts {
+    enum class Runs { beyondAscii, all };
+
+    /// Counts in these runs of `units`. Linear in their number.
+    explicit TextCounts(std::u16string_view units, Runs runs = Runs::beyondAscii);
+
+    /// The cost of the ASCII outside these runs.
+    Cost asciiCost = 0;
+    /// The neighbours in the runs, the commonest first; '\0' stands for what is beyond a run's end.
+    std::vector<UnitPair> pairs;
+    /// Each unit from 0x80 on between its neighbours, whatever they are; '\0' at the text's ends.
+    std::vector<UnitTriple> triples;
+};
+
+}  // namespace platform::i18n::detail
