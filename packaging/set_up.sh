@@ -98,11 +98,23 @@ install_node_packages() {
     fi
 }
 
+# build_client: builds the client library of the web page, unless it has been.
+build_client() {
+    local client="$root/web/client"
+    if [[ -z $(find "$client/dist/index.js" -newer "$client/package-lock.json" 2>/dev/null) ]] ||
+        [[ -n $(find "$client/src" -newer "$client/dist/index.js") ]]; then
+        step "building ${client#"$root/"}"
+        (cd "$client" && quietly npm npm run build)
+    fi
+}
+
 # install_all: installs all that building, running and testing the project needs.
 install_all() {
     install_packages "$root/packaging/debian-packages.txt"
     install_commands "$root/packaging/debian-commands.txt"
     install_node_packages "$root/web"
+    install_node_packages "$root/web/client"
+    build_client
 }
 
 # build NAME [CMAKE-ARGUMENT...] [-- TARGET...]: builds the targets, or all, in build/NAME, which is

@@ -1,0 +1,158 @@
+// SPDX-License-Identifier: Apache-2.0
+// Documents that are too long for one message, with the client library and a real host.
+import assert from "node:assert/strict";
+import { randomBytes } from "node:crypto";
+import { readFileSync, writeFileSync } from "node:fs";
+import { join } from "node:path";
+import { test } from "node:test";
+
+import WebSocket from "../../web/node_modules/ws/wrapper.mjs";
+import { headers } from "../../web/client/node_modules/@nats-io/nats-core/lib/mod.js";
+import { AskAgain, connect, utf8 } from "../../web/client/dist/index.js";
+import { parseUrl } from "./client.mjs";
+import { Host, IS_SANITIZED, temporaryFolder, waitFor } from "./processes.mjs";
+
+globalThis.WebSocket = WebSocket; // Node.js before version 22 has none
+
+const MEGABYTES = IS_SANITIZED ? 5 : 60;
+
+async function clientOf(test, host) {
+  const { server, user, password } = parseUrl(host.webSocket);
+  const client = await connect({ servers: server, user, pass: password });
+  test.after(() => client.close());
+  return client;
+}
+
+async function start(test) {
+  const folder = temporaryFolder(test);
+  const host = await Host.start(test, ["--root", folder]);
+  return { folder, host, client: await clientOf(test, host) };
+}
+
+// Text without a pattern that a lost or doubled piece could hide in.
+function longText(megabytes) {
+  return randomBytes((megabytes * 750_000) | 0).toString("base64");
+}
+
+test("a long text is written and read byte for byte, with progress", async (t) => {
+  const { folder, client } = await start(t);
+  const file = join(folder, "long.txt");
+  const text = longText(MEGABYTES);
+  const sent = [];
+  assert.equal(await client.write(file, text, { onProgress: (one) => sent.push(one) }), true);
+  assert.ok(readFileSync(file, "latin1") === text);
+  assert.ok(sent.filter(({ direction }) => direction === "sent").length >= MEGABYTES / 2);
+  const received = [];
+  const answer = await client.read(file, "text/plain", { onProgress: (one) => received.push(one) });
+  assert.ok(answer.data === text);
+  const last = received.at(-1);
+  assert.equal(last.direction, "received");
+  assert.equal(last.bytes, last.total);
+});
+
+test("a long package is written and read as it was, parts that are no text included", async (t) => {
+  const { folder, client } = await start(t);
+  const file = join(folder, "long.docx");
+  const part = (partUri, contentType, content) => ({ partUri, contentType, content, relationship: [] });
+  const document = {
+    parts: [
+      part("/media/image1.png", "image/png", `data:image/png;base64,${longText(MEGABYTES)}`),
+      part("/word/vbaProject.bin", "application/vnd.ms-office.vbaProject", "\x00\xff\x01 no text"),
+      part("/word/document.xml", "application/xml", utf8("<a>Cr\u00e8me br\u00fbl\u00e9e</a>")),
+    ],
+    relationships: [],
+  };
+  assert.equal(await client.write(file, document), true);
+  const answer = await client.read(file, "text/xml");
+  assert.equal(answer.status, true);
+  const contents = (parts) => new Map(parts.map(({ partUri, contentType, content }) => [partUri, [contentType, content]]));
+  assert.deepEqual(contents(answer.parts), contents(document.parts));
+});
+
+test("short requests and answers go as ever", async (t) => {
+  const { folder, client } = await start(t);
+  const file = join(folder, "short \u6d77.txt");
+  assert.equal(await client.write(file, utf8("\u6d77\n")), true);
+  assert.equal(readFileSync(file, "utf8"), "\u6d77\n");
+  assert.deepEqual(await client.read(file, "text/plain"), { data: utf8("\u6d77\n"), status: true });
+});
+
+test("of many writes of one file the last one counts, and those between are not made", async (t) => {
+  const { folder, client } = await start(t);
+  const file = join(folder, "often.txt");
+  let notifications = 0;
+  client.listen(() => ++notifications);
+  const writes = Array.from({ length: 20 }, (_, index) => client.write(file, `version ${index}`));
+  assert.deepEqual(new Set(await Promise.all(writes)), new Set([true]));
+  assert.equal(readFileSync(file, "latin1"), "version 19");
+  await waitFor("the notifications", () => notifications === 2);
+});
+
+test("a transfer that is cancelled frees its place", async (t) => {
+  const { folder, client } = await start(t);
+  const file = join(folder, "cancelled.txt");
+  const abort = new AbortController();
+  const onProgress = () => abort.abort(new Error("no more"));
+  const write = client.write(file, longText(MEGABYTES), { signal: abort.signal, onProgress });
+  await assert.rejects(write, /no more/);
+  assert.equal(await client.write(file, "short"), true);
+  assert.equal(readFileSync(file, "latin1"), "short");
+});
+
+test("clients that take nothing of their answers hold up no other", async (t) => {
+  const { folder, host, client } = await start(t);
+  const file = join(folder, "untaken.txt");
+  writeFileSync(file, longText(5));
+  const idle = await clientOf(t, host);
+  const { user } = parseUrl(host.webSocket);
+  for (let count = 0; count < 100; ++count) {
+    const rtcId = `${user}.untaken-${count}`;
+    const header = headers();
+    header.set("Zpr-Pieces", "yes");
+    idle.nats.publish(
+      "/zpr/service/readRequest_cpp",
+      JSON.stringify({ rtcId, contentType: "text/plain", filePath: file }),
+      { headers: header, reply: `/zpr/service/readResponse/${rtcId}` },
+    );
+  }
+  const small = join(folder, "small.txt");
+  writeFileSync(small, "small");
+  for (let count = 0; count < 20; ++count) {
+    assert.equal((await client.read(small, "text/plain")).data, "small");
+  }
+  assert.equal((await client.read(file, "text/plain")).data.length, 5_000_000);
+});
+
+test("nobody speaks in another's name about pieces", async (t) => {
+  const { client } = await start(t);
+  const refusals = [];
+  (async () => {
+    for await (const status of client.nats.status()) {
+      refusals.push(String(status.error ?? status.data ?? status.type));
+    }
+  })();
+  client.nats.publish("/zpr/service/piece.anyone.another.1");
+  await client.nats.flush();
+  await waitFor("the refusal", () => refusals.some((text) => /permissions violation/i.test(text)));
+});
+
+test("without a worker there is an error, and soon", async (t) => {
+  const { host, client } = await start(t);
+  host.signal("SIGTERM");
+  await host.end;
+  await assert.rejects(client.read("/any", "text/plain", { tries: 1, timeout: 500 }), AskAgain);
+});
+
+test("what is under way when a host ends is finished", async (t) => {
+  const { folder, host, client } = await start(t);
+  const file = join(folder, "ending.txt");
+  const text = longText(MEGABYTES);
+  writeFileSync(file, text);
+  let begun = false;
+  const onProgress = ({ direction }) => (begun ||= direction === "received");
+  const read = client.read(file, "text/plain", { onProgress });
+  await waitFor("the first piece", () => begun);
+  host.signal("SIGTERM");
+  assert.ok((await read).data === text);
+  assert.equal(await host.end, 0);
+});

@@ -1,0 +1,43 @@
+// SPDX-License-Identifier: Apache-2.0
+// Strings that carry bytes, one in each character, as documents do in messages.
+
+const CHUNK = 32_768; // what a call takes as arguments everywhere
+
+/** The characters U+0000 to U+00FF that stand for `bytes`. */
+export function stringOf(bytes: Uint8Array): string {
+  const chunks: string[] = [];
+  for (let begin = 0; begin < bytes.length; begin += CHUNK) {
+    chunks.push(String.fromCharCode.apply(null, bytes.subarray(begin, begin + CHUNK) as unknown as number[]));
+  }
+  return chunks.join("");
+}
+
+/** The bytes that `characters` stand for. Throws RangeError when one is past U+00FF. */
+export function bytesOf(characters: string): Uint8Array {
+  const bytes = new Uint8Array(characters.length);
+  for (let index = 0; index < characters.length; ++index) {
+    const code = characters.charCodeAt(index);
+    if (code > 0xff) {
+      throw new RangeError(`strings in messages carry bytes, and U+${code.toString(16).toUpperCase()} is none`);
+    }
+    bytes[index] = code;
+  }
+  return bytes;
+}
+
+/** `text` in UTF-8, as a string that carries bytes. */
+export function utf8(text: string): string {
+  return stringOf(new TextEncoder().encode(text));
+}
+
+// What the text rule for parts of "application/" types would change, besides what is no UTF-8.
+const CHANGED = /[\u0000-\u0008\u000b\u000c\u000e-\u001f\u200b\ufffe\uffff]/;
+
+/** Whether `content` comes back byte for byte as the content of a part of an "application/" type. */
+export function isPlainText(content: string): boolean {
+  try {
+    return !CHANGED.test(new TextDecoder("utf-8", { fatal: true, ignoreBOM: true }).decode(bytesOf(content)));
+  } catch {
+    return false;
+  }
+}
