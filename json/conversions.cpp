@@ -21,14 +21,19 @@ constexpr bool isLowSurrogate(char16_t unit) {
     return unit >= 0xDC00 && unit <= 0xDFFF;
 }
 
-char32_t codePoint(std::u16string_view units) {
-    if (units.size() == 1 && !isHighSurrogate(units[0]) && !isLowSurrogate(units[0]))
-        return units[0];
-    if (units.size() == 2 && isHighSurrogate(units[0]) && isLowSurrogate(units[1])) {
-        return 0x10000 + ((static_cast<char32_t>(units[0]) - 0xD800) << 10) +
-               (static_cast<char32_t>(units[1]) - 0xDC00);
-    }
-    return 0xFFFD;
+void appendUtf8(char32_t c, std::string& text) {
+    const auto continuation = [c](int shift) {
+        return static_cast<char>(0x80 | ((c >> shift) & 0x3F));
+    };
+    if (c < 0x80)
+        text += {static_cast<char>(c)};
+    else if (c < 0x800)
+        text += {static_cast<char>(0xC0 | (c >> 6)), continuation(0)};
+    else if (c < 0x10000)
+        text += {static_cast<char>(0xE0 | (c >> 12)), continuation(6), continuation(0)};
+    else
+        text += {static_cast<char>(0xF0 | (c >> 18)), continuation(12), continuation(6),
+                 continuation(0)};
 }
 
 /// The C library tells overflow from underflow, which std::from_chars does not.
@@ -84,18 +89,17 @@ double string_to_double(std::string_view text) {
 }
 
 std::string u16_to_u8(std::u16string_view units) {
-    const char32_t c = codePoint(units);
-    const auto continuation = [c](int shift) {
-        return static_cast<char>(0x80 | ((c >> shift) & 0x3F));
-    };
-    if (c < 0x80)
-        return {static_cast<char>(c)};
-    if (c < 0x800)
-        return {static_cast<char>(0xC0 | (c >> 6)), continuation(0)};
-    if (c < 0x10000)
-        return {static_cast<char>(0xE0 | (c >> 12)), continuation(6), continuation(0)};
-    return {static_cast<char>(0xF0 | (c >> 18)), continuation(12), continuation(6),
-            continuation(0)};
+    std::string text;
+    if (units.size() == 2 && isHighSurrogate(units[0]) && isLowSurrogate(units[1])) {
+        appendUtf8(0x10000 + ((static_cast<char32_t>(units[0]) - 0xD800) << 10) +
+                       (static_cast<char32_t>(units[1]) - 0xDC00),
+                   text);
+        return text;
+    }
+    constexpr char32_t replacement = 0xFFFD;
+    for (const char16_t unit : units)
+        appendUtf8(isHighSurrogate(unit) || isLowSurrogate(unit) ? replacement : unit, text);
+    return text;
 }
 
 }  // namespace json

@@ -12,8 +12,9 @@ namespace json {
 /// number is 0. No locale has a part in it.
 double string_to_double(std::string_view text);
 
-/// The UTF-8 form of one UTF-16 unit, or of two that are taken for a surrogate pair. What is no
-/// character (a surrogate alone, two units that are no pair) becomes U+FFFD.
+/// The UTF-8 form of one UTF-16 unit, or of two. A surrogate pair is one character; of two units
+/// that are no pair, each is converted by itself. A surrogate that is not part of a pair becomes
+/// U+FFFD.
 std::string u16_to_u8(std::u16string_view units);
 
 }  // namespace json

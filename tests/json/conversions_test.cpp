@@ -134,12 +134,19 @@ TEST(U16ToU8, JoinsAPairToOneCharacter) {
     EXPECT_EQ(u16_to_u8(u"\xDBFF\xDFFF"), "\xF4\x8F\xBF\xBF");
 }
 
-TEST(U16ToU8, ReplacesWhatIsNoCharacter) {
-    for (const std::u16string& units :
-         {std::u16string{0xD800}, std::u16string{0xDBFF}, std::u16string{0xDC00},
-          std::u16string{0xDFFF}, std::u16string{0xD83D, u'a'}, std::u16string{0xD83D, 0xD83D},
-          std::u16string{0xDE00, 0xD83D}, std::u16string{u'a', u'b'}})
-        EXPECT_EQ(u16_to_u8(units), "\xEF\xBF\xBD");
+TEST(U16ToU8, ReplacesASurrogateThatStandsAlone) {
+    for (const char16_t unit : std::u16string{0xD800, 0xDBFF, 0xDC00, 0xDFFF})
+        EXPECT_EQ(u16_to_u8(std::u16string(1, unit)), "\xEF\xBF\xBD");
+}
+
+TEST(U16ToU8, ConvertsEachOfTwoUnitsThatAreNoPair) {
+    EXPECT_EQ(u16_to_u8(std::u16string{0xD83D, 0x1DE0}), "\xEF\xBF\xBD\xE1\xB7\xA0");
+    EXPECT_EQ(u16_to_u8(std::u16string{0xD83D, u'a'}),
+              "\xEF\xBF\xBD"
+              "a");
+    EXPECT_EQ(u16_to_u8(std::u16string{0xD83D, 0xD83D}), "\xEF\xBF\xBD\xEF\xBF\xBD");
+    EXPECT_EQ(u16_to_u8(std::u16string{0xDE00, 0xD83D}), "\xEF\xBF\xBD\xEF\xBF\xBD");
+    EXPECT_EQ(u16_to_u8(u"ab"), "ab");
 }
 
 }  // namespace

@@ -149,8 +149,10 @@ TEST(ParseString, JoinsASurrogatePair) {
 
 TEST(ParseString, ReplacesSurrogatesThatAreNoPair) {
     // The second unit of a pair may be any, and a low surrogate may stand alone.
-    EXPECT_EQ(run(parseString, R"("\uD83D\u0041x")").target, "\xEF\xBF\xBDx");
-    EXPECT_EQ(run(parseString, R"("\uD83D\uD83Dx")").target, "\xEF\xBF\xBDx");
+    EXPECT_EQ(run(parseString, R"("\uD83D\u0041x")").target,
+              "\xEF\xBF\xBD"
+              "Ax");
+    EXPECT_EQ(run(parseString, R"("\uD83D\uD83Dx")").target, "\xEF\xBF\xBD\xEF\xBF\xBDx");
     EXPECT_EQ(run(parseString, R"("\uDE00x")").target, "\xEF\xBF\xBDx");
     EXPECT_EQ(run(parseString, R"("\uDBFF\uDFFF")").target, "\xF4\x8F\xBF\xBF");
     EXPECT_EQ(run(parseString, R"("\uE000")").target, "\xEE\x80\x80");

@@ -83,8 +83,11 @@ struct Reference {
         Status status = parseUnit(input, first);
         if (status != Status::success)
             return status;
+        const auto alone = [](unsigned u) {
+            return u >= 0xD800 && u <= 0xDFFF ? "\xEF\xBF\xBD" : utf8(u);
+        };
         if (first < 0xD800 || first > 0xDBFF) {
-            text += first >= 0xDC00 && first <= 0xDFFF ? "\xEF\xBF\xBD" : utf8(first);
+            text += alone(first);
             return Status::success;
         }
         if (remaining(input) < 6)
@@ -99,7 +102,7 @@ struct Reference {
         if (second >= 0xDC00 && second <= 0xDFFF)
             text += utf8(0x10000 + (first - 0xD800) * 0x400 + (second - 0xDC00));
         else
-            text += "\xEF\xBF\xBD";
+            text += alone(first) + alone(second);
         return Status::success;
     }
 
