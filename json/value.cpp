@@ -3,7 +3,9 @@
 // are.
 #include "json/value.h"
 
+#include <algorithm>
 #include <array>
+#include <cstddef>
 #include <iterator>
 #include <stdexcept>
 #include <string>
@@ -64,6 +66,52 @@ void copyTree(const Value& source, Value& target) {
         task = tasks.back();
         tasks.pop_back();
     }
+}
+
+// ---- Assigning ----
+
+struct ArrayAssignment {
+    Array* target;
+    Array* source;  // whose elements are taken
+
+    bool isInPlace() const { return source->size() <= target->capacity(); }
+    std::size_t common() const { return std::min(source->size(), target->size()); }
+
+    /// Whether the elements at `index` are both arrays, to be assigned in the same way.
+    bool hasNested(std::size_t index) const {
+        return (*target)[index].is<Array>() && (*source)[index].is<Array>();
+    }
+
+    /// Assigns what is no nested assignment of its own.
+    void carryOut() const noexcept {
+        if (!isInPlace()) {
+            *target = std::move(*source);
+            return;
+        }
+        const std::size_t staying = common();
+        for (std::size_t i = 0; i < staying; ++i) {
+            if (!hasNested(i))
+                (*target)[i] = std::move((*source)[i]);
+        }
+        const auto end = static_cast<std::ptrdiff_t>(staying);
+        target->erase(target->begin() + end, target->end());
+        std::move(source->begin() + end, source->end(), std::back_inserter(*target));
+    }
+};
+
+void assignElements(Array& target, Array& source) {
+    // First all that takes memory, so that nothing has changed yet when there is none.
+    std::vector<ArrayAssignment> assignments{{&target, &source}};
+    for (std::size_t done = 0; done < assignments.size(); ++done) {
+        const ArrayAssignment outer = assignments[done];
+        for (std::size_t i = 0; outer.isInPlace() && i < outer.common(); ++i) {
+            if (outer.hasNested(i))
+                assignments.push_back(
+                    {&(*outer.target)[i].get<Array>(), &(*outer.source)[i].get<Array>()});
+        }
+    }
+    for (const ArrayAssignment& assignment : assignments)
+        assignment.carryOut();
 }
 
 // ---- Destroying ----
@@ -161,6 +209,15 @@ bool equalBut(const Object& left, const Object& right, std::vector<Comparison>& 
 Value::Value(const Value& other) : storage(other.holdsElements() ? Storage() : other.storage) {
     if (other.holdsElements())
         copyTree(other, *this);
+}
+
+Value& Value::operator=(const Value& other) {
+    Value copy(other);
+    if (is<Array>() && copy.is<Array>())
+        assignElements(get<Array>(), copy.get<Array>());
+    else
+        *this = std::move(copy);
+    return *this;
 }
 
 void Value::releaseElements() noexcept {

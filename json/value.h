@@ -54,9 +54,11 @@ public:
     /// Takes over the contents. `other` keeps its kind; an array or object in it is left empty.
     Value(Value&& other) noexcept = default;
 
-    /// Assigns a copy. `other` may be part of this value's own tree. On std::bad_alloc this value
-    /// is as it was.
-    Value& operator=(const Value& other) { return *this = Value(other); }
+    /// Assigns a copy. `other` may be part of this value's own tree. An array is assigned to an
+    /// array as std::vector does it, element by element: references to the elements that stay are
+    /// kept, unless there is no room for those that are new. On std::bad_alloc this value is as it
+    /// was.
+    Value& operator=(const Value& other);
 
     /// Assigns the contents of `other`, which may be part of this value's own tree.
     Value& operator=(Value&& other) noexcept {

@@ -206,6 +206,43 @@ TEST(Value, AssignedArrayMayBeLongerOrShorterThanTheOldOne) {
     EXPECT_EQ(target, shorter);
 }
 
+TEST(Value, ArrayAssignmentKeepsTheElementsThatStay) {
+    Value target = Array{1.0, Array{"a", "b"}, Object{{"k", 1.0}}, "last"};
+    const Value source = Array{"new", Array{Array{}, 2.0}, Array{3.0}};
+    Array& array = target.get<Array>();
+    Array& nested = array[1].get<Array>();
+    const Value* const elements = array.data();
+    const Value* const nestedElements = nested.data();
+    target = source;
+    EXPECT_EQ(target, source);
+    EXPECT_EQ(target.get<Array>().data(), elements);
+    EXPECT_EQ(&target.get<Array>()[1].get<Array>(), &nested);
+    EXPECT_EQ(nested.data(), nestedElements);
+}
+
+TEST(Value, ArrayAssignmentAddsElementsWithoutMovingThoseThatStayWhereThereIsRoom) {
+    Value target = Array{1.0};
+    target.get<Array>().reserve(3);
+    const Value* const elements = target.get<Array>().data();
+    const Value longer = Array{"a", Array{1.0}, "c"};
+    target = longer;
+    EXPECT_EQ(target, longer);
+    EXPECT_EQ(target.get<Array>().data(), elements);
+    const Value tooLong = Array(100, Value("a"));
+    target = tooLong;
+    EXPECT_EQ(target, tooLong);
+}
+
+TEST(Value, ArrayAssignmentOfAnyTreesGivesTheSource) {
+    RandomJson random(7);
+    for (int i = 0; i < 1000; ++i) {
+        Value target = Array{random.tree(i % 12), random.tree(3), Array{random.tree(2)}};
+        const Value source = Array{random.tree(i % 10), random.tree(3), Array{random.tree(2)}};
+        target = source;
+        EXPECT_EQ(target, source);
+    }
+}
+
 TEST(Value, TakesAnAssignmentFromItsOwnTree) {
     Value copied(Array{"a", Array{"b", Object{{"key", "c"}}}});
     copied = copied.get<Array>()[1];
