@@ -308,21 +308,16 @@ public:
     Status parse(Value& root) {
         Status status = startValue(root);
         while (status == Status::success && !open.empty()) {
-            OpenContainer& innermost = open.top();
-            status = innermost.isArray ? continueArray(innermost) : continueObject(innermost);
+            Value& innermost = *open.top();
+            status = innermost.is<Array>() ? continueArray(innermost.get<Array>())
+                                           : continueObject(innermost.get<Object>());
         }
         return status;
     }
 
 private:
-    /// An array or object of which a part has been parsed, up to the end of an element or, at
-    /// first, to where the first element begins.
-    struct OpenContainer {
-        Value* value;
-        bool isArray;
-        bool hasElements = false;
-
-        // The rest is for objects.
+    /// What has to be remembered of an object that is open.
+    struct OpenObject {
         bool inOrder = true;       // each key so far comes behind the one before
         bool dropsMember = false;  // the value of the latest member is the front of `dropped`
         bool dataChecked = false;  // `data` is known to be an array of integers
@@ -340,21 +335,29 @@ private:
 
     /// Each parses on up to the end of the next element, the start of one that is itself left open,
     /// or the end of the container.
-    Status continueArray(OpenContainer& container);
-    Status continueObject(OpenContainer& container);
+    Status continueArray(Array& array);
+    Status continueObject(Object& object);
 
     /// Moves past what follows an element: a separator, and the white space after it, or the
     /// closing.
     Status skipSeparator(char closing, Status fault, bool& closed);
     Status parseKey(std::string& key);
-    Value& memberValue(OpenContainer& container, std::string key);
-    Status startData(OpenContainer& container, Value& value);
-    Status applyType(OpenContainer& container, const Value& name);
-    Status closeObject(OpenContainer& container);
+    Value& memberValue(Object& object, std::string key);
+    Status startData(Value& value);
+    Status applyType(const Value& name);
+    Status closeObject(Object& object);
+
+    template <typename T>
+    using Stack = std::stack<T, std::vector<T>>;
 
     Input& input;
-    std::stack<OpenContainer, std::vector<OpenContainer>>
-        open;                          // from the outermost to the innermost
+
+    // The arrays and objects of which a part has been parsed, up to the end of an element or, at
+    // first, to where the first element begins; from the outermost to the innermost. A text may
+    // open tens of millions of arrays, so what only objects need is kept apart.
+    Stack<Value*> open;
+    Stack<OpenObject> objects;
+
     std::forward_list<Value> dropped;  // values of members whose key was there, the innermost first
 };
 
@@ -408,10 +411,13 @@ Status TreeParser::startContainer(Value& value, char closing) {
     if (atEnd(input))
         return Status::endOfInput;
     value.emplace<Container>();
-    if (*input.position == closing)
+    if (*input.position == closing) {
         ++input.position;
-    else
-        open.push({.value = &value, .isArray = std::is_same_v<Container, Array>});
+        return Status::success;
+    }
+    open.push(&value);
+    if constexpr (std::is_same_v<Container, Object>)
+        objects.emplace();
     return Status::success;
 }
 
@@ -428,8 +434,8 @@ Status TreeParser::skipSeparator(char closing, Status fault, bool& closed) {
     return Status::success;
 }
 
-Status TreeParser::continueArray(OpenContainer& container) {
-    if (container.hasElements) {
+Status TreeParser::continueArray(Array& array) {
+    if (!array.empty()) {
         bool closed = false;
         const Status status = skipSeparator(']', Status::badArraySeparator, closed);
         if (status != Status::success)
@@ -439,8 +445,6 @@ Status TreeParser::continueArray(OpenContainer& container) {
             return Status::success;
         }
     }
-    container.hasElements = true;
-    Array& array = container.value->get<Array>();
     // After one element, which needs little memory, comes room for several.
     constexpr std::size_t usualCapacity = 4;
     if (array.size() == 1)
@@ -448,18 +452,17 @@ Status TreeParser::continueArray(OpenContainer& container) {
     return startValue(array.emplace_back());
 }
 
-Status TreeParser::continueObject(OpenContainer& container) {
-    if (container.hasElements) {
-        if (std::exchange(container.dropsMember, false))
+Status TreeParser::continueObject(Object& object) {
+    if (!object.empty()) {
+        if (std::exchange(objects.top().dropsMember, false))
             dropped.pop_front();
         bool closed = false;
         const Status status = skipSeparator('}', Status::badObjectSeparator, closed);
         if (status != Status::success)
             return status;
         if (closed)
-            return closeObject(container);
+            return closeObject(object);
     }
-    container.hasElements = true;
 
     std::string key;
     if (const Status status = parseKey(key); status != Status::success)
@@ -467,12 +470,12 @@ Status TreeParser::continueObject(OpenContainer& container) {
     const bool mayBeTyped = key.starts_with("kq");
     const bool isType = mayBeTyped && key == "kqtype";
     const bool isData = mayBeTyped && key == "kqdata";
-    Value& value = memberValue(container, std::move(key));
+    Value& value = memberValue(object, std::move(key));
     if (isData)
-        return startData(container, value);
+        return startData(value);
     const Status status = startValue(value);
     if (isType && status == Status::success)
-        return applyType(container, value);
+        return applyType(value);
     return status;
 }
 
@@ -496,8 +499,8 @@ Status TreeParser::parseKey(std::string& key) {
 
 /// Where the value of a member is to be put: into the object, unless the key is there already. Then
 /// the first value stays, and the later one has to be parsed only to get past it.
-Value& TreeParser::memberValue(OpenContainer& container, std::string key) {
-    Object& object = container.value->get<Object>();
+Value& TreeParser::memberValue(Object& object, std::string key) {
+    OpenObject& container = objects.top();
     const std::size_t size = object.size();
     // In order, a member is put behind the last without a search.
     const auto member = container.inOrder ? object.try_emplace(object.end(), std::move(key))
@@ -510,7 +513,8 @@ Value& TreeParser::memberValue(OpenContainer& container, std::string key) {
     return dropped.emplace_front();
 }
 
-Status TreeParser::startData(OpenContainer& container, Value& value) {
+Status TreeParser::startData(Value& value) {
+    OpenObject& container = objects.top();
     container.data = input.position;
     container.dataChecked = container.type != IntegerType::none;
     return container.dataChecked ? parseIntegers(input, container.type, value) : startValue(value);
@@ -520,12 +524,13 @@ Status TreeParser::startData(OpenContainer& container, Value& value) {
 /// again as data of that type, and put into the object in the place of what is there. Whether that
 /// can be done does not depend on the type, so each data is checked once, and read when the object
 /// ends: a request may repeat "kqtype" after long data many times.
-Status TreeParser::applyType(OpenContainer& container, const Value& name) {
+Status TreeParser::applyType(const Value& name) {
     if (!name.is<std::string>())
         return Status::success;
     const IntegerType type = integerType(name.get<std::string>());
     if (type == IntegerType::none)
         return Status::success;
+    OpenObject& container = objects.top();
     container.type = type;
     container.typedData = container.data;
     if (container.data == nullptr || container.dataChecked)
@@ -534,12 +539,16 @@ Status TreeParser::applyType(OpenContainer& container, const Value& name) {
     return checkIntegers({container.data, input.end, input.comments});
 }
 
-Status TreeParser::closeObject(OpenContainer& container) {
+Status TreeParser::closeObject(Object& object) {
+    const OpenObject& container = objects.top();
     Status status = Status::success;
     if (container.typedData != nullptr) {
+        Value& value = object.at("kqdata");
+        value = Undefined();  // so that the memory is not taken twice
         Input data{container.typedData, input.end, input.comments};
-        status = parseIntegers(data, container.type, container.value->get<Object>().at("kqdata"));
+        status = parseIntegers(data, container.type, value);
     }
+    objects.pop();
     open.pop();
     return status;
 }

@@ -1,6 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "tests/json/counting_allocator.h"
 
+#include <malloc.h>
+
+#include <algorithm>
 #include <cstdlib>
 #include <new>
 
@@ -12,6 +15,15 @@ Memory memory;
 
 using json::memory;
 
+namespace {
+
+/// What malloc uses for `block`, its own word included.
+std::size_t sizeOf(void* block) {
+    return ::malloc_usable_size(block) + sizeof(std::size_t);
+}
+
+}  // namespace
+
 void* operator new(std::size_t size) {
     if (memory.untilFailure == 0)
         throw std::bad_alloc();
@@ -22,12 +34,16 @@ void* operator new(std::size_t size) {
         throw std::bad_alloc();
     ++memory.live;
     ++memory.made;
+    memory.bytes += sizeOf(block);
+    memory.peak = std::max(memory.peak, memory.bytes);
     return block;
 }
 
 void operator delete(void* block) noexcept {
-    if (block != nullptr)
+    if (block != nullptr) {
         --memory.live;
+        memory.bytes -= sizeOf(block);
+    }
     std::free(block);
 }
 

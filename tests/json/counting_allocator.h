@@ -12,6 +12,8 @@ struct Memory {
     std::size_t live = 0;              // allocations that are not freed
     std::size_t made = 0;              // allocations so far
     std::size_t untilFailure = never;  // allocations that still succeed
+    std::size_t bytes = 0;             // of the live allocations, with what malloc adds
+    std::size_t peak = 0;              // the most of them at one time
 };
 
 extern Memory memory;
