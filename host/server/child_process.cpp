@@ -4,9 +4,11 @@
 #include <fcntl.h>
 #include <signal.h>
 #include <sys/prctl.h>
+#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <string_view>
 #include <system_error>
@@ -29,11 +31,22 @@ Pipe makePipe() {
     return {platform::FileDescriptor(ends[0]), platform::FileDescriptor(ends[1])};
 }
 
-// The environment for programs.
-std::vector<char*> makeEnvironment() {
+// Whether both are of the same name, as "NAME=value".
+bool haveSameName(std::string_view one, std::string_view other) {
+    return one.substr(0, one.find('=')) == other.substr(0, other.find('='));
+}
+
+// The environment for programs: `own`, which must last, and what the host has besides.
+std::vector<char*> makeEnvironment(const std::vector<std::string>& own) {
     std::vector<char*> variables;
+    for (const std::string& variable : own) {
+        variables.push_back(const_cast<char*>(variable.c_str()));
+    }
     for (char** variable = environ; *variable != nullptr; ++variable) {
-        if (!std::string_view(*variable).starts_with("GLIBC_TUNABLES=")) {
+        const bool isReplaced = std::any_of(own.begin(), own.end(), [&](const std::string& other) {
+            return haveSameName(*variable, other);
+        });
+        if (!isReplaced && !haveSameName(*variable, "GLIBC_TUNABLES")) {
             variables.push_back(*variable);
         }
     }
@@ -55,6 +68,12 @@ std::vector<char*> makeEnvironment() {
     ::sigprocmask(SIG_SETMASK, &none, nullptr);
     ::signal(SIGPIPE, SIG_DFL);
     ::signal(SIGXFSZ, SIG_DFL);
+    // The host's bound on its own memory would end the program where it makes the host's requests
+    // fail. What is set from outside is the hard limit.
+    rlimit memory{};
+    isReady = isReady && ::getrlimit(RLIMIT_DATA, &memory) == 0;
+    memory.rlim_cur = memory.rlim_max;
+    isReady = isReady && ::setrlimit(RLIMIT_DATA, &memory) == 0;
     // Some libraries open files that would be the program's too.
     isReady = isReady && ::close_range(3, ~0U, CLOSE_RANGE_CLOEXEC) == 0 &&
               ::dup2(output, STDOUT_FILENO) >= 0 && ::dup2(output, STDERR_FILENO) >= 0;
@@ -70,7 +89,8 @@ std::vector<char*> makeEnvironment() {
 }  // namespace
 
 ChildProcess::ChildProcess(const std::filesystem::path& program,
-                           const std::vector<std::string>& arguments) {
+                           const std::vector<std::string>& arguments,
+                           const std::vector<std::string>& variables) {
     Pipe output = makePipe();
     Pipe failure = makePipe();
     std::vector<char*> pointers{const_cast<char*>(program.c_str())};
@@ -78,7 +98,7 @@ ChildProcess::ChildProcess(const std::filesystem::path& program,
         pointers.push_back(const_cast<char*>(argument.c_str()));
     }
     pointers.push_back(nullptr);
-    const std::vector<char*> environment = makeEnvironment();
+    const std::vector<char*> environment = makeEnvironment(variables);
     const pid_t host = ::getpid();
     id_ = ::fork();
     if (id_ == 0) {

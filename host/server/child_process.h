@@ -18,9 +18,11 @@ class ChildProcess {
 public:
     /// Starts `program`, with `arguments` and without any other of the host's files than its
     /// output. Its environment is the host's without GLIBC_TUNABLES, which is for the host's own
-    /// memory. It is in a process group of its own, so that an interrupt from the keyboard is for
-    /// the host alone. Throws std::system_error when the program cannot be run.
-    ChildProcess(const std::filesystem::path& program, const std::vector<std::string>& arguments);
+    /// memory, and with `variables`, each as "NAME=value". The limit that the host has set on its
+    /// memory does not hold for it. It is in a process group of its own, so that an interrupt from
+    /// the keyboard is for the host alone. Throws std::system_error when the program cannot be run.
+    ChildProcess(const std::filesystem::path& program, const std::vector<std::string>& arguments,
+                 const std::vector<std::string>& variables = {});
 
     ChildProcess(const ChildProcess&) = delete;
     ChildProcess& operator=(const ChildProcess&) = delete;

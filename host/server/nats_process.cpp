@@ -19,12 +19,19 @@
 #include <vector>
 
 #include "host/commands/standard_streams.h"
+#include "host/limits/memory_limit.h"
 #include "json/parser.h"
 #include "json/value.h"
 
 namespace host {
 
 namespace {
+
+// The limit from which on the server, a Go program, would rather collect garbage than grow: of the
+// memory that the host leaves free by default, two thirds.
+std::string memoryLimitVariable() {
+    return "GOMEMLIMIT=" + std::to_string(defaultMemoryLimit() / 9 * 2);
+}
 
 using Clock = std::chrono::steady_clock;
 using std::chrono::milliseconds;
@@ -107,7 +114,7 @@ NatsProcess::NatsProcess(const std::filesystem::path& program,
                          const std::filesystem::path& configuration, int stop)
     : folder_(withoutPortsFiles(configuration.parent_path())),
       stop_(stop),
-      process_(program, {"--config", configuration.string()}) {}
+      process_(program, {"--config", configuration.string()}, {memoryLimitVariable()}) {}
 
 std::optional<NatsPorts> NatsProcess::ports() const {
     for (const std::filesystem::path& path : portsFilesIn(folder_)) {

@@ -3,6 +3,7 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/resource.h>
 #include <unistd.h>
 
 #include <array>
@@ -33,6 +34,26 @@ TEST(ChildProcess, HasTheHostsEnvironmentButForWhatTunesTheHostsMemory) {
     EXPECT_EQ(outputOf("echo \"$GLIBC_TUNABLES $SOMETHING_ELSE\""), " kept\n");
     ::unsetenv("GLIBC_TUNABLES");
     ::unsetenv("SOMETHING_ELSE");
+}
+
+TEST(ChildProcess, HasTheVariablesThatItIsGivenInThePlaceOfTheHosts) {
+    ::setenv("GIVEN", "the host's", 1);
+    ChildProcess process("/bin/sh", {"-c", "[ \"$GIVEN\" = 'its own' ]"}, {"GIVEN=its own"});
+    EXPECT_EQ(process.collect(), "exit status 0");
+    ::unsetenv("GIVEN");
+}
+
+TEST(ChildProcess, IsNotHeldToTheHostsMemoryLimit) {
+    rlimit before{};
+    ASSERT_EQ(::getrlimit(RLIMIT_DATA, &before), 0);
+    rlimit limited = before;
+    limited.rlim_cur = rlim_t{1} << 40U;
+    ASSERT_EQ(::setrlimit(RLIMIT_DATA, &limited), 0);
+    const std::string soft = outputOf("ulimit -S -d");
+    const std::string hard = outputOf("ulimit -H -d");
+    ASSERT_EQ(::setrlimit(RLIMIT_DATA, &before), 0);
+    EXPECT_EQ(soft, hard);
+    EXPECT_NE(soft, std::to_string((rlim_t{1} << 40U) / 1024) + "\n");
 }
 
 TEST(ChildProcess, WritesWhereTheHostReads) {
