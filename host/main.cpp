@@ -10,6 +10,7 @@
 #include <chrono>
 #include <csignal>
 #include <cstddef>
+#include <cstdint>
 #include <exception>
 #include <filesystem>
 #include <iostream>
@@ -89,9 +90,10 @@ int runCommandLine(int argc, char** argv, int output) {
     }
     setUpLogging(line.logLevel);
     host::keepFreedMemory();
-    if (line.memoryLimit != 0) {
-        host::limitMemory(line.memoryLimit);
-    }
+    const std::uint64_t memory = host::memoryForRequests(
+        line.memoryLimit != 0 ? host::limitMemory(line.memoryLimit) : host::defaultMemoryLimit());
+    line.serve.memoryForRequests = memory;
+    line.stdio.memoryForRequests = memory;
     const int status = run(app, line, output);
     spdlog::default_logger()->flush();  // It may have lines to tell of that it left out.
     return status;

@@ -10,6 +10,8 @@
 #include <string_view>
 #include <utility>
 
+#include "host/bus/failed_reads.h"
+#include "host/bus/request_admission.h"
 #include "host/commands/exit_status.h"
 #include "host/guard/guarded_client.h"
 #include "platform/messaging/transport.h"
@@ -29,31 +31,43 @@ constexpr const char* clientName = "serialization_host";
 constexpr std::size_t usualQueuedBytes = std::size_t{16} * 1024 * 1024;
 constexpr std::size_t mostQueuedMessages = 4096;
 
+// Makes the bundle's client.
+platform::messaging::Transport transportOf(const std::shared_ptr<InProcessBus>& bus, Guard guard,
+                                           std::uint64_t memoryForRequests) {
+    using namespace platform::messaging;
+    const auto budget = std::make_shared<MemoryBudget>(memoryForRequests);
+    return [=](const std::string& name, const MessageServiceOptions&) {
+        std::shared_ptr<MessageService> client = bus->connect(name).get();
+        if (memoryForRequests != 0) {
+            client = answeringFailedReads(admittingRequests(std::move(client), budget));
+        }
+        if (guard.saves) {
+            client = savingSafely(std::move(client), guard);
+        }
+        futures::Promise<std::shared_ptr<MessageService>> promise;
+        promise.setValue(std::move(client));
+        return promise.getFuture();
+    };
+}
+
 // A bus on which createMessageService makes its clients from now on.
-std::shared_ptr<InProcessBus> makeBus(std::size_t largestMessage, Guard guard) {
+std::shared_ptr<InProcessBus> makeBus(std::size_t largestMessage, Guard guard,
+                                      std::uint64_t memoryForRequests) {
     platform::messaging::InProcessBusOptions options;
     options.maxQueuedBytes = std::max(largestMessage, usualQueuedBytes);
     // A large document shall not hold up the small ones behind it.
     options.concurrentChannels = {platform::messaging::readRequestChannel};
     std::shared_ptr<InProcessBus> bus = InProcessBus::create(std::move(options));
-    platform::messaging::setTransport(
-        [bus, guard = std::move(guard)](const std::string& name,
-                                        const platform::messaging::MessageServiceOptions&) {
-            if (!guard.saves) {
-                return bus->connect(name);
-            }
-            futures::Promise<std::shared_ptr<platform::messaging::MessageService>> client;
-            client.setValue(savingSafely(bus->connect(name).get(), guard));
-            return client.getFuture();
-        });
+    platform::messaging::setTransport(transportOf(bus, std::move(guard), memoryForRequests));
     return bus;
 }
 
 }  // namespace
 
 BundleHost::BundleHost(const std::filesystem::path& bundle, std::size_t largestMessage,
-                       platform::messaging::MessageHandler published, Guard guard)
-    : bus_(makeBus(largestMessage, std::move(guard))),
+                       platform::messaging::MessageHandler published, Guard guard,
+                       std::uint64_t memoryForRequests)
+    : bus_(makeBus(largestMessage, std::move(guard), memoryForRequests)),
       observation_(bus_->observe(
           [published = std::move(published)](std::string_view sender, const JsonMessage& message) {
               if (sender != clientName) {

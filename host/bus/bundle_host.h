@@ -4,6 +4,7 @@
 
 #include <chrono>
 #include <cstddef>
+#include <cstdint>
 #include <filesystem>
 #include <functional>
 #include <memory>
@@ -25,10 +26,13 @@ public:
     /// Starts `bundle`, a shared library. `published` is called with every message that the bundle
     /// publishes, on the publishing thread and by several threads at once; while it runs, the
     /// request that the message answers is not done. Messages of up to `largestMessage` bytes can
-    /// be sent. What `guard` has saves for, it saves. Throws std::runtime_error
-    /// when the bundle cannot be loaded or started.
+    /// be sent. What `guard` has saves for, it saves. Unless `memoryForRequests` is 0, the bundle
+    /// gets requests as admittingRequests() gives them, with a budget of so many bytes, and those
+    /// to read that fail for want of memory are answered. Throws std::runtime_error when the bundle
+    /// cannot be loaded or started.
     BundleHost(const std::filesystem::path& bundle, std::size_t largestMessage,
-               platform::messaging::MessageHandler published, Guard guard = {});
+               platform::messaging::MessageHandler published, Guard guard = {},
+               std::uint64_t memoryForRequests = 0);
 
     BundleHost(const BundleHost&) = delete;
     BundleHost& operator=(const BundleHost&) = delete;

@@ -412,7 +412,16 @@ void describe(CLI::App& app, CommandLine& line) {
                    "The most memory to take, in bytes or with a unit such as GB; what needs more "
                    "fails (default: three quarters of the machine's; 0: no limit)")
         ->type_name("SIZE")
-        ->transform(untold(CLI::AsSizeValue(false)));
+        ->transform(untold(CLI::AsSizeValue(false)))
+        ->check(CLI::Validator(
+            [](const std::string& bytes) {
+                // Less is not enough to start the threads and the bundle.
+                constexpr unsigned long long least = 64ULL << 20U;
+                return bytes == "0" || std::stoull(bytes) >= least
+                           ? std::string()
+                           : "the program itself takes some 64 MB";
+            },
+            ""));
     app.require_subcommand(1);
     app.fallthrough();
     declareRead(*app.add_subcommand("read", "Read files and print the response for each on a line"),

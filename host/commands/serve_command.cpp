@@ -18,7 +18,8 @@
 #include "framework/bundle_runner.h"
 #include "futures/future.h"
 #include "host/bus/bundle_location.h"
-#include "host/bus/unsent_answers.h"
+#include "host/bus/failed_reads.h"
+#include "host/bus/request_admission.h"
 #include "host/commands/exit_status.h"
 #include "host/commands/standard_streams.h"
 #include "host/commands/stop_signals.h"
@@ -284,19 +285,22 @@ int runServe(const ServeOptions& options, int output) {
         // The threads that handle requests come from this one.
         confinements->documents.confineThisThread();
     }
-    platform::messaging::setTransport(
-        [bus, guard](const std::string& name, const platform::messaging::MessageServiceOptions&) {
-            // The bus is connected, so that this is no waiting.
-            futures::Promise<std::shared_ptr<platform::messaging::MessageService>> promise;
-            std::shared_ptr<platform::messaging::MessageService> client =
-                tellingWhatIsNotSent(bus->connect(name).get());
-            promise.setValue(guard.saves ? savingSafely(std::move(client), guard)
-                                         : std::move(client));
-            return promise.getFuture();
-        });
+    const auto budget =
+        std::make_shared<platform::messaging::MemoryBudget>(options.memoryForRequests);
+    platform::messaging::setTransport([bus, guard, budget](
+                                          const std::string& name,
+                                          const platform::messaging::MessageServiceOptions&) {
+        // The bus is connected, so that this is no waiting.
+        futures::Promise<std::shared_ptr<platform::messaging::MessageService>> promise;
+        std::shared_ptr<platform::messaging::MessageService> client =
+            answeringFailedReads(admittingRequests(bus->connect(name).get(), budget));
+        promise.setValue(guard.saves ? savingSafely(std::move(client), guard) : std::move(client));
+        return promise.getFuture();
+    });
     const TransportEnd transportEnd;
     const framework::BundleRunner bundle(options.bundle);
-    const FileService files(tellingWhatIsNotSent(bus->connect(clientName).get()), guard);
+    const FileService files(
+        answeringFailedReads(admittingRequests(bus->connect(clientName).get(), budget)), guard);
     tellHowToConnect(web.get(), server.get(), output);
     signals.first().wait();
     if (!bus->drain(longestDrain)) {

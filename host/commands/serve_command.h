@@ -2,6 +2,7 @@
 // The command `serve`: carries the bundle's messages over NATS.
 #pragma once
 
+#include <cstdint>
 #include <filesystem>
 #include <string>
 #include <vector>
@@ -48,6 +49,9 @@ struct ServeOptions {
     /// Whether the kernel keeps the host to these folders. Without, they have no effect.
     bool isConfined = true;
     GuardOptions guard;
+
+    /// The bytes that requests and the values in them may take together.
+    std::uint64_t memoryForRequests = 0;
 };
 
 /// Serves the bundle's clients until the process is asked to end (StopSignals), and finishes then

@@ -113,7 +113,8 @@ int runStdio(const StdioOptions& options, int input, int output) {
     const Guard guard = makeGuard(options.guard, {});
     BundleHost host(
         options.bundle, options.largestMessage,
-        [&frames](const JsonMessage& message) { frames.write(message); }, guard);
+        [&frames](const JsonMessage& message) { frames.write(message); }, guard,
+        options.memoryForRequests);
     const StopSignals signals([] {});
     FrameReader reader(
         [&](char* to, std::size_t room) {

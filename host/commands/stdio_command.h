@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <filesystem>
 
 #include "host/guard/guard.h"
@@ -13,6 +14,9 @@ struct StdioOptions {
     std::filesystem::path bundle;
     std::size_t largestMessage = std::size_t{1} << 30;  ///< Of the input, in bytes.
     GuardOptions guard{false};  ///< The command shows what the bundle does by itself.
+
+    /// The bytes that requests and the values in them may take together; 0: as many as they need.
+    std::uint64_t memoryForRequests = 0;
 };
 
 /// Sends the messages that come framed on `input` to the bundle, and writes every message that the

@@ -13,4 +13,8 @@ void keepFreedMemory() {
     ::mallopt(M_TRIM_THRESHOLD, static_cast<int>(keptMemory));
 }
 
+void returnFreedMemory() {
+    ::malloc_trim(0);
+}
+
 }  // namespace host

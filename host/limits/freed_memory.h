@@ -15,4 +15,8 @@ inline constexpr std::size_t keptMemory = std::size_t{32} << 20U;
 /// called before there are other threads.
 void keepFreedMemory();
 
+/// Gives all freed memory back to the system, also what is kept for the requests to come. Takes
+/// time in proportion to the pages that are given back.
+void returnFreedMemory();
+
 }  // namespace host

@@ -45,7 +45,7 @@ std::uint64_t defaultMemoryLimit() {
     return std::min(pages * pageSize, controlGroupLimit()) / 4 * 3;
 }
 
-void limitMemory(std::uint64_t bytes) {
+std::uint64_t limitMemory(std::uint64_t bytes) {
     rlimit limit{};
     if (::getrlimit(RLIMIT_DATA, &limit) != 0) {
         throw std::system_error(errno, std::generic_category(), "cannot get the memory limit");
@@ -54,6 +54,7 @@ void limitMemory(std::uint64_t bytes) {
     if (::setrlimit(RLIMIT_DATA, &limit) != 0) {
         throw std::system_error(errno, std::generic_category(), "cannot set the memory limit");
     }
+    return limit.rlim_cur;
 }
 
 }  // namespace host

@@ -12,7 +12,14 @@ namespace host {
 std::uint64_t defaultMemoryLimit();
 
 /// Makes allocations fail that would take the process's memory above `bytes`. A limit that was set
-/// from outside is never raised. Throws std::system_error when the system refuses.
-void limitMemory(std::uint64_t bytes);
+/// from outside is never raised. Returns the limit that holds. Throws std::system_error when the
+/// system refuses.
+std::uint64_t limitMemory(std::uint64_t bytes);
+
+/// What requests and the values in them may take together, in bytes, in a process that may take
+/// `limit` bytes. The other half is for the documents that they read and write, and the program.
+constexpr std::uint64_t memoryForRequests(std::uint64_t limit) {
+    return limit / 2;
+}
 
 }  // namespace host

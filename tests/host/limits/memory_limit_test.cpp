@@ -2,11 +2,15 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <chrono>
+#include <cstddef>
 #include <cstdint>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <string>
+#include <thread>
+#include <vector>
 
 #include "host/limits/memory_limit.h"
 #include "tests/host/host_program.h"
@@ -67,6 +71,75 @@ TEST_F(MemoryLimit, LeavesTheLimitOfTextsToTellOfAFileThatIsTooLargeForOne) {
               "{\"exception\":\"The text is too large: 1073741825 bytes, at most 1073741824 are "
               "accepted\",\"status\":false}\n"
               "{\"data\":\"text\",\"status\":true}\n");
+}
+
+// A read request in which something nests `levels` deep beside what counts.
+std::string deepRequest(const std::string& rtcId, const std::string& file, std::size_t levels) {
+    std::string request = test::readRequest(rtcId, file);
+    request.back() = ',';
+    return request + "\"deep\":" + std::string(levels, '[') + std::string(levels, ']') + "}";
+}
+
+constexpr const char* kReadRequests = "/zpr/service/readRequest_cpp";
+
+test::Message answer(const std::string& rtcId, const std::string& payload) {
+    return {"/zpr/service/readResponse/" + rtcId, payload};
+}
+
+TEST_F(MemoryLimit, HasARequestRefusedWhoseValuesWouldTakeMoreThanHalfOfIt) {
+    const Outcome outcome =
+        test::run(hostCommand({"--memory-limit", "200MB", "stdio"}),
+                  test::framed(kReadRequests, deepRequest("1", small, 2'000'000)) +
+                      test::framedReadRequest("2", small));
+    EXPECT_EQ(outcome.status, 0);
+    const std::vector<test::Message> messages = test::messagesIn(outcome.output);
+    ASSERT_THAT(messages, testing::SizeIs(2));
+    EXPECT_THAT(messages, testing::Contains(answer("2", R"({"data":"text","status":true})")));
+    EXPECT_THAT(messages, testing::Contains(testing::Field(
+                              &test::Message::payload,
+                              testing::StartsWith(R"({"exception":"The request is too large: )"))));
+    EXPECT_THAT(outcome.errors, testing::HasSubstr("is refused: The request is too large"));
+}
+
+TEST_F(MemoryLimit, LetsTenMillionLevelsThroughByDefault) {
+    if (host::defaultMemoryLimit() < 4 * kGigabyte) {
+        GTEST_SKIP() << "the machine has too little memory";
+    }
+    const Outcome outcome = test::run(
+        hostCommand({"stdio"}), test::framed(kReadRequests, deepRequest("1", small, 10'000'000)));
+    EXPECT_THAT(test::messagesIn(outcome.output),
+                testing::ElementsAre(answer("1", R"({"data":"text","status":true})")));
+}
+
+// The memory that a process has now, in bytes.
+std::size_t residentMemory(pid_t process) {
+    std::ifstream status("/proc/" + std::to_string(process) + "/status");
+    for (std::string line; std::getline(status, line);) {
+        if (line.starts_with("VmRSS:")) {
+            return std::stoul(line.substr(6)) * 1024;
+        }
+    }
+    return 0;
+}
+
+TEST_F(MemoryLimit, IsNotUsedUpByARequestThatIsDone) {
+    test::Subprocess program(hostCommand({"stdio"}));
+    program.write(test::framedReadRequest("1", small));
+    EXPECT_NE(program.readSome(), "");
+    const std::size_t before = residentMemory(program.id());
+    program.write(test::framed(kReadRequests, deepRequest("1", small, 3'000'000)));
+    EXPECT_NE(program.readSome(), "");
+    // The answer comes before the request's values are given back.
+    for (int i = 0; i < 600 && residentMemory(program.id()) > before + kGigabyte / 20; ++i) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(100));
+    }
+    EXPECT_LE(residentMemory(program.id()), before + kGigabyte / 20);
+}
+
+TEST_F(MemoryLimit, OfLessThanTheProgramTakesIsWrongUsage) {
+    const Outcome outcome = test::run(hostCommand({"--memory-limit", "16", "read", small}));
+    EXPECT_EQ(outcome.status, 2);
+    EXPECT_THAT(outcome.errors, testing::HasSubstr("the program itself takes some 64 MB"));
 }
 
 }  // namespace

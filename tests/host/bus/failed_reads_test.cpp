@@ -1,9 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "host/bus/unsent_answers.h"
+#include "host/bus/failed_reads.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <new>
 #include <stdexcept>
 #include <string>
 #include <string_view>
@@ -56,9 +57,11 @@ private:
     std::vector<std::string> received_;
     std::shared_ptr<platform::messaging::MessageService> receiver_ =
         bus_->connect("receiver").get();
+
+protected:
     std::vector<std::shared_ptr<platform::messaging::Subscription>> subscriptions_;
     std::shared_ptr<platform::messaging::MessageService> client_ =
-        tellingWhatIsNotSent(bus_->connect("bundle").get());
+        answeringFailedReads(bus_->connect("bundle").get());
 };
 
 TEST_F(UnsentAnswers, AreReplacedByTheReason) {
@@ -79,6 +82,45 @@ TEST_F(UnsentAnswers, ToWritesHaveNoFormForAReason) {
     auto future = publish(writeAnswers, std::string(301, 'x'));
     EXPECT_THAT(received(), IsEmpty());
     EXPECT_THROW(future.get(), std::runtime_error);
+}
+
+class FailedReads : public UnsentAnswers {
+protected:
+    /// Sends `request` on `channel` to a handler that throws `error`.
+    template <typename Error>
+    void fail(const std::string& channel, const std::string& text, const Error& error) {
+        subscriptions_.push_back(
+            client_->subscribe(channel, [error](const JsonMessage&) { throw error; }).get());
+        client_->publish(channel, DataBuffer::copyOf(text)).get();
+    }
+
+    const std::string readRequests = platform::messaging::readRequestChannel;
+    const std::string request = R"({"contentType":"text/plain","filePath":"/a","rtcId":"1"})";
+};
+
+TEST_F(FailedReads, AreAnsweredWhenMemoryRunsOut) {
+    fail(readRequests, request, std::bad_alloc());
+    EXPECT_THAT(received(), ElementsAre(R"({"exception":"Out of memory!","status":false})"));
+}
+
+TEST_F(FailedReads, AreAnsweredWhenThereIsNoMemoryForTheMessage) {
+    fail(readRequests, request, std::runtime_error("Out of memory!"));
+    EXPECT_THAT(received(), ElementsAre(R"({"exception":"Out of memory!","status":false})"));
+}
+
+TEST_F(FailedReads, AreNotAnsweredWhenTheyAreFaulty) {
+    fail(readRequests, request, std::runtime_error("invalid conversion: undefined to string"));
+    EXPECT_THAT(received(), IsEmpty());
+}
+
+TEST_F(FailedReads, AreNotAnsweredWhenNobodyKnowsWhere) {
+    fail(readRequests, R"({"contentType":"text/plain"})", std::bad_alloc());
+    EXPECT_THAT(received(), IsEmpty());
+}
+
+TEST_F(FailedReads, AreNoWrites) {
+    fail(platform::messaging::writeRequestChannel, request, std::bad_alloc());
+    EXPECT_THAT(received(), IsEmpty());
 }
 
 }  // namespace

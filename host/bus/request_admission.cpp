@@ -1,0 +1,191 @@
+// SPDX-License-Identifier: Apache-2.0
+// The thread that brings a large message goes on with those that come meanwhile. So it is the bus's
+// own threads that handle everything, and when the bus waits for them, nothing is left undone.
+#include "host/bus/request_admission.h"
+
+#include <spdlog/spdlog.h>
+
+#include <algorithm>
+#include <exception>
+#include <mutex>
+#include <optional>
+#include <queue>
+#include <string>
+#include <string_view>
+#include <utility>
+
+#include "host/bus/failed_reads.h"
+#include "host/limits/freed_memory.h"
+#include "json/find_string.h"
+#include "json/parse_memory.h"
+#include "platform/messaging/channels.h"
+
+namespace host {
+
+namespace {
+
+using platform::DataBuffer;
+using platform::messaging::JsonMessage;
+using platform::messaging::MemoryBudget;
+using platform::messaging::MessageHandler;
+using platform::messaging::MessageService;
+using platform::messaging::Subscription;
+
+// What each thread may take without asking: the values of a request to read, hundreds of times
+// over.
+constexpr std::size_t usualSmallRequest = std::size_t{4} << 20U;
+
+// The share of the budget that these take, with as many threads as a machine has that has so
+// little.
+constexpr std::size_t smallShare = 64;
+
+// The share of the budget whose size the messages may have together that wait.
+constexpr std::size_t waitingShare = 8;
+
+// The requests on one channel.
+class Admission {
+public:
+    Admission(std::shared_ptr<MessageService> client, std::shared_ptr<MemoryBudget> budget,
+              std::string channel, MessageHandler handler)
+        : client_(std::move(client)),
+          budget_(std::move(budget)),
+          channel_(std::move(channel)),
+          handler_(std::move(handler)) {}
+
+    void handle(const JsonMessage& message) {
+        const std::size_t smallest = std::min(usualSmallRequest, budget_->size() / smallShare);
+        const std::size_t length = message.payload().size();
+        // Most messages are so short that nothing has to be counted.
+        if (length + json::mostMemoryToParse(length) <= smallest) {
+            handler_(message);
+            return;
+        }
+        const std::size_t memory = length + json::memoryToParse(message.payload());
+        if (memory <= smallest) {
+            handler_(message);
+        } else if (memory > budget_->size()) {
+            refuse(message, "The request is too large: it would take " + std::to_string(memory) +
+                                " bytes of memory, and requests may take " +
+                                std::to_string(budget_->size()));
+        } else {
+            handleInTurn({message, memory});
+        }
+    }
+
+private:
+    struct LargeRequest {
+        JsonMessage message;
+        std::size_t memory;
+    };
+
+    // Handles the request, and all that come until it is done; or leaves it to the thread that is
+    // at this already.
+    void handleInTurn(LargeRequest request) {
+        std::unique_lock lock(mutex_);
+        const std::size_t length = request.message.payload().size();
+        if (isHandling_ && waitingBytes_ + length > budget_->size() / waitingShare) {
+            lock.unlock();
+            refuse(request.message, "Too many large requests are waiting");
+            return;
+        }
+        waiting_.push(std::move(request));
+        waitingBytes_ += length;
+        if (std::exchange(isHandling_, true)) {
+            return;
+        }
+        lock.unlock();
+        while (std::optional<LargeRequest> next = takeNext()) {
+            handleLarge(std::move(*next));
+        }
+    }
+
+    std::optional<LargeRequest> takeNext() {
+        const std::lock_guard lock(mutex_);
+        if (waiting_.empty()) {
+            isHandling_ = false;
+            return std::nullopt;
+        }
+        LargeRequest next = std::move(waiting_.front());
+        waiting_.pop();
+        waitingBytes_ -= next.message.payload().size();
+        return next;
+    }
+
+    void handleLarge(LargeRequest request) {
+        const MemoryBudget::Reservation reservation = budget_->reserve(request.memory);
+        // Failures are not left to the bus, for which they would be those of another message.
+        try {
+            handler_(request.message);
+        } catch (const std::exception& error) {
+            logFailure(request, error.what());
+        } catch (...) {
+            logFailure(request, "an exception that is not derived from std::exception");
+        }
+        if (request.memory - request.message.payload().size() > keptMemory) {
+            returnFreedMemory();
+        }
+    }
+
+    void logFailure(const LargeRequest& request, std::string_view reason) {
+        spdlog::error("A request of {} bytes on channel \"{}\" failed: {}",
+                      request.message.payload().size(), channel_, reason);
+    }
+
+    void refuse(const JsonMessage& message, const std::string& reason) {
+        spdlog::error("A request of {} bytes on channel \"{}\" is refused: {}",
+                      message.payload().size(), channel_, reason);
+        if (channel_ == platform::messaging::readRequestChannel) {
+            answerFailedRead(*client_, message.payload(), reason);
+        } else if (channel_ == platform::messaging::writeRequestChannel) {
+            if (const auto rtcId = json::findString(message.payload(), "rtcId")) {
+                client_->publish(platform::messaging::writeResponsePrefix + *rtcId,
+                                 DataBuffer::copyOf("false"));
+            }
+        }
+    }
+
+    const std::shared_ptr<MessageService> client_;
+    const std::shared_ptr<MemoryBudget> budget_;
+    const std::string channel_;
+    const MessageHandler handler_;
+
+    std::mutex mutex_;  // guards what follows
+    std::queue<LargeRequest> waiting_;
+    std::size_t waitingBytes_ = 0;
+    bool isHandling_ = false;  // a thread handles large requests
+};
+
+class AdmittingClient final : public MessageService {
+public:
+    AdmittingClient(std::shared_ptr<MessageService> client, std::shared_ptr<MemoryBudget> budget)
+        : client_(std::move(client)), budget_(std::move(budget)) {}
+
+    futures::Future<std::shared_ptr<Subscription>> subscribe(const std::string& channel,
+                                                             MessageHandler handler) override {
+        const auto admission =
+            std::make_shared<Admission>(client_, budget_, channel, std::move(handler));
+        return client_->subscribe(
+            channel, [admission](const JsonMessage& message) { admission->handle(message); });
+    }
+
+    futures::Future<void> publish(const std::string& channel, DataBuffer payload) override {
+        return client_->publish(channel, std::move(payload));
+    }
+
+    std::size_t maxPayload(const std::string& channel) const override {
+        return client_->maxPayload(channel);
+    }
+
+private:
+    const std::shared_ptr<MessageService> client_;
+    const std::shared_ptr<MemoryBudget> budget_;
+};
+
+}  // namespace
+
+std::shared_ptr<MessageService> admittingRequests(std::shared_ptr<MessageService> client,
+                                                  std::shared_ptr<MemoryBudget> budget) {
+    return std::make_shared<AdmittingClient>(std::move(client), std::move(budget));
+}
+
+}  // namespace host

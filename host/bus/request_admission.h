@@ -1,0 +1,29 @@
+// SPDX-License-Identifier: Apache-2.0
+// Admission control: the bundle is given a request when there is memory for it, so that no request
+// takes the memory of another one.
+#pragma once
+
+#include <cstddef>
+#include <memory>
+
+#include "platform/messaging/memory_budget.h"
+#include "platform/messaging/message_service.h"
+
+namespace host {
+
+/// A client that does what `client` does, except that the handler of a subscription gets a large
+/// message only when `budget` has the memory for it: its bytes, and what its JSON values take when
+/// they are parsed (json::memoryToParse). What is large is up to the size of the budget.
+///
+/// Of the large messages of a channel one is handled at a time, in the order in which they come, so
+/// that small ones find a thread beside it. A message that goes beyond the budget altogether, or
+/// that comes when too many bytes wait, is refused: the log says so, and the answer is an
+/// "exception" for a read request and `false` for a write request whose "rtcId" is known.
+///
+/// The memory of a large message's values is given back to the system when they have been handled.
+/// What the handler throws for a large message is logged.
+std::shared_ptr<platform::messaging::MessageService> admittingRequests(
+    std::shared_ptr<platform::messaging::MessageService> client,
+    std::shared_ptr<platform::messaging::MemoryBudget> budget);
+
+}  // namespace host

@@ -1,0 +1,212 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "host/bus/request_admission.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <latch>
+#include <memory>
+#include <stdexcept>
+#include <string>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "platform/messaging/channels.h"
+#include "platform/messaging/in_process_bus.h"
+
+namespace host {
+namespace {
+
+using namespace platform::messaging;
+using platform::DataBuffer;
+using testing::ElementsAre;
+using testing::MatchesRegex;
+
+constexpr std::size_t budgetSize = std::size_t{64} << 20U;
+
+/// Requests of a few bytes, of values that take about 10 MB, and of more than the budget.
+std::string request(const std::string& id, std::size_t depth = 0) {
+    return R"({"rtcId":")" + id + R"(","a":)" + std::string(depth, '[');
+}
+constexpr std::size_t large = 90'000;
+constexpr std::size_t tooLarge = 800'000;
+
+class RequestAdmission : public testing::Test {
+protected:
+    void handleReadsWith(MessageHandler handler) { subscribe(readRequestChannel, handler); }
+
+    void subscribe(const std::string& channel, MessageHandler handler) {
+        subscriptions_.push_back(client_->subscribe(channel, std::move(handler)).get());
+    }
+
+    /// What is answered to "1" on `prefix`.
+    void collectAnswers(const std::string& prefix) {
+        subscriptions_.push_back(bus_->connect("receiver")
+                                     .get()
+                                     ->subscribe(prefix + std::string("1"),
+                                                 [this](const JsonMessage& message) {
+                                                     answers_.emplace_back(message.payload());
+                                                     ++answerCount_;
+                                                 })
+                                     .get());
+    }
+
+    void send(const std::string& text, const std::string& channel = readRequestChannel) {
+        sender_->publish(channel, DataBuffer::copyOf(text)).get();
+    }
+
+    std::vector<std::string> answers() {
+        bus_->waitUntilIdle();
+        return answers_;
+    }
+
+    std::shared_ptr<InProcessBus> bus_ =
+        InProcessBus::create({.maxQueuedBytes = 1U << 30U,
+                              .concurrentChannels = {readRequestChannel},
+                              .concurrency = 2});
+    std::shared_ptr<MemoryBudget> budget_ = std::make_shared<MemoryBudget>(budgetSize);
+    std::vector<std::string> answers_;
+    std::atomic<int> answerCount_ = 0;
+
+private:
+    std::shared_ptr<MessageService> sender_ = bus_->connect("sender").get();
+    std::shared_ptr<MessageService> client_ =
+        admittingRequests(bus_->connect("bundle").get(), budget_);
+    std::vector<std::shared_ptr<Subscription>> subscriptions_;
+};
+
+TEST_F(RequestAdmission, ReservesTheMemoryOfALargeRequestWhileItIsHandled) {
+    std::vector<std::size_t> reserved;
+    handleReadsWith([&](const JsonMessage&) { reserved.push_back(budget_->reserved()); });
+    send(request("1"));
+    bus_->waitUntilIdle();
+    send(request("1", large));
+    bus_->waitUntilIdle();
+    ASSERT_EQ(reserved.size(), 2u);
+    EXPECT_EQ(reserved[0], 0u);
+    EXPECT_GT(reserved[1], 50 * large);
+    EXPECT_EQ(budget_->reserved(), 0u);
+}
+
+TEST_F(RequestAdmission, HandlesSmallRequestsBesideLargeOnesThatWait) {
+    std::latch smallDone(3);
+    std::atomic<int> largeDone = 0;
+    std::atomic<int> largeAtOnce = 0;
+    std::atomic<bool> overlapped = false;
+    handleReadsWith([&](const JsonMessage& message) {
+        if (message.payload().size() < large) {
+            smallDone.count_down();
+            return;
+        }
+        overlapped = overlapped || ++largeAtOnce > 1;
+        smallDone.wait();  // for ever if a large one had the other thread
+        --largeAtOnce;
+        ++largeDone;
+    });
+    for (int i = 0; i < 3; ++i) {
+        send(request("1", large));
+    }
+    for (int i = 0; i < 3; ++i) {
+        send(request("1"));
+    }
+    bus_->waitUntilIdle();
+    EXPECT_EQ(largeDone, 3);
+    EXPECT_FALSE(overlapped);
+}
+
+TEST_F(RequestAdmission, HasALargeRequestWaitUntilThereIsMemoryForIt) {
+    std::atomic<int> handled = 0;
+    handleReadsWith([&](const JsonMessage&) { ++handled; });
+    {
+        const auto others = budget_->tryReserve(budgetSize);
+        ASSERT_TRUE(others);
+        send(request("1", large));
+        send(request("1"));
+        while (handled == 0) {
+            std::this_thread::yield();
+        }
+        EXPECT_EQ(handled, 1);
+    }
+    bus_->waitUntilIdle();
+    EXPECT_EQ(handled, 2);
+}
+
+TEST_F(RequestAdmission, KeepsTheOrderOfWrites) {
+    std::vector<std::string> handled;
+    subscribe(writeRequestChannel, [&](const JsonMessage& message) {
+        handled.emplace_back(message.payload().substr(0, 12));
+    });
+    send(request("1", large), writeRequestChannel);
+    send(request("2"), writeRequestChannel);
+    send(request("3", large), writeRequestChannel);
+    bus_->waitUntilIdle();
+    EXPECT_THAT(handled, ElementsAre(R"({"rtcId":"1")", R"({"rtcId":"2")", R"({"rtcId":"3")"));
+}
+
+TEST_F(RequestAdmission, AnswersAReadThatIsBeyondTheBudget) {
+    bool handled = false;
+    handleReadsWith([&](const JsonMessage&) { handled = true; });
+    collectAnswers(readResponsePrefix);
+    send(request("1", tooLarge));
+    EXPECT_THAT(
+        answers(),
+        ElementsAre(MatchesRegex(R"(\{"exception":"The request is too large: it would take .*)")));
+    EXPECT_FALSE(handled);
+}
+
+TEST_F(RequestAdmission, AnswersFalseToAWriteThatIsBeyondTheBudget) {
+    subscribe(writeRequestChannel, [](const JsonMessage&) { FAIL(); });
+    collectAnswers(writeResponsePrefix);
+    send(request("1", tooLarge), writeRequestChannel);
+    EXPECT_THAT(answers(), ElementsAre("false"));
+}
+
+TEST_F(RequestAdmission, RefusesWhatComesWhileTooMuchWaits) {
+    std::latch begun(1);
+    std::latch refused(1);
+    bool isFirst = true;
+    handleReadsWith([&](const JsonMessage&) {
+        if (std::exchange(isFirst, false)) {
+            begun.count_down();
+            refused.wait();
+        }
+    });
+    collectAnswers(readResponsePrefix);
+    send(request("1", large));
+    begun.wait();
+    // Beside it an eighth of the budget may wait.
+    const std::size_t fitting = budgetSize / 8 / request("1", large).size();
+    for (std::size_t i = 0; i < fitting + 1; ++i) {
+        send(request("1", large));
+    }
+    while (answerCount_ == 0) {
+        std::this_thread::yield();
+    }
+    refused.count_down();
+    EXPECT_THAT(
+        answers(),
+        ElementsAre(R"({"exception":"Too many large requests are waiting","status":false})"));
+}
+
+TEST_F(RequestAdmission, GoesOnAfterHandlersThatThrow) {
+    int handled = 0;
+    handleReadsWith([&](const JsonMessage&) {
+        if (++handled == 1) {
+            throw std::runtime_error("a failure");
+        }
+        if (handled == 2) {
+            throw 1;
+        }
+    });
+    for (int i = 0; i < 3; ++i) {
+        send(request("1", large));
+        bus_->waitUntilIdle();
+    }
+    EXPECT_EQ(handled, 3);
+    EXPECT_EQ(budget_->reserved(), 0u);
+}
+
+}  // namespace
+}  // namespace host
