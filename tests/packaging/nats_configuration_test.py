@@ -158,22 +158,20 @@ class Permissions:
                        self.origins[0] + "1", "http://editor.example.org"):
             self.assertIn("403", open_websocket(self.server, origin, self.context), origin)
 
-    def test_statistics_are_for_this_machine(self):
-        url = f"http://127.0.0.1:{self.server.monitoring_port}/varz"
-        with urllib.request.urlopen(url, timeout=nats_server.PATIENCE) as answer:
-            self.assertEqual(json.load(answer)["max_payload"], LARGEST)
+    def test_nothing_else_listens(self):
+        self.assertEqual(self.server.listening_ports(),
+                         {self.server.client_port, self.server.websocket_port})
 
 
 class OneMachineServer(WithServer):
     @classmethod
     def start(cls):
-        client, websocket, monitoring = nats_server.free_ports(3)
+        client, websocket = nats_server.free_ports(2)
         nats_server.write_configuration(cls.folder, {
             '"127.0.0.1:4222"': f'"127.0.0.1:{client}"',
             '"127.0.0.1:9222"': f'"127.0.0.1:{websocket}"',
-            '"127.0.0.1:8222"': f'"127.0.0.1:{monitoring}"',
         })
-        return Server(cls.folder, "one-machine.conf", client, websocket, monitoring)
+        return Server(cls.folder, "one-machine.conf", client, websocket)
 
 
 class OneMachine(Permissions, OneMachineServer):
@@ -194,11 +192,10 @@ class ChangeOfUsers(OneMachineServer):
         self.assertEqual(ada.publish(READ_REQUESTS), [])
 
 
-def network_replacements(folder, client, websocket, monitoring):
+def network_replacements(folder, client, websocket):
     return {
         "0.0.0.0:4222": f"127.0.0.1:{client}",
         "0.0.0.0:9222": f"127.0.0.1:{websocket}",
-        "127.0.0.1:8222": f"127.0.0.1:{monitoring}",
         "/etc/editor-nats/server.crt": str(folder / "server.crt"),
         "/etc/editor-nats/server.key": str(folder / "server.key"),
     }
@@ -209,7 +206,7 @@ class NetworkServer(WithServer):
     def start(cls):
         nats_server.make_certificates(cls.folder)
         cls.context = nats_server.client_context(cls.folder)
-        ports = nats_server.free_ports(3)
+        ports = nats_server.free_ports(2)
         nats_server.write_configuration(cls.folder, network_replacements(cls.folder, *ports))
         return Server(cls.folder, "network.conf", *ports)
 
@@ -253,8 +250,8 @@ class Cluster(unittest.TestCase):
     def start(cls, number):
         folder = cls.folder / str(number)
         folder.mkdir()
-        ports = nats_server.free_ports(3)
-        replacements = network_replacements(cls.folder, *ports) | {
+        client, websocket, monitoring = nats_server.free_ports(3)
+        replacements = network_replacements(cls.folder, client, websocket) | {
             "/etc/editor-nats/cluster.crt": str(cls.folder / "server.crt"),
             "/etc/editor-nats/cluster.key": str(cls.folder / "server.key"),
             "/etc/editor-nats/cluster-ca.crt": str(cls.folder / "ca.crt"),
@@ -264,7 +261,9 @@ class Cluster(unittest.TestCase):
         for i, port in enumerate(cls.cluster_ports):
             replacements[f"nats-{i + 1}.example.org:6222"] = f"127.0.0.1:{port}"
         nats_server.write_configuration(folder, replacements)
-        return Server(folder, "cluster.conf", *ports)
+        with open(folder / "site.conf", "a") as site:
+            site.write(f'http: "127.0.0.1:{monitoring}"\n')
+        return Server(folder, "cluster.conf", client, websocket, monitoring)
 
     @staticmethod
     def wait_for_routes(server, count):

@@ -15,7 +15,6 @@ import time
 
 PACKAGED = pathlib.Path(__file__).resolve().parents[2] / "packaging" / "nats"
 PASSWORDS = {"worker": "worker's", "ada": "ada's", "ben": "ben's"}
-PORTS = ("4222", "9222", "6222", "8222")
 PATIENCE = 30  # seconds that anything may take; nothing here is expected to
 
 
@@ -89,6 +88,16 @@ class Server:
             if self.process.poll() is not None or time.monotonic() > deadline:
                 raise RuntimeError("no server: " + self.log.read_text())
             time.sleep(0.02)
+
+    def listening_ports(self):
+        """The ports of all sockets of the process that wait for connections."""
+        process = pathlib.Path(f"/proc/{self.process.pid}")
+        open_files = {os.readlink(file) for file in (process / "fd").iterdir()}
+        lines = [line.split() for version in ("tcp", "tcp6")
+                 for line in (process / "net" / version).read_text().splitlines()[1:]]
+        listening = "0A"
+        return {int(columns[1].rpartition(":")[2], 16) for columns in lines
+                if columns[3] == listening and f"socket:[{columns[9]}]" in open_files}
 
     def kill(self):
         self.process.kill()

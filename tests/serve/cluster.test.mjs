@@ -41,7 +41,8 @@ function configuration(name, { port, webSocketPort, clusterPort, monitoringPort 
     `WORKER_PASSWORD: "${WORKER}"`,
     `ADA_PASSWORD: "${ADA}"`,
     `BEN_PASSWORD: "ben"`,
-    packaged("limits.conf").replace("127.0.0.1:8222", `127.0.0.1:${monitoringPort}`),
+    `http: "127.0.0.1:${monitoringPort}"`,
+    packaged("limits.conf"),
     packaged("users.conf").replace('include "secrets.conf"', ""),
   ].join("\n");
 }
