@@ -29,8 +29,13 @@ public:
 
     /// Stops the bundles too that still run.
     ~RunningFramework() {
-        framework_.Stop();
-        framework_.WaitForStop(std::chrono::milliseconds::zero());  // however long it takes
+        try {
+            framework_.Stop();
+            framework_.WaitForStop(std::chrono::milliseconds::zero());  // however long it takes
+        } catch (const std::exception&) {
+            // It stops on a thread of its own, which the system may refuse. What is left running
+            // has no subscriptions any more and ends with the process.
+        }
     }
 
     cppmicroservices::Bundle install(const std::filesystem::path& bundle) {
