@@ -23,6 +23,7 @@
 #include <exception>
 #include <future>
 #include <memory>
+#include <new>
 #include <optional>
 #include <stdexcept>
 #include <system_error>
@@ -171,22 +172,28 @@ private:
         return ::MHD_get_connection_info(connection, MHD_CONNECTION_INFO_CONNECTION_FD)->connect_fd;
     }
 
+    // No exception may leave this one and the next for the library, which is written in C.
+
     static void connectionChanged(void* self, MHD_Connection* connection, void**,
                                   MHD_ConnectionNotificationCode change) {
         Loop& loop = *static_cast<Loop*>(self);
-        if (change == MHD_CONNECTION_NOTIFY_STARTED) {
-            loop.deadlines_[socketOf(connection)] = Clock::now() + loop.limits_.head;
-        } else {
-            loop.deadlines_.erase(socketOf(connection));
+        const int socket = socketOf(connection);
+        if (change != MHD_CONNECTION_NOTIFY_STARTED) {
+            loop.deadlines_.erase(socket);
+            return;
+        }
+        try {
+            loop.deadlines_[socket] = Clock::now() + loop.limits_.head;
+        } catch (const std::bad_alloc&) {
+            ::shutdown(socket, SHUT_RDWR);
         }
     }
 
     static MHD_Result answer(void* self, MHD_Connection* connection, const char* path,
                              const char* method, const char*, const char*, std::size_t*, void**) {
         Loop& loop = *static_cast<Loop*>(self);
-        loop.deadlines_[socketOf(connection)] = Clock::now() + loop.limits_.answer;
-        // No exception may leave this for the library, which is written in C.
         try {
+            loop.deadlines_[socketOf(connection)] = Clock::now() + loop.limits_.answer;
             const char* const host =
                 ::MHD_lookup_connection_value(connection, MHD_HEADER_KIND, "Host");
             HttpAnswer answer = loop.answerTo({method, path, viewOf(host)});
@@ -263,18 +270,19 @@ HttpServer::~HttpServer() {
 void HttpServer::start(std::function<void()> prepare, Handler handler) {
     std::promise<void> running;
     std::future<void> whenRunning = running.get_future();
-    thread_ = std::thread(
-        [this, &running, prepare = std::move(prepare), handler = std::move(handler)]() mutable {
-            std::optional<Loop> loop;
-            try {
-                prepare();
-                loop.emplace(std::move(socket_), limits_, std::move(handler));
-            } catch (...) {
-                return running.set_exception(std::current_exception());
-            }
-            running.set_value();
-            loop->run(stop_.get());
-        });
+    // The thread has the promise, since it may be busy with it still when the future is ready.
+    thread_ = std::thread([this, running = std::move(running), prepare = std::move(prepare),
+                           handler = std::move(handler)]() mutable {
+        std::optional<Loop> loop;
+        try {
+            prepare();
+            loop.emplace(std::move(socket_), limits_, std::move(handler));
+        } catch (...) {
+            return running.set_exception(std::current_exception());
+        }
+        running.set_value();
+        loop->run(stop_.get());
+    });
     whenRunning.get();
 }
 
