@@ -10,6 +10,7 @@
 #   lib/systemd/system/                 the program as a service
 #   share/editor-serialization/web/     the page that the program serves to browsers
 #   share/editor-serialization/nats/    configurations for nats-server
+#   share/editor-serialization/prometheus/ alerts for those who watch the program
 #   share/editor-serialization/systemd/ how nats-server's service takes one of them
 
 include(CMakePackageConfigHelpers)
@@ -60,7 +61,7 @@ install(FILES ${package_files} DESTINATION "${package_folder}")
 install(EXPORT EditorSerializationTargets
   NAMESPACE EditorSerialization:: DESTINATION "${package_folder}")
 
-install(DIRECTORY "${PROJECT_SOURCE_DIR}/packaging/nats"
+install(DIRECTORY "${PROJECT_SOURCE_DIR}/packaging/nats" "${PROJECT_SOURCE_DIR}/packaging/prometheus"
   DESTINATION "${CMAKE_INSTALL_DATADIR}/editor-serialization")
 install(FILES "${PROJECT_SOURCE_DIR}/packaging/systemd/serialization-host@.service"
   DESTINATION lib/systemd/system)

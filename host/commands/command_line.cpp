@@ -165,9 +165,11 @@ CLI::Option& declareOtherServers(CLI::App& command, OtherServers& options) {
         declareFile("--tls-key", options.keyFile, "Its key, in PEM")->needs(certificate));
     command
         .add_option("--group", options.group,
-                    "The group of workers that share the requests (default: " + options.group + ")")
+                    "The group of workers of the servers of --nats that share the requests "
+                    "(default: " +
+                        options.group + ")")
         ->type_name("NAME")
-        ->needs(&servers);
+        ->take_last();
     return servers;
 }
 
@@ -199,6 +201,22 @@ void declareWeb(CLI::App& command, WebOptions& options) {
                     "its own, for all who come through one proxy share an address)")
         ->type_name("COUNT")
         ->excludes(none);
+}
+
+void declareMetrics(CLI::App& command, ServeOptions& options) {
+    command
+        .add_option_function<std::string>(
+            "--metrics",
+            [&options](const std::string& text) {
+                try {
+                    options.metrics = ListenAddress::parse(text);
+                } catch (const std::invalid_argument& error) {
+                    throw CLI::ValidationError("--metrics", error.what());
+                }
+            },
+            "Where programs that watch the host find /metrics, in Prometheus' format, and /healthz "
+            "(default: nowhere)")
+        ->type_name("HOST:PORT");
 }
 
 // The host's own server can let pages of one origin of each host in, the web page's included.
@@ -248,6 +266,7 @@ void declareServe(CLI::App& command, ServeOptions& options) {
                      "Go without the kernel's help to keep clients to the folders of --root");
     declareGuard(command, options.guard);
     declareWeb(command, options.web);
+    declareMetrics(command, options);
     declareOwnServer(command, options.ownServer,
                      declareOtherServers(command, options.otherServers));
     command.final_callback([&command, &options] {

@@ -2,9 +2,12 @@
 #include "host/commands/serve_command.h"
 
 #include <dlfcn.h>
+#include <fcntl.h>
 #include <spdlog/spdlog.h>
+#include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <chrono>
 #include <cstdlib>
 #include <fstream>
@@ -12,6 +15,7 @@
 #include <memory>
 #include <optional>
 #include <stdexcept>
+#include <system_error>
 #include <thread>
 #include <utility>
 
@@ -20,6 +24,7 @@
 #include "host/bus/bundle_location.h"
 #include "host/bus/failed_reads.h"
 #include "host/bus/request_admission.h"
+#include "host/bus/serving_client.h"
 #include "host/commands/exit_status.h"
 #include "host/commands/standard_streams.h"
 #include "host/commands/stop_signals.h"
@@ -27,10 +32,13 @@
 #include "host/guard/guarded_client.h"
 #include "host/limits/confinement.h"
 #include "host/limits/open_files.h"
+#include "host/metrics/health_check.h"
+#include "host/metrics/metrics_server.h"
 #include "host/server/private_folder.h"
 #include "platform/messaging/channels.h"
 #include "platform/messaging/nats/nats_bus.h"
 #include "platform/messaging/transport.h"
+#include "platform/posix/file_descriptor.h"
 
 namespace host {
 
@@ -57,6 +65,30 @@ constexpr std::chrono::seconds longestConnect{5};
 // How long the requests that were taken may need when the host ends.
 constexpr std::chrono::seconds longestDrain{60};
 
+// Servers would take what is behind white space for the next word of their protocol.
+void requireGroup(const std::string& group) {
+    const bool isValid = !group.empty() && std::all_of(group.begin(), group.end(), [](char c) {
+        return c > ' ' && c != '\x7f';
+    });
+    if (!isValid) {
+        throw std::runtime_error("\"" + group +
+                                 "\" is no name for --group: it may hold neither white space nor "
+                                 "characters other than those of ASCII");
+    }
+}
+
+// Tells of a folder that cannot be read before clients are told that their documents are empty.
+void requireReadable(const std::vector<std::filesystem::path>& roots) {
+    for (const std::filesystem::path& root : roots) {
+        const platform::FileDescriptor opened(
+            ::open(root.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+        if (!opened || ::faccessat(AT_FDCWD, root.c_str(), X_OK, AT_EACCESS) != 0) {
+            throw std::runtime_error("cannot read the folder " + root.string() +
+                                     " of --root: " + std::generic_category().message(errno));
+        }
+    }
+}
+
 // The first line of `file`, which holds a secret.
 std::string secretIn(const std::filesystem::path& file) {
     std::ifstream input(file);
@@ -71,6 +103,7 @@ std::string secretIn(const std::filesystem::path& file) {
 }
 
 NatsOptions connectionTo(const OtherServers& servers) {
+    requireGroup(servers.group);
     NatsOptions options;
     options.servers = servers.urls;
     options.credentialsFile = servers.credentialsFile.string();
@@ -108,9 +141,11 @@ std::shared_ptr<NatsBus> makeBus(NatsOptions options) {
 
 // What each kind of thread may open.
 struct Confinements {
-    Confinement documents;
+    Confinement bundle;     // While it starts: its framework may read it once more.
+    Confinement documents;  // While it handles requests: it is no document.
     Confinement network;
     Confinement web;
+    Confinement metrics;
 };
 
 // What is needed to find servers by name, to trust them, and to tell them who the host is; again
@@ -144,11 +179,12 @@ std::optional<Confinements> confinementsOf(const ServeOptions& options,
                                  "; --no-confinement goes without");
     }
     return Confinements{
-        Confinement({options.roots, {options.bundle}}),
+        Confinement({options.roots, {options.bundle}}), Confinement({options.roots, {}}),
         Confinement({{}, filesOf(options.otherServers)}),
         Confinement({{},
                      webFolder.empty() ? std::vector<std::filesystem::path>{}
-                                       : std::vector<std::filesystem::path>{webFolder}})};
+                                       : std::vector<std::filesystem::path>{webFolder}}),
+        Confinement(Grants{})};
 }
 
 // Keeps a library loaded, so that it can be loaded again by who cannot open all of its files.
@@ -204,10 +240,14 @@ std::string pageUrl(const WebServer& web, const NatsServer* server) {
     return url;
 }
 
-void tellHowToConnect(const WebServer* web, const NatsServer* server, int output) {
+void tellHowToConnect(const WebServer* web, const MetricsServer* metrics, const NatsServer* server,
+                      int output) {
     std::string lines;
     if (web != nullptr) {
         lines += "page: " + pageUrl(*web, server) + "\n";
+    }
+    if (metrics != nullptr) {
+        lines += "metrics: " + metrics->address().origin() + "/metrics\n";
     }
     if (server != nullptr) {
         const Login& editor = server->users().editor;
@@ -244,11 +284,29 @@ std::unique_ptr<NatsServer> startOwnServer(const ServeOptions& options, const We
     return std::make_unique<NatsServer>(std::move(own), folder);
 }
 
+// What tells those who watch the host; it looks at the roots while it lives.
+std::unique_ptr<MetricsServer> makeMetricsServer(const ServeOptions& options,
+                                                 std::shared_ptr<const NatsBus> bus,
+                                                 std::shared_ptr<const RequestMetrics> requests) {
+    if (!options.metrics) {
+        return nullptr;
+    }
+    MetricsSources sources;
+    sources.version = PROGRAM_VERSION;
+    sources.requests = std::move(requests);
+    sources.isConnected = [bus = std::move(bus)] { return bus->isConnected(); };
+    sources.areRootsReadable = [check = std::make_shared<HealthCheck>([roots = options.roots] {
+                                    return areReadable(roots);
+                                })] { return check->isHealthy(); };
+    return std::make_unique<MetricsServer>(*options.metrics, std::move(sources));
+}
+
 }  // namespace
 
 int runServe(const ServeOptions& options, int output) {
     blockStopSignals();
     raiseOpenFileLimit();
+    requireReadable(options.roots);
     std::optional<PrivateFolder> folder;
     if (options.otherServers.urls.empty()) {
         folder.emplace();
@@ -280,28 +338,43 @@ int runServe(const ServeOptions& options, int output) {
         });
     }
 
+    ServingOptions serving;
+    serving.roots = options.roots;
+    const std::unique_ptr<MetricsServer> metrics = makeMetricsServer(options, bus, serving.metrics);
     const LoadedLibrary library(options.bundle);
     if (confinements) {
         // The threads that handle requests come from this one.
-        confinements->documents.confineThisThread();
+        confinements->bundle.confineThisThread();
+        serving.prepareThread = [&confinements] { confinements->documents.confineThisThread(); };
     }
     const auto budget =
         std::make_shared<platform::messaging::MemoryBudget>(options.memoryForRequests);
-    platform::messaging::setTransport([bus, guard, budget](
+    const auto connectClient = [bus, budget, serving](const std::string& name) {
+        // The bus is connected, so that this is no waiting. What admits requests hands them to
+        // other threads than those that brought them, so it comes before what counts them.
+        return answeringFailedReads(
+            servingClient(admittingRequests(bus->connect(name).get(), budget), serving));
+    };
+    platform::messaging::setTransport([connectClient, guard](
                                           const std::string& name,
                                           const platform::messaging::MessageServiceOptions&) {
-        // The bus is connected, so that this is no waiting.
         futures::Promise<std::shared_ptr<platform::messaging::MessageService>> promise;
-        std::shared_ptr<platform::messaging::MessageService> client =
-            answeringFailedReads(admittingRequests(bus->connect(name).get(), budget));
+        std::shared_ptr<platform::messaging::MessageService> client = connectClient(name);
         promise.setValue(guard.saves ? savingSafely(std::move(client), guard) : std::move(client));
         return promise.getFuture();
     });
     const TransportEnd transportEnd;
     const framework::BundleRunner bundle(options.bundle);
-    const FileService files(
-        answeringFailedReads(admittingRequests(bus->connect(clientName).get(), budget)), guard);
-    tellHowToConnect(web.get(), server.get(), output);
+    serving.subscriptionFailure->check();
+    const FileService files(connectClient(clientName), guard);
+    if (metrics) {
+        metrics->start([&] {
+            if (confinements) {
+                confinements->metrics.confineThisThread();
+            }
+        });
+    }
+    tellHowToConnect(web.get(), metrics.get(), server.get(), output);
     signals.first().wait();
     if (!bus->drain(longestDrain)) {
         spdlog::error("requests that were taken have not been done after {} s and are given up",

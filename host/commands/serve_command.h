@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <filesystem>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -43,6 +44,9 @@ struct ServeOptions {
     OtherServers otherServers;
     WebOptions web;
 
+    /// Where programs that watch the host ask it how it is; nothing: nowhere.
+    std::optional<ListenAddress> metrics;
+
     /// The folders below which clients may have files read and written; empty: everywhere.
     std::vector<std::filesystem::path> roots;
 
@@ -55,10 +59,11 @@ struct ServeOptions {
 };
 
 /// Serves the bundle's clients until the process is asked to end (StopSignals), and finishes then
-/// what was taken. Writes to `output`, a line each, how clients connect: "page: ", "nats: " and
-/// "websocket: " with the URL, password included, as far as they are the host's own. To be called
-/// while the process has no other threads. Returns the exit status. Throws std::runtime_error when
-/// the servers or the bundle cannot be started, or the kernel cannot confine.
+/// what was taken. Writes to `output`, a line each, how clients connect: "page: ", "metrics: ",
+/// "nats: " and "websocket: " with the URL, password included, as far as they are the host's own.
+/// To be called while the process has no other threads. Returns the exit status. Throws
+/// std::runtime_error when the servers or the bundle cannot be started, when the bundle gets no
+/// requests, and when the kernel cannot confine.
 ///
 /// With roots, each thread is confined to what it needs: the one that starts the bundle, and the
 /// threads of the bundle with it, to the roots, for good.

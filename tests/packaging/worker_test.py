@@ -5,6 +5,7 @@
 Usage: worker_test.py PROGRAM"""
 
 import json
+import re
 import subprocess
 import sys
 import time
@@ -32,12 +33,15 @@ class Worker:
         (cls.folder / "text").write_text("outside")
         scheme = "tls" if cls.context else "nats"
         authority = ["--tls-ca", str(cls.folder / "ca.crt")] if cls.context else []
-        worker = subprocess.Popen(
-            [PROGRAM, "serve", "--root", str(cls.documents),
-             "--nats", f"{scheme}://localhost:{cls.server.client_port}",
-             "--nats-user", "worker", "--nats-password-file", str(password), *authority])
+        worker = subprocess.Popen(cls.command(
+            ["--nats", f"{scheme}://localhost:{cls.server.client_port}",
+             "--nats-user", "worker", "--nats-password-file", str(password), *authority]))
         cls.addClassCleanup(cls.stop, worker)
         cls.wait_until_it_answers()
+
+    @classmethod
+    def command(cls, options):
+        return [PROGRAM, "serve", "--root", str(cls.documents), *options]
 
     @classmethod
     def wait_until_it_answers(cls):
@@ -121,7 +125,47 @@ class OnANetwork(Worker, NetworkServer):
     pass
 
 
+class OfTheUnit(Worker, OneMachineServer):
+    """Started as systemd does it for the instance "srv-documents"."""
+
+    @classmethod
+    def command(cls, options):
+        unit = (nats_server.PACKAGED.parent / "systemd/serialization-host@.service").read_text()
+        line = re.search("^ExecStart=(.*)$", unit, re.MULTILINE).group(1)
+        words = {"serialization_host": [PROGRAM], "%f": [str(cls.documents)],
+                 "%i": ["srv-documents"], "$OPTIONS": ["--log-level", "info"],
+                 "$INSTANCE_OPTIONS": options}
+        assert set(words) <= set(line.split()), line
+        return [argument for word in line.split() for argument in words.get(word, [word])]
+
+    def test_shares_requests_with_the_instances_of_its_name(self):
+        same, other = self.connect("worker"), self.connect("worker")
+        self.assertEqual(same.subscribe(READ_REQUESTS, "srv-documents"), [])
+        self.assertEqual(other.subscribe(READ_REQUESTS, "srv-others"), [])
+        for _ in range(100):
+            self.request(READ_REQUESTS, filePath=str(self.documents / "text"), rtcId="ada.2")
+        for client in (same, other):
+            client.settle()
+        self.assertTrue(0 < len(same.messages) < 100, len(same.messages))
+        self.assertEqual(len(other.messages), 100)
+
+
+class ThatMayNotSubscribe(OneMachineServer):
+    def test_ends_and_says_why(self):
+        password = self.folder / "password"
+        password.write_text(nats_server.PASSWORDS["ada"] + "\n")
+        worker = subprocess.run(
+            [PROGRAM, "serve", "--root", str(self.folder),
+             "--nats", f"nats://localhost:{self.server.client_port}", "--nats-user", "ada",
+             "--nats-password-file", str(password)],
+            stderr=subprocess.PIPE, text=True, timeout=nats_server.PATIENCE, check=False)
+        self.assertEqual(worker.returncode, 1)
+        self.assertIn("the bundle gets no requests", worker.stderr)
+        self.assertIn(f'Subscription to "{READ_REQUESTS}"', worker.stderr)
+
+
 if __name__ == "__main__":
     tests = unittest.TestSuite(unittest.defaultTestLoader.loadTestsFromTestCase(case)
-                               for case in (OnOneMachine, OnANetwork, AfterALostServer))
+                               for case in (OnOneMachine, OnANetwork, AfterALostServer,
+                                            OfTheUnit, ThatMayNotSubscribe))
     sys.exit(not unittest.TextTestRunner(verbosity=2).run(tests).wasSuccessful())

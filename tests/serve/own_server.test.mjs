@@ -12,7 +12,7 @@ import {
   writeFileSync,
 } from "node:fs";
 import { createServer } from "node:net";
-import { join } from "node:path";
+import { dirname, join } from "node:path";
 import { test } from "node:test";
 import { setTimeout as sleep } from "node:timers/promises";
 
@@ -211,13 +211,19 @@ test("a second signal ends it at once", async (t) => {
   await waitFor("the server's end", () => !isRunning(serverId), 5);
 });
 
-test("its message server goes with it when it is killed", async (t) => {
-  const host = await Host.start(t, []);
+test("its message server goes with it when it is killed, and the next host cleans up", async (t) => {
+  const { host, folder } = await hostWithRuntimeFolder(t, []);
+  const [left] = readdirSync(folder);
   const serverId = host.serverId();
   assert.ok(isRunning(serverId));
   host.signal("SIGKILL");
   await host.end;
   await waitFor("the server's end", () => !isRunning(serverId), 5);
+  assert.deepEqual(readdirSync(folder), [left]);
+  await Host.start(t, [], folder);
+  const [name, ...others] = readdirSync(folder);
+  assert.notEqual(name, left);
+  assert.deepEqual(others, []);
 });
 
 test("clients get to no file outside of its roots", async (t) => {
@@ -240,10 +246,14 @@ test("clients get to no file outside of its roots", async (t) => {
     `/proc/self/cwd/../../../../../../../../..${outside}/file.txt`,
     "/etc/hostname",
     "/proc/self/environ",
+    join(dirname(HOST), "../lib/libcom_vorplanex_serialization.so"),
   ];
   for (const path of paths) {
     assert.deepEqual(await client.read(path), { data: "", status: true }, path);
     assert.equal(await client.write(path, "changed\n"), false, path);
+  }
+  for (const path of [join(outside, "file.txt"), `${inside}/link/file.txt`]) {
+    assert.ok(host.errors.includes(`refused ${path}, which is in no folder of --root`), path);
   }
   assert.equal(await client.write(join(outside, "new.txt"), "new\n"), false);
   assert.ok(!existsSync(join(outside, "new.txt")));

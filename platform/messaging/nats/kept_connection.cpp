@@ -177,6 +177,15 @@ void KeptConnection::add(const std::shared_ptr<NatsSource>& source) {
     }
 }
 
+void KeptConnection::requirePermitted(const std::string& channel) {
+    const char* reason = nullptr;
+    natsConnection_GetLastError(connection()->get(), &reason);
+    if (reason != nullptr && std::string_view(reason).find("Subscription to \"" + channel + "\"") !=
+                                 std::string_view::npos) {
+        throw std::runtime_error(reason);
+    }
+}
+
 void KeptConnection::remove(const std::shared_ptr<NatsSource>& source) {
     const std::lock_guard lock(sourcesMutex_);
     std::erase(sources_, source);

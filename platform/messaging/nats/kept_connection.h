@@ -40,6 +40,10 @@ public:
     void add(const std::shared_ptr<NatsSource>& source);
     void remove(const std::shared_ptr<NatsSource>& source);
 
+    /// Throws std::runtime_error with the reason if the server has refused a source of `channel`
+    /// that was added. It does so before it answers the flush with which `add` ends.
+    void requirePermitted(const std::string& channel);
+
     /// Sends a message without a header. Throws std::runtime_error with the reason when it cannot
     /// be sent, which holds also for a channel that is no subject.
     void publish(const std::string& channel, std::string_view payload);

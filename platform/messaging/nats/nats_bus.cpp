@@ -227,6 +227,7 @@ std::shared_ptr<Subscription> NatsBus::Core::subscribe(const std::string& channe
                                                              std::move(handler), threads);
     }
     first_->add(source);
+    first_->requirePermitted(channel);
     return subscription;
 }
 

@@ -1,0 +1,191 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "host/bus/serving_client.h"
+
+#include <spdlog/spdlog.h>
+
+#include <algorithm>
+#include <chrono>
+#include <cstddef>
+#include <exception>
+#include <optional>
+#include <string_view>
+#include <system_error>
+#include <utility>
+
+#include "json/find_string.h"
+#include "platform/messaging/channels.h"
+
+namespace host {
+
+namespace {
+
+namespace fs = std::filesystem;
+
+using Clock = std::chrono::steady_clock;
+using platform::DataBuffer;
+using platform::messaging::JsonMessage;
+using platform::messaging::MessageHandler;
+using platform::messaging::MessageService;
+using platform::messaging::Subscription;
+
+// Whether an answer to a request of `kind` tells of success. A document that holds the text has its
+// quotes escaped.
+bool isSuccess(RequestKind kind, std::string_view answer) {
+    constexpr std::size_t longestFailure = 4096;
+    return kind == RequestKind::write
+               ? answer == "true"
+               : answer.size() > longestFailure ||
+                     answer.find(R"("status":false)") == std::string_view::npos;
+}
+
+// The request that a thread is handling, which counts it.
+class HandledRequest {
+public:
+    HandledRequest(const JsonMessage& message, RequestMetrics& metrics);
+    HandledRequest(const HandledRequest&) = delete;
+    HandledRequest& operator=(const HandledRequest&) = delete;
+    ~HandledRequest();
+
+    const JsonMessage& message() const noexcept { return message_; }
+
+    void answered(std::string_view answer) noexcept {
+        outcome_ = isSuccess(kind_, answer) ? RequestOutcome::success : RequestOutcome::failure;
+        answerBytes_ = answer.size();
+    }
+
+private:
+    const JsonMessage& message_;
+    RequestMetrics& metrics_;
+    const RequestKind kind_;
+    const Clock::time_point start_ = Clock::now();
+    RequestOutcome outcome_ = RequestOutcome::noAnswer;
+    std::size_t answerBytes_ = 0;
+};
+
+// A request is answered on the thread that handles it.
+thread_local HandledRequest* requestOfThread = nullptr;
+
+HandledRequest::HandledRequest(const JsonMessage& message, RequestMetrics& metrics)
+    : message_(message),
+      metrics_(metrics),
+      kind_(message.channel() == platform::messaging::readRequestChannel ? RequestKind::read
+                                                                         : RequestKind::write) {
+    metrics_.begin(kind_, message_.payload().size());
+    requestOfThread = this;
+}
+
+HandledRequest::~HandledRequest() {
+    requestOfThread = nullptr;
+    metrics_.end(kind_, outcome_, answerBytes_, Clock::now() - start_);
+}
+
+bool isAnswer(const std::string& channel) {
+    return channel.starts_with(platform::messaging::readResponsePrefix) ||
+           channel.starts_with(platform::messaging::writeResponsePrefix);
+}
+
+// Whether `answer` may be one to a request that was refused. An answer with a document is longer
+// than the others, so requests are not looked at for most answers.
+bool mayBeRefusal(const std::string& channel, std::string_view answer) {
+    constexpr std::size_t longestRefusal = 4096;
+    return (channel.starts_with(platform::messaging::readResponsePrefix) &&
+            answer.size() <= longestRefusal) ||
+           (channel.starts_with(platform::messaging::writeResponsePrefix) && answer != "true");
+}
+
+// With symbolic links followed, as far as there are any files.
+fs::path withoutLinks(const fs::path& path) {
+    std::error_code error;
+    fs::path result = fs::weakly_canonical(path, error);
+    return error ? path.lexically_normal() : result;
+}
+
+bool isBelow(const fs::path& path, const fs::path& folder) {
+    return std::mismatch(folder.begin(), folder.end(), path.begin(), path.end()).first ==
+           folder.end();
+}
+
+class ServingClient final : public MessageService {
+public:
+    ServingClient(std::shared_ptr<MessageService> client, ServingOptions options)
+        : client_(std::move(client)), options_(std::move(options)) {
+        for (fs::path& root : options_.roots) {
+            root = withoutLinks(root);
+        }
+    }
+
+    futures::Future<std::shared_ptr<Subscription>> subscribe(const std::string& channel,
+                                                             MessageHandler handler) override {
+        futures::Promise<std::shared_ptr<Subscription>> promise;
+        try {
+            promise.setValue(
+                client_->subscribe(channel, prepared(channel, std::move(handler))).get());
+        } catch (const std::exception& error) {
+            options_.subscriptionFailure->set(error.what());
+            promise.setException(std::current_exception());
+        }
+        return promise.getFuture();
+    }
+
+    futures::Future<void> publish(const std::string& channel, DataBuffer payload) override {
+        if (requestOfThread != nullptr && isAnswer(channel)) {
+            requestOfThread->answered(payload.view());
+            if (!options_.roots.empty() && mayBeRefusal(channel, payload.view())) {
+                logIfOutside(requestOfThread->message());
+            }
+        }
+        return client_->publish(channel, std::move(payload));
+    }
+
+    std::size_t maxPayload(const std::string& channel) const override {
+        return client_->maxPayload(channel);
+    }
+
+private:
+    MessageHandler prepared(const std::string& channel, MessageHandler handler) const {
+        const bool isCounted = channel == platform::messaging::readRequestChannel ||
+                               channel == platform::messaging::writeRequestChannel;
+        return [isCounted, prepareThread = options_.prepareThread, metrics = options_.metrics,
+                handler = std::move(handler)](const JsonMessage& message) {
+            // Subscriptions have threads of their own, so they are this client's.
+            thread_local bool isPrepared = false;
+            if (prepareThread && !isPrepared) {
+                prepareThread();
+                isPrepared = true;
+            }
+            if (!isCounted) {
+                return handler(message);
+            }
+            const HandledRequest request(message, *metrics);
+            handler(message);
+        };
+    }
+
+    void logIfOutside(const JsonMessage& request) const {
+        // A request may be so large that there is no memory to parse it once more.
+        const std::optional<std::string> path = json::findString(request.payload(), "filePath");
+        if (!path || path->empty()) {
+            return;
+        }
+        const fs::path file = withoutLinks(*path);
+        if (std::none_of(options_.roots.begin(), options_.roots.end(),
+                         [&file](const fs::path& root) { return isBelow(file, root); })) {
+            spdlog::warn(
+                "refused {}, which is in no folder of --root; workers of other folders need a "
+                "group and message servers, or an account, of their own",
+                *path);
+        }
+    }
+
+    const std::shared_ptr<MessageService> client_;
+    ServingOptions options_;
+};
+
+}  // namespace
+
+std::shared_ptr<MessageService> servingClient(std::shared_ptr<MessageService> client,
+                                              ServingOptions options) {
+    return std::make_shared<ServingClient>(std::move(client), std::move(options));
+}
+
+}  // namespace host

@@ -1,0 +1,46 @@
+// SPDX-License-Identifier: Apache-2.0
+// Tells programs that watch servers how the host is: /metrics for Prometheus, /healthz for load
+// balancers and the like.
+#pragma once
+
+#include <functional>
+#include <memory>
+#include <string>
+
+#include "host/metrics/request_metrics.h"
+#include "host/web/http_server.h"
+#include "host/web/listen_address.h"
+#include "platform/posix/file_descriptor.h"
+
+namespace host {
+
+struct MetricsSources {
+    std::string version;  ///< That of the program.
+    std::shared_ptr<const RequestMetrics> requests;
+    std::function<bool()> isConnected;  ///< To the message servers.
+    std::function<bool()> areRootsReadable;
+};
+
+class MetricsServer {
+public:
+    /// Listens at `address`. Throws std::runtime_error.
+    MetricsServer(const ListenAddress& address, MetricsSources sources);
+
+    const ListenAddress& address() const noexcept { return server_.address(); }
+
+    /// Begins to answer, on a thread that calls `prepare` first. To be called once. Throws what
+    /// `prepare` throws.
+    void start(std::function<void()> prepare);
+
+private:
+    HttpAnswer answer(const HttpRequest& request) const;
+    HttpAnswer health() const;
+    std::string metrics() const;
+    std::string memoryMetrics() const;
+
+    const MetricsSources sources_;
+    const platform::FileDescriptor memory_;  // Open, since the thread may open no files.
+    HttpServer server_;                      // Ends first: its thread uses the others.
+};
+
+}  // namespace host
