@@ -176,11 +176,17 @@ void LongMessages::takeWord(natsMsg* received) {
                 break;  // is said elsewhere
         }
         hasChanged = incoming_.count() + outgoing_.count() != before;
+        ++sending_;
+    }
+    sendAll(notes);
+    {
+        const std::lock_guard lock(mutex_);
+        --sending_;
+        hasChanged = hasChanged || refusing_;  // drain waits for what is being sent, too
     }
     if (hasChanged) {
         changed_.notify_all();
     }
-    sendAll(notes);
 }
 
 void LongMessages::takeOffer(const std::string& channel, natsMsg* received) {
@@ -250,7 +256,7 @@ bool LongMessages::drain(Time deadline) {
     return changed_.wait_until(lock, deadline, [this] {
         const bool isHandled =
             std::ranges::all_of(whole_, [](const auto& each) { return each.second.empty(); });
-        return isHandled && expected_.empty() && outgoing_.count() == 0;
+        return isHandled && expected_.empty() && outgoing_.count() == 0 && sending_ == 0;
     });
 }
 

@@ -103,6 +103,7 @@ private:
     OutgoingTransfers outgoing_;
     std::map<std::string, std::deque<WholeRequest>> whole_;  // to be handled, by channel
     std::multimap<std::string, ReturnAddress> expected_;     // answers, by channel
+    int sending_ = 0;  // words that have been taken whose replies are not all sent yet
     bool refusing_ = false;
     bool closed_ = false;
 

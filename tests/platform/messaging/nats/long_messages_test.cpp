@@ -286,7 +286,7 @@ TEST(NatsLongMessages, AreTakenBeforeTheBusEnds) {
     client.say("/ask", "yes", "short");
     const auto announced = client.hear().value();
     std::atomic<bool> drained = false;
-    std::thread drain([&] { drained = worker.bus->drain(kPatience); });
+    std::jthread drain([&] { drained = worker.bus->drain(kPatience); });
     std::this_thread::sleep_for(std::chrono::milliseconds(50));
     EXPECT_FALSE(drained);
     EXPECT_TRUE(client.take(announced) == worker.answer);
