@@ -286,7 +286,7 @@ std::unique_ptr<NatsServer> startOwnServer(const ServeOptions& options, const We
 
 // What tells those who watch the host; it looks at the roots while it lives.
 std::unique_ptr<MetricsServer> makeMetricsServer(const ServeOptions& options,
-                                                 std::shared_ptr<const NatsBus> bus,
+                                                 const std::shared_ptr<const NatsBus>& bus,
                                                  std::shared_ptr<const RequestMetrics> requests) {
     if (!options.metrics) {
         return nullptr;
@@ -294,7 +294,8 @@ std::unique_ptr<MetricsServer> makeMetricsServer(const ServeOptions& options,
     MetricsSources sources;
     sources.version = PROGRAM_VERSION;
     sources.requests = std::move(requests);
-    sources.isConnected = [bus = std::move(bus)] { return bus->isConnected(); };
+    sources.isConnected = [bus] { return bus->isConnected(); };
+    sources.reconnects = [bus] { return bus->reconnects(); };
     sources.areRootsReadable = [check = std::make_shared<HealthCheck>([roots = options.roots] {
                                     return areReadable(roots);
                                 })] { return check->isHealthy(); };
@@ -350,8 +351,8 @@ int runServe(const ServeOptions& options, int output) {
     const auto budget =
         std::make_shared<platform::messaging::MemoryBudget>(options.memoryForRequests);
     const auto connectClient = [bus, budget, serving](const std::string& name) {
-        // The bus is connected, so that this is no waiting. What admits requests hands them to
-        // other threads than those that brought them, so it comes before what counts them.
+        // The bus is connected, so that this is no waiting. A request that waits for memory may be
+        // handled on another thread than the one that brought it, and is counted on that.
         return answeringFailedReads(
             servingClient(admittingRequests(bus->connect(name).get(), budget), serving));
     };

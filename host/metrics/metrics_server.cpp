@@ -75,6 +75,9 @@ std::string MetricsServer::metrics() const {
            fmt::format("editor_build_info{{version=\"{}\"}} 1\n", sources_.version) +
            gauge("editor_bus_connected", "Whether the message servers are connected.",
                  sources_.isConnected() ? 1 : 0) +
+           metricHeader("editor_bus_reconnects_total", "counter",
+                        "How many times the message servers had to be connected again.") +
+           fmt::format("editor_bus_reconnects_total {}\n", sources_.reconnects()) +
            gauge("editor_roots_readable", "Whether the folders of --root can be read.",
                  sources_.areRootsReadable() ? 1 : 0) +
            memoryMetrics() + sources_.requests->text();

@@ -3,6 +3,7 @@
 // balancers and the like.
 #pragma once
 
+#include <cstdint>
 #include <functional>
 #include <memory>
 #include <string>
@@ -17,7 +18,8 @@ namespace host {
 struct MetricsSources {
     std::string version;  ///< That of the program.
     std::shared_ptr<const RequestMetrics> requests;
-    std::function<bool()> isConnected;  ///< To the message servers.
+    std::function<bool()> isConnected;          ///< To the message servers.
+    std::function<std::uint64_t()> reconnects;  ///< How many times they had to be connected again.
     std::function<bool()> areRootsReadable;
 };
 

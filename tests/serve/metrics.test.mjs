@@ -93,9 +93,14 @@ test("it is not healthy without a connection to the message servers", async (t) 
   const { host, url } = await startWithMetrics(t);
   const healthUrl = new URL("/healthz", url);
   await waitFor("health", async () => (await fetch(healthUrl)).status === 200);
+  assert.equal(valueOf(await metricsAt(url), "editor_bus_reconnects_total"), 0);
   process.kill(host.serverId(), "SIGKILL");
   await waitFor("the loss of the server", async () => (await fetch(healthUrl)).status === 503);
   await waitFor("health", async () => (await fetch(healthUrl)).status === 200);
+  await waitFor(
+    "the count of the new connection",
+    async () => valueOf(await metricsAt(url), "editor_bus_reconnects_total") === 1,
+  );
 });
 
 test("it tells nothing unless it is asked to, and nothing else", async (t) => {

@@ -123,6 +123,7 @@ void KeptConnection::reconnect(const std::string& name) {
                 attach(*source);
             }
             disconnected_ = false;
+            ++reconnects_;
             logger().warn("Connected to NATS again, at {}.", server);
             return;
         } catch (const std::exception& error) {
@@ -298,6 +299,7 @@ void KeptConnection::onDisconnected(const std::string& reason) {
 void KeptConnection::onReconnected(const std::string& server) {
     disconnected_ = false;
     unsent_ = false;
+    ++reconnects_;
     logger().warn("Connected to NATS again, at {}.", server);
 }
 

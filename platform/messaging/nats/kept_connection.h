@@ -58,6 +58,9 @@ public:
     /// True while a server is connected.
     bool isConnected();
 
+    /// How many times a lost connection has been replaced.
+    std::uint64_t reconnects() const noexcept { return reconnects_; }
+
     /// Makes no connection and takes no sources any more. What stands goes on.
     void stop();
 
@@ -96,6 +99,7 @@ private:
     // Whether libnats holds messages until there is a server again.
     std::atomic<bool> unsent_ = false;
     std::atomic<bool> disconnected_ = false;
+    std::atomic<std::uint64_t> reconnects_ = 0;
 
     std::mutex sourcesMutex_;  // guards what follows; locked before mutex_
     std::vector<std::shared_ptr<NatsSource>> sources_;

@@ -56,6 +56,7 @@ public:
     void publish(const std::string& channel, DataBuffer payload);
     std::size_t maxPayload(const std::string& channel);
     bool isConnected() const { return first_->isConnected(); }
+    std::uint64_t reconnects() const { return first_->reconnects(); }
     bool drain(std::chrono::milliseconds timeout);
 
 private:
@@ -310,6 +311,10 @@ futures::Future<std::shared_ptr<MessageService>> NatsBus::connect(const std::str
 
 bool NatsBus::isConnected() const {
     return core_->isConnected();
+}
+
+std::uint64_t NatsBus::reconnects() const {
+    return core_->reconnects();
 }
 
 bool NatsBus::drain(std::chrono::milliseconds timeout) {

@@ -4,6 +4,7 @@
 
 #include <chrono>
 #include <cstddef>
+#include <cstdint>
 #include <map>
 #include <memory>
 #include <string>
@@ -111,6 +112,9 @@ public:
 
     /// True while the connection to a server stands.
     bool isConnected() const;
+
+    /// How many times a lost connection has been replaced since the first `connect`.
+    std::uint64_t reconnects() const;
 
     /// Ends the bus in good order: unsubscribes at the server, has the handlers finish the messages
     /// that were taken, sends what they published, and closes the connection. Returns false when

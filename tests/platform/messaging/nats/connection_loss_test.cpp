@@ -4,6 +4,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <cstdint>
 #include <future>
 #include <string>
 #include <thread>
@@ -34,6 +35,7 @@ TEST(NatsConnectionLoss, ReconnectsAndResubscribesWhenAServerIsKilledAndComesBac
     BusAtServer bus(server);
     Inbox<std::string> texts;
     const auto one = bus.collect("x", texts);
+    std::uint64_t reconnects = 0;
     for (const std::string text : {"first", "second", "third"}) {
         server.kill();
         EXPECT_TRUE(log.waitFor("The connection to NATS is lost"));
@@ -43,6 +45,7 @@ TEST(NatsConnectionLoss, ReconnectsAndResubscribesWhenAServerIsKilledAndComesBac
         BusAtServer publisher(server);
         EXPECT_TRUE(arrives(publisher, "x", texts, text));
         EXPECT_TRUE(arrives(bus, "x", texts, "own " + text));
+        EXPECT_EQ(bus.bus->reconnects(), ++reconnects);
         BusLog::start();
     }
 }
@@ -118,6 +121,7 @@ TEST(NatsConnectionLoss, OutlastsAServerThatTurnsItAway) {
     server.kill();
     server.startWith("authorization { token: good }");
     EXPECT_TRUE(log.waitFor("Connected to NATS again"));
+    EXPECT_EQ(bus.bus->reconnects(), 1U);
     EXPECT_TRUE(arrives(bus, "x", texts, "1"));
     EXPECT_EQ(log.count("good"), 0) << "secrets do not belong in logs";
 }
