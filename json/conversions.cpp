@@ -26,7 +26,7 @@ void appendUtf8(char32_t c, std::string& text) {
         return static_cast<char>(0x80 | ((c >> shift) & 0x3F));
     };
     if (c < 0x80)
-        text += {static_cast<char>(c)};
+        text += static_cast<char>(c);
     else if (c < 0x800)
         text += {static_cast<char>(0xC0 | (c >> 6)), continuation(0)};
     else if (c < 0x10000)

@@ -38,14 +38,16 @@ bool isDirect(char16_t character) {
 constexpr std::uint32_t noDigit = 64;
 
 // The value of each ASCII character as a digit of base64.
-constexpr std::array<std::uint32_t, 0x80> digitValues = [] {
+constexpr std::array<std::uint32_t, 0x80> makeDigitValues() {
     std::array<std::uint32_t, 0x80> values{};
     values.fill(noDigit);
     for (std::size_t i = 0; i < alphabet.size(); ++i) {
         values[static_cast<std::size_t>(alphabet[i])] = static_cast<std::uint32_t>(i);
     }
     return values;
-}();
+}
+
+constexpr std::array<std::uint32_t, 0x80> digitValues = makeDigitValues();
 
 bool isBase64(char16_t character) {
     return character < digitValues.size() && digitValues[character] != noDigit;
