@@ -180,9 +180,13 @@ void KeptConnection::add(const std::shared_ptr<NatsSource>& source) {
 
 void KeptConnection::requirePermitted(const std::string& channel) {
     const char* reason = nullptr;
-    natsConnection_GetLastError(connection()->get(), &reason);
-    if (reason != nullptr && std::string_view(reason).find("Subscription to \"" + channel + "\"") !=
-                                 std::string_view::npos) {
+    // The text is the connection's own and is written anew with each error, such as those of a
+    // reconnection: it is looked at for a refusal only.
+    if (natsConnection_GetLastError(connection()->get(), &reason) != NATS_NOT_PERMITTED) {
+        return;
+    }
+    if (std::string_view(reason).find("Subscription to \"" + channel + "\"") !=
+        std::string_view::npos) {
         throw std::runtime_error(reason);
     }
 }
