@@ -1,0 +1,78 @@
+// SPDX-License-Identifier: Apache-2.0
+// What the page's rooms agree on: a document as it was read, the view in which it is edited, and what
+// a view may ask of the page around it. text/ and package/ make views; ui/ shows them in tabs; save/
+// takes their content, keeps their drafts and resolves their conflicts.
+import type { Client, Document, ReadAnswer } from "../client/src/index.js";
+
+/** A document as it was read, with what the file service says of it. */
+export interface LoadedDocument {
+  path: string;
+  /** The token of the content that was read; "" when there is no such file yet. */
+  version: string;
+  /** A successful answer: of a text "data", of a package "parts" and "relationships". */
+  answer: ReadAnswer;
+  /** Texts: the charset that the file is in, and whether it begins with a byte-order mark. */
+  charset?: string;
+  byteOrderMark?: boolean;
+}
+
+/** What a save sends: a package, or a text as the bytes of its file in `encoding`. */
+export type DocumentContent =
+  | { kind: "package"; content: Document }
+  | { kind: "text"; content: string; encoding: string };
+
+/** An open document, as one of the rooms shows it in its tab. */
+export interface DocumentView {
+  readonly element: HTMLElement;
+
+  /**
+   * The document as it stands, for a save. Asks the person first where something must be decided, such as
+   * what becomes of characters that the charset lacks. Nothing when the person thinks better of it.
+   */
+  content(): Promise<DocumentContent | undefined>;
+
+  /** What is unsaved, as a value that IndexedDB can store; given to the factory after a reload. */
+  draft(): unknown;
+
+  /** Shows `loaded` instead, which somebody else saved; what is unsaved is given up. */
+  replace(loaded: LoadedDocument): void;
+
+  /** Both sides beside each other, for a person to put together. */
+  compare(theirs: LoadedDocument): Comparison;
+
+  focus(): void;
+
+  /** Lets go of what the view holds. It is not used afterwards. */
+  close(): void;
+}
+
+export interface Comparison {
+  readonly element: HTMLElement;
+  /** The view's content becomes what the comparison shows as the result. */
+  apply(): void;
+}
+
+export interface Choice {
+  /** What is returned when this one is chosen. */
+  value: string;
+  label: string;
+  isDefault?: boolean;
+}
+
+/** What a view may ask of the page. */
+export interface Page {
+  readonly client: Client;
+  /** Translates: the text of `key` in the person's language, with {name} replaced by values.name. */
+  text(key: string, values?: Record<string, string | number>): string;
+  /** To be called on every edit. */
+  changed(): void;
+  /** Asks in a modal dialog. Nothing when it is closed without a choice. */
+  ask(question: { title: string; message: string; choices: Choice[] }): Promise<string | undefined>;
+  /** Tells in a line that screen readers read out, too. */
+  tell(message: string, kind?: "information" | "problem"): void;
+  /** Reads the document again, a text as `charset`, after asking when something is unsaved. */
+  reopen(charset?: string): void;
+}
+
+/** Makes the view of a document; `draft` is what an earlier view of it said was unsaved. */
+export type ViewFactory = (loaded: LoadedDocument, page: Page, draft?: unknown) => DocumentView;
