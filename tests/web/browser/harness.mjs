@@ -1,0 +1,114 @@
+// SPDX-License-Identifier: Apache-2.0
+// The page in a real browser: Chromium, driven by playwright-core, on a host of its own that serves a
+// new folder. Where there is no Chromium the tests are skipped, with a line that says so.
+import { existsSync, mkdirSync, readFileSync, writeFileSync } from "node:fs";
+import { createRequire } from "node:module";
+import { dirname, join } from "node:path";
+import { after, test } from "node:test";
+
+import { Host, ROOT, temporaryFolder } from "../../serve/processes.mjs";
+
+const { chromium } = createRequire(join(ROOT, "web/package.json"))("playwright-core");
+
+const CHROMIUM = process.env.CHROMIUM || "/usr/bin/chromium";
+const IS_THERE = existsSync(CHROMIUM);
+
+const FLAGS = [
+  // Chromium refuses its sandbox to root, as whom tests run in containers.
+  ...(process.getuid() === 0 ? ["--no-sandbox"] : []),
+  ...["--disable-gpu", "--disable-quic", "--no-first-run", "--no-proxy-server"],
+  ...["--disable-background-networking", "--disable-component-update", "--disable-sync"],
+];
+
+let running; // the browser of this file's tests
+
+async function browser() {
+  running ??= chromium.launch({ executablePath: CHROMIUM, args: FLAGS });
+  return running;
+}
+
+if (IS_THERE) {
+  after(async () => (await running)?.close());
+} else {
+  // ctest is told to look for this line.
+  console.error(`SKIPPED: there is no Chromium at ${CHROMIUM}, so the page is not tested in a browser`);
+}
+
+/** A test, as those of node:test, that needs the browser. */
+export function browserTest(name, ...rest) {
+  const body = rest.pop();
+  return test(name, { skip: !IS_THERE && "there is no Chromium", ...rest[0] }, body);
+}
+
+const IS_LOCAL = /^(http|ws):\/\/127\.0\.0\.1:|^(blob|data|about):/;
+
+/** A host, its folder of documents, and a page that is connected to it. */
+export class Session {
+  /**
+   * `files` are those of the folder, contents by name. `hostOptions` are further ones of the command line.
+   * Whatever is wrong on the page, from an exception to a request that leaves the machine, fails the test
+   * at its end, unless it matches one of the patterns of `expectedProblems`.
+   */
+  static async start(test, files = {}, { hostOptions = [], expectedProblems = [], ...contextOptions } = {}) {
+    const session = new Session(test, files);
+    session.expectedProblems = expectedProblems;
+    session.host = await Host.start(test, ["--listen", "127.0.0.1:0", "--root", session.folder, ...hostOptions]);
+    session.context = await (await browser()).newContext({ locale: "en-US", ...contextOptions });
+    test.after(() => session.#end());
+    session.page = await session.newPage();
+    return session;
+  }
+
+  constructor(test, files) {
+    this.folder = join(temporaryFolder(test), "documents");
+    this.problems = [];
+    mkdirSync(this.folder);
+    for (const [name, content] of Object.entries(files)) {
+      this.write(name, content);
+    }
+  }
+
+  /** The path of a file of the folder, as clients ask for it. */
+  path(name) {
+    return join(this.folder, name);
+  }
+
+  /** The bytes of a file of the folder, as they are on disk now. */
+  read(name) {
+    return readFileSync(this.path(name));
+  }
+
+  write(name, content) {
+    mkdirSync(dirname(this.path(name)), { recursive: true });
+    writeFileSync(this.path(name), content);
+  }
+
+  /** Another page in the same browser, which shares its storage with the others. */
+  async newPage(fragment = "") {
+    const page = await this.context.newPage();
+    page.setDefaultTimeout(30_000);
+    page.on("pageerror", (error) => this.#note(`exception: ${error.stack ?? error}`));
+    page.on("console", (message) => message.type() === "error" && this.#note(`console: ${message.text()}`));
+    page.on("request", (request) => IS_LOCAL.test(request.url()) || this.#note(`request: ${request.url()}`));
+    await page.goto(this.host.page + fragment);
+    await this.waitUntilConnected(page);
+    return page;
+  }
+
+  waitUntilConnected(page = this.page) {
+    return page.locator('[data-state="connected"]').first().waitFor({ state: "attached" });
+  }
+
+  #note(problem) {
+    if (!this.expectedProblems.some((pattern) => pattern.test(problem))) {
+      this.problems.push(problem);
+    }
+  }
+
+  async #end() {
+    await this.context.close();
+    if (this.problems.length > 0) {
+      throw new Error(`the page had problems:\n${this.problems.join("\n")}`);
+    }
+  }
+}
