@@ -1,9 +1,10 @@
 # SPDX-License-Identifier: Apache-2.0
-# What is installed: the program, the bundle, and for hosts that carry the bundle's messages the
-# messaging library with its headers and a CMake package.
+# What is installed: the program, the bundle, and for other hosts the messaging library, the loader of
+# bundles, their headers and a CMake package.
 #
 #   bin/serialization_host
 #   lib/libeditor_messaging.so.<version>
+#   lib/libeditor_framework.a
 #   lib/<"installpath" of the bundle's manifest>
 #   lib/cmake/EditorSerialization/
 #   include/editor_serialization/
@@ -29,13 +30,15 @@ install(FILES "${PROJECT_SOURCE_DIR}/web/${page_library}/LICENSE"
   DESTINATION "${WEB_INSTALL_FOLDER}/${page_library}" OPTIONAL)
 
 set(header_folder "${CMAKE_INSTALL_INCLUDEDIR}/editor_serialization")
-install(TARGETS editor_futures editor_messaging EXPORT EditorSerializationTargets
+install(TARGETS editor_futures editor_messaging editor_framework EXPORT EditorSerializationTargets
   INCLUDES DESTINATION "${header_folder}")
 foreach(header IN ITEMS
+    framework/bundle_runner.h
     futures/future.h
     futures/detail/shared_future_state.h
     platform/data_buffer.h
     platform/large_pages.h
+    platform/messaging/channels.h
     platform/messaging/in_process_bus.h
     platform/messaging/memory_budget.h
     platform/messaging/message_service.h
