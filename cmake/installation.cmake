@@ -19,15 +19,8 @@ include(CMakePackageConfigHelpers)
 install(TARGETS serialization_host)
 install(TARGETS com_vorplanex_serialization LIBRARY DESTINATION "${BUNDLE_INSTALL_FOLDER}")
 
-# The page, and of what npm has installed for it what it loads.
-install(DIRECTORY "${PROJECT_SOURCE_DIR}/web/" DESTINATION "${WEB_INSTALL_FOLDER}"
-  FILES_MATCHING PATTERN "*.html" PATTERN "*.css" PATTERN "*.js" PATTERN "*.svg"
-  PATTERN node_modules EXCLUDE)
-set(page_library node_modules/nats.ws)
-install(FILES "${PROJECT_SOURCE_DIR}/web/${page_library}/esm/nats.js"
-  DESTINATION "${WEB_INSTALL_FOLDER}/${page_library}/esm" OPTIONAL)
-install(FILES "${PROJECT_SOURCE_DIR}/web/${page_library}/LICENSE"
-  DESTINATION "${WEB_INSTALL_FOLDER}/${page_library}" OPTIONAL)
+# The page, which npm run build in web/ makes; packaging/set_up.sh has it made.
+install(DIRECTORY "${PROJECT_SOURCE_DIR}/web/dist/" DESTINATION "${WEB_INSTALL_FOLDER}" OPTIONAL)
 
 set(header_folder "${CMAKE_INSTALL_INCLUDEDIR}/editor_serialization")
 install(TARGETS editor_futures editor_messaging editor_framework EXPORT EditorSerializationTargets

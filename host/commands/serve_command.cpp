@@ -18,6 +18,7 @@
 #include <system_error>
 #include <thread>
 #include <utility>
+#include <vector>
 
 #include "framework/bundle_runner.h"
 #include "futures/future.h"
@@ -87,6 +88,18 @@ void requireReadable(const std::vector<std::filesystem::path>& roots) {
                                      " of --root: " + std::generic_category().message(errno));
         }
     }
+}
+
+// Where clients find their documents. Without roots they are kept to no folder.
+std::vector<std::filesystem::path> rootsToTell(const std::vector<std::filesystem::path>& roots) {
+    if (roots.empty()) {
+        return {"/"};
+    }
+    std::vector<std::filesystem::path> told;
+    for (const std::filesystem::path& root : roots) {
+        told.push_back(std::filesystem::absolute(root).lexically_normal());
+    }
+    return told;
 }
 
 // The first line of `file`, which holds a secret.
@@ -367,7 +380,7 @@ int runServe(const ServeOptions& options, int output) {
     const TransportEnd transportEnd;
     const framework::BundleRunner bundle(options.bundle);
     serving.subscriptionFailure->check();
-    const FileService files(connectClient(clientName), guard);
+    const FileService files(connectClient(clientName), guard, rootsToTell(options.roots));
     if (metrics) {
         metrics->start([&] {
             if (confinements) {

@@ -12,6 +12,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <exception>
+#include <filesystem>
 #include <map>
 #include <sstream>
 #include <stdexcept>
@@ -87,11 +88,13 @@ std::int64_t timeIn(const json::Value& value) {
     return std::llround(time);
 }
 
+using Roots = std::vector<std::filesystem::path>;
+
 // One request. Each operation returns the members of its answer beside "status".
 class Request {
 public:
-    Request(json::Object members, MessageService& client, const Guard& guard)
-        : members_(std::move(members)), client_(client), guard_(guard) {}
+    Request(json::Object members, MessageService& client, const Guard& guard, const Roots& roots)
+        : members_(std::move(members)), client_(client), guard_(guard), roots_(roots) {}
 
     std::string answer() {
         const std::string operation = text("operation");
@@ -106,16 +109,22 @@ public:
 private:
     json::Object perform(const std::string& operation) {
         static const std::map<std::string, json::Object (Request::*)()> operations = {
-            {"list", &Request::list},
-            {"charset", &Request::charset},
-            {"version", &Request::version},
-            {"versions", &Request::versions},
-            {"restore", &Request::restore}};
+            {"roots", &Request::roots},       {"list", &Request::list},
+            {"charset", &Request::charset},   {"version", &Request::version},
+            {"versions", &Request::versions}, {"restore", &Request::restore}};
         const auto found = operations.find(operation);
         if (found == operations.end()) {
             throw std::runtime_error("There is no such \"operation\"");
         }
         return (this->*found->second)();
+    }
+
+    json::Object roots() {
+        json::Array paths;
+        for (const std::filesystem::path& root : roots_) {
+            paths.emplace_back(root.string());
+        }
+        return {{"roots", std::move(paths)}};
     }
 
     json::Object list() {
@@ -213,19 +222,21 @@ private:
     json::Object members_;
     MessageService& client_;
     const Guard& guard_;
+    const Roots& roots_;
 };
 
 std::string failure(const char* reason) {
     return json::serialize(json::Value(json::Object{{"exception", reason}, {"status", false}}));
 }
 
-void answer(const JsonMessage& message, MessageService& client, const Guard& guard) {
+void answer(const JsonMessage& message, MessageService& client, const Guard& guard,
+            const Roots& roots) {
     json::Object members = json::parse(message.payload());
     const std::string channel =
         platform::messaging::filesResponsePrefix + members["rtcId"].get<std::string>();
     std::string answer;
     try {
-        answer = Request(std::move(members), client, guard).answer();
+        answer = Request(std::move(members), client, guard, roots).answer();
     } catch (const std::exception& error) {
         answer = failure(error.what());
     }
@@ -238,11 +249,12 @@ void answer(const JsonMessage& message, MessageService& client, const Guard& gua
 
 }  // namespace
 
-FileService::FileService(std::shared_ptr<MessageService> client, Guard guard)
+FileService::FileService(std::shared_ptr<MessageService> client, Guard guard, Roots roots)
     : subscription_(client
                         ->subscribe(platform::messaging::filesRequestChannel,
-                                    [client, guard = std::move(guard)](const JsonMessage& message) {
-                                        answer(message, *client, guard);
+                                    [client, guard = std::move(guard),
+                                     roots = std::move(roots)](const JsonMessage& message) {
+                                        answer(message, *client, guard, roots);
                                     })
                         .get()) {}
 

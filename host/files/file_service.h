@@ -4,7 +4,9 @@
 // one.
 #pragma once
 
+#include <filesystem>
 #include <memory>
+#include <vector>
 
 #include "host/guard/guard.h"
 #include "platform/messaging/message_service.h"
@@ -16,8 +18,10 @@ class FileService {
 public:
     /// Subscribes to the requests through `client`, whose futures have to be resolved when they are
     /// returned. What threads of the subscription may open is what clients may see. Without a
-    /// history in `guard` there are no earlier versions.
-    FileService(std::shared_ptr<platform::messaging::MessageService> client, Guard guard);
+    /// history in `guard` there are no earlier versions. `roots` are the folders that clients are
+    /// told of, in which their documents are.
+    FileService(std::shared_ptr<platform::messaging::MessageService> client, Guard guard,
+                std::vector<std::filesystem::path> roots);
 
 private:
     std::shared_ptr<platform::messaging::Subscription> subscription_;

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// A client of the bundle over NATS, as a browser would be one: nats.ws over WebSocket.
+// A client of the bundle over NATS, as a browser would be one: nats-core over WebSocket.
 import WebSocket from "../../web/node_modules/ws/wrapper.mjs";
-import { connect } from "../../web/node_modules/nats.ws/esm/nats.js";
+import { TimeoutError, wsconnect } from "../../web/node_modules/@nats-io/nats-core/lib/mod.js";
 
 export const READ_REQUEST = "/zpr/service/readRequest_cpp";
 export const READ_RESPONSE = "/zpr/service/readResponse/";
@@ -34,7 +34,7 @@ export class Client {
   static async connect(url, options = {}) {
     const { server, user, password } = parseUrl(url);
     return new Client(
-      await connect({ servers: server, user, pass: password, timeout: 60_000, ...options }),
+      await wsconnect({ servers: server, user, pass: password, timeout: 60_000, ...options }),
       user,
     );
   }
@@ -59,7 +59,7 @@ export class Client {
           return decode(message.data);
         }
       } catch (error) {
-        if (error.code !== "TIMEOUT") {
+        if (!(error instanceof TimeoutError)) {
           throw error;
         }
       }

@@ -51,14 +51,26 @@ test("its own page is served with all that it loads", async (t) => {
   const host = await Host.start(t, ["--listen", "127.0.0.1:0"]);
   const page = await (await fetch(host.page)).text();
   const files = [...page.matchAll(/(?:src|href)="([^"]+)"/g)].map((match) => match[1]);
-  assert.deepEqual(files.sort(), ["icon.svg", "page.js", "style.css"]);
-  const script = await (await fetch(new URL("page.js", host.page))).text();
-  files.push(script.match(/from "\.\/([^"]+)"/)[1]);
+  assert.deepEqual(files.sort(), ["icon.svg", "main.css", "main.js"]);
+  const script = await (await fetch(new URL("main.js", host.page))).text();
+  const chunks = [...script.matchAll(/import\("\.\/([^"]+)"\)/g)].map((match) => match[1]);
+  assert.ok(chunks.length >= 2, script.slice(0, 1000));
+  files.push(...chunks);
   for (const file of files) {
     const response = await fetch(new URL(file, host.page));
     assert.equal(response.status, 200, file);
-    assert.equal(await response.text(), readFileSync(join(ROOT, "web", file), "utf8"), file);
+    assert.equal(await response.text(), readFileSync(join(ROOT, "web/dist", file), "utf8"), file);
   }
+});
+
+test("the page lets no script run but its own", async (t) => {
+  const host = await Host.start(t, ["--listen", "127.0.0.1:0"]);
+  const page = await (await fetch(host.page)).text();
+  const [, policy] = page.match(/http-equiv="Content-Security-Policy"\s+content="([^"]+)"/);
+  const directives = Object.fromEntries(policy.split("; ").map((one) => one.split(/ (.*)/s)));
+  assert.equal(directives["default-src"], "'none'");
+  assert.equal(directives["script-src"], "'self'");
+  assert.doesNotMatch(page, /<script(?![^>]*\ssrc=)|\son\w+=/);
 });
 
 test("the page's address tells how to connect in its fragment, and nowhere else", async (t) => {

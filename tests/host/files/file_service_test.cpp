@@ -73,7 +73,8 @@ protected:
                 return promise.getFuture();
             });
         bundle_ = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
-        service_ = std::make_unique<host::FileService>(bus_->connect("files").get(), guard_);
+        service_ = std::make_unique<host::FileService>(bus_->connect("files").get(), guard_,
+                                                       std::vector<fs::path>{root_, outside_});
     }
 
     // The payload of the last message on a channel that begins like this, after a request.
@@ -126,6 +127,12 @@ protected:
     std::unique_ptr<framework::BundleRunner> bundle_;
     std::unique_ptr<host::FileService> service_;
 };
+
+TEST_F(FileServiceTest, TellsTheRoots) {
+    json::Object answer = ask("roots", "");
+    EXPECT_EQ(answer["status"], json::Value(true));
+    EXPECT_EQ(answer["roots"], json::Value(json::Array{root_.string(), outside_.string()}));
+}
 
 TEST_F(FileServiceTest, ListsAFolderInTheOrderOfItsNames) {
     fs::create_directory(root_ / "b");

@@ -30,6 +30,11 @@ export function utf8(text: string): string {
   return stringOf(new TextEncoder().encode(text));
 }
 
+/** The text that a string carries in UTF-8; what is no UTF-8 in it becomes U+FFFD. */
+export function textOf(characters: string): string {
+  return new TextDecoder("utf-8", { ignoreBOM: true }).decode(bytesOf(characters));
+}
+
 // What the text rule for parts of "application/" types would change, besides what is no UTF-8.
 const CHANGED = /[\u0000-\u0008\u000b\u000c\u000e-\u001f\u200b\ufffe\uffff]/;
 

@@ -2,13 +2,14 @@
 // A client of an editor serialization host, for browsers and Node.js.
 import { wsconnect, type ConnectionOptions, type NatsConnection } from "@nats-io/nats-core";
 
-import { bytesOf, isPlainText, stringOf, utf8 } from "./bytes.js";
+import { bytesOf, isPlainText, stringOf, textOf, utf8 } from "./bytes.js";
 import { AskAgain, exchange, type Progress } from "./exchange.js";
 
-export { AskAgain, bytesOf, isPlainText, stringOf, utf8, type Progress };
+export { AskAgain, bytesOf, isPlainText, stringOf, textOf, utf8, type NatsConnection, type Progress };
 
 const READ = ["/zpr/service/readRequest_cpp", "/zpr/service/readResponse/"] as const;
 const WRITE = ["/zpr/service/writeRequest_cpp", "/zpr/service/writeResponse/"] as const;
+const FILES = ["/zpr/service/filesRequest_host", "/zpr/service/filesResponse/"] as const;
 const NOTIFICATION = "/zpr/service/notifyFileSystemRequest";
 
 /** A document package: what a read answers and a write takes. Its strings carry bytes. */
@@ -43,6 +44,39 @@ export interface Change {
   isExistingFile: boolean;
 }
 
+/** The file service refused a question; the message says why. */
+export class FilesError extends Error {}
+
+export interface FolderEntry {
+  name: string;
+  kind: "file" | "folder" | "other";
+  size: number; // in bytes
+  time: number; // of the last change, in milliseconds since 1970
+}
+
+export interface FolderPage {
+  /** In the order of their names' UTF-8 bytes. */
+  entries: FolderEntry[];
+  isLast: boolean;
+}
+
+export interface Charset {
+  charset: string;
+  byteOrderMark: boolean;
+}
+
+export interface EarlierVersion {
+  time: number; // when it was replaced, in milliseconds since 1970
+  size: number; // in bytes
+}
+
+/** An answer with the version of the document that it was read from. */
+export interface VersionedAnswer {
+  answer: ReadAnswer;
+  /** "" when there is no such document. */
+  version: string;
+}
+
 export interface RequestOptions {
   /** How long, in milliseconds, an answer may take to begin. 60000 without it. */
   timeout?: number;
@@ -55,6 +89,8 @@ export interface RequestOptions {
 export interface WriteOptions extends RequestOptions {
   /** The charset of a text and of its file. "UTF-8" without it. */
   encoding?: string;
+  /** The version that the content is based on; the save is made only if the file still has it. "": no file yet. */
+  baseVersion?: string;
 }
 
 interface WaitingWrite {
@@ -115,12 +151,68 @@ export class Client {
     return result;
   }
 
+  /** The folders whose documents can be read and written. Rejects, as all that follow, with FilesError. */
+  async roots(options: RequestOptions = {}): Promise<string[]> {
+    return (await this.#askFiles<{ roots: string[] }>("roots", {}, options)).roots;
+  }
+
+  /** What is in a folder, up to 1000 entries of it: those whose names come after `after`. */
+  list(folder: string, after = "", options: RequestOptions = {}): Promise<FolderPage> {
+    return this.#askFiles("list", { filePath: folder, after }, options);
+  }
+
+  /** The charset in which a text is read. */
+  charset(filePath: string, options: RequestOptions = {}): Promise<Charset> {
+    return this.#askFiles("charset", { filePath }, options);
+  }
+
+  /** The version of a document, a token made from its content. "" when there is none. */
+  async version(filePath: string, options: RequestOptions = {}): Promise<string> {
+    return (await this.#askFiles<{ version: string }>("version", { filePath }, options)).version;
+  }
+
+  /** The earlier versions of a document, the newest first. */
+  async versions(filePath: string, options: RequestOptions = {}): Promise<EarlierVersion[]> {
+    return (await this.#askFiles<{ versions: EarlierVersion[] }>("versions", { filePath }, options)).versions;
+  }
+
+  /** Reads an earlier version, which was replaced at `time`, as `read` reads the present one. */
+  async readVersion(
+    filePath: string,
+    time: number,
+    contentType: string,
+    options: RequestOptions = {},
+  ): Promise<ReadAnswer> {
+    const question = { operation: "readVersion", filePath: utf8(filePath), time, contentType };
+    return JSON.parse(stringOf(await this.#ask(FILES, question, options)));
+  }
+
+  /** Makes an earlier version the present one, which becomes an earlier one. */
+  async restore(filePath: string, time: number, options: RequestOptions = {}): Promise<void> {
+    await this.#askFiles("restore", { filePath, time }, options);
+  }
+
+  /**
+   * Reads a file, and tells the version of just this content: it is asked for before and after, and the file
+   * is read again when somebody has saved in between.
+   */
+  async readVersioned(filePath: string, contentType: string, options: RequestOptions = {}): Promise<VersionedAnswer> {
+    for (let version = await this.version(filePath, options); ; ) {
+      const answer = await this.read(filePath, contentType, options);
+      const after = await this.version(filePath, options);
+      if (after === version) {
+        return { answer, version };
+      }
+      version = after;
+    }
+  }
+
   /** Calls `changed` whenever a file may have been written. What is returned ends that. */
   listen(changed: (change: Change) => void): () => void {
     const subscription = this.nats.subscribe(NOTIFICATION, {
       callback: (error, message) => {
         if (!error) {
-          changed(JSON.parse(stringOf(message.data)));
+          changed(JSON.parse(new TextDecoder().decode(message.data)));
         }
       },
     });
@@ -149,8 +241,20 @@ export class Client {
       typeof content === "string"
         ? { contentType: "text/plain", encoding: options.encoding ?? "UTF-8", content }
         : { contentType: "text/xml", content: storable(content) };
-    const answer = await this.#ask(WRITE, { filePath: utf8(filePath), ...request }, options);
-    return JSON.parse(stringOf(answer));
+    const { baseVersion } = options;
+    const message = { filePath: utf8(filePath), ...request, ...(baseVersion !== undefined && { baseVersion }) };
+    return JSON.parse(stringOf(await this.#ask(WRITE, message, options)));
+  }
+
+  // The members of the file service's answer, whose texts are UTF-8.
+  async #askFiles<Answer>(operation: string, question: object, options: RequestOptions): Promise<Answer> {
+    const texts = Object.entries(question).map(([key, value]) => [key, typeof value === "string" ? utf8(value) : value]);
+    const bytes = await this.#ask(FILES, { operation, ...Object.fromEntries(texts) }, options);
+    const answer = JSON.parse(new TextDecoder().decode(bytes));
+    if (!answer.status) {
+      throw new FilesError(answer.exception);
+    }
+    return answer;
   }
 
   // Asks until an answer comes, with a new id each time, so that a late one is not taken for

@@ -1,0 +1,44 @@
+// SPDX-License-Identifier: Apache-2.0
+// Reading a document with all that a view needs to know of it.
+import { type Client, type ReadAnswer, type RequestOptions, textOf } from "../../client/src/index.js";
+import type { LoadedDocument } from "../document_view.js";
+import { isPackage } from "./paths.js";
+
+/** There is no such document, or it cannot be read; the message says why. */
+export class UnreadableDocument extends Error {}
+
+type Reader = Pick<Client, "readVersioned" | "version" | "charset" | "readVersion">;
+
+/**
+ * Reads the document at `path`. A text comes with the charset that it is in; when somebody saves meanwhile,
+ * it is read again, so that content, charset and version belong together. Throws UnreadableDocument, and what
+ * the client throws.
+ */
+export async function load(client: Reader, path: string, options: RequestOptions = {}): Promise<LoadedDocument> {
+  if (isPackage(path)) {
+    const { answer, version } = await client.readVersioned(path, "text/xml", options);
+    return { path, version, answer: readable(answer) };
+  }
+  for (;;) {
+    const { answer, version } = await client.readVersioned(path, "text/plain", options);
+    readable(answer);
+    const { charset, byteOrderMark } = await client.charset(path, options);
+    if ((await client.version(path, options)) === version) {
+      return { path, version, answer, charset, byteOrderMark };
+    }
+  }
+}
+
+/** Reads the version of `present` that was replaced at `time`. Its charset is taken to be that of `present`. */
+export async function loadEarlier(client: Reader, present: LoadedDocument, time: number): Promise<LoadedDocument> {
+  const contentType = isPackage(present.path) ? "text/xml" : "text/plain";
+  const answer = await client.readVersion(present.path, time, contentType);
+  return { ...present, version: "", answer: readable(answer) };
+}
+
+function readable(answer: ReadAnswer): ReadAnswer {
+  if (!answer.status) {
+    throw new UnreadableDocument(answer.exception ? textOf(answer.exception) : "File does not exist");
+  }
+  return answer;
+}

@@ -1,0 +1,56 @@
+// SPDX-License-Identifier: Apache-2.0
+// The page's start: takes what the address says out of it, connects, and shows the workspace.
+import { ConnectionFailure, type ConnectionState, openConnection } from "./connection/connection.js";
+import { loginForm } from "./connection/login.js";
+import { type Settings, completeSettings, fragmentOf, readFragment, remember } from "./connection/settings.js";
+import { element } from "./ui/dom.js";
+import { Messages } from "./ui/messages.js";
+import { preferredLanguage, text, useLanguage } from "./ui/text.js";
+import { chosenTheme, useTheme } from "./ui/theme.js";
+import { Workspace } from "./ui/workspace.js";
+// Here, since nothing would load the style sheets of chunks.
+import "./ui/page.css";
+import "./text/text.css";
+import "./package/package.css";
+
+const address = readFragment(location.hash);
+const known = completeSettings(address, sessionStorage, localStorage);
+// At once, so that the password is not seen, kept or passed on with the address.
+history.replaceState(null, "", location.pathname + location.search + fragmentOf(known, address.file));
+
+const language = preferredLanguage(localStorage.getItem("language"), navigator.languages);
+useLanguage(language);
+document.documentElement.lang = language;
+useTheme(chosenTheme());
+
+const messages = new Messages();
+const stage = element("div", { className: "stage" });
+document.body.append(stage, messages.element);
+document.title = text("page.title");
+let workspace: Workspace | undefined;
+
+async function start(settings: Settings): Promise<void> {
+  stage.replaceChildren(element("p", { className: "waiting", role: "status" }, text("connection.connecting")));
+  try {
+    const client = await openConnection(settings, (state: ConnectionState) => workspace?.connection(state));
+    remember(settings, sessionStorage, localStorage);
+    workspace = new Workspace({ client, settings }, messages);
+    stage.replaceChildren(workspace.element);
+    if (address.file) {
+      workspace.open(address.file);
+    }
+  } catch (error) {
+    const failure = error as ConnectionFailure;
+    askToConnect(settings, text(`connection.${failure.state}`, { server: settings.server }));
+  }
+}
+
+function askToConnect(settings: Partial<Settings>, wrong = ""): void {
+  stage.replaceChildren(loginForm(settings, wrong, (typed) => void start(typed)));
+}
+
+if (known.server && known.password) {
+  void start({ server: known.server, user: known.user ?? "", password: known.password });
+} else {
+  askToConnect(known);
+}

@@ -1,0 +1,51 @@
+// SPDX-License-Identifier: Apache-2.0
+// Questions in modal dialogs.
+import type { Choice } from "../document_view.js";
+import { element } from "./dom.js";
+
+export interface Question {
+  title: string;
+  message: string;
+  choices: Choice[];
+  /** Something to look at while choosing; the dialog is large then. */
+  body?: HTMLElement;
+}
+
+/** The value of the choice that is taken; nothing when the dialog is closed without one. */
+export function ask({ title, message, choices, body }: Question): Promise<string | undefined> {
+  const heading = element("h2", { id: "dialog-title" }, title);
+  const explanation = element("p", { id: "dialog-message" }, message);
+  const buttons = choices.map(({ value, label, isDefault }) =>
+    element("button", { value, autofocus: Boolean(isDefault), className: isDefault ? "main" : "" }, label),
+  );
+  const form = element(
+    "form",
+    { method: "dialog" },
+    heading,
+    explanation,
+    ...(body ? [body] : []),
+    element("div", { className: "choices" }, ...buttons),
+  );
+  const dialog = element(
+    "dialog",
+    {
+      className: body ? "large" : "",
+      "aria-labelledby": heading.id,
+      "aria-describedby": explanation.id,
+    },
+    form,
+  );
+  // The policy of the page lets no form be sent, not even to a dialog.
+  form.addEventListener("submit", (event) => {
+    event.preventDefault();
+    dialog.close((event.submitter as HTMLButtonElement | null)?.value ?? "");
+  });
+  document.body.append(dialog);
+  return new Promise((resolve) => {
+    dialog.addEventListener("close", () => {
+      dialog.remove();
+      resolve(dialog.returnValue === "" ? undefined : dialog.returnValue);
+    });
+    dialog.showModal();
+  });
+}
