@@ -9,6 +9,7 @@
 #   lib/cmake/EditorSerialization/
 #   include/editor_serialization/
 #   lib/systemd/system/                 the program as a service
+#   share/man/, share/bash-completion/, share/zsh/, share/fish/
 #   share/editor-serialization/web/     the page that the program serves to browsers
 #   share/editor-serialization/nats/    configurations for nats-server
 #   share/editor-serialization/prometheus/ alerts for those who watch the program
@@ -21,6 +22,16 @@ install(TARGETS com_vorplanex_serialization LIBRARY DESTINATION "${BUNDLE_INSTAL
 
 # The page, which npm run build in web/ makes; packaging/set_up.sh has it made.
 install(DIRECTORY "${PROJECT_SOURCE_DIR}/web/dist/" DESTINATION "${WEB_INSTALL_FOLDER}" OPTIONAL)
+
+install(FILES "${MANUAL_FOLDER}/serialization_host.1.gz" DESTINATION "${CMAKE_INSTALL_MANDIR}/man1")
+install(FILES "${MANUAL_FOLDER}/editor-serialization.7.gz" DESTINATION "${CMAKE_INSTALL_MANDIR}/man7")
+install(FILES "${MANUAL_FOLDER}/serialization_host.bash" RENAME serialization_host
+  DESTINATION "${CMAKE_INSTALL_DATADIR}/bash-completion/completions")
+# Debian's zsh looks there.
+install(FILES "${MANUAL_FOLDER}/serialization_host.zsh" RENAME _serialization_host
+  DESTINATION "${CMAKE_INSTALL_DATADIR}/zsh/vendor-completions")
+install(FILES "${MANUAL_FOLDER}/serialization_host.fish"
+  DESTINATION "${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d")
 
 set(header_folder "${CMAKE_INSTALL_INCLUDEDIR}/editor_serialization")
 install(TARGETS editor_futures editor_messaging editor_framework EXPORT EditorSerializationTargets

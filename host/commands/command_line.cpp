@@ -456,10 +456,8 @@ void describe(CLI::App& app, CommandLine& line) {
     declareWrite(*app.add_subcommand(
                      "write", "Write standard input to a file and print the answer, true or false"),
                  line.write);
-    app.footer(
-        "Exit status: 0 when all was done, 1 when a request failed, 2 when the command line is "
-        "wrong.\n"
-        "COMMAND --help tells the options of a command.");
+    app.footer(std::string("Exit status: ") + exitStatuses +
+               "\nCOMMAND --help tells the options of a command.");
 }
 
 void parse(CLI::App& app, std::vector<std::string> arguments) {

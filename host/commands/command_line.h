@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // The program's command line: the one description of its commands and options, from which the
-// parser, the texts of --help and the hints at mistakes are made.
+// parser, the texts of --help, the hints at mistakes and the manual (host/manual/) are made.
 #pragma once
 
 #include <CLI/CLI.hpp>
@@ -18,6 +18,10 @@
 namespace host {
 
 inline constexpr const char* programName = "serialization_host";
+
+/// What the program's exit statuses mean.
+inline constexpr const char* exitStatuses =
+    "0 when all was done, 1 when a request failed, 2 when the command line is wrong.";
 
 /// What a command line says.
 struct CommandLine {
