@@ -41,7 +41,6 @@ foreach(header IN ITEMS
     futures/future.h
     futures/detail/shared_future_state.h
     platform/data_buffer.h
-    platform/large_pages.h
     platform/messaging/channels.h
     platform/messaging/in_process_bus.h
     platform/messaging/memory_budget.h

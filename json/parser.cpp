@@ -31,7 +31,6 @@
 #include "json/string_kernels.h"
 #include "json/text_memory.h"
 #include "json/word_bytes.h"
-#include "platform/large_pages.h"
 #include "platform/text/ascii.h"
 
 namespace json {
@@ -138,7 +137,6 @@ Status parseQuoted(Input& input, std::string& text) {
     const char* const end = extent.end;
     Status status = Status::success;
     if (extent.escapes == 0) {
-        platform::reserveLarge(text, static_cast<std::size_t>(end - start));
         text.assign(start, end);
         input.position = end;
     } else {

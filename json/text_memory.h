@@ -5,15 +5,12 @@
 #include <cstddef>
 #include <string>
 
-#include "platform/large_pages.h"
-
 namespace json::detail {
 
 /// Gives `text` memory for `capacity` bytes, keeps what is in it, and calls `write` with the
 /// memory. `write` returns the new length, at most `capacity`, and throws nothing.
 template <typename Write>
 void overwrite(std::string& text, std::size_t capacity, Write write) {
-    platform::reserveLarge(text, capacity);
 #ifdef __cpp_lib_string_resize_and_overwrite
     text.resize_and_overwrite(capacity, [&](char* memory, std::size_t) { return write(memory); });
 #else

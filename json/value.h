@@ -128,11 +128,6 @@ private:
     [[noreturn]] void throwInvalidConversion(char const* target) const;
 
     Storage storage;
-
-    // Makes the node of a map larger than 128 bytes. Of smaller blocks, glibc's free() only makes a
-    // list, and joins them later in a pass over all memory that costs more than the rest of
-    // destroying a tree.
-    [[maybe_unused]] std::byte unused[8] = {};
 };
 
 bool operator==(const Value& left, const Value& right);

@@ -11,8 +11,6 @@
 #include <string_view>
 #include <utility>
 
-#include "platform/large_pages.h"
-
 namespace platform {
 
 /// Owns `capacity()` bytes from malloc, of which the first `length()` are in use. Move-only: bytes
@@ -32,7 +30,6 @@ public:
         if (!data_) {
             throw std::runtime_error("Out of memory!");
         }
-        preferLargePages(data_.get(), capacity);
     }
 
     /// A buffer of exactly `bytes.size()` bytes, without a terminating zero. Throws as the

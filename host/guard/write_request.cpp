@@ -12,7 +12,6 @@
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "json/string_kernels.h"
-#include "platform/large_pages.h"
 
 namespace host {
 
@@ -147,7 +146,7 @@ std::optional<WriteRequest> readWriteRequest(std::string_view payload) {
 
 std::string withFilePath(std::string_view payload, const std::string& filePath) {
     std::string result = "{\"filePath\":" + json::serialize(json::Value(filePath)) + ",";
-    platform::reserveLarge(result, result.size() + payload.size());
+    result.reserve(result.size() + payload.size());
     return result.append(payload.substr(1));
 }
 

@@ -17,7 +17,6 @@
 #include "platform/i18n/charsets/shift_jis.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/i18n/detect_charset.h"
-#include "platform/large_pages.h"
 #include "platform/posix/file_descriptor.h"
 #include "platform/posix/open_regular_file.h"
 #include "serialization/reading/result_keys.h"
@@ -96,7 +95,6 @@ std::string readToEnd(const FileDescriptor& file, std::size_t expectedSize) {
     std::size_t length = 0;
     // One byte more than expected, so that the end is seen without growing.
     const std::size_t room = std::max(expectedSize + 1, kSmallestPiece);
-    platform::reserveLarge(bytes, room);
     bytes.resize(room);
     for (;;) {
         const ssize_t count = ::read(file.get(), bytes.data() + length, bytes.size() - length);
