@@ -1,0 +1,75 @@
+// SPDX-License-Identifier: Apache-2.0
+import assert from "node:assert/strict";
+import { test } from "node:test";
+import { setTimeout as sleep } from "node:timers/promises";
+
+import { room } from "./room.mjs";
+
+const { DraftKeeper } = await room("save/draft_keeper.ts");
+
+function keeper({ takes = 0, fails = false } = {}) {
+  const log = [];
+  const made = new DraftKeeper({
+    store: async () => {
+      await sleep(takes);
+      if (fails) {
+        throw new Error("full");
+      }
+      log.push("stored");
+    },
+    remove: async () => void log.push("removed"),
+    failed: (reason) => log.push(reason.message),
+  });
+  return { log, made };
+}
+
+test("an edit is stored soon, and many edits at once are stored once", async () => {
+  const { log, made } = keeper();
+  for (let count = 0; count < 5; ++count) {
+    made.changed();
+  }
+  assert.equal(made.isPending, true);
+  await sleep(400);
+  assert.deepEqual([log, made.isPending], [["stored"], false]);
+});
+
+test("an edit can be stored at once", async () => {
+  const { log, made } = keeper();
+  await made.flush();
+  assert.deepEqual(log, []);
+  made.changed();
+  await made.flush();
+  assert.deepEqual(log, ["stored"]);
+});
+
+test("what is removed is not stored afterwards", async () => {
+  const { log, made } = keeper({ takes: 20 });
+  made.changed();
+  const stored = made.flush();
+  await made.clear();
+  await stored;
+  made.changed();
+  await made.clear();
+  await sleep(400);
+  assert.deepEqual(log, ["stored", "removed", "removed"]);
+});
+
+test("a draft that takes long is stored more rarely", async () => {
+  const { log, made } = keeper({ takes: 50 });
+  made.changed();
+  await made.flush();
+  made.changed();
+  await sleep(600);
+  assert.deepEqual(log, ["stored"]);
+  await sleep(900);
+  assert.deepEqual(log, ["stored", "stored"]);
+});
+
+test("a draft that cannot be stored is told of once", async () => {
+  const { log, made } = keeper({ fails: true });
+  for (let count = 0; count < 2; ++count) {
+    made.changed();
+    await made.flush();
+  }
+  assert.deepEqual([log, made.isPending], [["full"], true]);
+});

@@ -1,0 +1,233 @@
+// SPDX-License-Identifier: Apache-2.0
+// Saves of one document, on a disk that is a variable.
+import assert from "node:assert/strict";
+import { test } from "node:test";
+import { setTimeout as sleep } from "node:timers/promises";
+
+import { room } from "./room.mjs";
+
+const { SaveRefused, Saver } = await room("save/saver.ts");
+
+// A host with one text, whose versions are "v" and what it holds, and a view on it.
+class Desk {
+  disk = "one";
+  view = "one";
+  writes = [];
+  conflicts = [];
+  decide = () => undefined;
+  write = async (content, base) => this.store(content, base);
+
+  store(content, base) {
+    this.writes.push(content.content);
+    if (base !== this.versionOf(this.disk)) {
+      return { isSaved: content.content === this.disk, version: this.versionOf(content.content) };
+    }
+    this.disk = content.content;
+    return { isSaved: true, version: this.versionOf(this.disk) };
+  }
+
+  versionOf(text) {
+    return text === undefined ? "" : `v${text}`;
+  }
+
+  open() {
+    this.saver = new Saver(
+      {
+        content: async () => ({ kind: "text", content: this.view, encoding: "UTF-8" }),
+        write: (content, base) => this.write(content, base),
+        load: async () => this.disk === undefined ? undefined : { path: "/t", version: this.versionOf(this.disk), answer: { status: true, data: this.disk } },
+        replace: (theirs) => (this.view = theirs.answer.data),
+        resolve: async (theirs) => {
+          this.conflicts.push(theirs?.answer.data);
+          return this.decide(theirs);
+        },
+        update: () => {},
+      },
+      this.versionOf(this.disk),
+    );
+    return this;
+  }
+
+  type(text) {
+    this.view = text;
+    this.saver.changed();
+  }
+}
+
+test("what is saved is on disk, and no longer unsaved", async () => {
+  const desk = new Desk().open();
+  desk.type("two");
+  assert.equal(desk.saver.isUnsaved, true);
+  assert.equal(await desk.saver.save(), true);
+  assert.equal(desk.disk, "two");
+  assert.equal(desk.saver.isUnsaved, false);
+  assert.equal(desk.saver.baseVersion, "vtwo");
+});
+
+test("what is typed during a save stays unsaved", async () => {
+  const desk = new Desk().open();
+  desk.type("two");
+  const save = desk.saver.save();
+  await sleep(0);
+  desk.type("three");
+  await save;
+  assert.equal(desk.saver.isUnsaved, true);
+});
+
+test("one save is under way at a time, and of those wanted meanwhile the latest is made", async () => {
+  const desk = new Desk().open();
+  let underWay = 0;
+  desk.write = async (content, base) => {
+    assert.equal(++underWay, 1);
+    await sleep(5);
+    --underWay;
+    return desk.store(content, base);
+  };
+  const saves = [];
+  for (let count = 0; count < 10; ++count) {
+    desk.type(`text ${count}`);
+    saves.push(desk.saver.save());
+    await sleep(1);
+  }
+  assert.deepEqual(new Set(await Promise.all(saves)), new Set([true]));
+  assert.equal(desk.disk, "text 9");
+  assert.ok(desk.writes.length < 8, `${desk.writes}`);
+  assert.equal(desk.saver.isUnsaved, false);
+  assert.deepEqual(desk.conflicts, []);
+});
+
+test("what somebody else saved is not overwritten unseen", async () => {
+  const desk = new Desk().open();
+  desk.type("mine");
+  desk.disk = "theirs";
+  assert.equal(await desk.saver.save(), false);
+  assert.deepEqual(desk.conflicts, ["theirs"]);
+  assert.deepEqual([desk.disk, desk.view, desk.saver.isUnsaved, desk.saver.hasTheirs], ["theirs", "mine", true, true]);
+});
+
+test("mine is kept when the person says so", async () => {
+  const desk = new Desk().open();
+  desk.decide = () => "mine";
+  desk.type("mine");
+  desk.disk = "theirs";
+  assert.equal(await desk.saver.save(), true);
+  assert.deepEqual([desk.disk, desk.saver.isUnsaved, desk.saver.hasTheirs], ["mine", false, false]);
+});
+
+test("theirs is taken when the person says so", async () => {
+  const desk = new Desk().open();
+  desk.decide = () => "theirs";
+  desk.type("mine");
+  desk.disk = "theirs";
+  assert.equal(await desk.saver.save(), true);
+  assert.deepEqual([desk.disk, desk.view, desk.saver.isUnsaved], ["theirs", "theirs", false]);
+  desk.type("next");
+  assert.equal(await desk.saver.save(), true);
+  assert.equal(desk.disk, "next");
+});
+
+test("a save that comes while the person decides is not overwritten either", async () => {
+  const desk = new Desk().open();
+  const answers = ["mine", undefined];
+  desk.decide = (theirs) => {
+    desk.disk = `${theirs.answer.data}+`;
+    return answers.shift();
+  };
+  desk.type("mine");
+  desk.disk = "theirs";
+  assert.equal(await desk.saver.save(), false);
+  assert.deepEqual(desk.conflicts, ["theirs", "theirs+"]);
+  assert.equal(desk.disk, "theirs++");
+});
+
+test("a save whose answer was lost is not taken for somebody else's", async () => {
+  const desk = new Desk().open();
+  desk.write = async (content, base) => {
+    desk.store(content, base);
+    throw new Error("no answer");
+  };
+  desk.type("two");
+  await assert.rejects(desk.saver.save(), /no answer/);
+  desk.write = async (content, base) => desk.store(content, base);
+  desk.type("three");
+  assert.equal(await desk.saver.save(), true);
+  assert.deepEqual([desk.disk, desk.conflicts], ["three", []]);
+});
+
+test("without a word of the version, what was saved is looked at before it is built on", async () => {
+  const desk = new Desk().open();
+  let other;
+  desk.write = async (content, base) => {
+    const { isSaved } = desk.store(content, base);
+    desk.disk = isSaved && other ? other : desk.disk;
+    return { isSaved };
+  };
+  desk.type("two");
+  await desk.saver.save();
+  assert.equal(desk.saver.baseVersion, "vtwo");
+  other = "theirs, right after the save";
+  desk.type("three");
+  await desk.saver.save();
+  desk.type("four");
+  assert.equal(await desk.saver.save(), false);
+  assert.deepEqual(desk.conflicts, [other]);
+  assert.equal(desk.disk, other);
+});
+
+test("a save that is refused though nobody else has saved is an error", async () => {
+  const desk = new Desk().open();
+  desk.write = async () => ({ isSaved: false });
+  desk.type("two");
+  await assert.rejects(desk.saver.save(), SaveRefused);
+  assert.equal(desk.saver.isUnsaved, true);
+});
+
+test("a document that was removed is saved anew when the person says so", async () => {
+  const desk = new Desk().open();
+  desk.decide = () => "mine";
+  desk.type("two");
+  desk.disk = undefined;
+  assert.equal(await desk.saver.save(), true);
+  assert.deepEqual([desk.conflicts, desk.disk], [[undefined], "two"]);
+});
+
+test("what somebody else saved is shown where nothing is unsaved, and told of where something is", async () => {
+  const desk = new Desk().open();
+  assert.equal(await desk.saver.followTheirs(), "same");
+  desk.disk = "theirs";
+  assert.equal(await desk.saver.followTheirs(), "shown");
+  assert.deepEqual([desk.view, desk.saver.isUnsaved, desk.saver.baseVersion], ["theirs", false, "vtheirs"]);
+  desk.type("mine");
+  desk.disk = "theirs again";
+  assert.equal(await desk.saver.followTheirs(), "kept");
+  assert.deepEqual([desk.view, desk.saver.hasTheirs], ["mine", true]);
+});
+
+test("of two people who save in turn or at once, nobody loses anything unseen", async () => {
+  const disk = { text: "start" };
+  const people = ["a", "b"].map((name) => {
+    const desk = new Desk();
+    Object.defineProperty(desk, "disk", { get: () => disk.text, set: (text) => (disk.text = text) });
+    desk.name = name;
+    desk.view = disk.text;
+    desk.decide = (theirs) => {
+      desk.view = `${theirs.answer.data}|${desk.view.split("|").at(-1)}`; // put together
+      return "mine";
+    };
+    return desk;
+  });
+  people.forEach((desk) => desk.open());
+  for (let round = 0; round < 100; ++round) {
+    for (const desk of people) {
+      desk.type(`${desk.view}|${desk.name}${round}`);
+    }
+    const [first, second] = round % 2 ? people : [...people].reverse();
+    const save = first.saver.save();
+    await sleep(Math.random() < 0.5 ? 0 : 1);
+    assert.deepEqual(await Promise.all([save, second.saver.save()]), [true, true]);
+    await Promise.all(people.map((desk) => desk.saver.followTheirs()));
+    for (const desk of people) {
+      assert.ok(disk.text.includes(`|${desk.name}${round}`), `round ${round}: ${disk.text}`);
+    }
+  }
+});

@@ -1,0 +1,36 @@
+// SPDX-License-Identifier: Apache-2.0
+// Whether a document that was read is one that was sent to be saved.
+import type { Part, Relationship } from "../../client/src/index.js";
+import type { DocumentContent, LoadedDocument } from "../document_view.js";
+
+// Byte-order marks, which are saved with a text but not read with it. The longer ones first.
+const MARKS = ["\xff\xfe\0\0", "\0\0\xfe\xff", "\xef\xbb\xbf", "\xff\xfe", "\xfe\xff", "\x84\x31\x95\x33"];
+
+/** Whether `loaded` has the content `sent`. False also in rare cases in which the host stored it otherwise. */
+export function isSame(loaded: LoadedDocument, sent: DocumentContent): boolean {
+  const { answer } = loaded;
+  if (sent.kind === "text") {
+    const mark = MARKS.find((one) => sent.content.startsWith(one)) ?? "";
+    return answer.data === sent.content || (mark !== "" && answer.data === sent.content.slice(mark.length));
+  }
+  const { parts, relationships } = sent.content;
+  return (
+    answer.parts?.length === parts.length &&
+    haveSame(answer.relationships ?? [], relationships, relationshipKey) &&
+    haveSame(answer.parts, parts, partKey)
+  );
+}
+
+function haveSame<Item>(some: Item[], others: Item[], keyOf: (item: Item) => string): boolean {
+  const keys = new Set(some.map(keyOf));
+  return some.length === others.length && others.every((item) => keys.has(keyOf(item)));
+}
+
+function relationshipKey({ relationshipId, relationshipType, target }: Relationship): string {
+  return [relationshipId, relationshipType, target].join("\n");
+}
+
+function partKey({ partUri, contentType, content, relationship }: Part): string {
+  const relationships = (relationship ?? []).map(relationshipKey).sort();
+  return [partUri, contentType.toLowerCase(), ...relationships, content].join("\n");
+}
