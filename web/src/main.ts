@@ -3,6 +3,7 @@
 import { ConnectionFailure, type ConnectionState, openConnection } from "./connection/connection.js";
 import { loginForm } from "./connection/login.js";
 import { type Settings, completeSettings, fragmentOf, readFragment, remember } from "./connection/settings.js";
+import { Drafts, ownWindow } from "./save/drafts.js";
 import { element } from "./ui/dom.js";
 import { Messages } from "./ui/messages.js";
 import { preferredLanguage, text, useLanguage } from "./ui/text.js";
@@ -10,6 +11,7 @@ import { chosenTheme, useTheme } from "./ui/theme.js";
 import { Workspace } from "./ui/workspace.js";
 // Here, since nothing would load the style sheets of chunks.
 import "./ui/page.css";
+import "./files/files.css";
 import "./text/text.css";
 import "./package/package.css";
 
@@ -32,19 +34,32 @@ let workspace: Workspace | undefined;
 async function start(settings: Settings): Promise<void> {
   stage.replaceChildren(element("p", { className: "waiting", role: "status" }, text("connection.connecting")));
   try {
-    const client = await openConnection(settings, (state: ConnectionState) => workspace?.connection(state));
+    const client = await openConnection(settings, (state) => connectionChanged(state, settings));
     remember(settings, sessionStorage, localStorage);
-    workspace = new Workspace({ client, settings }, messages);
-    stage.replaceChildren(workspace.element);
-    if (address.file) {
-      workspace.open(address.file);
+    if (workspace) {
+      workspace.reconnected(client, settings);
+    } else {
+      const drafts = await Drafts.open(await ownWindow());
+      workspace = new Workspace({ client, settings, drafts, messages });
+      workspace.restore(await drafts.take(), address.file);
     }
+    stage.replaceChildren(workspace.element);
   } catch (error) {
-    const failure = error as ConnectionFailure;
-    askToConnect(settings, text(`connection.${failure.state}`, { server: settings.server }));
+    if (!(error instanceof ConnectionFailure)) {
+      throw error;
+    }
+    askToConnect(settings, text(`connection.${error.state}`, { server: settings.server }));
   }
 }
 
+function connectionChanged(state: ConnectionState, settings: Settings): void {
+  workspace?.connection(state);
+  if (workspace && (state === "refused" || state === "closed")) {
+    askToConnect(settings, text(`connection.${state}`));
+  }
+}
+
+// What is open stays as it is while this is asked.
 function askToConnect(settings: Partial<Settings>, wrong = ""): void {
   stage.replaceChildren(loginForm(settings, wrong, (typed) => void start(typed)));
 }

@@ -84,6 +84,8 @@ export interface RequestOptions {
   tries?: number;
   signal?: AbortSignal;
   onProgress?: (progress: Progress) => void;
+  /** Called when nothing came of a try, and there will be another. */
+  onAskAgain?: () => void;
 }
 
 export interface WriteOptions extends RequestOptions {
@@ -91,6 +93,12 @@ export interface WriteOptions extends RequestOptions {
   encoding?: string;
   /** The version that the content is based on; the save is made only if the file still has it. "": no file yet. */
   baseVersion?: string;
+}
+
+export interface SaveResult {
+  isSaved: boolean;
+  /** The version that the save made; hosts tell it of saves with a "baseVersion". */
+  version?: string;
 }
 
 interface WaitingWrite {
@@ -149,6 +157,18 @@ export class Client {
     const result = new Promise<boolean>((settle) => (resolve = settle));
     this.#waiting.set(filePath, { content, options, result, resolve });
     return result;
+  }
+
+  /**
+   * Writes like `write`, but at once: who calls this sees to it that no two saves of a file are under way. Tells
+   * which version the save has made, so that the next one can be based on it.
+   */
+  async save(filePath: string, content: Document | string, options: WriteOptions = {}): Promise<SaveResult> {
+    let version: string | undefined;
+    const isSaved = await this.#write(filePath, content, options, (word) => {
+      version = JSON.parse(new TextDecoder().decode(word)).version;
+    });
+    return { isSaved, ...(isSaved && version !== undefined && { version }) };
   }
 
   /** The folders whose documents can be read and written. Rejects, as all that follow, with FilesError. */
@@ -236,14 +256,19 @@ export class Client {
     return result;
   }
 
-  async #write(filePath: string, content: Document | string, options: WriteOptions): Promise<boolean> {
+  async #write(
+    filePath: string,
+    content: Document | string,
+    options: WriteOptions,
+    hear?: (word: Uint8Array) => void,
+  ): Promise<boolean> {
     const request =
       typeof content === "string"
         ? { contentType: "text/plain", encoding: options.encoding ?? "UTF-8", content }
         : { contentType: "text/xml", content: storable(content) };
     const { baseVersion } = options;
     const message = { filePath: utf8(filePath), ...request, ...(baseVersion !== undefined && { baseVersion }) };
-    return JSON.parse(stringOf(await this.#ask(WRITE, message, options)));
+    return JSON.parse(stringOf(await this.#ask(WRITE, message, options, hear)));
   }
 
   // The members of the file service's answer, whose texts are UTF-8.
@@ -258,16 +283,18 @@ export class Client {
   }
 
   // Asks until an answer comes, with a new id each time, so that a late one is not taken for
-  // another's.
+  // another's. `hear` gets what the file service says about the request before its answer.
   async #ask(
     [requestChannel, responsePrefix]: readonly [string, string],
     request: object,
-    { timeout = 60_000, tries = 5, signal, onProgress }: RequestOptions,
+    { timeout = 60_000, tries = 5, signal, onProgress, onAskAgain }: RequestOptions,
+    hear?: (word: Uint8Array) => void,
   ): Promise<Uint8Array> {
     for (let left = tries; ; --left) {
       const rtcId = `${this.#idPrefix}-${++this.#requests}`;
       const payload = bytesOf(JSON.stringify({ rtcId, ...request }));
       const responseChannel = responsePrefix + rtcId;
+      const words = hear && this.nats.subscribe(FILES[1] + rtcId, { callback: (error, message) => void (error ?? hear(message.data)) });
       try {
         return await exchange(this.nats, {
           ...{ rtcId, requestChannel, responseChannel, payload, timeout },
@@ -277,6 +304,11 @@ export class Client {
       } catch (error) {
         if (!(error instanceof AskAgain) || left <= 1) {
           throw error;
+        }
+        onAskAgain?.();
+      } finally {
+        if (!this.nats.isClosed()) {
+          words?.unsubscribe();
         }
       }
       // At random, so that those who were turned away together do not come back together.

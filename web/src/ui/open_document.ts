@@ -1,24 +1,33 @@
 // SPDX-License-Identifier: Apache-2.0
-// A document that is open: it is read, shown in a panel by the view of its kind, and followed when
-// somebody else saves it.
+// A document that is open: read, shown in a panel by the view of its kind, saved, and followed when somebody
+// else saves it.
 import { AskAgain, type Client, type Progress } from "../../client/src/index.js";
-import type { Choice, DocumentView, LoadedDocument, Page, ViewFactory } from "../document_view.js";
-import { load } from "../files/loading.js";
+import type { DocumentContent, DocumentView, LoadedDocument, Page, ViewFactory } from "../document_view.js";
+import { UnreadableDocument, load } from "../files/loading.js";
 import { isPackage, nameOf } from "../files/paths.js";
+import { resolveConflict } from "../save/conflict.js";
+import { DraftKeeper } from "../save/draft_keeper.js";
+import type { Draft, Drafts } from "../save/drafts.js";
+import { SaveRefused, type SaveResult, Saver } from "../save/saver.js";
+import { browseVersions } from "../save/versions.js";
 import { ask } from "./dialog.js";
 import { button, element } from "./dom.js";
-import { bytesText, text } from "./text.js";
+import { bytesText, currentLanguage, text } from "./text.js";
 
 /** What an open document needs of the page around it. */
 export interface Surroundings {
   readonly client: Client;
+  readonly drafts: Drafts;
   tell(message: string, kind?: "information" | "problem"): void;
-  /** The document's marks have changed. */
+  /** The document's marks or what it says of its saves have changed. */
   update(): void;
 }
 
 /** What there is to say of an open document beside its name. */
 export type Mark = "unsaved" | "theirs";
+
+const ANSWER_TIME = 10_000; // ms that a save's answer may take to begin, before it is asked for again
+const PAUSE = 3_000; // ms between the tries of a save that nobody answers
 
 let opened = 0;
 
@@ -26,50 +35,130 @@ export class OpenDocument {
   readonly id = ++opened;
   readonly panel = element("div", { role: "tabpanel", id: `panel-${this.id}`, className: "panel", tabIndex: -1 });
   readonly name: string;
-  isUnsaved = false;
+  /** What has become of the last save, for the line of the page's state. */
+  status = "";
   #view: DocumentView | undefined;
   #loaded: LoadedDocument | undefined;
+  #saver: Saver | undefined;
   #reading: AbortController | undefined;
+  #saving: AbortController | undefined;
+  #chosenCharset: string | undefined;
+  #keeper: DraftKeeper;
 
+  /** `draft`: what is unsaved of an earlier life of the page. */
   constructor(
     readonly path: string,
     private around: Surroundings,
+    draft?: Draft,
   ) {
     this.name = nameOf(path);
     this.panel.setAttribute("aria-labelledby", `tab-${this.id}`);
-    void this.read();
+    this.#keeper = new DraftKeeper({
+      store: async () => this.#storeDraft(),
+      remove: () => around.drafts.remove(path),
+      failed: (reason) => around.tell(text("draft.failed", { name: this.name, reason: reasonText(reason) }), "problem"),
+    });
+    void this.read({ ...(draft && { draft }) });
+  }
+
+  get isUnsaved(): boolean {
+    return this.#saver?.isUnsaved ?? false;
+  }
+
+  get isSaving(): boolean {
+    return this.#saver?.isSaving ?? false;
+  }
+
+  /** Whether it is shown, and so can be saved. */
+  get isShown(): boolean {
+    return this.#saver !== undefined;
+  }
+
+  /** Whether an edit would be lost with the page now. */
+  get isAtRisk(): boolean {
+    return this.isUnsaved && this.#keeper.isPending;
   }
 
   marks(): Mark[] {
-    return this.isUnsaved ? ["unsaved"] : [];
+    return [...(this.isUnsaved ? ["unsaved" as const] : []), ...(this.#saver?.hasTheirs ? ["theirs" as const] : [])];
   }
 
-  get view(): DocumentView | undefined {
-    return this.#view;
-  }
-
-  /** Reads the document and shows it; a text as `charset`, where that is given. */
-  async read(charset?: string): Promise<void> {
+  /** Reads the document and shows it; a text as `charset`, where that is given, or with a draft's edits. */
+  async read({ charset, draft }: { charset?: string; draft?: Draft } = {}): Promise<void> {
     this.#reading?.abort();
     const reading = (this.#reading = new AbortController());
     this.#showProgress(reading);
     try {
-      const loaded = await load(this.around.client, this.path, {
-        signal: reading.signal,
-        onProgress: (progress) => this.#progress(progress),
-      });
+      const loaded = await this.#load(reading.signal, draft !== undefined);
       const open = await factoryOf(this.path);
       reading.signal.throwIfAborted();
-      this.#view?.close();
-      this.#loaded = { ...loaded, ...(charset && { charset }) };
-      this.#view = open(this.#loaded, this.#page());
-      this.panel.replaceChildren(this.#view.element);
-      this.isUnsaved = false;
-      this.around.update();
+      this.#chosenCharset = charset ?? draft?.charset;
+      this.#show(this.#asChosen(loaded), open, draft);
     } catch (error) {
       if (this.#reading === reading) {
-        this.#showFailure(reading.signal.aborted ? text("document.cancelled") : this.#reasonOf(error));
+        const again = () => void this.read({ ...(charset && { charset }), ...(draft && { draft }) });
+        this.#showFailure(reading.signal.aborted ? text("document.cancelled") : this.#reasonOf(error), again);
       }
+    }
+  }
+
+  /** Saves, and tells how that went. True when what the view holds is on disk. */
+  async save(): Promise<boolean> {
+    if (!this.#saver) {
+      return false;
+    }
+    try {
+      const isSaved = await this.#saver.save();
+      if (isSaved) {
+        const time = new Date().toLocaleTimeString(currentLanguage());
+        this.#setStatus(text("save.done", { time }));
+      } else {
+        this.#setStatus(this.isUnsaved ? text("save.notyet") : "");
+      }
+      return isSaved;
+    } catch (error) {
+      this.#saveFailed(error);
+      return false;
+    }
+  }
+
+  cancelSave(): void {
+    this.#saving?.abort();
+  }
+
+  /** To be called when the file may have changed. */
+  async follow(): Promise<void> {
+    const saver = this.#saver;
+    if (!saver || saver.hasTheirs) {
+      return;
+    }
+    try {
+      const version = saver.isSaving ? "" : await this.around.client.version(this.path);
+      if (version === saver.baseVersion) {
+        return;
+      }
+      const outcome = await saver.followTheirs();
+      if (outcome !== "same") {
+        const key = outcome === "shown" ? "document.reloaded" : "document.theirs";
+        this.around.tell(text(key, { name: this.name }));
+      }
+    } catch {
+      // There will be another notification, or a save that finds out.
+    }
+  }
+
+  /** Shows the earlier versions. */
+  async versions(): Promise<void> {
+    if (!this.#view || !this.#loaded || !this.#saver) {
+      return;
+    }
+    try {
+      const isRestored = await browseVersions(this.around.client, this.#loaded, this.#view);
+      if (isRestored && (await this.#saver.followTheirs()) === "kept") {
+        this.around.tell(text("document.theirs", { name: this.name }));
+      }
+    } catch (error) {
+      this.around.tell(this.#reasonOf(error), "problem");
     }
   }
 
@@ -77,10 +166,140 @@ export class OpenDocument {
     (this.#view ?? this.panel).focus();
   }
 
+  /** Stores what is unsaved, before the page goes. */
+  async keep(): Promise<void> {
+    await this.#keeper.flush();
+  }
+
+  /** What is unsaved is given up. */
   close(): void {
     this.#reading?.abort();
+    this.#saving?.abort();
+    void this.#keeper.clear();
     this.#view?.close();
     this.panel.remove();
+  }
+
+  async #load(signal: AbortSignal, hasDraft: boolean): Promise<LoadedDocument> {
+    const { client } = this.around;
+    try {
+      return await load(client, this.path, { signal, onProgress: (progress) => this.#readProgress(progress) });
+    } catch (error) {
+      if (hasDraft && error instanceof UnreadableDocument && (await client.version(this.path)) === "") {
+        const answer = { status: true, ...(isPackage(this.path) ? { parts: [], relationships: [] } : { data: "" }) };
+        return { path: this.path, version: "", answer, charset: "UTF-8" };
+      }
+      throw error;
+    }
+  }
+
+  #show(loaded: LoadedDocument, open: ViewFactory, draft?: Draft): void {
+    this.#view?.close();
+    this.#loaded = { ...loaded, ...(draft?.byteOrderMark !== undefined && { byteOrderMark: draft.byteOrderMark }) };
+    this.#saver = this.#makeSaver(draft?.version ?? loaded.version, draft !== undefined);
+    this.#view = open(this.#loaded, this.#page(), draft?.content);
+    this.panel.replaceChildren(this.#view.element);
+    this.#setStatus("");
+    if (draft) {
+      const isSame = draft.version === loaded.version;
+      this.around.tell(text(isSame ? "document.restored" : "document.restored.theirs", { name: this.name }));
+    } else {
+      void this.#keeper.clear();
+    }
+  }
+
+  // In the charset that the person has chosen, where that is so.
+  #asChosen(loaded: LoadedDocument): LoadedDocument {
+    return { ...loaded, ...(this.#chosenCharset !== undefined && { charset: this.#chosenCharset }) };
+  }
+
+  #makeSaver(version: string, isUnsaved: boolean): Saver {
+    const saver = new Saver(
+      {
+        content: () => this.#view!.content(),
+        write: (content, base) => this.#write(content, base),
+        load: () => this.#present(),
+        replace: (theirs) => {
+          this.#loaded = theirs;
+          this.#view!.replace(theirs);
+        },
+        resolve: (theirs) => resolveConflict(this.name, this.#view!, theirs),
+        update: () => {
+          if (this.#saver === saver) {
+            this.#updated(saver);
+          }
+        },
+      },
+      version,
+      isUnsaved,
+    );
+    return saver;
+  }
+
+  #updated(saver: Saver): void {
+    if (saver.isUnsaved) {
+      this.#keeper.changed();
+    } else {
+      void this.#keeper.clear();
+    }
+    this.around.update();
+  }
+
+  // Asks again for as long as it takes, since what is sent is saved once however often it is asked for.
+  async #write(content: DocumentContent, base: string): Promise<SaveResult> {
+    const saving = (this.#saving = new AbortController());
+    const options = {
+      baseVersion: base,
+      signal: saving.signal,
+      timeout: ANSWER_TIME,
+      onProgress: ({ direction, bytes, total }: Progress) => {
+        const part = { done: bytesText(bytes), total: bytesText(total) };
+        this.#setStatus(direction === "sent" && bytes < total ? text("save.progress", part) : text("save.waiting"));
+      },
+      onAskAgain: () => this.#setStatus(text("save.again")),
+    };
+    this.#setStatus(text("save.waiting"));
+    for (;;) {
+      try {
+        const { client } = this.around;
+        return content.kind === "package"
+          ? await client.save(this.path, content.content, options)
+          : await client.save(this.path, content.content, { ...options, encoding: content.encoding });
+      } catch (error) {
+        if (saving.signal.aborted || !(error instanceof AskAgain || this.around.client.nats.isClosed())) {
+          throw error;
+        }
+        this.#setStatus(text("save.again"));
+        this.around.tell(text("save.noanswer", { name: this.name }), "problem");
+        await pause(PAUSE, saving.signal);
+      }
+    }
+  }
+
+  // The document as it is saved now.
+  async #present(): Promise<LoadedDocument | undefined> {
+    try {
+      return this.#asChosen(await load(this.around.client, this.path));
+    } catch (error) {
+      if (error instanceof UnreadableDocument && (await this.around.client.version(this.path)) === "") {
+        return undefined;
+      }
+      throw error;
+    }
+  }
+
+  async #storeDraft(): Promise<void> {
+    if (!this.#view || !this.#saver?.isUnsaved) {
+      return;
+    }
+    const { charset, byteOrderMark } = this.#loaded ?? {};
+    await this.around.drafts.put({
+      path: this.path,
+      version: this.#saver.baseVersion,
+      content: this.#view.draft(),
+      ...(charset !== undefined && { charset }),
+      ...(byteOrderMark !== undefined && { byteOrderMark }),
+    });
   }
 
   #page(): Page {
@@ -90,16 +309,11 @@ export class OpenDocument {
         return around.client;
       },
       text,
-      changed: () => this.#changed(),
-      ask: (question: { title: string; message: string; choices: Choice[] }) => ask(question),
+      changed: () => this.#saver?.changed(),
+      ask,
       tell: (message, kind) => around.tell(message, kind),
       reopen: (charset) => void this.#reopen(charset),
     };
-  }
-
-  #changed(): void {
-    this.isUnsaved = true;
-    this.around.update();
   }
 
   async #reopen(charset?: string): Promise<void> {
@@ -109,48 +323,74 @@ export class OpenDocument {
     ];
     const title = text("document.reopen.title", { name: this.name });
     if (!this.isUnsaved || (await ask({ title, message: text("document.reopen.message"), choices }))) {
-      await this.read(charset);
+      await this.read(charset ? { charset } : {});
     }
+  }
+
+  #setStatus(status: string): void {
+    this.status = status;
+    this.around.update();
+  }
+
+  #saveFailed(error: unknown): void {
+    if (this.#saving?.signal.aborted) {
+      this.#setStatus(text("save.cancelled"));
+      return;
+    }
+    this.#setStatus(text("save.failed"));
+    const reason = error instanceof SaveRefused ? text("save.refused") : this.#reasonOf(error);
+    this.around.tell(`${text("save.failed.name", { name: this.name })} ${reason}`, "problem");
   }
 
   #showProgress(reading: AbortController): void {
-    const bar = element("progress", { "aria-label": text("document.reading", { name: this.name }) });
-    const waiting = element(
-      "div",
-      { className: "waiting" },
-      element("p", {}, text("document.reading", { name: this.name })),
-      bar,
-      element("p", { className: "amount" }),
-      button(text("action.cancel"), () => reading.abort()),
+    const name = text("document.reading", { name: this.name });
+    this.panel.replaceChildren(
+      element(
+        "div",
+        { className: "waiting" },
+        element("p", {}, name),
+        element("progress", { "aria-label": name }),
+        element("p", { className: "amount" }),
+        button(text("action.cancel"), () => reading.abort()),
+      ),
     );
-    this.panel.replaceChildren(waiting);
   }
 
-  #progress({ direction, bytes, total }: Progress): void {
+  #readProgress({ direction, bytes, total }: Progress): void {
     const bar = this.panel.querySelector("progress");
-    if (bar && direction === "received") {
+    const amount = this.panel.querySelector(".amount");
+    if (bar && amount && direction === "received") {
       bar.max = total;
       bar.value = bytes;
-      this.panel.querySelector(".amount")!.textContent = text("document.progress", {
-        done: bytesText(bytes),
-        total: bytesText(total),
-      });
+      amount.textContent = text("document.progress", { done: bytesText(bytes), total: bytesText(total) });
     }
   }
 
-  #showFailure(reason: string): void {
-    const again = button(text("action.retry"), () => void this.read());
-    this.panel.replaceChildren(
-      element("div", { className: "waiting" }, element("p", { className: "problem", role: "alert" }, reason), again),
-    );
+  #showFailure(reason: string, again: () => void): void {
+    const line = element("p", { className: "problem", role: "alert" }, reason);
+    this.panel.replaceChildren(element("div", { className: "waiting" }, line, button(text("action.retry"), again)));
   }
 
   #reasonOf(error: unknown): string {
     if (error instanceof AskAgain) {
       return text("connection.noworker");
     }
-    return text("document.failed", { name: this.name, reason: error instanceof Error ? error.message : String(error) });
+    return text("document.failed", { name: this.name, reason: reasonText(error) });
   }
+}
+
+function reasonText(error: unknown): string {
+  return error instanceof Error ? error.message : String(error);
+}
+
+function pause(milliseconds: number, signal: AbortSignal): Promise<void> {
+  return new Promise((resolve, reject) => {
+    const timer = setTimeout(resolve, milliseconds);
+    signal.addEventListener("abort", () => {
+      clearTimeout(timer);
+      reject(signal.reason);
+    });
+  });
 }
 
 // The rooms are loaded when a document of theirs is opened.

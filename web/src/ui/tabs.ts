@@ -8,6 +8,10 @@ import { text } from "./text.js";
 export class Tabs {
   readonly element = element("div", { role: "tablist", className: "tabs", "aria-label": text("tabs.title") });
 
+  #shown: readonly OpenDocument[] = [];
+  #active: OpenDocument | undefined;
+  #looks = "";
+
   constructor(
     private select: (document: OpenDocument) => void,
     private close: (document: OpenDocument) => void,
@@ -15,10 +19,12 @@ export class Tabs {
     this.element.addEventListener("keydown", (event) => this.#key(event));
   }
 
-  #shown: readonly OpenDocument[] = [];
-  #active: OpenDocument | undefined;
-
   show(documents: readonly OpenDocument[], active: OpenDocument | undefined): void {
+    const looks = JSON.stringify([active?.id, ...documents.map((one) => [one.id, one.marks()])]);
+    if (looks === this.#looks) {
+      return;
+    }
+    this.#looks = looks;
     const hadFocus = this.element.contains(document.activeElement);
     this.#shown = documents;
     this.#active = active;

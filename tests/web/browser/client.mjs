@@ -1,0 +1,15 @@
+// SPDX-License-Identifier: Apache-2.0
+// Somebody else, who saves while a page is open: the client library under Node.js.
+import WebSocket from "../../../web/node_modules/ws/wrapper.mjs";
+import { connect } from "../../../web/client/dist/index.js";
+import { parseUrl } from "../../serve/client.mjs";
+
+globalThis.WebSocket = WebSocket; // Node.js before version 22 has none
+
+/** A client of the session's host. */
+export async function clientOf(test, session) {
+  const { server, user, password } = parseUrl(session.host.webSocket);
+  const client = await connect({ servers: server, user, pass: password });
+  test.after(() => client.close());
+  return client;
+}

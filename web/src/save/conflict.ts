@@ -1,0 +1,58 @@
+// SPDX-License-Identifier: Apache-2.0
+// Somebody else has saved: what becomes of both.
+import type { DocumentView, LoadedDocument } from "../document_view.js";
+import { ask } from "../ui/dialog.js";
+import { text } from "../ui/text.js";
+
+/**
+ * Asks whose version stays. "mine": what the view holds, in which both may have been put together; it is to be
+ * saved on the base of `theirs`. Nothing: the person wants to decide later. `theirs` is nothing where the
+ * document was removed.
+ */
+export async function resolveConflict(
+  name: string,
+  view: DocumentView,
+  theirs: LoadedDocument | undefined,
+): Promise<"mine" | "theirs" | undefined> {
+  if (!theirs) {
+    return (await ask({
+      title: text("conflict.removed.title", { name }),
+      message: text("conflict.removed.message"),
+      choices: [later(), { value: "mine", label: text("conflict.removed.save"), isDefault: true }],
+    })) as "mine" | undefined;
+  }
+  for (;;) {
+    const choice = await ask({
+      title: text("conflict.title", { name }),
+      message: text("conflict.message"),
+      choices: [later(), theirsChoice(), mineChoice(), { value: "compare", label: text("conflict.compare"), isDefault: true }],
+    });
+    const decision = choice === "compare" ? await compare(name, view, theirs) : choice;
+    if (decision !== "back") {
+      return decision as "mine" | "theirs" | undefined;
+    }
+  }
+}
+
+async function compare(name: string, view: DocumentView, theirs: LoadedDocument): Promise<"mine" | "theirs" | "back"> {
+  const comparison = view.compare(theirs);
+  const choice = await ask({
+    title: text("conflict.title", { name }),
+    message: text("conflict.compare.message"),
+    body: comparison.element,
+    choices: [
+      { value: "back", label: text("action.back") },
+      theirsChoice(),
+      { value: "together", label: text("conflict.together"), isDefault: true },
+    ],
+  });
+  if (choice === "together") {
+    comparison.apply();
+    return "mine";
+  }
+  return choice === "theirs" ? "theirs" : "back";
+}
+
+const later = () => ({ value: "", label: text("conflict.later") });
+const mineChoice = () => ({ value: "mine", label: text("conflict.mine") });
+const theirsChoice = () => ({ value: "theirs", label: text("conflict.theirs") });
