@@ -6,7 +6,7 @@
 #   lib/libeditor_messaging.so.<version>
 #   lib/libeditor_framework.a
 #   lib/<"installpath" of the bundle's manifest>
-#   lib/cmake/EditorSerialization/
+#   lib/cmake/EditorSerialization/, lib/pkgconfig/
 #   include/editor_serialization/
 #   lib/systemd/system/                 the program as a service
 #   share/man/, share/bash-completion/, share/zsh/, share/fish/
@@ -15,7 +15,14 @@
 #   share/editor-serialization/prometheus/ alerts for those who watch the program
 #   share/editor-serialization/systemd/ how nats-server's service takes one of them
 
+#   lib/sysusers.d/                     the user that the service runs as
+#   share/doc/editor-serialization/
+#
+# In three components: `library`, `development`, and `program` for all that names none.
+
 include(CMakePackageConfigHelpers)
+set(CMAKE_INSTALL_DEFAULT_COMPONENT_NAME program)
+set(documentation_folder "${CMAKE_INSTALL_DATADIR}/doc/editor-serialization")
 
 install(TARGETS serialization_host)
 install(TARGETS com_vorplanex_serialization LIBRARY DESTINATION "${BUNDLE_INSTALL_FOLDER}")
@@ -35,6 +42,8 @@ install(FILES "${MANUAL_FOLDER}/serialization_host.fish"
 
 set(header_folder "${CMAKE_INSTALL_INCLUDEDIR}/editor_serialization")
 install(TARGETS editor_futures editor_messaging editor_framework EXPORT EditorSerializationTargets
+  LIBRARY COMPONENT library NAMELINK_COMPONENT development
+  ARCHIVE COMPONENT development
   INCLUDES DESTINATION "${header_folder}")
 foreach(header IN ITEMS
     framework/bundle_runner.h
@@ -48,7 +57,7 @@ foreach(header IN ITEMS
     platform/messaging/nats/nats_bus.h
     platform/messaging/transport.h)
   cmake_path(GET header PARENT_PATH folder)
-  install(FILES "${PROJECT_SOURCE_DIR}/${header}" DESTINATION "${header_folder}/${folder}")
+  install(FILES "${PROJECT_SOURCE_DIR}/${header}" DESTINATION "${header_folder}/${folder}" COMPONENT development)
 endforeach()
 
 set(package_folder "${CMAKE_INSTALL_LIBDIR}/cmake/EditorSerialization")
@@ -63,9 +72,16 @@ configure_package_config_file(
 write_basic_package_version_file(
   "${PROJECT_BINARY_DIR}/EditorSerializationConfigVersion.cmake"
   COMPATIBILITY SameMinorVersion)
-install(FILES ${package_files} DESTINATION "${package_folder}")
+install(FILES ${package_files} DESTINATION "${package_folder}" COMPONENT development)
 install(EXPORT EditorSerializationTargets
-  NAMESPACE EditorSerialization:: DESTINATION "${package_folder}")
+  NAMESPACE EditorSerialization:: DESTINATION "${package_folder}" COMPONENT development)
+
+set(pkgconfig_folder "${CMAKE_INSTALL_LIBDIR}/pkgconfig")
+cmake_path(RELATIVE_PATH CMAKE_INSTALL_PREFIX BASE_DIRECTORY "${CMAKE_INSTALL_PREFIX}/${pkgconfig_folder}"
+           OUTPUT_VARIABLE pkgconfig_prefix)
+configure_file("${PROJECT_SOURCE_DIR}/packaging/editor-messaging.pc.in"
+  "${PROJECT_BINARY_DIR}/editor-messaging.pc" @ONLY)
+install(FILES "${PROJECT_BINARY_DIR}/editor-messaging.pc" DESTINATION "${pkgconfig_folder}" COMPONENT development)
 
 install(DIRECTORY "${PROJECT_SOURCE_DIR}/packaging/nats" "${PROJECT_SOURCE_DIR}/packaging/prometheus"
   DESTINATION "${CMAKE_INSTALL_DATADIR}/editor-serialization")
@@ -73,20 +89,11 @@ install(FILES "${PROJECT_SOURCE_DIR}/packaging/systemd/serialization-host@.servi
   DESTINATION lib/systemd/system)
 install(FILES "${PROJECT_SOURCE_DIR}/packaging/systemd/nats-server-editor.conf"
   DESTINATION "${CMAKE_INSTALL_DATADIR}/editor-serialization/systemd")
-install(FILES "${PROJECT_SOURCE_DIR}/docs/deployment.md" "${PROJECT_SOURCE_DIR}/docs/protocol.md"
-  DESTINATION "${CMAKE_INSTALL_DATADIR}/doc/editor-serialization")
+install(FILES "${PROJECT_SOURCE_DIR}/packaging/systemd/sysusers.conf" RENAME editor-serialization.conf
+  DESTINATION lib/sysusers.d)
+install(DIRECTORY "${PROJECT_SOURCE_DIR}/docs/" DESTINATION "${documentation_folder}")
+install(FILES "${PROJECT_SOURCE_DIR}/README.md" "${PROJECT_SOURCE_DIR}/NOTICE" DESTINATION "${documentation_folder}")
+install(DIRECTORY "${PROJECT_SOURCE_DIR}/examples/embedding" DESTINATION "${documentation_folder}/examples"
+  COMPONENT development)
 
-set(CPACK_GENERATOR TGZ DEB)
-set(CPACK_PACKAGE_NAME editor-serialization)
-set(CPACK_PACKAGE_VENDOR "The Vorplanex Company")
-set(CPACK_PACKAGE_CONTACT "The Vorplanex Company")
-set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "Documents on disk for a browser-based document editor")
-set(CPACK_PACKAGE_DIRECTORY "${PROJECT_BINARY_DIR}/packages")
-set(CPACK_STRIP_FILES ON)
-set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
-set(CPACK_DEBIAN_PACKAGE_SECTION editors)
-# Depends on the packages of the libraries that the files are linked with, which dpkg-shlibdeps finds;
-# the project's own library is in the package itself.
-set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
-set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS_PRIVATE_DIRS "${CMAKE_LIBRARY_OUTPUT_DIRECTORY}")
-include(CPack)
+include(packages)

@@ -81,9 +81,9 @@ function(project_library name)
   else()
     if(arg_SHARED)
       add_library(${target} SHARED ${arg_SOURCES})
-      # Until 1.0 each minor version has an interface of its own.
+      # Until 1.0 the interface may change with each version; packages depend on theirs.
       set_target_properties(${target} PROPERTIES
-        VERSION ${PROJECT_VERSION} SOVERSION ${PROJECT_VERSION_MAJOR}.${PROJECT_VERSION_MINOR})
+        VERSION ${PROJECT_VERSION} SOVERSION ${PROJECT_VERSION_MAJOR})
     else()
       add_library(${target} STATIC ${arg_SOURCES})
     endif()
