@@ -32,7 +32,7 @@ constexpr Cost hintBits = bits(40);
 constexpr Cost infinite = std::numeric_limits<Cost>::max() / 2;
 
 Cost hintFor(const LegacyCharset& charset, const std::string& declared) {
-    return isSameCharset(charset.name(), declared) ? hintBits : 0;
+    return !declared.empty() && isSameCharset(charset.name(), declared) ? hintBits : 0;
 }
 
 bool isWordByte(char byte) {
@@ -116,6 +116,7 @@ public:
     Search(std::string_view sample, std::string_view bytes,
            const std::vector<const LegacyCharset*>& excluded)
         : sample_(sample),
+          isCut_(sample.size() < bytes.size() && !sample.ends_with('\n')),
           values_(bytesIn(bytes)),
           declared_(declaredCharset(bytes)),
           excluded_(excluded),
@@ -163,10 +164,11 @@ private:
         }
     }
 
-    // The text of the sample, which may end inside a character.
+    // The text of the sample. One that was taken of a text without a boundary may end inside a
+    // character; others are decoded once, as it takes long to find that they cannot be.
     std::optional<std::u16string> decodeSample(const LegacyCharset& charset) const {
-        constexpr std::size_t longestCharacter = 4;
-        for (std::size_t cut = 0; cut < longestCharacter && cut <= sample_.size(); ++cut) {
+        const std::size_t longestCut = isCut_ ? 3 : 0;
+        for (std::size_t cut = 0; cut <= std::min(longestCut, sample_.size()); ++cut) {
             if (auto text = charset.decode(sample_.substr(0, sample_.size() - cut))) {
                 return text;
             }
@@ -249,6 +251,7 @@ private:
     }
 
     std::string_view sample_;
+    bool isCut_;  // the sample ends anywhere in the file
     ByteSet values_;
     std::string declared_;
     const std::vector<const LegacyCharset*>& excluded_;

@@ -3,7 +3,6 @@
 #include "platform/i18n/detection/text_counts.h"
 
 #include <algorithm>
-#include <bit>
 #include <cstddef>
 
 namespace platform::i18n::detail {
@@ -15,7 +14,7 @@ constexpr Cost asciiBits = bits(5);
 // A control that no text holds.
 constexpr Cost strayControlBits = bits(20);
 
-// Counts keys: a hash table with open addressing, sized for the number of keys that may come.
+// Counts keys: a hash table with open addressing.
 class Tally {
 public:
     struct Entry {
@@ -23,18 +22,17 @@ public:
         std::uint32_t count;
     };
 
-    explicit Tally(std::size_t keys) : places_(std::bit_ceil(2 * keys + 1)) {}
-
     void add(std::uint64_t key) {
-        std::size_t slot = (key * 0x9E3779B97F4A7C15U >> 32U) & (places_.size() - 1);
-        while (places_[slot] != 0 && entries_[places_[slot] - 1].key != key) {
-            slot = (slot + 1) & (places_.size() - 1);
+        std::uint32_t& place = placeOf(key);
+        if (place != 0) {
+            ++entries_[place - 1].count;
+            return;
         }
-        if (places_[slot] == 0) {
-            entries_.push_back({key, 0});
-            places_[slot] = static_cast<std::uint32_t>(entries_.size());
+        entries_.push_back({key, 1});
+        place = static_cast<std::uint32_t>(entries_.size());
+        if (2 * entries_.size() > places_.size()) {
+            grow();
         }
-        ++entries_[places_[slot] - 1].count;
     }
 
     const std::vector<Entry>& entries() const { return entries_; }
@@ -46,8 +44,25 @@ public:
     }
 
 private:
+    // Where the place of `key` stands, or is to stand.
+    std::uint32_t& placeOf(std::uint64_t key) {
+        std::size_t slot = (key * 0x9E3779B97F4A7C15U >> 32U) & (places_.size() - 1);
+        while (places_[slot] != 0 && entries_[places_[slot] - 1].key != key) {
+            slot = (slot + 1) & (places_.size() - 1);
+        }
+        return places_[slot];
+    }
+
+    void grow() {
+        places_.assign(2 * places_.size(), 0);
+        for (std::size_t i = 0; i < entries_.size(); ++i) {
+            placeOf(entries_[i].key) = static_cast<std::uint32_t>(i + 1);
+        }
+    }
+
     std::vector<Entry> entries_;
-    std::vector<std::uint32_t> places_;  // in `entries_`, from one; zero where there is none
+    // In `entries_`, from one; zero where there is none. Their number is a power of two.
+    std::vector<std::uint32_t> places_ = std::vector<std::uint32_t>(1024);
 };
 
 bool isWordUnit(char16_t unit) {
@@ -68,8 +83,8 @@ std::uint64_t keyOf(char16_t first, char16_t second, char16_t third = 0) {
 }  // namespace
 
 TextCounts::TextCounts(std::u16string_view units, Runs runs) {
-    Tally pairTally(2 * units.size());
-    Tally tripleTally(units.size());
+    Tally pairTally;
+    Tally tripleTally;
     for (std::size_t begin = 0; begin < units.size();) {
         if (!isWordUnit(units[begin])) {
             asciiCost += costOfAscii(units[begin++]);
