@@ -265,6 +265,12 @@ void declareServe(CLI::App& command, ServeOptions& options) {
     command.add_flag("!--no-confinement", options.isConfined,
                      "Go without the kernel's help to keep clients to the folders of --root");
     declareGuard(command, options.guard);
+    command
+        .add_option("--max-message", options.largestMessage,
+                    "The longest request or answer, in bytes or with a unit such as MB (default: "
+                    "1 GB, and at most a tenth of --memory-limit)")
+        ->type_name("SIZE")
+        ->transform(untold(CLI::AsSizeValue(false)));
     declareWeb(command, options.web);
     declareMetrics(command, options);
     declareOwnServer(command, options.ownServer,

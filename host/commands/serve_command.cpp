@@ -138,7 +138,18 @@ NatsOptions connectionTo(const OtherServers& servers) {
     return options;
 }
 
-std::shared_ptr<NatsBus> makeBus(NatsOptions options) {
+// The memory for requests is divided for good between those that come in pieces, long answers, and
+// requests that are being handled, each of which takes its bytes and its values, more than twice
+// its length. If they shared it, transfers and requests that wait to be handled could hold all of
+// it, while the request that is to be handled first waits for more.
+constexpr std::uint64_t memoryOfTransfers(std::uint64_t memoryForRequests) {
+    return memoryForRequests / 5;
+}
+constexpr std::uint64_t memoryToHandle(std::uint64_t memoryForRequests) {
+    return memoryForRequests - 2 * memoryOfTransfers(memoryForRequests);
+}
+
+std::shared_ptr<NatsBus> makeBus(NatsOptions options, const ServeOptions& serve) {
     options.connectTimeout = longestConnect;
     // Counting them takes files that the threads which ask may not be allowed to open.
     options.concurrency = std::max(2U, std::thread::hardware_concurrency());
@@ -149,6 +160,9 @@ std::shared_ptr<NatsBus> makeBus(NatsOptions options) {
         {platform::messaging::readRequestChannel, platform::messaging::readResponsePrefix},
         {platform::messaging::writeRequestChannel, platform::messaging::writeResponsePrefix},
         {platform::messaging::filesRequestChannel, platform::messaging::filesResponsePrefix}};
+    options.longMessages.maxMessage = serve.largestMessage;
+    options.longMessages.maxIncomingBytes = memoryOfTransfers(serve.memoryForRequests);
+    options.longMessages.maxOutgoingBytes = memoryOfTransfers(serve.memoryForRequests);
     return NatsBus::create(std::move(options));
 }
 
@@ -340,7 +354,7 @@ int runServe(const ServeOptions& options, int output) {
     std::unique_ptr<NatsServer> server =
         folder ? startOwnServer(options, web.get(), *folder) : nullptr;
     const std::shared_ptr<NatsBus> bus =
-        makeBus(server ? server->workerConnection() : connectionTo(options.otherServers));
+        makeBus(server ? server->workerConnection() : connectionTo(options.otherServers), options);
     if (!connect(*bus, confinements ? &confinements->network : nullptr, signals.first())) {
         return exitDone;
     }
@@ -361,8 +375,8 @@ int runServe(const ServeOptions& options, int output) {
         confinements->bundle.confineThisThread();
         serving.prepareThread = [&confinements] { confinements->documents.confineThisThread(); };
     }
-    const auto budget =
-        std::make_shared<platform::messaging::MemoryBudget>(options.memoryForRequests);
+    const auto budget = std::make_shared<platform::messaging::MemoryBudget>(
+        memoryToHandle(options.memoryForRequests));
     const auto connectClient = [bus, budget, serving](const std::string& name) {
         // The bus is connected, so that this is no waiting. A request that waits for memory may be
         // handled on another thread than the one that brought it, and is counted on that.

@@ -2,6 +2,7 @@
 // The command `serve`: carries the bundle's messages over NATS.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <filesystem>
 #include <optional>
@@ -54,8 +55,11 @@ struct ServeOptions {
     bool isConfined = true;
     GuardOptions guard;
 
-    /// The bytes that requests and the values in them may take together.
+    /// The bytes that requests, the values in them and answers may take together.
     std::uint64_t memoryForRequests = 0;
+
+    /// The longest message, in bytes, that is taken or sent in pieces.
+    std::size_t largestMessage = std::size_t{1} << 30;
 };
 
 /// Serves the bundle's clients until the process is asked to end (StopSignals), and finishes then

@@ -16,8 +16,9 @@ std::uint64_t defaultMemoryLimit();
 /// system refuses.
 std::uint64_t limitMemory(std::uint64_t bytes);
 
-/// What requests and the values in them may take together, in bytes, in a process that may take
-/// `limit` bytes. The other half is for the documents that they read and write, and the program.
+/// What requests, the values in them and answers that wait to be taken may take together, in bytes,
+/// in a process that may take `limit` bytes. The other half is for the documents that they read and
+/// write, and the program.
 constexpr std::uint64_t memoryForRequests(std::uint64_t limit) {
     return limit / 2;
 }

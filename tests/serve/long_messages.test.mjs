@@ -156,3 +156,17 @@ test("what is under way when a host ends is finished", async (t) => {
   assert.ok((await read).data === text);
   assert.equal(await host.end, 0);
 });
+
+test("what is longer than --max-message is refused, with the reason", async (t) => {
+  const folder = temporaryFolder(t);
+  const host = await Host.start(t, ["--root", folder, "--max-message", "9MB"]);
+  const client = await clientOf(t, host);
+  const file = join(folder, "long.txt");
+  const text = longText(10);
+  await assert.rejects(client.write(file, text, { tries: 1 }), /requests have 1 to 9437184 bytes/);
+  writeFileSync(file, text);
+  const { status, exception } = await client.read(file, "text/plain");
+  assert.equal(status, false);
+  assert.match(exception, /too large.*9437184 bytes/s);
+  assert.equal(await client.write(file, longText(8)), true);
+});

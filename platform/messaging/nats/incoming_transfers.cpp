@@ -36,8 +36,11 @@ Notes IncomingTransfers::offer(const std::string& channel, const ReturnAddress& 
     transfer.address = address;
     transfer.length = static_cast<std::size_t>(length);
     ++offersOf_[user];
-    if (waiting_.contains(user) || !start(transfer, now)) {
-        waiting_[user].push_back(address.id);
+    const auto queue = waiting_.find(user);
+    if (queue != waiting_.end()) {
+        queue->second.ids.push_back(address.id);
+    } else if (mostOvertaken(now) != waiting_.end() || !start(transfer, now)) {
+        waiting_.emplace(user, Queue{{address.id}, now});
     }
     return {tellRoom(transfer, now)};
 }
@@ -53,7 +56,7 @@ IncomingTransfers::Progress IncomingTransfers::piece(const std::string& id, std:
     if (offset != received || bytes.empty() || bytes.size() > pieceSize ||
         bytes.size() > transfer.room - received) {
         Progress progress{{stopNote(transfer.address, "a piece is out of turn")}, {}};
-        remove(found);
+        remove(found, now);
         std::ranges::move(admitWaiting(now), std::back_inserter(progress.notes));
         return progress;
     }
@@ -62,7 +65,7 @@ IncomingTransfers::Progress IncomingTransfers::piece(const std::string& id, std:
     if (received + bytes.size() == transfer.length) {
         WholeRequest request{transfer.channel, transfer.address, std::move(transfer.payload),
                              std::move(transfer.reservation)};
-        remove(found);
+        remove(found, now);
         return {admitWaiting(now), std::move(request)};
     }
     if (received + bytes.size() >= transfer.progress + leastProgress) {
@@ -83,13 +86,21 @@ Notes IncomingTransfers::stop(const std::string& id, Time now) {
     if (found == transfers_.end()) {
         return {};
     }
-    remove(found);
+    remove(found, now);
     return admitWaiting(now);
 }
 
-// One of each user in turn, until nothing more fits.
+// One of each user in turn, until nothing more fits, or somebody has been overtaken for too long.
 Notes IncomingTransfers::admitWaiting(Time now) {
     Notes notes;
+    for (auto first = mostOvertaken(now); first != waiting_.end(); first = mostOvertaken(now)) {
+        Transfer& transfer = transfers_.at(first->second.ids.front());
+        if (!start(transfer, now)) {
+            return notes;
+        }
+        notes.push_back(tellRoom(transfer, now));
+        leave(first, first->second.ids.begin(), now);
+    }
     std::size_t refused = 0;
     while (refused < waiting_.size()) {
         auto next = waiting_.upper_bound(lastUser_);
@@ -97,23 +108,44 @@ Notes IncomingTransfers::admitWaiting(Time now) {
             next = waiting_.begin();
         }
         lastUser_ = next->first;
-        refused = admitOneOf(next->second, notes, now) ? 0 : refused + 1;
-        if (next->second.empty()) {
-            waiting_.erase(next);
-        }
+        refused = admitOneOf(next, notes, now) ? 0 : refused + 1;
     }
     return notes;
 }
 
-bool IncomingTransfers::admitOneOf(std::deque<std::string>& ids, Notes& notes, Time now) {
+bool IncomingTransfers::admitOneOf(Queues::iterator queue, Notes& notes, Time now) {
+    std::deque<std::string>& ids = queue->second.ids;
     const auto first = std::ranges::find_if(
         ids, [&](const std::string& id) { return start(transfers_.at(id), now); });
     if (first == ids.end()) {
         return false;
     }
     notes.push_back(tellRoom(transfers_.at(*first), now));
-    ids.erase(first);
+    leave(queue, first, now);
     return true;
+}
+
+// The user whose first offer has waited for the longest, if that is too long. Counted from when it
+// came to be the first, so that a user with many offers does not shut out the others with them.
+IncomingTransfers::Queues::iterator IncomingTransfers::mostOvertaken(Time now) {
+    const auto first = std::ranges::min_element(
+        waiting_, {}, [](const Queues::value_type& each) { return each.second.since; });
+    return first != waiting_.end() && now - first->second.since >= longestOvertaking
+               ? first
+               : waiting_.end();
+}
+
+// Takes `id` out of `queue`.
+void IncomingTransfers::leave(Queues::iterator queue, std::deque<std::string>::iterator id,
+                              Time now) {
+    std::deque<std::string>& ids = queue->second.ids;
+    if (id == ids.begin()) {
+        queue->second.since = now;
+    }
+    ids.erase(id);
+    if (ids.empty()) {
+        waiting_.erase(queue);
+    }
 }
 
 // Reserves what `transfer` needs; false when there is not enough.
@@ -149,7 +181,7 @@ Notes IncomingTransfers::tick(Time now) {
             }
         } else if (now - transfer.moved >= standstill) {
             notes.push_back(stopNote(transfer.address, "nothing came for too long"));
-            remove(position);
+            remove(position, now);
         }
     }
     std::ranges::move(admitWaiting(now), std::back_inserter(notes));
@@ -158,10 +190,13 @@ Notes IncomingTransfers::tick(Time now) {
 
 Notes IncomingTransfers::stopAll(std::string_view reason) {
     Notes notes;
-    while (!transfers_.empty()) {
-        notes.push_back(stopNote(transfers_.begin()->second.address, reason));
-        remove(transfers_.begin());
+    for (const auto& [id, transfer] : transfers_) {
+        notes.push_back(stopNote(transfer.address, reason));
     }
+    transfers_.clear();
+    waiting_.clear();
+    offersOf_.clear();
+    ahead_ = 0;
     return notes;
 }
 
@@ -171,16 +206,13 @@ bool IncomingTransfers::isFull(const std::string& user) const {
            (offers != offersOf_.end() && offers->second >= limits_.mostOffersOfAUser);
 }
 
-void IncomingTransfers::remove(Position position) {
+void IncomingTransfers::remove(Position position, Time now) {
     const Transfer& transfer = position->second;
     const std::string user = transfer.address.user();
     if (transfer.room > 0) {
         ahead_ -= aheadOf(transfer);
-    } else if (const auto waiting = waiting_.find(user); waiting != waiting_.end()) {
-        std::erase(waiting->second, position->first);
-        if (waiting->second.empty()) {
-            waiting_.erase(waiting);
-        }
+    } else if (const auto queue = waiting_.find(user); queue != waiting_.end()) {
+        leave(queue, std::ranges::find(queue->second.ids, position->first), now);
     }
     if (const auto offers = offersOf_.find(user); --offers->second == 0) {
         offersOf_.erase(offers);

@@ -16,6 +16,7 @@
 // stands still, end with "stop": nothing is handled and the memory is free again.
 #pragma once
 
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <deque>
@@ -31,6 +32,9 @@
 
 namespace platform::messaging::nats {
 
+/// How long an offer that does not fit waits while others go first.
+inline constexpr std::chrono::seconds longestOvertaking{10};
+
 /// A request that has come whole.
 struct WholeRequest {
     std::string channel;
@@ -39,10 +43,10 @@ struct WholeRequest {
     Reservation reservation;  ///< For the payload.
 };
 
-/// Those whose turn it is have their memory reserved whole. The others wait; when there is memory,
-/// the users take turns, and of each user the first offer that fits is next. A large one waits
-/// until there is memory for it at once, so that nobody fills memory with halves of requests.
-/// Belongs to one thread at a time.
+/// Those whose turn it is have their memory reserved whole, so that nobody fills memory with halves
+/// of requests. The others wait; when there is memory, the users take turns, and of each user the
+/// first offer that fits is next. One that would be overtaken for longer than `longestOvertaking`
+/// is not overtaken any more. Belongs to one thread at a time.
 class IncomingTransfers {
 public:
     struct Limits {
@@ -101,20 +105,29 @@ private:
     };
     using Position = std::map<std::string, Transfer>::iterator;
 
+    // The offers of a user that wait; never empty.
+    struct Queue {
+        std::deque<std::string> ids;
+        Time since;  // when the first of them came to be the first
+    };
+    using Queues = std::map<std::string, Queue>;
+
     bool isFull(const std::string& user) const;
     bool start(Transfer& transfer, Time now);
-    bool admitOneOf(std::deque<std::string>& ids, Notes& notes, Time now);
-    void remove(Position position);
+    bool admitOneOf(Queues::iterator queue, Notes& notes, Time now);
+    Queues::iterator mostOvertaken(Time now);
+    void leave(Queues::iterator queue, std::deque<std::string>::iterator id, Time now);
+    void remove(Position position, Time now);
     Note tellRoom(Transfer& transfer, Time now) const;
     std::size_t aheadOf(const Transfer& transfer) const;
 
     const std::string worker_;
     const Limits limits_;
     const Reserve reserve_;
-    std::map<std::string, Transfer> transfers_;               // by the client's id
-    std::map<std::string, std::deque<std::string>> waiting_;  // ids by user; none is empty
-    std::map<std::string, std::size_t> offersOf_;             // by user
-    std::string lastUser_;                                    // whose turn it was
+    std::map<std::string, Transfer> transfers_;    // by the client's id
+    Queues waiting_;                               // by user
+    std::map<std::string, std::size_t> offersOf_;  // by user
+    std::string lastUser_;                         // whose turn it was
     std::size_t ahead_ = 0;  // what the clients whose turn it is may be ahead, together
 };
 

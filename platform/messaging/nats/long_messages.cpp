@@ -44,32 +44,15 @@ std::string_view payloadOf(natsMsg* received) {
     return {natsMsg_GetData(received), static_cast<std::size_t>(natsMsg_GetDataLength(received))};
 }
 
+Reserve reserveFrom(MemoryBudget& budget) {
+    return [&budget](std::size_t bytes) -> Reservation {
+        std::optional<MemoryBudget::Reservation> reserved = budget.tryReserve(bytes);
+        return reserved ? std::make_shared<MemoryBudget::Reservation>(std::move(*reserved))
+                        : nullptr;
+    };
+}
+
 }  // namespace
-
-// A bound on the memory of one direction, and within it of the whole process's.
-class LongMessages::Share : public std::enable_shared_from_this<Share> {
-public:
-    Share(std::size_t size, std::function<void()> onRoom)
-        : size_(size), onRoom_(std::move(onRoom)) {}
-
-    Reservation reserve(std::size_t bytes) {
-        std::size_t used = used_;
-        do {
-            if (bytes > size_ - used) {
-                return nullptr;
-            }
-        } while (!used_.compare_exchange_weak(used, used + bytes));
-        return {this, [self = shared_from_this(), bytes](const void*) {
-                    self->used_ -= bytes;
-                    self->onRoom_();
-                }};
-    }
-
-private:
-    const std::size_t size_;
-    const std::function<void()> onRoom_;
-    std::atomic<std::size_t> used_ = 0;
-};
 
 // The requests on one channel that came in pieces.
 class LongMessages::WholeRequests final : public MessageSource {
@@ -132,11 +115,12 @@ LongMessages::LongMessages(const LongMessageOptions& options, Send send)
     : options_(options),
       worker_(makeWorkerName()),
       send_(std::move(send)),
+      incomingMemory_(options.maxIncomingBytes),
+      outgoingMemory_(options.maxOutgoingBytes),
       incoming_(worker_, {.longestRequest = std::min(options.maxMessage, options.maxIncomingBytes)},
-                [share = std::make_shared<Share>(options.maxIncomingBytes, [this] { onRoom(); })](
-                    std::size_t bytes) { return share->reserve(bytes); }),
-      outgoing_(worker_, [share = std::make_shared<Share>(options.maxOutgoingBytes, [] {})](
-                             std::size_t bytes) { return share->reserve(bytes); }) {}
+                reserveFrom(incomingMemory_)),
+      outgoing_(worker_, reserveFrom(outgoingMemory_)),
+      roomWatch_(incomingMemory_.onRoom([this] { onRoom(); })) {}
 
 LongMessages::~LongMessages() {
     close();

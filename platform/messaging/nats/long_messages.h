@@ -20,6 +20,7 @@
 #include "platform/data_buffer.h"
 #include "platform/messaging/channels.h"
 #include "platform/messaging/delivery_threads.h"
+#include "platform/messaging/memory_budget.h"
 #include "platform/messaging/nats/incoming_transfers.h"
 #include "platform/messaging/nats/nats_bus.h"
 #include "platform/messaging/nats/nats_source.h"
@@ -80,7 +81,6 @@ public:
     void close();
 
 private:
-    class Share;
     class WholeRequests;
 
     LongMessages(const LongMessageOptions& options, Send send);
@@ -94,6 +94,8 @@ private:
     const LongMessageOptions options_;
     const std::string worker_;
     const Send send_;
+    MemoryBudget incomingMemory_;
+    MemoryBudget outgoingMemory_;
     std::atomic<bool> hasRoom_ = false;  // memory has become free since the timer last looked
 
     std::mutex mutex_;                    // guards what follows
@@ -108,6 +110,7 @@ private:
     bool closed_ = false;
 
     std::thread timer_;
+    const std::shared_ptr<Subscription> roomWatch_;
 };
 
 }  // namespace platform::messaging::nats

@@ -175,6 +175,30 @@ TEST_F(IncomingTransfersTest, AdmitsWhatFitsWhileALargerOneWaits) {
                 ElementsAre("/answers/ben.1: room w1 4194304"));
 }
 
+TEST_F(IncomingTransfersTest, LetsNobodyOvertakeAnOfferForEver) {
+    offer("ada.1", 40 * pieceSize);
+    offer("eve.1", 64 * pieceSize);
+    now += longestOvertaking - seconds(1);
+    EXPECT_THAT(said(offer("ben.1", 10 * pieceSize)),
+                ElementsAre("/answers/ben.1: room w1 4194304"));
+    now += seconds(1);
+    EXPECT_THAT(said(offer("cem.1", 10 * pieceSize)), ElementsAre("/answers/cem.1: room w1 0"));
+    EXPECT_THAT(transfers.stop("ben.1", now), IsEmpty());
+    EXPECT_THAT(said(transfers.stop("ada.1", now)), ElementsAre("/answers/eve.1: room w1 4194304"));
+    EXPECT_THAT(said(transfers.stop("eve.1", now)), ElementsAre("/answers/cem.1: room w1 4194304"));
+}
+
+TEST_F(IncomingTransfersTest, LetsNobodyShutOthersOutWithManyOffers) {
+    for (const char* id : {"eve.1", "eve.2", "eve.3", "eve.4"}) {
+        offer(id, 64 * pieceSize);
+    }
+    now += seconds(3);
+    offer("ben.1", 64 * pieceSize);
+    now += longestOvertaking;
+    EXPECT_THAT(said(transfers.stop("eve.1", now)), ElementsAre("/answers/eve.2: room w1 4194304"));
+    EXPECT_THAT(said(transfers.stop("eve.2", now)), ElementsAre("/answers/ben.1: room w1 4194304"));
+}
+
 TEST_F(IncomingTransfersTest, BoundsTheOffersOfAUserAndOfAll) {
     for (const char* id : {"eve.1", "eve.2", "eve.3", "eve.4"}) {
         offer(id, 64 * pieceSize);
