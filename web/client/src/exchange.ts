@@ -12,6 +12,7 @@ const HEADER = "Zpr-Pieces";
 const PIECE = 2 ** 20;
 const WINDOW = 4 * PIECE;
 const STANDSTILL = 40_000; // ms; longer than a worker gives up after
+const PROBE = 5_000; // ms
 
 /** Nothing is known to have come of a request: it may be made again, with a new id. */
 export class AskAgain extends Error {}
@@ -37,9 +38,30 @@ export function exchange(nats: NatsConnection, about: Exchange): Promise<Uint8Ar
   return new Promise((resolve, reject) => new Transfer(nats, about, resolve, reject));
 }
 
+// What is under way on a connection, and ends when that is lost: what was on its way is lost with it.
+const underWay = new WeakMap<NatsConnection, Set<Transfer>>();
+
+function transfersOf(nats: NatsConnection): Set<Transfer> {
+  const known = underWay.get(nats);
+  if (known) {
+    return known;
+  }
+  const transfers = new Set<Transfer>();
+  underWay.set(nats, transfers);
+  (async () => {
+    for await (const { type } of nats.status()) {
+      if (type === "disconnect") {
+        [...transfers].forEach((transfer) => transfer.lose());
+      }
+    }
+  })();
+  return transfers;
+}
+
 class Transfer {
   #subscription: Subscription;
   #timer: ReturnType<typeof setTimeout> | undefined;
+  #probe: ReturnType<typeof setInterval> | undefined;
   #worker: string | null = null;
   #sent = 0;
   #answer: Uint8Array | null = null;
@@ -55,6 +77,8 @@ class Transfer {
     this.#subscription = nats.subscribe(about.responseChannel, {
       callback: (error, message) => this.#guarded(() => this.#hear(error, message)),
     });
+    transfersOf(nats).add(this);
+    this.#probe = setInterval(() => this.#guarded(() => this.#seekWorker()), PROBE);
     this.#guarded(() => {
       about.signal?.throwIfAborted();
       about.signal?.addEventListener("abort", this.#abort);
@@ -65,6 +89,17 @@ class Transfer {
         this.#tell(`${about.requestChannel}/offer`, `offer ${about.payload.length}`);
       }
     });
+  }
+
+  lose() {
+    this.#end(() => this.reject(new AskAgain("the connection is lost")), true);
+  }
+
+  // Changes nothing where the worker is; where it has died, the server says that nobody listens.
+  #seekWorker() {
+    if (this.#worker !== null) {
+      this.#tell(this.#channelOf(this.#worker), `room ${this.#room}`);
+    }
   }
 
   #abort = () => this.#end(() => this.reject(this.about.signal?.reason), true);
@@ -173,6 +208,8 @@ class Transfer {
 
   #end(settle: () => void, tellWorker = false) {
     clearTimeout(this.#timer);
+    clearInterval(this.#probe);
+    transfersOf(this.nats).delete(this);
     this.about.signal?.removeEventListener("abort", this.#abort);
     if (!this.nats.isClosed()) {
       this.#subscription.unsubscribe();

@@ -171,6 +171,15 @@ export class Client {
     return { isSaved, ...(isSaved && version !== undefined && { version }) };
   }
 
+  /**
+   * Writes a package that is the bytes of its JSON, with types that are storable: also where it is too long
+   * for a string. Does not wait for other writes.
+   */
+  async writeBytes(filePath: string, content: Uint8Array, options: RequestOptions = {}): Promise<boolean> {
+    const request = { contentType: "text/xml", filePath: utf8(filePath) };
+    return JSON.parse(stringOf(await this.#ask(WRITE, request, options, undefined, content)));
+  }
+
   /** The folders whose documents can be read and written. Rejects, as all that follow, with FilesError. */
   async roots(options: RequestOptions = {}): Promise<string[]> {
     return (await this.#askFiles<{ roots: string[] }>("roots", {}, options)).roots;
@@ -283,16 +292,19 @@ export class Client {
   }
 
   // Asks until an answer comes, with a new id each time, so that a late one is not taken for
-  // another's. `hear` gets what the file service says about the request before its answer.
+  // another's. `hear` gets what the file service says about the request before its answer. The JSON `content`
+  // becomes a member of the request.
   async #ask(
     [requestChannel, responsePrefix]: readonly [string, string],
     request: object,
     { timeout = 60_000, tries = 5, signal, onProgress, onAskAgain }: RequestOptions,
     hear?: (word: Uint8Array) => void,
+    content?: Uint8Array,
   ): Promise<Uint8Array> {
     for (let left = tries; ; --left) {
       const rtcId = `${this.#idPrefix}-${++this.#requests}`;
-      const payload = bytesOf(JSON.stringify({ rtcId, ...request }));
+      const message = JSON.stringify({ rtcId, ...request });
+      const payload = content ? withContent(message, content) : bytesOf(message);
       const responseChannel = responsePrefix + rtcId;
       const words = hear && this.nats.subscribe(FILES[1] + rtcId, { callback: (error, message) => void (error ?? hear(message.data)) });
       try {
@@ -315,6 +327,16 @@ export class Client {
       await new Promise((resume) => setTimeout(resume, (tries - left + 1) * (100 + 400 * Math.random())));
     }
   }
+}
+
+// The bytes of `message`, an object that is not empty, with `content` as a member.
+function withContent(message: string, content: Uint8Array): Uint8Array {
+  const head = bytesOf(`${message.slice(0, -1)},"content":`);
+  const payload = new Uint8Array(head.length + content.length + 1);
+  payload.set(head);
+  payload.set(content, head.length);
+  payload.set(bytesOf("}"), head.length + content.length);
+  return payload;
 }
 
 // The package, with the types of those parts in another case that would otherwise be refused as
