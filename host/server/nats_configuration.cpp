@@ -16,9 +16,10 @@ namespace host {
 
 namespace {
 
-// In megabytes, as the server takes them. A message is one document. What waits for one client may
-// be several, but not more than the machine can bear from a client that does not read.
-constexpr const char* largestMessage = "64MB";
+// In megabytes, as the server takes them. Longer messages travel in pieces. What waits for one
+// client may be several of the longest, but not more than the machine can bear from a client that
+// does not read.
+constexpr const char* largestMessage = "8MB";
 constexpr const char* mostPending = "256MB";
 
 // A string of the configuration language.

@@ -22,7 +22,7 @@ OFFERS = tuple(f"/zpr/service/{requests}/offer"
                for requests in ("readRequest_cpp", "writeRequest_cpp", "filesRequest_host"))
 PIECE = "/zpr/service/piece."
 NOTIFICATIONS = "/zpr/service/notifyFileSystemRequest"
-LARGEST = 64 * 1024 * 1024
+LARGEST = 8 * 1024 * 1024
 
 
 class WithServer(unittest.TestCase):
@@ -135,7 +135,7 @@ class Permissions:
         self.assertEqual(len(one.messages) + len(other.messages), 100)
         self.assertTrue(one.messages and other.messages)
 
-    def test_a_message_of_64_mb_passes(self):
+    def test_a_message_of_8_mb_passes(self):
         worker, ada = self.connect("worker"), self.connect("ada")
         self.assertEqual(ada.info["max_payload"], LARGEST)
         self.assertEqual(worker.subscribe(WRITE_REQUESTS), [])

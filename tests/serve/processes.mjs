@@ -13,6 +13,9 @@ export const HOST = process.env.SERIALIZATION_HOST;
 // Under the sanitizers, programs are many times slower and get less to do.
 export const IS_SANITIZED = Boolean(process.env.IS_SANITIZED);
 
+// Whether there is time for what takes more than some seconds: at night.
+export const IS_LONG = process.env.EDITOR_SERIALIZATION_LONG_TESTS === "1";
+
 export const ROOT = new URL("../../", import.meta.url).pathname;
 
 // A new folder, which is removed when the test is over.

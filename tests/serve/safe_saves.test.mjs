@@ -29,7 +29,7 @@ async function setUp(t) {
     configuration,
     `listen: "127.0.0.1:-1"
      websocket: { listen: "127.0.0.1:-1", no_tls: true }
-     max_payload: 64MB
+     max_payload: 8MB
      ports_file_dir: "${folder}"`,
   );
   const path = `${process.env.PATH}:/usr/sbin`;
