@@ -15,14 +15,15 @@ struct WriteRequest {
     std::string rtcId;
     std::string filePath;
     bool isPackage = false;
-    std::string text;         // a text's bytes, in the charset `encoding`
+    std::string_view text;    // a text as it stands in the request: JSON, of the charset `encoding`
     std::string encoding;     // of a text
     json::Value baseVersion;  // Undefined where there is none
 };
 
 /// The request that `payload` holds, or nothing where it is none that the bundle would answer: it
 /// is no object, or lacks a member or has one of another kind. The content of a package is passed
-/// over without a look at what is between its brackets. Linear in the size of `payload`.
+/// over without a look at what is between its brackets. The result lasts no longer than `payload`.
+/// Linear in the size of `payload`.
 std::optional<WriteRequest> readWriteRequest(std::string_view payload);
 
 /// `payload`, which is an object with members, with a member "filePath" put in front of the others.

@@ -103,7 +103,7 @@ std::string Serialization::encodePartContent(std::vector<std::uint8_t> bytes,
         return std::string(text);
     }
     DataBuffer image = DataBuffer::copyOf(text);
-    bytes = {};
+    std::vector<std::uint8_t>().swap(bytes);  // an assignment of {} would keep the memory
     const DataBuffer encoded = platform::base64encode(std::exchange(image, {}));
     dataUri.reserve(dataUri.size() + encoded.length());
     dataUri += encoded.view();

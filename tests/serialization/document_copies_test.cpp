@@ -215,6 +215,26 @@ TEST_F(DocumentCopies, OfAPackageThatIsWritten) {
     EXPECT_LE(static_cast<double>(allocations.peak) / static_cast<double>(request.size()), 2.25);
 }
 
+// The request, its text, and the bytes that the text is decoded to; the image's base64 and that as
+// a data URI, or the answer's text and the message.
+TEST_F(DocumentCopies, OfAPackageOfOneImage) {
+    const std::string content = "data:image/png;base64," + std::string(16 * kMegabyte, 'A');
+    const std::string request = json::serialize(json::Value(json::Object{
+        {"rtcId", "1"},
+        {"contentType", "text/xml"},
+        {"filePath", packagePath()},
+        {"content",
+         json::Object{{"parts", json::Array{json::Object{{"partUri", "/image.png"},
+                                                         {"contentType", "image/png"},
+                                                         {"content", content},
+                                                         {"relationship", json::Null()}}}},
+                      {"relationships", json::Array()}}}}));
+    const Allocations allocations = write(request);
+    EXPECT_EQ(answer, "true");
+    EXPECT_LE(static_cast<double>(allocations.peak) / static_cast<double>(request.size()), 2.8);
+    EXPECT_LE(timesTheAnswer(read("text/xml", packagePath())), 2.05);
+}
+
 // Of each part its bytes and its content; of an image also a buffer, its base64 and that as a data
 // URI; the answer's text and the message.
 TEST_F(DocumentCopies, OfAPackageThatIsRead) {
