@@ -33,6 +33,7 @@
 #include "platform/i18n/detect_charset.h"
 #include "platform/messaging/channels.h"
 #include "platform/posix/file_descriptor.h"
+#include "platform/posix/open_regular_file.h"
 
 namespace host {
 
@@ -47,7 +48,7 @@ constexpr std::size_t entriesOfAPage = 1000;
 
 // The regular file at `path`; none where there is nothing.
 FileDescriptor openDocument(const std::string& path) {
-    FileDescriptor file(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+    FileDescriptor file = platform::openWithoutHanging(path, O_RDONLY);
     struct stat status {};
     if (!file && errno == ENOENT) {
         return file;

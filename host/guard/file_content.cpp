@@ -17,7 +17,7 @@ namespace host {
 
 namespace {
 
-constexpr std::size_t blockSize = std::size_t{256} * 1024;
+constexpr std::size_t blockSize = std::size_t{64} * 1024;
 
 // Reads up to `size` bytes; fewer at the end of the file only, and less than none when it
 // cannot be read.

@@ -104,13 +104,20 @@ void removeIfAbandoned(const fs::path& path) {
 
 // Copies `from` to a new file at `path`, without its bytes being copied where the file system can
 // share them.
-void copyTo(const fs::path& path, int from) {
-    const FileDescriptor to(::open(path.c_str(), O_RDWR | O_CREAT | O_TRUNC | O_CLOEXEC, 0600));
+FileDescriptor copyTo(const fs::path& path, int from) {
+    FileDescriptor to(::open(path.c_str(), O_RDWR | O_CREAT | O_TRUNC | O_CLOEXEC, 0600));
     if (!to) {
         throw std::system_error(errno, std::generic_category(), path.string());
     }
     if (::ioctl(to.get(), FICLONE, from) != 0) {
         copyContent(from, to.get());
+    }
+    return to;
+}
+
+void syncToDisk(const FileDescriptor& file, const fs::path& path) {
+    if (!file || ::fsync(file.get()) != 0) {
+        throw std::system_error(errno, std::generic_category(), path.string());
     }
 }
 
@@ -186,13 +193,12 @@ void History::keep(FileDescriptor old, std::string document) {
         }
     }
     post([this, old = std::make_shared<FileDescriptor>(std::move(old)),
-          document = std::move(document)] {
-        try {
-            copy(*old, document);
-        } catch (const std::exception& error) {
-            spdlog::warn("{}: no earlier version is kept: {}", document, error.what());
-        }
-    });
+          document = std::move(document)] { copy(*old, document, Sync::no); });
+}
+
+void History::keepNow(const FileDescriptor& old, const std::string& document) {
+    post([&] { copy(old, document, Sync::yes); });
+    waitUntilIdle();
 }
 
 std::vector<EarlierVersion> History::versionsOf(const std::string& document) {
@@ -278,7 +284,15 @@ std::vector<History::File> History::filesOf(const std::string& document) const {
     return files;
 }
 
-void History::copy(const FileDescriptor& old, const std::string& document) {
+void History::copy(const FileDescriptor& old, const std::string& document, Sync sync) noexcept {
+    try {
+        makeCopy(old, document, sync);
+    } catch (const std::exception& error) {
+        spdlog::warn("{}: no earlier version is kept: {}", document, error.what());
+    }
+}
+
+void History::makeCopy(const FileDescriptor& old, const std::string& document, Sync sync) {
     const fs::path root = rootOf(document);
     const std::string digest = digestOf(document);
     const fs::path folder = options_.folder / digestOf(root.string()) / digest.substr(0, 2);
@@ -286,7 +300,10 @@ void History::copy(const FileDescriptor& old, const std::string& document) {
     const fs::path unfinished =
         folder / (unfinishedName + std::to_string(::getpid()) + "." + std::to_string(now()));
     try {
-        copyTo(unfinished, old.get());
+        const FileDescriptor made = copyTo(unfinished, old.get());
+        if (sync == Sync::yes) {
+            syncToDisk(made, unfinished);
+        }
         EarlierVersion version{now(), fs::file_size(unfinished)};
         // Two within a millisecond get times of their own.
         const std::vector<File> others = filesOf(document);
@@ -294,6 +311,10 @@ void History::copy(const FileDescriptor& old, const std::string& document) {
             version.time = std::max(version.time, others.front().version.time + 1);
         }
         fs::rename(unfinished, folder / fileName(digest, version));
+        if (sync == Sync::yes) {
+            syncToDisk(FileDescriptor(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)),
+                       folder);
+        }
         removeSurplus(document);
         keepToShare(root, version.size);
     } catch (...) {

@@ -72,6 +72,9 @@ public:
     /// versions are left out.
     void keep(platform::FileDescriptor old, std::string document);
 
+    /// The same, but returns when the copy is made and safe on disk, or has failed.
+    void keepNow(const platform::FileDescriptor& old, const std::string& document);
+
     /// The versions of `document`, the newest first. Throws std::runtime_error where it is below no
     /// root.
     std::vector<EarlierVersion> versionsOf(const std::string& document);
@@ -95,7 +98,10 @@ private:
     std::filesystem::path rootOf(const std::string& document) const;
     std::vector<std::filesystem::path> foldersOf(const std::string& document) const;
     std::vector<File> filesOf(const std::string& document) const;
-    void copy(const platform::FileDescriptor& old, const std::string& document);
+    enum class Sync { no, yes };
+
+    void copy(const platform::FileDescriptor& old, const std::string& document, Sync sync) noexcept;
+    void makeCopy(const platform::FileDescriptor& old, const std::string& document, Sync sync);
     void removeSurplus(const std::string& document);
     void keepToShare(const std::filesystem::path& root, std::uint64_t added);
     std::uint64_t removeOldest(const std::filesystem::path& root, std::uint64_t most) const;

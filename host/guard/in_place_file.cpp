@@ -11,6 +11,7 @@
 #include <system_error>
 
 #include "host/guard/file_content.h"
+#include "platform/posix/open_regular_file.h"
 
 namespace host {
 
@@ -20,10 +21,29 @@ namespace {
     throw std::system_error(errno, std::generic_category(), what);
 }
 
+off_t sizeOf(int file) {
+    struct stat status {};
+    if (::fstat(file, &status) != 0) {
+        failForSystem("cannot be examined");
+    }
+    return status.st_size;
+}
+
+// Has the disk set aside room for `size` bytes of `file`, where it can do that.
+void reserveRoom(int file, off_t size) {
+    int result = -1;
+    do {
+        result = size == 0 ? 0 : ::fallocate(file, FALLOC_FL_KEEP_SIZE, 0, size);
+    } while (result != 0 && errno == EINTR);
+    if (result != 0 && errno != EOPNOTSUPP && errno != ENOSYS) {
+        failForSystem("cannot be written");
+    }
+}
+
 }  // namespace
 
 InPlaceFile::InPlaceFile(const std::string& path)
-    : file_(::open(path.c_str(), O_RDWR | O_NONBLOCK | O_NOCTTY | O_CLOEXEC)) {
+    : file_(platform::openWithoutHanging(path, O_RDWR)) {
     struct stat status {};
     if (!file_ || ::fstat(file_.get(), &status) != 0) {
         failForSystem("cannot be opened");
@@ -38,35 +58,25 @@ InPlaceFile::InPlaceFile(const std::string& path)
     copyContent(file_.get(), copy_.get());
 }
 
-std::string InPlaceFile::path() const {
-    return "/proc/self/fd/" + std::to_string(file_.get());
-}
-
-void InPlaceFile::sync() const {
-    if (::fsync(file_.get()) != 0) {
-        failForSystem("cannot be saved");
-    }
-}
-
 void InPlaceFile::replaceContent(int from) const {
     try {
         writeContentOf(from);
-    } catch (const std::system_error&) {
-        putBack();
+    } catch (...) {
+        writeContentOf(copy_.get());
         throw;
     }
 }
 
-void InPlaceFile::putBack() const {
-    writeContentOf(copy_.get());
-}
-
 void InPlaceFile::writeContentOf(int from) const {
-    if (::ftruncate(file_.get(), 0) != 0) {
+    const off_t size = sizeOf(from);
+    reserveRoom(file_.get(), size);
+    copyContent(from, file_.get());
+    if (::ftruncate(file_.get(), size) != 0) {
         failForSystem("cannot be written");
     }
-    copyContent(from, file_.get());
-    sync();
+    if (::fsync(file_.get()) != 0) {
+        failForSystem("cannot be saved");
+    }
 }
 
 }  // namespace host

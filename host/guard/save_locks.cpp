@@ -16,7 +16,8 @@ namespace host {
 
 namespace {
 
-constexpr std::chrono::seconds longestWait{30};
+// Longer than a save waits for a lease of its file.
+constexpr std::chrono::seconds longestWait{90};
 constexpr std::chrono::milliseconds pause{2};
 
 int setLock(int file, short type, std::size_t number) {

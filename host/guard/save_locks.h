@@ -41,7 +41,7 @@ public:
     };
 
     /// Waits for the lock of the document at `path`. Throws std::runtime_error when another process
-    /// has held it for half a minute.
+    /// has held it for a minute and a half.
     Held hold(const std::string& path);
 
 private:

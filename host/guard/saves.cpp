@@ -3,7 +3,8 @@
 
 #include <fcntl.h>
 #include <spdlog/spdlog.h>
-#include <sys/stat.h>
+#include <sys/mman.h>
+#include <unistd.h>
 
 #include <cerrno>
 #include <optional>
@@ -17,6 +18,7 @@
 #include "json/parser.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/posix/atomic_file.h"
+#include "platform/posix/open_regular_file.h"
 
 namespace host {
 
@@ -43,12 +45,36 @@ bool isNowhere(const std::error_code& error) {
 
 // The regular file at `path`, opened to read; none where there is no such thing.
 FileDescriptor openRegular(const std::string& path) {
-    FileDescriptor file(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
-    struct stat status {};
-    if (!file || ::fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode)) {
-        return {};
+    return platform::openRegularFile(path).descriptor;
+}
+
+// A new file in memory.
+FileDescriptor makeFileInMemory() {
+    FileDescriptor file(::memfd_create("new content", MFD_CLOEXEC));
+    if (!file) {
+        throw std::system_error(errno, std::generic_category(), "cannot be kept in memory");
     }
     return file;
+}
+
+void sync(int file) {
+    // Some file systems cannot sync folders, and say so.
+    if (::fsync(file) != 0 && errno != EINVAL) {
+        throw std::system_error(errno, std::generic_category(), "may not be safe on disk");
+    }
+}
+
+// Makes the document `file` and its name in its folder safe on disk. A folder that may not be
+// listed cannot be synced.
+void syncWithFolder(int file, const std::filesystem::path& document) {
+    sync(file);
+    const FileDescriptor folder(
+        ::open(document.parent_path().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (folder) {
+        sync(folder.get());
+    } else if (errno != EACCES) {
+        throw std::system_error(errno, std::generic_category(), "may not be safe on disk");
+    }
 }
 
 // Whether the file holds the text that `request` asks for. The text is nearly always stored as it
@@ -134,13 +160,14 @@ private:
         if (!askBundle_(file.contentPath()).isWritten) {
             throw std::runtime_error("the text is not valid in the charset");
         }
+        file.startSync();
         if (!holdsTextOf(request_, file.content())) {
             throw std::runtime_error("not all of the text could be written");
         }
         const SaveLocks::Held lock = locks_.hold(document_);
         FileDescriptor old = file.openTarget();
         if (!isBasedOn(old, file.hasTarget())) {
-            return isRepetition(old && haveSameContent(old.get(), file.content()));
+            return isRepetition(old.get(), old && haveSameContent(old.get(), file.content()));
         }
         file.commit();
         keep(std::move(old));
@@ -161,20 +188,20 @@ private:
         return saveTextOver(*opened);
     }
 
-    bool saveTextOver(InPlaceFile& file) {
-        if (!isBasedOn(openRegular(file.path()), true)) {
-            return isRepetition(holdsTextOf(request_, file.descriptor()));
+    bool saveTextOver(const InPlaceFile& file) {
+        if (!isBasedOn(file.copy(), true)) {
+            return isRepetition(file.descriptor(), holdsTextOf(request_, file.copy().get()));
         }
-        try {
-            if (!askBundle_(file.path()).isWritten || !holdsTextOf(request_, file.descriptor())) {
-                throw std::runtime_error("the text is not valid in the charset, or the disk full");
-            }
-            file.sync();
-        } catch (...) {
-            file.putBack();
-            throw;
+        const FileDescriptor text = makeFileInMemory();
+        const std::string path = "/proc/self/fd/" + std::to_string(text.get());
+        if (!askBundle_(path).isWritten || !holdsTextOf(request_, text.get())) {
+            throw std::runtime_error("the text is not valid in the charset");
         }
-        keep(file.releaseCopy());
+        // Who ends this process while it writes leaves a mixture, so the old text is kept before.
+        if (history_ != nullptr) {
+            history_->keepNow(file.copy(), document_);
+        }
+        file.replaceContent(text.get());
         return true;
     }
 
@@ -193,7 +220,7 @@ private:
         const SaveLocks::Held lock = locks_.hold(document_);
         FileDescriptor old = openRegular(request_.filePath);
         if (!isBasedOn(old, existed_)) {
-            return isRepetition(old && packageComesOutAs(old));
+            return isRepetition(old.get(), old && packageComesOutAs(old));
         }
         const BundleAnswer answer = askBundle_({});
         existed_ = answer.existed;
@@ -229,9 +256,12 @@ private:
         return expected == (current ? versionOf(current.get()) : std::string());
     }
 
-    // A client that had no answer asks again, and shall not take its own save for another's.
-    bool isRepetition(bool isSame) const {
-        if (!isSame) {
+    // A client that had no answer asks again, and shall not take its own save for another's. That
+    // save may have failed at its last step, which was to sync.
+    bool isRepetition(int current, bool isSame) const {
+        if (isSame) {
+            syncWithFolder(current, document_);
+        } else {
             spdlog::warn("{}: not saved, since it has changed meanwhile", request_.filePath);
         }
         return isSame;
@@ -265,7 +295,6 @@ SaveResult Saves::save(const WriteRequest& request, const AskBundle& askBundle) 
 void Saves::restore(const std::string& path, int version) {
     const std::string document = History::nameOf(path);
     const SaveLocks::Held lock = locks_.hold(document);
-    FileDescriptor old = openRegular(path);
     std::optional<AtomicFile> file;
     try {
         file.emplace(path);
@@ -275,16 +304,19 @@ void Saves::restore(const std::string& path, int version) {
         }
     }
     if (file && file->canStandForTarget()) {
+        FileDescriptor old = file->openTarget();
         copyContent(version, file->content());
         file->commit();
-    } else {
-        InPlaceFile inPlace(path);
-        inPlace.replaceContent(version);
-        old = inPlace.releaseCopy();
+        if (history_ && old) {
+            history_->keep(std::move(old), document);
+        }
+        return;
     }
-    if (history_ && old) {
-        history_->keep(std::move(old), document);
+    const InPlaceFile inPlace(path);
+    if (history_) {
+        history_->keepNow(inPlace.copy(), document);
     }
+    inPlace.replaceContent(version);
 }
 
 }  // namespace host

@@ -19,6 +19,8 @@
 #include <utility>
 #include <vector>
 
+#include "platform/posix/open_regular_file.h"
+
 namespace platform {
 namespace {
 
@@ -221,10 +223,8 @@ bool AtomicFile::canStandForTarget() const {
 }
 
 FileDescriptor AtomicFile::openTarget() const {
-    FileDescriptor file(uninterrupted([&] {
-        return ::openat(folder_.get(), targetName_.c_str(),
-                        O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC);
-    }));
+    FileDescriptor file =
+        openWithoutHanging(pathTo(folder_) + "/" + targetName_, O_RDONLY | O_NOFOLLOW);
     struct stat status {};
     if (!file || ::fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode)) {
         return {};
@@ -238,6 +238,10 @@ std::string AtomicFile::contentPath() const {
 
 std::string AtomicFile::temporaryPath() const {
     return pathTo(folder_) + "/" + temporaryName_;
+}
+
+void AtomicFile::startSync() const noexcept {
+    ::sync_file_range(temporary_.get(), 0, 0, SYNC_FILE_RANGE_WRITE);  // all is as well without it
 }
 
 void AtomicFile::write(std::string_view bytes) {

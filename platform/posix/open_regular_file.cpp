@@ -22,7 +22,7 @@ constexpr std::chrono::milliseconds longestWait(50);
 FileDescriptor openWhenLeaseIsGone(const std::string& path, int flags,
                                    std::chrono::milliseconds patience) {
     const auto end = std::chrono::steady_clock::now() + patience;
-    const FileDescriptor held(::open(path.c_str(), O_PATH | O_CLOEXEC));
+    const FileDescriptor held(::open(path.c_str(), O_PATH | O_CLOEXEC | (flags & O_NOFOLLOW)));
     struct stat status {};
     if (!held || ::fstat(held.get(), &status) != 0) {
         return {};
@@ -33,7 +33,7 @@ FileDescriptor openWhenLeaseIsGone(const std::string& path, int flags,
     }
     const std::string name = "/proc/self/fd/" + std::to_string(held.get());
     for (auto wait = shortestWait;; wait = std::min(2 * wait, longestWait)) {
-        FileDescriptor file(::open(name.c_str(), flags));
+        FileDescriptor file(::open(name.c_str(), flags & ~O_NOFOLLOW));
         if (file || errno != EWOULDBLOCK || std::chrono::steady_clock::now() >= end) {
             return file;
         }

@@ -241,13 +241,16 @@ TEST_F(FileServiceTest, ShowsAndChangesNothingOutsideItsRoot) {
     if (host::whyConfinementIsUnavailable()) {
         GTEST_SKIP() << "this kernel cannot confine threads";
     }
+    double time = 0;
     {
         host::GuardOptions options;
         options.folder = state_;
         const host::Guard other = host::makeGuard(options, {outside_});
+        const std::string document = host::History::nameOf(outside_ / "secret.txt");
         other.history->keep(
             platform::FileDescriptor(::open((outside_ / "secret.txt").c_str(), O_RDONLY)),
-            host::History::nameOf(outside_ / "secret.txt"));
+            document);
+        time = static_cast<double>(other.history->versionsOf(document).at(0).time);
     }
     fs::create_directory_symlink(outside_, root_ / "link");
     for (const fs::path& folder : {outside_, root_ / "link", root_ / "../outside"}) {
@@ -255,6 +258,10 @@ TEST_F(FileServiceTest, ShowsAndChangesNothingOutsideItsRoot) {
         EXPECT_EQ(ask("version", folder / "secret.txt")["status"], json::Value(false));
         EXPECT_EQ(ask("charset", folder / "secret.txt")["status"], json::Value(false));
         EXPECT_EQ(ask("versions", folder / "secret.txt")["status"], json::Value(false));
+        const json::Object version{{"time", time}, {"contentType", "text/plain"}};
+        EXPECT_EQ(ask("readVersion", folder / "secret.txt", version)["status"], json::Value(false));
+        EXPECT_EQ(ask("restore", folder / "secret.txt", version)["status"], json::Value(false));
+        EXPECT_EQ(ask("restore", root_ / "secret.txt", version)["status"], json::Value(false));
         EXPECT_EQ(write(folder / "secret.txt", "x"), "false");
         EXPECT_EQ(write(folder / "new.txt", "x"), "false");
     }

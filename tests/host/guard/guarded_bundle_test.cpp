@@ -24,6 +24,7 @@
 #include "json/serialize.h"
 #include "json/value.h"
 #include "platform/posix/file_descriptor.h"
+#include "tests/support/lease_holder.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
@@ -158,6 +159,36 @@ TEST_F(GuardedBundle, WritesInPlaceWhereAFileHasOtherNames) {
     EXPECT_EQ(readFile(at("b.txt")), "new");
     history_->waitUntilIdle();
     EXPECT_EQ(history_->versionsOf(host::History::nameOf(at("a.txt"))).size(), 1U);
+}
+
+TEST_F(GuardedBundle, KeepsTheOldTextAsAVersionBeforeItWritesInPlace) {
+    writeFile(at("a.txt"), "old");
+    fs::create_hard_link(at("a.txt"), at("b.txt"));
+    EXPECT_EQ(write(at("a.txt"), "new").back(), "true");
+    const std::string document = host::History::nameOf(at("a.txt"));
+    const auto versions = history_->versionsOf(document);  // without waiting for copies
+    ASSERT_EQ(versions.size(), 1U);
+    const FileDescriptor kept = history_->open(document, versions[0].time);
+    EXPECT_EQ(readFile("/proc/self/fd/" + std::to_string(kept.get())), "old");
+}
+
+TEST_F(GuardedBundle, WaitsForALeaseOfWhatItSaves) {
+    for (const bool hasTwoNames : {false, true}) {
+        for (const json::Object& more :
+             {json::Object{}, json::Object{{"baseVersion", host::digestOf("old")}}}) {
+            writeFile(at("a.txt"), "old");
+            if (hasTwoNames) {
+                fs::remove(at("b.txt"));
+                fs::create_hard_link(at("a.txt"), at("b.txt"));
+            }
+            const test::LeaseHolder holder(at("a.txt"), std::chrono::milliseconds(100));
+            if (!holder.hasLease()) {
+                GTEST_SKIP() << "this file system has no leases";
+            }
+            EXPECT_EQ(write(at("a.txt"), "new", more), outcome(at("a.txt"), true, true));
+            EXPECT_EQ(readFile(at("a.txt")), "new");
+        }
+    }
 }
 
 TEST_F(GuardedBundle, WritesInPlaceWhereAFileIsAMountPoint) {

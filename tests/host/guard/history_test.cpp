@@ -102,6 +102,23 @@ TEST_F(HistoryTest, TakesNoMoreThanItsShareOfTheDiskAndRemovesTheOldestFirst) {
     ::umount2(root_.path().c_str(), MNT_DETACH);
 }
 
+TEST_F(HistoryTest, LeavesTheVersionsOfOneRootWhateverIsKeptOfAnother) {
+    const TemporaryDirectory other;
+    if (::mount("tmpfs", root_.path().c_str(), "tmpfs", 0, "size=1000k,mode=700") != 0) {
+        GTEST_SKIP() << "this user may not mount a file system";
+    }
+    {
+        History history({scratch_ / "versions", {other.path(), root_.path()}});
+        history.keep(fileOf("old"), History::nameOf(other / "a.txt"));
+        for (int i = 0; i < 50; ++i) {
+            history.keep(fileOf(std::string(10'000, 'x')), document(std::to_string(i)));
+        }
+        EXPECT_EQ(history.versionsOf(History::nameOf(other / "a.txt")).size(), 1U);
+        EXPECT_TRUE(history.versionsOf(document("0")).empty());
+    }
+    ::umount2(root_.path().c_str(), MNT_DETACH);
+}
+
 TEST_F(HistoryTest, LeavesOutWhatIsTooOldOrWasNotCopiedWhole) {
     History history({scratch_ / "versions", {root_.path()}});
     history.keep(fileOf("whole"), document("a.txt"));

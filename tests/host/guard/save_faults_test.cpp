@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What is left of a text, and what is answered, when a guarded save fails at any of its system
+// What is left of a document, and what is answered, when a guarded save fails at any of its system
 // calls, is killed there, or finds the disk full.
 #include <fcntl.h>
 #include <gmock/gmock.h>
@@ -7,12 +7,15 @@
 #include <signal.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
+#include <sys/statvfs.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
+#include <cstdlib>
 #include <exception>
 #include <filesystem>
 #include <functional>
@@ -22,6 +25,7 @@
 #include <vector>
 
 #include "framework/bundle_runner.h"
+#include "host/guard/document_version.h"
 #include "host/guard/guarded_client.h"
 #include "host/guard/saves.h"
 #include "json/serialize.h"
@@ -70,6 +74,58 @@ public:
     std::string answer;
 };
 
+// A folder with a file system of its own, while this lives.
+class SmallDisk {
+public:
+    // `type` is one of mount(8); `source` and `options` are for it.
+    SmallDisk(const std::string& folder, const std::string& type, const std::string& source,
+              const std::string& options)
+        : folder_(folder) {
+        fs::create_directory(folder);
+        const std::string command =
+            "mount -t " + type + " -o " + options + " " + source + " " + folder + " 2>/dev/null";
+        isMounted_ = std::system(command.c_str()) == 0;
+    }
+    SmallDisk(const SmallDisk&) = delete;
+    SmallDisk& operator=(const SmallDisk&) = delete;
+    ~SmallDisk() {
+        if (isMounted_) {
+            ::umount2(folder_.c_str(), MNT_DETACH);
+        }
+    }
+
+    bool isMounted() const { return isMounted_; }
+
+    // Has a file of its own take what is free but for `room` bytes.
+    void leaveFree(std::uint64_t room) const {
+        const std::string filler = folder_ + "/filler";
+        fs::remove(filler);
+        const int file = ::open(filler.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600);
+        ::syncfs(file);  // what was written may have no blocks yet
+        struct statvfs status {};
+        EXPECT_EQ(::fstatvfs(file, &status), 0);
+        const std::uint64_t free = status.f_bavail * status.f_frsize;
+        // The filler may need blocks beside those of its content.
+        std::uint64_t size = free - std::min(free, room);
+        while (size != 0 && ::posix_fallocate(file, 0, static_cast<off_t>(size)) == ENOSPC) {
+            size -= std::min<std::uint64_t>(size, status.f_frsize);
+        }
+        ::close(file);
+    }
+
+private:
+    const std::string folder_;
+    bool isMounted_ = false;
+};
+
+json::Object packageOf(const std::string& content) {
+    return {{"parts", json::Array{json::Object{{"partUri", "/a"},
+                                               {"contentType", "text/plain"},
+                                               {"content", content},
+                                               {"relationship", json::Null()}}}},
+            {"relationships", json::Array{}}};
+}
+
 class GuardedSaveFaults : public testing::Test {
 protected:
     void SetUp() override {
@@ -91,12 +147,13 @@ protected:
 
     std::string at(const std::string& name) const { return folder_ / name; }
 
-    std::function<void()> saving(const std::string& path) {
-        json::Object request{{"rtcId", "1"},
-                             {"contentType", "text/plain"},
-                             {"filePath", path},
-                             {"content", new_},
-                             {"encoding", "UTF-8"}};
+    // A save of the new text, or with other members.
+    std::function<void()> saving(const std::string& path, json::Object request = {}) {
+        request.try_emplace("rtcId", "1");
+        request.try_emplace("contentType", "text/plain");
+        request.try_emplace("filePath", path);
+        request.try_emplace("content", new_);
+        request.try_emplace("encoding", "UTF-8");
         const auto payload =
             std::make_shared<const std::string>(json::serialize(json::Value(std::move(request))));
         return [this, payload] {
@@ -110,9 +167,15 @@ protected:
         };
     }
 
-    // `file` as it was or as it shall be, and no other file; and answered true only when it is new.
-    void expectOldOrNew(const std::string& file, const std::string& old) {
-        const std::string now = readFile(at(file));
+    std::function<void()> savingPackage(const std::string& content, json::Object request = {}) {
+        request["contentType"] = "text/xml";
+        request["content"] = packageOf(content);
+        return saving(at("a.txt"), std::move(request));
+    }
+
+    // The document is as it was or as it shall be; and answered true only when it is new.
+    void expectOldOrNew(const std::string& old) {
+        const std::string now = readFile(at("a.txt"));
         EXPECT_TRUE(now == old || now == new_) << now.size() << " bytes: " << now.substr(0, 20);
         if (service_->answer == "true") {
             EXPECT_EQ(now, new_);
@@ -130,10 +193,13 @@ protected:
         return names;
     }
 
-    // Makes a save fail at each of its calls, of a document that `place` puts there.
-    void failEachCall(const std::function<void()>& place, const std::vector<std::string>& files) {
+    // Makes `save`, of a document that `place` puts there, fail at each of its calls. No other
+    // files than `files` may be left.
+    void failEachCall(const std::function<void()>& place, const std::function<void()>& save,
+                      const std::vector<std::string>& files = {"a.txt"}) {
         place();
-        const std::vector<int> calls = test::callsOf(saving(at("a.txt")));
+        const std::string old = readFile(at("a.txt"));
+        const std::vector<int> calls = test::callsOf(save);
         ASSERT_EQ(service_->answer, "true");
         for (int failing = 0; failing < static_cast<int>(calls.size()); ++failing) {
             for (const int error : {ENOSPC, EIO, EACCES, EPERM, EINTR, ENOENT}) {
@@ -141,20 +207,62 @@ protected:
                              std::to_string(calls[static_cast<std::size_t>(failing)]) + ", errno " +
                              std::to_string(error));
                 place();
-                test::supervise(saving(at("a.txt")), [&](int call, int index) {
+                test::supervise(save, [&](int call, int index) {
                     // Without its clean-up any file may be left.
                     return index == failing && call != SYS_unlinkat ? error : 0;
                 });
-                expectOldOrNew("a.txt", "old");
+                expectOldOrNew(old);
                 EXPECT_EQ(names(), files);
             }
         }
         EXPECT_GT(refused_, 20);
     }
 
+    // Makes each of the syncs of `save`, a repetition of one that was done, fail alone.
+    void failEachSync(const std::function<void()>& save) {
+        for (int failing = 0;; ++failing) {
+            int syncs = 0;
+            test::supervise(save, [&](int call, int) {
+                return call == SYS_fsync && syncs++ == failing ? EIO : 0;
+            });
+            EXPECT_EQ(readFile(at("a.txt")), new_);
+            if (failing >= syncs) {
+                EXPECT_EQ(service_->answer, "true");
+                EXPECT_GE(syncs, 2);  // of the document and of its folder
+                return;
+            }
+            EXPECT_EQ(service_->answer, "false") << failing;
+        }
+    }
+
+    // Saves texts on `disk` with all amounts of room left, none to enough.
+    void saveAsTheDiskFills(const SmallDisk& disk, const std::string& folder) {
+        const std::string old(8'000, 'o');
+        for (const bool hasTwoNames : {false, true}) {
+            int saved = 0;
+            int refused = 0;
+            for (std::uint64_t kilobytes = 0; kilobytes <= 160; kilobytes += 4) {
+                fs::remove(folder + "/a.txt");
+                fs::remove(folder + "/b.txt");
+                fs::remove(folder + "/filler");
+                writeFile(folder + "/a.txt", old);
+                if (hasTwoNames) {
+                    fs::create_hard_link(folder + "/a.txt", folder + "/b.txt");
+                }
+                disk.leaveFree(kilobytes * 1024);
+                saving(folder + "/a.txt")();
+                const bool isSaved = service_->answer == "true";
+                EXPECT_TRUE(readFile(folder + "/a.txt") == (isSaved ? new_ : old)) << kilobytes;
+                ++(isSaved ? saved : refused);
+            }
+            EXPECT_GT(saved, 5);
+            EXPECT_GT(refused, 5);
+        }
+    }
+
     const test::TemporaryDirectory folder_;
     const test::TemporaryDirectory state_;
-    const std::string new_ = std::string(100'000, 'n');
+    std::string new_ = std::string(100'000, 'n');
     const std::shared_ptr<DirectService> service_ = std::make_shared<DirectService>();
     const std::shared_ptr<host::Saves> saves_ =
         std::make_shared<host::Saves>(state_ / "locks", nullptr);
@@ -163,7 +271,45 @@ protected:
 };
 
 TEST_F(GuardedSaveFaults, LeaveTheOldTextOrTheNewOneWhicheverCallFails) {
-    failEachCall([this] { writeFile(at("a.txt"), "old"); }, {"a.txt"});
+    failEachCall([this] { writeFile(at("a.txt"), "old"); }, saving(at("a.txt")));
+}
+
+TEST_F(GuardedSaveFaults, LeaveTheOldTextOrTheNewOneOfASaveThatNamesItsVersion) {
+    failEachCall([this] { writeFile(at("a.txt"), "old"); },
+                 saving(at("a.txt"), {{"baseVersion", host::digestOf("old")}}));
+}
+
+TEST_F(GuardedSaveFaults, LeaveTheOldPackageOrTheNewOneOfASaveThatNamesItsVersion) {
+    savingPackage("old")();
+    const std::string old = readFile(at("a.txt"));
+    savingPackage("new")();
+    new_ = readFile(at("a.txt"));
+    failEachCall([&] { writeFile(at("a.txt"), old); },
+                 savingPackage("new", {{"baseVersion", host::digestOf(old)}}));
+}
+
+TEST_F(GuardedSaveFaults, LeaveTheDocumentThatARepetitionFinds) {
+    const json::Object based{{"baseVersion", host::digestOf("old")}};
+    failEachCall([this] { writeFile(at("a.txt"), new_); }, saving(at("a.txt"), based));
+
+    savingPackage("new")();
+    new_ = readFile(at("a.txt"));
+    failEachCall([this] { writeFile(at("a.txt"), new_); }, savingPackage("new", based));
+}
+
+// The save that is repeated may have failed at its last step.
+TEST_F(GuardedSaveFaults, AnswerTrueToARepetitionOnlyWhenItIsSafeOnDisk) {
+    const json::Object based{{"baseVersion", host::digestOf("old")}};
+    writeFile(at("a.txt"), new_);
+    failEachSync(saving(at("a.txt"), based));
+
+    fs::create_hard_link(at("a.txt"), at("b.txt"));
+    failEachSync(saving(at("a.txt"), based));
+
+    fs::remove(at("a.txt"));
+    savingPackage("new")();
+    new_ = readFile(at("a.txt"));
+    failEachSync(savingPackage("new", based));
 }
 
 TEST_F(GuardedSaveFaults, LeaveTheOldTextOrTheNewOneOfAFileWithTwoNames) {
@@ -173,7 +319,7 @@ TEST_F(GuardedSaveFaults, LeaveTheOldTextOrTheNewOneOfAFileWithTwoNames) {
             writeFile(at("a.txt"), "old");
             fs::create_hard_link(at("a.txt"), at("b.txt"));
         },
-        {"a.txt", "b.txt"});
+        saving(at("a.txt")), {"a.txt", "b.txt"});
 }
 
 TEST_F(GuardedSaveFaults, LeaveTheOldTextOrTheNewOneWhenKilledAtAnyCall) {
@@ -201,34 +347,27 @@ TEST_F(GuardedSaveFaults, LeaveTheOldTextOrTheNewOneWhenKilledAtAnyCall) {
 }
 
 TEST_F(GuardedSaveFaults, LeaveTheOldTextOnADiskThatIsTooFullForTheNewOne) {
-    int saved = 0;
-    int refused = 0;
-    for (int kilobytes = 0; kilobytes <= 240; kilobytes += 8) {
-        const std::string disk = at("disk");
-        fs::create_directory(disk);
-        if (::mount("tmpfs", disk.c_str(), "tmpfs", 0, "size=256k,mode=700") != 0) {
-            GTEST_SKIP() << "this user may not mount a file system";
-        }
-        const std::string old(8'000, 'o');
-        writeFile(disk + "/a.txt", old);
-        writeFile(disk + "/filler", "");
-        EXPECT_EQ(::truncate((disk + "/filler").c_str(), 0), 0);
-        const int filler = ::open((disk + "/filler").c_str(), O_WRONLY);
-        EXPECT_EQ(::posix_fallocate(filler, 0, std::max(kilobytes, 1) * 1024), 0);
-        ::close(filler);
-        saving(disk + "/a.txt")();
-        const std::string now = readFile(disk + "/a.txt");
-        if (service_->answer == "true") {
-            EXPECT_EQ(now, new_) << kilobytes;
-            ++saved;
-        } else {
-            EXPECT_EQ(now, old) << kilobytes;
-            ++refused;
-        }
-        EXPECT_EQ(::umount2(disk.c_str(), MNT_DETACH), 0);
+    const SmallDisk disk(at("disk"), "tmpfs", "tmpfs", "size=512k,mode=700");
+    if (!disk.isMounted()) {
+        GTEST_SKIP() << "this user may not mount a file system";
     }
-    EXPECT_GT(saved, 5);
-    EXPECT_GT(refused, 5);
+    saveAsTheDiskFills(disk, at("disk"));
+}
+
+// Where room is found only as the blocks of a file are.
+TEST_F(GuardedSaveFaults, LeaveTheOldTextOnAFullDiskWithBlocks) {
+    writeFile(at("image"), "");
+    fs::resize_file(at("image"), 4 << 20);
+    const std::string makeFileSystem =
+        "mkfs.ext4 -q -m 0 -O ^has_journal " + at("image") + " 2>/dev/null";
+    if (std::system(makeFileSystem.c_str()) != 0) {
+        GTEST_SKIP() << "this system cannot make a file system of ext4";
+    }
+    const SmallDisk disk(at("disk"), "ext4", at("image"), "loop");
+    if (!disk.isMounted()) {
+        GTEST_SKIP() << "this user may not mount a file system";
+    }
+    saveAsTheDiskFills(disk, at("disk"));
 }
 
 }  // namespace
