@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The real bundle with its delivery threads confined to a folder: it works inside as ever, and
-// whatever a request tries, files outside stay shut.
+// The real bundle with its delivery threads confined to a folder, by itself and behind the guard of
+// its saves: it works inside as ever, and whatever a request tries, files outside stay shut.
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <gmock/gmock.h>
@@ -16,12 +16,16 @@
 #include <filesystem>
 #include <functional>
 #include <memory>
+#include <mutex>
 #include <stdexcept>
 #include <string>
+#include <string_view>
 #include <thread>
 #include <utility>
 #include <vector>
 
+#include "host/bus/bundle_host.h"
+#include "host/guard/guard.h"
 #include "host/limits/confinement.h"
 #include "platform/posix/file_descriptor.h"
 #include "tests/platform/i18n/detection/corpus.h"
@@ -35,6 +39,7 @@ namespace fs = std::filesystem;
 
 using host::Confinement;
 using platform::FileDescriptor;
+using platform::messaging::JsonMessage;
 using test::Message;
 using test::readFile;
 using test::RunningBundle;
@@ -47,15 +52,46 @@ using testing::IsEmpty;
 constexpr const char* textType = "text/plain";
 constexpr const char* packageType = "text/xml";
 
-// The bundle in a process that has loaded it and used nothing of it.
-std::unique_ptr<RunningBundle> startConfined(const Confinement& confinement) {
+// The bundle behind a guard, which may guard nothing.
+class Bundle {
+public:
+    explicit Bundle(host::Guard guard)
+        : host_(
+              SERIALIZATION_BUNDLE, std::size_t{1} << 28,
+              [this](const JsonMessage& message) {
+                  const std::lock_guard lock(mutex_);
+                  published_.push_back(
+                      {std::string(message.channel()), std::string(message.payload())});
+              },
+              std::move(guard)) {}
+
+    // All that is published for a message.
+    std::vector<Message> send(const std::string& channel, std::string_view payload) {
+        host_.publish(channel, platform::DataBuffer::copyOf(payload));
+        host_.waitUntilIdle();
+        const std::lock_guard lock(mutex_);
+        return std::exchange(published_, {});
+    }
+
+    std::vector<Message> read(const std::string& path, const std::string& contentType) {
+        return send(test::kReadRequests, RunningBundle::request(path, contentType, "1"));
+    }
+
+private:
+    std::mutex mutex_;
+    std::vector<Message> published_;  // guarded by mutex_
+    host::BundleHost host_;
+};
+
+// It in a process that has loaded it and used nothing of it.
+std::unique_ptr<Bundle> startConfined(const Confinement& confinement, const host::Guard& guard) {
     if (::dlopen(SERIALIZATION_BUNDLE, RTLD_NOW | RTLD_LOCAL) == nullptr) {
         throw std::runtime_error(::dlerror());
     }
-    std::unique_ptr<RunningBundle> bundle;
+    std::unique_ptr<Bundle> bundle;
     std::thread([&] {
         confinement.confineThisThread();
-        bundle = std::make_unique<RunningBundle>();
+        bundle = std::make_unique<Bundle>(guard);
     }).join();
     return bundle;
 }
@@ -75,8 +111,9 @@ json::Value minimalPackage() {
     return json::parse(R"({"parts": [], "relationships": []})");
 }
 
-// A folder to grant and one beside it, each with a text and a package.
-class ConfinedBundle : public testing::Test {
+// A folder to grant and one beside it, each with a text and a package. The parameter says whether
+// saves are guarded.
+class ConfinedBundle : public testing::TestWithParam<bool> {
 protected:
     void SetUp() override {
         if (const auto reason = host::whyConfinementIsUnavailable()) {
@@ -87,7 +124,10 @@ protected:
             writeFile(folder / "text", folder.filename().string());
             fs::copy_file(test::sourceRoot() + "/examples/report.docx", folder / "package");
         }
-        bundle = startConfined(Confinement({.readWrite = {inside}, .readOnly = {}}));
+        host::GuardOptions options(GetParam());
+        options.folder = scratch / "state";
+        guard = host::makeGuard(options, {inside});
+        bundle = startConfined(Confinement({.readWrite = {inside}, .readOnly = {}}), guard);
     }
 
     std::string read(const fs::path& path, const char* contentType) {
@@ -149,10 +189,14 @@ protected:
     const fs::path outside = scratch / "outside";
     FileDescriptor openFolder{
         (fs::create_directory(outside), ::open(outside.c_str(), O_PATH | O_CLOEXEC))};
-    std::unique_ptr<RunningBundle> bundle;
+    host::Guard guard;
+    std::unique_ptr<Bundle> bundle;
 };
 
-TEST_F(ConfinedBundle, ReadsAndWritesInside) {
+INSTANTIATE_TEST_SUITE_P(Saves, ConfinedBundle, testing::Bool(),
+                         [](const auto& test) { return test.param ? "Guarded" : "Unguarded"; });
+
+TEST_P(ConfinedBundle, ReadsAndWritesInside) {
     EXPECT_EQ(read(inside / "text", textType), R"({"data":"inside","status":true})");
     EXPECT_THAT(write(inside / "text", textType, "new"),
                 ElementsAre(notification(inside / "text", true), "true"));
@@ -162,7 +206,7 @@ TEST_F(ConfinedBundle, ReadsAndWritesInside) {
     EXPECT_EQ(readFile(inside / "folder/text"), "new");
 }
 
-TEST_F(ConfinedBundle, SavesPackagesInsideWithTheirPermissions) {
+TEST_P(ConfinedBundle, SavesPackagesInsideWithTheirPermissions) {
     ASSERT_EQ(::chmod((inside / "package").c_str(), 0640), 0);
     const std::string before = read(inside / "package", packageType);
     json::Object document = json::parse(before);
@@ -178,7 +222,7 @@ TEST_F(ConfinedBundle, SavesPackagesInsideWithTheirPermissions) {
     EXPECT_EQ(read(inside / "folder/new", packageType), before);
 }
 
-TEST_F(ConfinedBundle, SavesThroughALinkThatStaysInside) {
+TEST_P(ConfinedBundle, SavesThroughALinkThatStaysInside) {
     fs::create_symlink("../package", inside / "folder/link");
     EXPECT_THAT(write(inside / "folder/link", packageType, minimalPackage()),
                 ElementsAre(notification(inside / "folder/link", true), "true"));
@@ -187,13 +231,13 @@ TEST_F(ConfinedBundle, SavesThroughALinkThatStaysInside) {
               R"({"parts":[],"relationships":[],"status":true})");
 }
 
-TEST_F(ConfinedBundle, TakesTextsOutsideForOnesThatMayNotBeOpened) {
+TEST_P(ConfinedBundle, TakesTextsOutsideForOnesThatMayNotBeOpened) {
     for (const fs::path& path : waysOut("text")) {
         EXPECT_EQ(read(path, textType), R"({"data":"","status":true})") << path;
     }
 }
 
-TEST_F(ConfinedBundle, TakesPackagesOutsideForOnesThatMayNotBeOpened) {
+TEST_P(ConfinedBundle, TakesPackagesOutsideForOnesThatMayNotBeOpened) {
     for (const fs::path& path : waysOut("package")) {
         const json::Object answer = json::parse(read(path, packageType));
         EXPECT_FALSE(answer.at("status").get<bool>()) << path;
@@ -203,7 +247,7 @@ TEST_F(ConfinedBundle, TakesPackagesOutsideForOnesThatMayNotBeOpened) {
     EXPECT_THAT(answer.at("exception").get<std::string>(), testing::HasSubstr("Permission denied"));
 }
 
-TEST_F(ConfinedBundle, ChangesNothingThatIsOutside) {
+TEST_P(ConfinedBundle, ChangesNothingThatIsOutside) {
     const auto before = allOutside();
     for (const fs::path& path : waysOut("text")) {
         EXPECT_EQ(write(path, textType, "x").back(), "false") << path;
@@ -214,7 +258,7 @@ TEST_F(ConfinedBundle, ChangesNothingThatIsOutside) {
     EXPECT_EQ(allOutside(), before);
 }
 
-TEST_F(ConfinedBundle, CreatesNothingOutside) {
+TEST_P(ConfinedBundle, CreatesNothingOutside) {
     const auto before = allOutside();
     for (const fs::path& path : waysOut("new")) {
         EXPECT_EQ(write(path, textType, "x").back(), "false") << path;
@@ -223,14 +267,14 @@ TEST_F(ConfinedBundle, CreatesNothingOutside) {
     EXPECT_EQ(allOutside(), before);
 }
 
-TEST_F(ConfinedBundle, TellsOfWritesOutsideAsOfOthersThatFail) {
+TEST_P(ConfinedBundle, TellsOfWritesOutsideAsOfOthersThatFail) {
     EXPECT_THAT(write(outside / "text", textType, "x"),
                 ElementsAre(notification(outside / "text", true), "false"));
     EXPECT_THAT(write(outside / "new", textType, "x"),
                 ElementsAre(notification(outside / "new", false), "false"));
 }
 
-TEST_F(ConfinedBundle, ReadsNoDevicesAndNothingOfProc) {
+TEST_P(ConfinedBundle, ReadsNoDevicesAndNothingOfProc) {
     for (const char* path : {"/dev/zero", "/proc/self/environ", "/proc/self/maps", "/proc/cpuinfo",
                              "/etc/passwd", "/proc/self/exe", SERIALIZATION_BUNDLE}) {
         EXPECT_EQ(read(path, textType), R"({"data":"","status":true})") << path;
@@ -240,7 +284,7 @@ TEST_F(ConfinedBundle, ReadsNoDevicesAndNothingOfProc) {
 }
 
 // The system lets a confined thread open a pipe of its process again.
-TEST_F(ConfinedBundle, ReadsAndWritesNoPipesOfTheHost) {
+TEST_P(ConfinedBundle, ReadsAndWritesNoPipesOfTheHost) {
     int ends[2];
     ASSERT_EQ(::pipe2(ends, O_CLOEXEC | O_NONBLOCK), 0);
     const FileDescriptor readEnd(ends[0]);
@@ -260,7 +304,7 @@ TEST_F(ConfinedBundle, ReadsAndWritesNoPipesOfTheHost) {
 
 // The system lets a confined thread see nothing of another process's folders, not even that they
 // are there.
-TEST_F(ConfinedBundle, FindsNoWayThroughAnotherProcess) {
+TEST_P(ConfinedBundle, FindsNoWayThroughAnotherProcess) {
     const auto before = allOutside();
     const std::string root = "/proc/" + std::to_string(::getppid()) + "/root";
     for (const fs::path& path : {outside / "text", outside / "new", inside / "text"}) {
@@ -288,7 +332,7 @@ void whileSwapping(const fs::path& document, const fs::path& target,
     swapper.join();
 }
 
-TEST_F(ConfinedBundle, NeverReadsOutsideWhileALinkIsSwapped) {
+TEST_P(ConfinedBundle, NeverReadsOutsideWhileALinkIsSwapped) {
     whileSwapping(inside / "text", outside / "text", [this] {
         int read = 0;
         int denied = 0;
@@ -301,7 +345,7 @@ TEST_F(ConfinedBundle, NeverReadsOutsideWhileALinkIsSwapped) {
     });
 }
 
-TEST_F(ConfinedBundle, NeverWritesOutsideWhileAFolderIsSwapped) {
+TEST_P(ConfinedBundle, NeverWritesOutsideWhileAFolderIsSwapped) {
     const auto before = allOutside();
     whileSwapping(inside / "folder", outside, [this] {
         int written = 0;
@@ -320,7 +364,7 @@ TEST_F(ConfinedBundle, NeverWritesOutsideWhileAFolderIsSwapped) {
 }
 
 // Nothing that the bundle needs for its work is left to be opened once it is loaded.
-TEST_F(ConfinedBundle, HandlesEveryCharsetAsItDoesUnconfined) {
+TEST_P(ConfinedBundle, HandlesEveryCharsetAsItDoesUnconfined) {
     std::vector<std::string> requests;
     std::vector<fs::path> written;
     // The sanitizers make it slow, and find in some what they would in all.
@@ -356,11 +400,11 @@ TEST_F(ConfinedBundle, HandlesEveryCharsetAsItDoesUnconfined) {
     };
     const std::vector<std::string> confined = handleAll();
     bundle.reset();
-    bundle = std::make_unique<RunningBundle>();
+    bundle = std::make_unique<Bundle>(guard);
     EXPECT_EQ(handleAll(), confined);
 }
 
-TEST_F(ConfinedBundle, HandlesEveryPackageAsItDoesUnconfined) {
+TEST_P(ConfinedBundle, HandlesEveryPackageAsItDoesUnconfined) {
     std::vector<fs::path> packages;
     for (const auto& entry : fs::directory_iterator(test::sourceRoot() + "/examples")) {
         if (entry.path().extension().string().ends_with('x')) {  // .docx and its like
@@ -382,7 +426,7 @@ TEST_F(ConfinedBundle, HandlesEveryPackageAsItDoesUnconfined) {
     };
     const std::vector<std::string> confined = handleAll();
     bundle.reset();
-    bundle = std::make_unique<RunningBundle>();
+    bundle = std::make_unique<Bundle>(guard);
     EXPECT_TRUE(handleAll() == confined);
 }
 
