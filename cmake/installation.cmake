@@ -27,7 +27,7 @@ set(documentation_folder "${CMAKE_INSTALL_DATADIR}/doc/editor-serialization")
 install(TARGETS serialization_host)
 install(TARGETS com_vorplanex_serialization LIBRARY DESTINATION "${BUNDLE_INSTALL_FOLDER}")
 
-# The page, which npm run build in web/ makes; packaging/set_up.sh has it made.
+# The page; without Node.js there is none.
 install(DIRECTORY "${PROJECT_SOURCE_DIR}/web/dist/" DESTINATION "${WEB_INSTALL_FOLDER}" OPTIONAL)
 
 install(FILES "${MANUAL_FOLDER}/serialization_host.1.gz" DESTINATION "${CMAKE_INSTALL_MANDIR}/man1")

@@ -108,18 +108,6 @@ build_client() {
     fi
 }
 
-# build_page: builds the web page, unless it has been built from these sources.
-build_page() {
-    local web="$root/web"
-    if [[ ! $web/dist/index.html -nt $web/package-lock.json ]] ||
-        [[ -n $(find "$web" -path "$web/node_modules" -prune -o -path "$web/client/node_modules" -prune -o \
-            -path "$web/dist" -prune -o -path "$web/client/dist" -prune -o \
-            -type f -newer "$web/dist/index.html" -print -quit) ]]; then
-        step "building ${web#"$root/"}"
-        (cd "$web" && quietly npm npm run build)
-    fi
-}
-
 # install_all: installs all that building, running and testing the project needs.
 install_all() {
     install_packages "$root/packaging/debian-packages.txt"
@@ -127,7 +115,6 @@ install_all() {
     install_node_packages "$root/web"
     install_node_packages "$root/web/client"
     build_client
-    build_page
 }
 
 # build NAME [CMAKE-ARGUMENT...] [-- TARGET...]: builds the targets, or all, in build/NAME, which is

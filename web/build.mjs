@@ -1,11 +1,14 @@
 // SPDX-License-Identifier: Apache-2.0
 // Builds the page into dist/: one script that opens it, chunks that are loaded when they are needed, one
-// style sheet, and the licences of what they contain.
+// style sheet, the tables of charsets, and the licences of what they contain.
 import { build } from "esbuild";
-import { copyFile, mkdir, readFile, readdir, rm, writeFile } from "node:fs/promises";
+import { copyFile, cp, mkdir, readFile, readdir, rm, writeFile } from "node:fs/promises";
 import { fileURLToPath } from "node:url";
 
 process.chdir(fileURLToPath(new URL(".", import.meta.url)));
+
+// The folder that make_charset_tables has filled, which is built with the host.
+const tables = process.env.CHARSET_TABLES ?? "../build/release/web/charset_tables";
 
 await rm("dist", { recursive: true, force: true });
 await mkdir("dist");
@@ -25,6 +28,7 @@ const { metafile } = await build({
   loader: { ".bin": "file", ".svg": "file" },
   logLevel: "warning",
 });
+await cp(tables, "dist/charsets", { recursive: true });
 await writeFile("dist/LICENSES.txt", await licenses(Object.keys(metafile.inputs)));
 await copyFile("icon.svg", "dist/icon.svg");
 await copyFile("index.html", "dist/index.html"); // last: what is newer than it has not been built

@@ -14,6 +14,8 @@ export interface LoadedDocument {
   /** Texts: the charset that the file is in, and whether it begins with a byte-order mark. */
   charset?: string;
   byteOrderMark?: boolean;
+  /** Texts: the charset in which a person wants to read it instead. */
+  readAs?: string;
 }
 
 /** What a save sends: a package, or a text as the bytes of its file in `encoding`. */

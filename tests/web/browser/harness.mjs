@@ -52,9 +52,9 @@ export class Session {
   static async start(test, files = {}, { hostOptions = [], expectedProblems = [], ...contextOptions } = {}) {
     const session = new Session(test, files);
     session.expectedProblems = expectedProblems;
+    test.after(() => session.#end()); // before the host ends, which the page would complain of
     session.host = await Host.start(test, ["--listen", "127.0.0.1:0", "--root", session.folder, ...hostOptions]);
     session.context = await (await browser()).newContext({ locale: "en-US", ...contextOptions });
-    test.after(() => session.#end());
     session.page = await session.newPage();
     return session;
   }
@@ -106,7 +106,7 @@ export class Session {
   }
 
   async #end() {
-    await this.context.close();
+    await this.context?.close();
     if (this.problems.length > 0) {
       throw new Error(`the page had problems:\n${this.problems.join("\n")}`);
     }

@@ -9,8 +9,6 @@ export interface Draft {
   path: string;
   /** The version that it is based on. */
   version: string;
-  charset?: string;
-  byteOrderMark?: boolean;
   /** What the view needs to show it again. */
   content: unknown;
 }

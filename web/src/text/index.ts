@@ -1,18 +1,17 @@
 // SPDX-License-Identifier: Apache-2.0
 // The view in which a text is edited.
-import { type DocumentContent, type DocumentView, type LoadedDocument, type Page } from "../document_view.js";
-import { element } from "../ui/dom.js";
+import type { ViewFactory } from "../document_view.js";
+import { Charsets } from "./charsets/index.js";
+import { TextView } from "./text_view.js";
 
-/** Shows a text in UTF-8 as it is; it cannot be changed yet. */
-export function openText(loaded: LoadedDocument, _page: Page, _draft?: unknown): DocumentView {
-  const area = element("pre", { tabIndex: 0 }, loaded.answer.data ?? "");
-  return {
-    element: area,
-    content: async (): Promise<DocumentContent | undefined> => undefined,
-    draft: () => undefined,
-    replace: (other) => (area.textContent = other.answer.data ?? ""),
-    compare: () => ({ element: element("div"), apply: () => {} }),
-    focus: () => area.focus(),
-    close: () => {},
-  };
+async function loadTable(file: string): Promise<Uint8Array> {
+  const response = await fetch(new URL(`charsets/${file}`, document.baseURI));
+  if (!response.ok) {
+    throw new Error(`${file}: ${response.status}`);
+  }
+  return new Uint8Array(await response.arrayBuffer());
 }
+
+const charsets = new Charsets(loadTable);
+
+export const openText: ViewFactory = (loaded, page, draft) => new TextView(charsets, loaded, page, draft);

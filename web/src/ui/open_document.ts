@@ -42,7 +42,7 @@ export class OpenDocument {
   #saver: Saver | undefined;
   #reading: AbortController | undefined;
   #saving: AbortController | undefined;
-  #chosenCharset: string | undefined;
+  #chosenCharset: { found: string | undefined; readAs: string } | undefined;
   #keeper: DraftKeeper;
 
   /** `draft`: what is unsaved of an earlier life of the page. */
@@ -92,7 +92,7 @@ export class OpenDocument {
       const loaded = await this.#load(reading.signal, draft !== undefined);
       const open = await factoryOf(this.path);
       reading.signal.throwIfAborted();
-      this.#chosenCharset = charset ?? draft?.charset;
+      this.#chosenCharset = charset === undefined ? undefined : { found: loaded.charset, readAs: charset };
       this.#show(this.#asChosen(loaded), open, draft);
     } catch (error) {
       if (this.#reading === reading) {
@@ -195,7 +195,7 @@ export class OpenDocument {
 
   #show(loaded: LoadedDocument, open: ViewFactory, draft?: Draft): void {
     this.#view?.close();
-    this.#loaded = { ...loaded, ...(draft?.byteOrderMark !== undefined && { byteOrderMark: draft.byteOrderMark }) };
+    this.#loaded = loaded;
     this.#saver = this.#makeSaver(draft?.version ?? loaded.version, draft !== undefined);
     this.#view = open(this.#loaded, this.#page(), draft?.content);
     this.panel.replaceChildren(this.#view.element);
@@ -208,9 +208,10 @@ export class OpenDocument {
     }
   }
 
-  // In the charset that the person has chosen, where that is so.
+  // To be read in the charset that the person has chosen, unless it has been saved in another one since.
   #asChosen(loaded: LoadedDocument): LoadedDocument {
-    return { ...loaded, ...(this.#chosenCharset !== undefined && { charset: this.#chosenCharset }) };
+    const chosen = this.#chosenCharset;
+    return chosen && chosen.found === loaded.charset ? { ...loaded, readAs: chosen.readAs } : loaded;
   }
 
   #makeSaver(version: string, isUnsaved: boolean): Saver {
@@ -292,14 +293,8 @@ export class OpenDocument {
     if (!this.#view || !this.#saver?.isUnsaved) {
       return;
     }
-    const { charset, byteOrderMark } = this.#loaded ?? {};
-    await this.around.drafts.put({
-      path: this.path,
-      version: this.#saver.baseVersion,
-      content: this.#view.draft(),
-      ...(charset !== undefined && { charset }),
-      ...(byteOrderMark !== undefined && { byteOrderMark }),
-    });
+    const { baseVersion: version } = this.#saver;
+    await this.around.drafts.put({ path: this.path, version, content: this.#view.draft() });
   }
 
   #page(): Page {

@@ -1,0 +1,164 @@
+// SPDX-License-Identifier: Apache-2.0
+// The page's charsets against the converters of the host, code by code.
+import assert from "node:assert/strict";
+import { spawnSync } from "node:child_process";
+import { readFile } from "node:fs/promises";
+import { join } from "node:path";
+import { test } from "node:test";
+
+import { room } from "./room.mjs";
+
+const { ByteSink, Charsets } = await room("text/charsets/index.ts");
+
+const load = (file) => readFile(join(process.env.CHARSET_TABLES, file));
+const charsets = new Charsets(load);
+const names = await charsets.names();
+const UNICODE = ["UTF-8", "UTF-16LE", "UTF-16BE", "UTF-32LE", "UTF-32BE"];
+const SURROGATES = [0xd800, 0xdfff];
+
+function oracle(args, input) {
+  const { status, stdout, stderr } = spawnSync(process.env.CHARSET_ORACLE, args, { input, maxBuffer: 2 ** 30 });
+  assert.equal(status, 0, String(stderr));
+  return stdout;
+}
+
+function encoded(charset, text) {
+  const sink = new ByteSink(0);
+  const lacking = charset.encode(text, sink);
+  return { bytes: Buffer.from(sink.result()), lacking };
+}
+
+// Collects what differs, so that a test says what and how much.
+class Differences {
+  found = [];
+
+  compare(what, actual, expected) {
+    if (actual !== expected) {
+      this.found.push(`${what}: ${actual} rather than ${expected}`);
+    }
+  }
+
+  assertNone() {
+    assert.equal(this.found.length, 0, `${this.found.length} differ: ${this.found.slice(0, 10).join("; ")}`);
+  }
+}
+
+function compareEncoding(charset, first, last) {
+  const differences = new Differences();
+  const answers = oracle([charset.name, "encode", String(first), String(last)]);
+  let at = 0;
+  for (let character = first; character <= last; ++character) {
+    const length = answers[at++];
+    const expected = length === 0 ? "lacking" : answers.toString("hex", at, at + length);
+    at += length;
+    if (character >= SURROGATES[0] && character <= SURROGATES[1]) {
+      continue; // no characters
+    }
+    const { bytes, lacking } = encoded(charset, String.fromCodePoint(character));
+    differences.compare(`U+${character.toString(16)}`, lacking.length > 0 ? "lacking" : bytes.toString("hex"), expected);
+  }
+  assert.equal(at, answers.length);
+  differences.assertNone();
+}
+
+function compareDecoding(charset, codes) {
+  const differences = new Differences();
+  const answers = oracle([charset.name, "decode"], Buffer.concat(codes.flatMap((code) => [[code.length], code]).map(Buffer.from)));
+  let at = 0;
+  for (const code of codes) {
+    const units = answers[at++];
+    const expected = units === 0xff ? "damaged" : answers.toString("utf16le", at, (at += 2 * units));
+    const { text, isDamaged } = charset.decode(Uint8Array.from(code));
+    differences.compare(Buffer.from(code).toString("hex"), isDamaged ? "damaged" : text, expected);
+  }
+  assert.equal(at, answers.length);
+  differences.assertNone();
+}
+
+const bytesFrom = (first, last) => Array.from({ length: last - first + 1 }, (_, index) => first + index);
+const ALL = bytesFrom(0, 0xff);
+
+// Numbers that are the same in every run.
+function* pseudorandom(limit, seed = 1) {
+  for (let state = seed; ; ) {
+    state = (Math.imul(state, 1664525) + 1013904223) >>> 0;
+    yield Math.floor((state / 2 ** 32) * limit);
+  }
+}
+
+test("the charsets that texts are found in are all there", () => {
+  for (const name of [...UNICODE, "Shift_JIS", "x-Shift_JIS-nec", "EUC-JP", "GB18030", "Big5-HKSCS", "Johab", "IBM037"]) {
+    assert.ok(names.includes(name), name);
+  }
+  assert.ok(names.length > 90, String(names.length));
+});
+
+for (const name of names) {
+  const charset = await charsets.open(name);
+  const hasTable = !UNICODE.includes(name);
+  const isMultiByte = hasTable && (await load(JSON.parse(await load("charsets.json"))[name]))[0] > 1;
+
+  test(`${name}: every character is encoded as the host encodes it`, () => {
+    compareEncoding(charset, 0, 0xffff);
+    if (isMultiByte || !hasTable) {
+      compareEncoding(charset, 0x1f000, 0x1ffff);
+      compareEncoding(charset, 0x20000, 0x2ffff);
+      compareEncoding(charset, 0xf0000, 0xf00ff);
+      compareEncoding(charset, 0x10ff00, 0x10ffff);
+    }
+  });
+
+  if (hasTable) {
+    test(`${name}: every code is decoded as the host decodes it`, () => {
+      const codes = ALL.map((byte) => [byte]);
+      if (isMultiByte) {
+        codes.push(...ALL.flatMap((lead) => ALL.map((trail) => [lead, trail])));
+        codes.push(...[0x8e, 0x8f].flatMap((first) => bytesFrom(0xa0, 0xff).flatMap((second) => ALL.map((third) => [first, second, third]))));
+        const random = pseudorandom(0x100);
+        const next = () => random.next().value;
+        for (let count = 0; count < 20_000; ++count) {
+          codes.push([0x81 + (next() % 126), 0x30 + (next() % 10), 0x81 + (next() % 126), 0x30 + (next() % 11)]);
+          codes.push([0x8e, 0xa0 + (next() % 17), 0xa0 + (next() % 96), 0xa0 + (next() % 96)]);
+        }
+      }
+      compareDecoding(charset, codes);
+    });
+  }
+}
+
+test("what a charset lacks is told with its place, and the rest is encoded", async () => {
+  const { bytes, lacking } = encoded(await charsets.open("windows-1252"), "a\u{1f600}\u0416b\u20acc\u0142");
+  assert.deepEqual(lacking, [{ from: 1, to: 4 }, { from: 7, to: 8 }]);
+  assert.equal(bytes.toString("latin1"), "ab\x80c");
+});
+
+test("halves of characters are lacking in every form of Unicode", async () => {
+  for (const name of UNICODE) {
+    assert.deepEqual(encoded(await charsets.open(name), "a\ud83d\u{1f600}\ude00").lacking, [{ from: 1, to: 2 }, { from: 4, to: 5 }]);
+  }
+});
+
+test("damaged Unicode is told of, and U+FFFD that a file does hold is no damage", async () => {
+  const damaged = { "UTF-8": "61ff", "UTF-16LE": "00d86100", "UTF-16BE": "006100", "UTF-32LE": "00d80000", "UTF-32BE": "00110000" };
+  for (const [name, bytes] of Object.entries(damaged)) {
+    const charset = await charsets.open(name);
+    assert.equal(charset.decode(Buffer.from(bytes, "hex")).isDamaged, true, name);
+    const whole = encoded(charset, "\ufeffa\ufffd\u{1f600}\n").bytes;
+    assert.deepEqual(charset.decode(whole), { text: "\ufeffa\ufffd\u{1f600}\n", isDamaged: false }, name);
+  }
+});
+
+test("Japanese texts with escape sequences are shown, and not encoded", async () => {
+  const charset = await charsets.open("ISO-2022-JP");
+  assert.equal(charset.canEncode, false);
+  assert.equal(charset.decode(Buffer.from("\x1b$B$\"\x1b(B!", "latin1")).text, "\u3042!");
+});
+
+test("a charset that is not known is none, and one whose table could not be loaded is tried again", async () => {
+  assert.equal(await charsets.open("UTF-7"), undefined);
+  let fails = true;
+  const flaky = new Charsets((file) => (fails ? Promise.reject(new Error("no network")) : load(file)));
+  await assert.rejects(flaky.open("KOI8-R"), /no network/);
+  fails = false;
+  assert.equal((await flaky.open("KOI8-R")).decode(Uint8Array.of(0xf0)).text, "\u041f");
+});

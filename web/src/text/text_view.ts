@@ -1,0 +1,331 @@
+// SPDX-License-Identifier: Apache-2.0
+// A text in its tab: the editor and the status bar below it. Decoding needs the table of the charset, so
+// the editor appears when that is loaded.
+import { ChangeSet, Compartment, EditorSelection, EditorState } from "@codemirror/state";
+import { EditorView, type ViewUpdate } from "@codemirror/view";
+import { bytesOf, stringOf } from "../../client/src/index.js";
+import type { Comparison, DocumentContent, DocumentView, LoadedDocument, Page } from "../document_view.js";
+import { nameOf } from "../files/paths.js";
+import { element } from "../ui/dom.js";
+import { ByteSink, type Charset, type Charsets, type Decoded } from "./charsets/index.js";
+import { TextComparison } from "./comparison.js";
+import { type TextDraft, makeDraft } from "./draft.js";
+import { textEditor } from "./editor.js";
+import { type EncodedText, type FileForm, encodeFile, fileFormOf, setFileForm } from "./file_form.js";
+import { fromStored, splitLines, uniform } from "./lines.js";
+import { StatusBar } from "./status_bar.js";
+
+const MOST_NAMED = 10; // lacking characters that a question names
+
+/** What a text is edited from. */
+interface Source {
+  bytes: Uint8Array<ArrayBuffer>;
+  charset: Charset;
+  decoded: Decoded;
+  byteOrderMark: boolean;
+}
+
+export class TextView implements DocumentView {
+  readonly element = element("div", { className: "text-view" });
+  #status: StatusBar;
+  #wrapping = new Compartment();
+  #view: EditorView | undefined;
+  #ready: Promise<void>;
+  #base = new Blob();
+  #baseCharset = "UTF-8";
+  #changes = ChangeSet.empty(0);
+  #draft: TextDraft | undefined; // that has not been applied yet
+  #isClosed = false;
+  #wantsFocus = false;
+
+  constructor(
+    private charsets: Charsets,
+    private loaded: LoadedDocument,
+    private page: Page,
+    draft?: unknown,
+  ) {
+    this.#status = new StatusBar(page, {
+      charsetChosen: (name) => void this.#chooseCharset(name),
+      lineEndChosen: (lineEnd) => this.#setForm({ lineEnds: uniform(lineEnd) }),
+      byteOrderMarkChosen: (byteOrderMark) => this.#setForm({ byteOrderMark }),
+      wrapChosen: (wraps) => {
+        const effects = this.#wrapping.reconfigure(wraps ? EditorView.lineWrapping : []);
+        this.#view?.dispatch({ effects });
+      },
+    });
+    this.#draft = draft as TextDraft | undefined;
+    this.#ready = this.#show(loaded);
+  }
+
+  async content(): Promise<DocumentContent | undefined> {
+    await this.#ready;
+    if (!this.#view || this.#view.state.readOnly) {
+      return undefined;
+    }
+    const { charset } = fileFormOf(this.#view.state);
+    if (!charset.canEncode && !(await this.#agreesToUtf8(charset))) {
+      return undefined;
+    }
+    const encoded = encodeFile(this.#view.state.doc, fileFormOf(this.#view.state));
+    if (encoded.lacking && !(await this.#settles(encoded.lacking))) {
+      return undefined;
+    }
+    const { bytes } = encoded.lacking ? encodeFile(this.#view.state.doc, fileFormOf(this.#view.state)) : encoded;
+    return { kind: "text", content: stringOf(bytes), encoding: fileFormOf(this.#view.state).charset.name };
+  }
+
+  draft(): unknown {
+    return this.#view
+      ? makeDraft(this.#base, this.#baseCharset, this.#changes, fileFormOf(this.#view.state))
+      : this.#draft;
+  }
+
+  replace(loaded: LoadedDocument): void {
+    this.loaded = loaded;
+    this.#draft = undefined;
+    this.#ready = this.#show(loaded);
+  }
+
+  compare(theirs: LoadedDocument): Comparison {
+    const place = element("div");
+    let comparison: TextComparison | undefined;
+    const start = this.#view?.state.doc;
+    void this.#comparisonWith(theirs).then((made) => {
+      comparison = made;
+      place.replaceChildren(made?.element ?? "");
+    });
+    return {
+      element: place,
+      apply: () => {
+        if (!comparison || !this.#view || this.#view.state.doc !== start) {
+          throw new Error(this.page.text("text.loading"));
+        }
+        const effects = setFileForm.of(fileFormOf(comparison.result));
+        this.#view.dispatch({ changes: comparison.changes, effects });
+        comparison.close();
+      },
+    };
+  }
+
+  focus(): void {
+    this.#wantsFocus = true;
+    this.#view?.focus();
+  }
+
+  close(): void {
+    this.#isClosed = true;
+    this.#view?.destroy();
+  }
+
+  async #show(loaded: LoadedDocument): Promise<void> {
+    this.element.replaceChildren(element("p", { className: "waiting", role: "status" }, this.page.text("text.loading")));
+    try {
+      const source = this.#draft ? await this.#sourceOfDraft(this.#draft) : await this.#source(loaded);
+      if (this.#isClosed || loaded !== this.loaded) {
+        return;
+      }
+      if (source) {
+        this.#edit(source);
+        await this.#applyDraft();
+        this.#status.offer(await this.charsets.names(), this.#view!.state);
+      }
+    } catch (error) {
+      this.#refuse(this.page.text("text.failed", { reason: error instanceof Error ? error.message : String(error) }));
+    }
+  }
+
+  // Nothing when the charset is not known, which is told.
+  async #source(loaded: LoadedDocument): Promise<Source | undefined> {
+    const found = loaded.charset ?? "UTF-8";
+    const name = loaded.readAs ?? found;
+    const charset = await this.charsets.open(name);
+    if (!charset) {
+      this.#refuse(this.page.text("text.unknownCharset", { charset: name }));
+      return undefined;
+    }
+    let bytes = bytesOf(loaded.answer.data ?? "") as Uint8Array<ArrayBuffer>;
+    let byteOrderMark = loaded.byteOrderMark ?? false;
+    if (byteOrderMark && name !== found) {
+      // What is a mark in the charset of the file is part of its text in another one.
+      const sink = new ByteSink(bytes.length + 4);
+      (await this.charsets.open(found))?.encode("\ufeff", sink);
+      sink.reserve(bytes.length);
+      sink.bytes.set(bytes, sink.length);
+      sink.length += bytes.length;
+      bytes = sink.result() as Uint8Array<ArrayBuffer>;
+      byteOrderMark = false;
+    }
+    return { bytes, charset, decoded: charset.decode(bytes), byteOrderMark };
+  }
+
+  async #sourceOfDraft(draft: TextDraft): Promise<Source | undefined> {
+    const bytes = new Uint8Array(await draft.base.arrayBuffer());
+    const charset = await this.charsets.open(draft.baseCharset);
+    return charset && { bytes, charset, decoded: charset.decode(bytes), byteOrderMark: draft.byteOrderMark };
+  }
+
+  #edit({ bytes, charset, decoded, byteOrderMark }: Source): void {
+    const { doc, lineEnds } = splitLines(decoded.text);
+    this.#base = new Blob([bytes]);
+    this.#baseCharset = charset.name;
+    this.#changes = ChangeSet.empty(doc.length);
+    this.#view?.destroy();
+    const label = this.page.text("text.editor", { name: nameOf(this.loaded.path) });
+    this.#view = new EditorView({
+      state: EditorState.create({
+        doc,
+        extensions: [
+          textEditor({ charset, byteOrderMark, lineEnds }, this.page, label),
+          this.#wrapping.of([]),
+          EditorState.readOnly.of(decoded.isDamaged),
+          EditorView.updateListener.of((update) => this.#updated(update)),
+        ],
+      }),
+    });
+    const warning = this.page.text("text.damaged", { charset: charset.name });
+    this.element.replaceChildren(
+      ...(decoded.isDamaged ? [element("p", { className: "problem", role: "alert" }, warning)] : []),
+      this.#view.dom,
+      this.#status.element,
+    );
+    this.#status.show(this.#view.state);
+    if (this.#wantsFocus) {
+      this.#view.focus();
+    }
+  }
+
+  async #applyDraft(): Promise<void> {
+    const draft = this.#draft;
+    const charset = draft && (await this.charsets.open(draft.charset));
+    if (!draft || !charset) {
+      return;
+    }
+    const lineEnds = fromStored(draft.lineEnd, draft.otherLineEnds);
+    const effects = setFileForm.of({ charset, byteOrderMark: draft.byteOrderMark, lineEnds });
+    this.#view!.dispatch({ changes: ChangeSet.fromJSON(draft.changes), effects });
+    this.#draft = undefined;
+  }
+
+  #updated(update: ViewUpdate): void {
+    if (update.docChanged) {
+      this.#changes = this.#changes.compose(update.changes);
+    }
+    if (update.docChanged || fileFormOf(update.startState) !== fileFormOf(update.state)) {
+      this.page.changed();
+      this.#status.show(update.state);
+    } else if (update.selectionSet) {
+      this.#status.show(update.state);
+    }
+  }
+
+  // Instead of a text.
+  #refuse(message: string): void {
+    this.#view?.destroy();
+    this.#view = undefined;
+    this.element.replaceChildren(element("p", { className: "problem", role: "alert" }, message));
+  }
+
+  #setForm(form: Partial<FileForm>): void {
+    if (this.#view) {
+      this.#view.dispatch({ effects: setFileForm.of({ ...fileFormOf(this.#view.state), ...form }) });
+    }
+  }
+
+  async #chooseCharset(name: string): Promise<void> {
+    const view = this.#view!;
+    const choices = [{ value: "reopen", label: this.page.text("text.choose.reopen", { charset: name }), isDefault: true }];
+    if (!view.state.readOnly) {
+      choices.push({ value: "save", label: this.page.text("text.choose.save", { charset: name }), isDefault: false });
+    }
+    const chosen = await this.page.ask({
+      title: this.page.text("text.choose.title", { charset: name }),
+      message: this.page.text("text.choose.message", { charset: name }),
+      choices: [...choices, { value: "", label: this.page.text("text.cancel") }],
+    });
+    if (chosen === "reopen") {
+      this.page.reopen(name);
+    } else if (chosen === "save") {
+      await this.#saveIn(name);
+    }
+    if (this.#view) {
+      this.#status.show(this.#view.state);
+    }
+  }
+
+  async #saveIn(name: string): Promise<void> {
+    const charset = await this.charsets.open(name);
+    this.#setForm({ charset: charset! });
+  }
+
+  async #agreesToUtf8(charset: Charset): Promise<boolean> {
+    const chosen = await this.page.ask({
+      title: this.page.text("text.escapes.title"),
+      message: this.page.text("text.escapes.message", { charset: charset.name }),
+      choices: [
+        { value: "yes", label: this.page.text("text.escapes.yes"), isDefault: true },
+        { value: "", label: this.page.text("text.cancel") },
+      ],
+    });
+    if (chosen === "yes") {
+      await this.#saveIn("UTF-8");
+    }
+    return chosen === "yes";
+  }
+
+  // Asks what becomes of characters that the charset lacks. Whether the text can be saved then.
+  async #settles(lacking: NonNullable<EncodedText["lacking"]>): Promise<boolean> {
+    const { charset } = fileFormOf(this.#view!.state);
+    const kind = charset.isUnicode ? "halves" : "lacking";
+    const settlement = charset.isUnicode ? "replace" : "utf8";
+    const named = [...lacking.characters].slice(0, MOST_NAMED).join(" ");
+    const characters = lacking.characters.size > MOST_NAMED ? `${named} ...` : named;
+    const chosen = await this.page.ask({
+      title: this.page.text(`text.${kind}.title`),
+      message: this.page.text(`text.${kind}.message`, { charset: charset.name, count: lacking.count, characters }),
+      choices: [
+        { value: settlement, label: this.page.text(`text.${kind}.${settlement}`), isDefault: true },
+        { value: "show", label: this.page.text("text.lacking.show") },
+        { value: "", label: this.page.text("text.cancel") },
+      ],
+    });
+    if (chosen === "utf8") {
+      await this.#saveIn("UTF-8");
+    } else if (chosen === "replace") {
+      this.#replaceHalves();
+    } else if (chosen === "show") {
+      this.#view!.dispatch({ selection: EditorSelection.cursor(lacking.first), scrollIntoView: true });
+      this.#view!.focus();
+    }
+    return chosen === settlement;
+  }
+
+  #replaceHalves(): void {
+    const changes = [];
+    let position = 0;
+    for (const part of this.#view!.state.doc.iter()) {
+      for (const { index } of part.matchAll(/\p{Surrogate}/gu)) {
+        changes.push({ from: position + index, to: position + index + 1, insert: "\ufffd" });
+      }
+      position += part.length;
+    }
+    this.#view!.dispatch({ changes });
+  }
+
+  async #comparisonWith(theirs: LoadedDocument): Promise<TextComparison | undefined> {
+    const source = await this.#source(theirs);
+    if (!source || !this.#view) {
+      return undefined;
+    }
+    const { doc, lineEnds } = splitLines(source.decoded.text);
+    const form = { charset: source.charset, byteOrderMark: source.byteOrderMark, lineEnds };
+    const [theirLabel, myLabel] = [this.page.text("text.theirs"), this.page.text("text.mine")];
+    return new TextComparison(
+      { label: theirLabel, doc, extensions: textEditor(form, this.page, theirLabel) },
+      {
+        label: myLabel,
+        doc: this.#view.state.doc,
+        extensions: textEditor(fileFormOf(this.#view.state), this.page, myLabel),
+      },
+    );
+  }
+}
