@@ -25,6 +25,7 @@ const { metafile } = await build({
   sourcemap: true,
   metafile: true,
   legalComments: "none", // LICENSES.txt has them
+  alias: { jszip: "./src/package/parts_archive.ts" }, // for docx-preview, which has nothing to unzip here
   loader: { ".bin": "file", ".svg": "file" },
   logLevel: "warning",
 });

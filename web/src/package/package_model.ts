@@ -1,0 +1,181 @@
+// SPDX-License-Identifier: Apache-2.0
+// A package in memory: what was read, what was changed since, and the way back. Parts are values; an edit puts
+// another one in the place of a part, so what is not edited is sent back as it came.
+import type { Document, Part, Relationship } from "../../client/src/index.js";
+
+/** What is unsaved, as IndexedDB stores it. */
+export interface PackageDraft {
+  kind: "package";
+  /** Changed parts by name, and what they were before; null for what is, or was, not there. */
+  parts: Record<string, { part: Part | null; base: Part | null }>;
+  relationships?: Relationship[];
+}
+
+/** Contents after an edit. What is left out stays; null takes a part away. */
+export interface Edit {
+  parts?: Map<string, Part | null>;
+  relationships?: Relationship[];
+  /** Edits with the same key in a row are undone as one: what is typed into one editor. */
+  joins?: string;
+}
+
+interface Step {
+  before: Edit;
+  after: Edit;
+}
+
+type Listener = (changedParts: ReadonlySet<string>, editor: unknown) => void;
+
+export class PackageModel {
+  #parts = new Map<string, Part>();
+  #original = new Map<string, Part>();
+  #relationships: Relationship[];
+  #originalRelationships: Relationship[];
+  #undone: Step[] = [];
+  #done: Step[] = [];
+  #listeners = new Set<Listener>();
+
+  /** The document as it was read, with the edits of `draft`, which may have been made to an earlier edition. */
+  constructor({ parts, relationships }: Document, draft?: PackageDraft) {
+    for (const part of parts) {
+      this.#parts.set(part.partUri, part);
+      this.#original.set(part.partUri, part);
+    }
+    this.#relationships = this.#originalRelationships = relationships;
+    if (draft) {
+      for (const [uri, { part, base }] of Object.entries(draft.parts)) {
+        putInto(this.#original, uri, base);
+        putInto(this.#parts, uri, part);
+      }
+      this.#relationships = draft.relationships ?? relationships;
+    }
+  }
+
+  /** In the order of the package; new ones at the end. */
+  get parts(): IterableIterator<Part> {
+    return this.#parts.values();
+  }
+
+  get relationships(): readonly Relationship[] {
+    return this.#relationships;
+  }
+
+  part(uri: string): Part | undefined {
+    return this.#parts.get(uri);
+  }
+
+  /** The part as it was before the first edit. */
+  originalPart(uri: string): Part | undefined {
+    return this.#original.get(uri);
+  }
+
+  isChanged(uri: string): boolean {
+    return this.#parts.get(uri) !== this.#original.get(uri);
+  }
+
+  /** The whole, for a save. */
+  document(): Document {
+    return { parts: [...this.#parts.values()], relationships: this.#relationships };
+  }
+
+  draft(): PackageDraft {
+    const uris = [...new Set([...this.#parts.keys(), ...this.#original.keys()])];
+    const changed = uris.filter((uri) => this.isChanged(uri));
+    return {
+      kind: "package",
+      parts: Object.fromEntries(
+        changed.map((uri) => [uri, { part: this.#parts.get(uri) ?? null, base: this.#original.get(uri) ?? null }]),
+      ),
+      ...(this.#relationships !== this.#originalRelationships && { relationships: this.#relationships }),
+    };
+  }
+
+  /** Calls `changed` after every edit, with `editor` as it was given to it. What is returned ends that. */
+  listen(changed: Listener): () => void {
+    this.#listeners.add(changed);
+    return () => this.#listeners.delete(changed);
+  }
+
+  /** Changes what `edit` holds, so that it can be undone. */
+  edit(edit: Edit, editor?: unknown): void {
+    const last = this.#done[this.#done.length - 1];
+    if (edit.joins !== undefined && last?.after.joins === edit.joins && this.#undone.length === 0) {
+      last.after = edit;
+      this.#put(edit);
+    } else {
+      this.#done.push({ before: this.#put(edit), after: edit });
+    }
+    this.#undone = [];
+    this.#tell(edit, editor);
+  }
+
+  get canUndo(): boolean {
+    return this.#done.length > 0;
+  }
+
+  get canRedo(): boolean {
+    return this.#undone.length > 0;
+  }
+
+  undo(): void {
+    const step = this.#done.pop();
+    if (step) {
+      this.#undone.push(step);
+      this.#put(step.before);
+      this.#tell(step.before);
+    }
+  }
+
+  redo(): void {
+    const step = this.#undone.pop();
+    if (step) {
+      this.#done.push(step);
+      this.#put(step.after);
+      this.#tell(step.after);
+    }
+  }
+
+  // What undoes it is returned. A part that was read, and is itself again, is no longer changed.
+  #put({ parts, relationships }: Edit): Edit {
+    const before: Edit = { parts: new Map(), ...(relationships && { relationships: this.#relationships }) };
+    for (const [uri, part] of parts ?? []) {
+      before.parts!.set(uri, this.#parts.get(uri) ?? null);
+      const original = this.#original.get(uri);
+      putInto(this.#parts, uri, part && original && isSame(part, original) ? original : part);
+    }
+    this.#relationships = relationships ?? this.#relationships;
+    return before;
+  }
+
+  #tell({ parts }: Edit, editor?: unknown): void {
+    const changed = new Set(parts?.keys());
+    for (const listener of this.#listeners) {
+      listener(changed, editor);
+    }
+  }
+}
+
+function putInto(parts: Map<string, Part>, uri: string, part: Part | null): void {
+  if (part) {
+    parts.set(uri, part);
+  } else {
+    parts.delete(uri);
+  }
+}
+
+/** Whether two parts are the same, bytes, type and relationships. */
+export function isSame(one: Part | undefined, other: Part | undefined): boolean {
+  return (
+    one === other ||
+    (one !== undefined &&
+      other !== undefined &&
+      one.content === other.content &&
+      one.contentType === other.contentType &&
+      areSame(one.relationship, other.relationship))
+  );
+}
+
+/** Whether two lists have the same relationships in the same order. */
+export function areSame(one: readonly Relationship[] | null, other: readonly Relationship[] | null): boolean {
+  return one === other || JSON.stringify(one ?? []) === JSON.stringify(other ?? []);
+}

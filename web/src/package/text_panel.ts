@@ -1,0 +1,282 @@
+// SPDX-License-Identifier: Apache-2.0
+// All text of a document as a list, with find and replace.
+import type { Part } from "../../client/src/index.js";
+import type { Page } from "../document_view.js";
+import { button, element } from "../ui/dom.js";
+import type { PackageModel } from "./package_model.js";
+import type { Panel } from "./package_view.js";
+import { byName, kindOf, textOf } from "./part_kinds.js";
+import { decodePart, encodePart, type PartText } from "./part_text.js";
+import { findMatches, mayHaveText, patternOf, replaceMatches, textBlocks, type TextBlock } from "./text_runs.js";
+
+interface TextPart {
+  decoded: PartText;
+  blocks: TextBlock[];
+}
+
+type Matches = ReturnType<typeof findMatches>;
+
+/** A paragraph in the list. */
+interface Entry {
+  uri: string;
+  block: TextBlock;
+  matches: Matches;
+}
+
+const SHOWN_AT_ONCE = 200; // entries; the next ones follow when the list is scrolled
+const LONGEST_SHOWN = 2_000; // characters of one entry
+
+// Where text is in the parts of a document, in the order in which people look for it.
+const PLACES: [RegExp, string][] = [
+  [/wordprocessingml\.document|ms-word\.(document|template)|wordprocessingml\.template/i, "document"],
+  [/presentationml\.slide\+/i, "slide"],
+  [/sharedStrings/i, "cells"],
+  [/worksheet/i, "sheet"],
+  [/header\+/i, "header"],
+  [/footer\+/i, "footer"],
+  [/footnotes\+/i, "footnotes"],
+  [/endnotes\+/i, "endnotes"],
+  [/comments?\+/i, "comments"],
+  [/notesSlide/i, "notes"],
+  [/chart\+/i, "chart"],
+  [/diagram/i, "diagram"],
+  [/drawing\+/i, "drawing"],
+  [/slideLayout/i, "layout"],
+  [/slideMaster|notesMaster|handoutMaster/i, "master"],
+];
+
+export class TextPanel implements Panel {
+  readonly element = element("div", { className: "package-text" });
+
+  #find = element("input", { type: "search", autocomplete: "off", spellcheck: false });
+  #replacement = element("input", { type: "text", autocomplete: "off" });
+  #matchCase = element("input", { type: "checkbox" });
+  #wholeWords = element("input", { type: "checkbox" });
+  #status = element("p", { role: "status", className: "package-count" });
+  #list = element("div", { className: "package-paragraphs", tabIndex: 0, role: "region" });
+  #more = element("div", { className: "package-more" });
+  #replaceAll: HTMLButtonElement;
+
+  #parts = new WeakMap<Part, TextPart>();
+  #entries: Entry[] = [];
+  #listed = 0;
+  #heading = ""; // of the part whose entries are being listed
+  #reading = 0; // which pass over the parts is the latest
+  #isStale = true;
+  #isShown = false;
+  #whenScrolled = new IntersectionObserver(
+    (seen) => {
+      if (seen.some(({ isIntersecting }) => isIntersecting)) {
+        this.#listMore();
+      }
+    },
+    { root: this.#list, rootMargin: "400px" },
+  );
+  #stopListening: () => void;
+
+  constructor(
+    private model: PackageModel,
+    private page: Page,
+  ) {
+    this.#replaceAll = button(page.text("package.text.replaceall"), () => this.#replace(this.#entries));
+    this.#list.setAttribute("aria-label", page.text("package.text.list"));
+    this.element.append(this.#form(), this.#status, this.#list);
+    this.#whenScrolled.observe(this.#more);
+    this.#stopListening = model.listen(() => {
+      this.#isStale = true;
+      if (this.#isShown) {
+        void this.#search();
+      }
+    });
+  }
+
+  commit(): void {}
+
+  show(): void {
+    this.#isShown = true;
+    if (this.#isStale) {
+      void this.#search();
+    }
+  }
+
+  hide(): void {
+    this.#isShown = false;
+  }
+
+  focus(): void {
+    this.#find.focus();
+  }
+
+  close(): void {
+    ++this.#reading;
+    this.#whenScrolled.disconnect();
+    this.#stopListening();
+  }
+
+  #form(): HTMLElement {
+    const { page } = this;
+    const form = element(
+      "form",
+      { className: "package-find", role: "search" },
+      element("label", {}, page.text("package.text.find"), this.#find),
+      element("label", {}, page.text("package.text.replacement"), this.#replacement),
+      this.#replaceAll,
+      element("label", { className: "package-check" }, this.#matchCase, page.text("package.text.case")),
+      element("label", { className: "package-check" }, this.#wholeWords, page.text("package.text.words")),
+    );
+    form.addEventListener("submit", (event) => event.preventDefault());
+    for (const input of [this.#find, this.#matchCase, this.#wholeWords]) {
+      input.addEventListener("input", () => void this.#search());
+    }
+    this.#replacement.addEventListener("keydown", (event) => {
+      if (event.key === "Enter") {
+        this.#replaceAll.click();
+      }
+    });
+    return form;
+  }
+
+  // Part by part, letting the page do other things between them, until it is asked for again.
+  async #search(): Promise<void> {
+    const reading = ++this.#reading;
+    this.#isStale = false;
+    this.#replaceAll.disabled = true;
+    this.#status.textContent = this.page.text("package.text.reading");
+    const pattern = this.#pattern();
+    const entries: Entry[] = [];
+    let since = performance.now();
+    for (const part of this.#textParts()) {
+      const read = this.#read(part);
+      for (const block of read?.blocks ?? []) {
+        const matches = pattern ? findMatches(block, pattern) : [];
+        if (!pattern || matches.length > 0) {
+          entries.push({ uri: part.partUri, block, matches });
+        }
+      }
+      if (performance.now() - since > 30) {
+        await new Promise((resume) => setTimeout(resume));
+        since = performance.now();
+        if (reading !== this.#reading) {
+          return;
+        }
+      }
+    }
+    this.#entries = entries;
+    this.#showEntries(pattern !== undefined);
+  }
+
+  #pattern(): RegExp | undefined {
+    return patternOf({
+      text: this.#find.value,
+      matchCase: this.#matchCase.checked,
+      wholeWords: this.#wholeWords.checked,
+    });
+  }
+
+  #textParts(): Part[] {
+    const parts = [...this.model.parts].filter((part) => kindOf(part) === "xml");
+    return parts
+      .map((part) => ({ part, place: placeOf(part) }))
+      .sort((a, b) => a.place - b.place || byName(a.part.partUri, b.part.partUri))
+      .map(({ part }) => part);
+  }
+
+  #read(part: Part): TextPart | undefined {
+    const known = this.#parts.get(part);
+    if (known) {
+      return known;
+    }
+    const decoded = decodePart(part.content);
+    if (!decoded) {
+      return undefined;
+    }
+    let blocks: TextBlock[] = [];
+    try {
+      blocks = mayHaveText(decoded.text) ? textBlocks(decoded.text) : [];
+    } catch {
+      // Not well-formed, which is told where it is edited.
+    }
+    const read = { decoded, blocks };
+    this.#parts.set(part, read);
+    return read;
+  }
+
+  #showEntries(isSearch: boolean): void {
+    const count = this.#entries.reduce((sum, { matches }) => sum + matches.length, 0);
+    this.#replaceAll.disabled = count === 0;
+    const key = !isSearch ? "package.text.all" : count === 0 ? "package.text.none" : "package.text.found";
+    this.#status.textContent = this.page.text(key, { count: isSearch ? count : this.#entries.length });
+    this.#listed = 0;
+    this.#heading = "";
+    this.#list.replaceChildren(this.#more);
+    this.#listMore();
+  }
+
+  #listMore(): void {
+    const end = Math.min(this.#entries.length, this.#listed + SHOWN_AT_ONCE);
+    const made: HTMLElement[] = [];
+    for (; this.#listed < end; ++this.#listed) {
+      const entry = this.#entries[this.#listed]!;
+      if (entry.uri !== this.#heading) {
+        this.#heading = entry.uri;
+        made.push(element("h3", { title: textOf(entry.uri) }, this.#nameOf(entry.uri)));
+      }
+      made.push(this.#paragraph(entry));
+    }
+    this.#more.before(...made);
+    this.#more.hidden = this.#listed === this.#entries.length;
+    // Observed anew, since it may still be in sight.
+    this.#whenScrolled.unobserve(this.#more);
+    this.#whenScrolled.observe(this.#more);
+  }
+
+  #nameOf(uri: string): string {
+    const part = this.model.part(uri);
+    const place = part && PLACES[placeOf(part)]?.[1];
+    const number = /([0-9]+)\.[^./]*$/.exec(uri)?.[1] ?? "";
+    return place ? `${this.page.text(`package.place.${place}`)} ${number}`.trim() : textOf(uri);
+  }
+
+  #paragraph(entry: Entry): HTMLElement {
+    const { block, matches } = entry;
+    const paragraph = element("p", { dir: "auto" });
+    let copied = 0;
+    for (const { from, to } of matches) {
+      if (from > LONGEST_SHOWN) {
+        break;
+      }
+      paragraph.append(block.text.slice(copied, from), element("mark", {}, block.text.slice(from, to)));
+      copied = to;
+    }
+    const end = Math.max(copied, LONGEST_SHOWN);
+    paragraph.append(block.text.slice(copied, end), end < block.text.length ? " …" : "");
+    if (matches.length > 0) {
+      const label = this.page.text("package.text.replace");
+      paragraph.append(button(label, () => this.#replace([entry]), { className: "package-replace" }));
+    }
+    return paragraph;
+  }
+
+  #replace(entries: Entry[]): void {
+    const byPart = new Map<string, Entry[]>();
+    for (const entry of entries) {
+      byPart.set(entry.uri, [...(byPart.get(entry.uri) ?? []), entry]);
+    }
+    const parts = new Map<string, Part>();
+    for (const [uri, replacements] of byPart) {
+      const part = this.model.part(uri)!;
+      const { decoded } = this.#read(part)!;
+      const text = replaceMatches(decoded.text, replacements, this.#replacement.value);
+      parts.set(uri, { ...part, content: encodePart({ ...decoded, text }) });
+    }
+    this.model.edit({ parts });
+    const count = entries.reduce((sum, { matches }) => sum + matches.length, 0);
+    this.page.tell(this.page.text("package.text.replaced", { count }));
+    this.#find.focus();
+  }
+}
+
+function placeOf({ contentType }: Part): number {
+  const place = PLACES.findIndex(([type]) => type.test(contentType));
+  return place < 0 ? PLACES.length : place;
+}
