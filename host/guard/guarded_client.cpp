@@ -58,6 +58,11 @@ void publishResult(MessageService& client, const WriteRequest& request, const Sa
     json::Object notification{{"filePath", request.filePath}, {"isExistingFile", result.existed}};
     client.publish(platform::messaging::notificationChannel,
                    DataBuffer::copyOf(json::serialize(std::move(notification))));
+    if (!result.version.empty()) {
+        json::Object word{{"status", true}, {"version", result.version}};
+        client.publish(platform::messaging::filesResponsePrefix + request.rtcId,
+                       DataBuffer::copyOf(json::serialize(std::move(word))));
+    }
     client.publish(platform::messaging::writeResponsePrefix + request.rtcId,
                    DataBuffer::copyOf(result.isSaved ? "true" : "false"));
 }

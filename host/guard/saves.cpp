@@ -117,10 +117,11 @@ public:
                 !request_.baseVersion.is<std::string>()) {
                 throw std::runtime_error("\"baseVersion\" is no string");
             }
-            return {request_.isPackage ? savePackage() : saveText(), existed_};
+            const bool isSaved = request_.isPackage ? savePackage() : saveText();
+            return {isSaved, existed_, isSaved ? version_ : std::string()};
         } catch (const std::exception& error) {
             spdlog::error("{}: {}", request_.filePath, error.what());
-            return {false, existed_};
+            return {false, existed_, {}};
         }
     }
 
@@ -169,6 +170,7 @@ private:
         if (!isBasedOn(old, file.hasTarget())) {
             return isRepetition(old.get(), old && haveSameContent(old.get(), file.content()));
         }
+        noteVersion(file.content());
         file.commit();
         keep(std::move(old));
         return true;
@@ -202,6 +204,7 @@ private:
             history_->keepNow(file.copy(), document_);
         }
         file.replaceContent(text.get());
+        noteVersion(text.get());
         return true;
     }
 
@@ -225,6 +228,7 @@ private:
         const BundleAnswer answer = askBundle_({});
         existed_ = answer.existed;
         if (answer.isWritten) {
+            noteVersion(openRegular(request_.filePath).get());
             keep(std::move(old));
         }
         return answer.isWritten;
@@ -258,13 +262,26 @@ private:
 
     // A client that had no answer asks again, and shall not take its own save for another's. That
     // save may have failed at its last step, which was to sync.
-    bool isRepetition(int current, bool isSame) const {
+    bool isRepetition(int current, bool isSame) {
         if (isSame) {
             syncWithFolder(current, document_);
+            noteVersion(current);
         } else {
             spdlog::warn("{}: not saved, since it has changed meanwhile", request_.filePath);
         }
         return isSame;
+    }
+
+    // Called with the lock held. A save that is made has not failed because its version is not
+    // known.
+    void noteVersion(int file) noexcept {
+        try {
+            if (request_.baseVersion.is<std::string>()) {
+                version_ = versionOf(file);
+            }
+        } catch (const std::exception&) {
+            version_.clear();
+        }
     }
 
     void keep(FileDescriptor old) {
@@ -279,6 +296,7 @@ private:
     History* const history_;
     const std::string document_;
     bool existed_ = false;
+    std::string version_;
 };
 
 }  // namespace

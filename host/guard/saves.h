@@ -42,6 +42,7 @@ struct BundleFailure {
 struct SaveResult {
     bool isSaved = false;
     bool existed = false;
+    std::string version;  // that was made, where the request names the one it is based on
 };
 
 /// Makes saves, several at once if need be.

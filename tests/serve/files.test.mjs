@@ -78,6 +78,23 @@ test("a save based on the version there is made, and one based on another is not
   assert.equal(readFileSync(file, "latin1"), "two");
 });
 
+test("a save tells the version that it has made, and not one that somebody else makes later", async (t) => {
+  const { folder, client } = await start(t);
+  const file = join(folder, "text.txt");
+  let version = "";
+  for (const text of ["one", "two", "x".repeat(2_000_000)]) {
+    const result = await client.save(file, text, { baseVersion: version });
+    assert.deepEqual(result, { isSaved: true, version: await client.version(file) });
+    version = result.version;
+  }
+  writeFileSync(file, "theirs");
+  assert.deepEqual(await client.save(file, "mine", { baseVersion: version }), { isSaved: false });
+  const document = join(folder, "new.docx");
+  const part = { partUri: "/a", contentType: "text/plain", content: "a", relationship: null };
+  const { version: made } = await client.save(document, { parts: [part], relationships: [] }, { baseVersion: "" });
+  assert.equal(made, await client.version(document));
+});
+
 test("a read has the version of just what it read, while others save", async (t) => {
   const { folder, client } = await start(t);
   const file = join(folder, "text.txt");

@@ -67,6 +67,17 @@ protected:
                 isSaved ? "true" : "false"};
     }
 
+    // Saves on the base of a version, and expects to be told the version that this has made.
+    void expectSaved(const std::string& path, json::Value content, const std::string& base,
+                     bool existed) {
+        const std::vector<std::string> messages =
+            write(path, std::move(content), {{"baseVersion", base}});
+        std::vector<std::string> expected = outcome(path, existed, true);
+        expected.insert(expected.begin() + 1,
+                        R"({"status":true,"version":")" + version(path) + "\"}");
+        EXPECT_EQ(messages, expected);
+    }
+
     std::vector<std::string> names() const {
         std::vector<std::string> names;
         for (const auto& entry : fs::directory_iterator(folder_.path())) {
@@ -237,6 +248,12 @@ TEST_F(GuardedBundle, RefusesASaveOfAnotherVersionThanTheOneThatIsThere) {
     EXPECT_THAT(names(), ElementsAre("a.txt"));
 }
 
+TEST_F(GuardedBundle, TellsTheVersionThatASaveHasMade) {
+    expectSaved(at("a.txt"), "one", "", false);
+    fs::create_hard_link(at("a.txt"), at("b.txt"));  // so that it is written in place
+    expectSaved(at("a.txt"), "two", version(at("a.txt")), true);
+}
+
 TEST_F(GuardedBundle, TakesTheEmptyVersionForNoDocument) {
     EXPECT_EQ(write(at("a.txt"), "one", {{"baseVersion", ""}}).back(), "true");
     EXPECT_EQ(write(at("a.txt"), "two", {{"baseVersion", ""}}).back(), "false");
@@ -254,11 +271,10 @@ TEST_F(GuardedBundle, AnswersTheRepetitionOfTheLastSaveAsThatSave) {
     writeFile(at("a.txt"), "old");
     const std::string old = version(at("a.txt"));
     for (int i = 0; i < 2; ++i) {
-        EXPECT_EQ(write(at("a.txt"), "new", {{"baseVersion", old}}),
-                  outcome(at("a.txt"), true, true));
+        expectSaved(at("a.txt"), "new", old, true);
     }
     fs::create_hard_link(at("a.txt"), at("b.txt"));
-    EXPECT_EQ(write(at("a.txt"), "new", {{"baseVersion", old}}).back(), "true");
+    expectSaved(at("a.txt"), "new", old, true);
     EXPECT_EQ(write(at("a.txt"), "other", {{"baseVersion", old}}).back(), "false");
     EXPECT_EQ(readFile(at("b.txt")), "new");
 }
@@ -272,12 +288,10 @@ json::Value package(const std::string& content) {
 }
 
 TEST_F(GuardedBundle, HoldsPackagesToTheirVersionToo) {
-    EXPECT_EQ(write(at("a.docx"), package("one"), {{"baseVersion", ""}}),
-              outcome(at("a.docx"), false, true));
+    expectSaved(at("a.docx"), package("one"), "", false);
     const std::string one = version(at("a.docx"));
     for (int i = 0; i < 2; ++i) {  // the second is a repetition
-        EXPECT_EQ(write(at("a.docx"), package("two"), {{"baseVersion", one}}),
-                  outcome(at("a.docx"), true, true));
+        expectSaved(at("a.docx"), package("two"), one, true);
     }
     EXPECT_EQ(write(at("a.docx"), package("three"), {{"baseVersion", one}}),
               outcome(at("a.docx"), true, false));
