@@ -9,6 +9,10 @@ export interface Draft {
   path: string;
   /** The version that it is based on. */
   version: string;
+  /** Those of the document that the view showed. */
+  charset?: string;
+  byteOrderMark?: boolean;
+  readAs?: string;
   /** What the view needs to show it again. */
   content: unknown;
 }

@@ -89,10 +89,11 @@ export class OpenDocument {
     const reading = (this.#reading = new AbortController());
     this.#showProgress(reading);
     try {
-      const loaded = await this.#load(reading.signal, draft !== undefined);
+      const loaded = await this.#load(reading.signal, draft);
       const open = await factoryOf(this.path);
       reading.signal.throwIfAborted();
-      this.#chosenCharset = charset === undefined ? undefined : { found: loaded.charset, readAs: charset };
+      const readAs = charset ?? draft?.readAs;
+      this.#chosenCharset = readAs === undefined ? undefined : { found: loaded.charset, readAs };
       this.#show(this.#asChosen(loaded), open, draft);
     } catch (error) {
       if (this.#reading === reading) {
@@ -180,14 +181,16 @@ export class OpenDocument {
     this.panel.remove();
   }
 
-  async #load(signal: AbortSignal, hasDraft: boolean): Promise<LoadedDocument> {
+  // With a draft, a document that was removed can still be shown, and saved anew.
+  async #load(signal: AbortSignal, draft?: Draft): Promise<LoadedDocument> {
     const { client } = this.around;
     try {
       return await load(client, this.path, { signal, onProgress: (progress) => this.#readProgress(progress) });
     } catch (error) {
-      if (hasDraft && error instanceof UnreadableDocument && (await client.version(this.path)) === "") {
+      if (draft && error instanceof UnreadableDocument && (await client.version(this.path)) === "") {
         const answer = { status: true, ...(isPackage(this.path) ? { parts: [], relationships: [] } : { data: "" }) };
-        return { path: this.path, version: "", answer, charset: "UTF-8" };
+        const { charset = "UTF-8", byteOrderMark = false } = draft;
+        return { path: this.path, version: "", answer, charset, byteOrderMark };
       }
       throw error;
     }
@@ -293,8 +296,15 @@ export class OpenDocument {
     if (!this.#view || !this.#saver?.isUnsaved) {
       return;
     }
-    const { baseVersion: version } = this.#saver;
-    await this.around.drafts.put({ path: this.path, version, content: this.#view.draft() });
+    const { charset, byteOrderMark, readAs } = this.#loaded ?? {};
+    await this.around.drafts.put({
+      path: this.path,
+      version: this.#saver.baseVersion,
+      content: this.#view.draft(),
+      ...(charset !== undefined && { charset }),
+      ...(byteOrderMark !== undefined && { byteOrderMark }),
+      ...(readAs !== undefined && { readAs }),
+    });
   }
 
   #page(): Page {

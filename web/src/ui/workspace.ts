@@ -27,6 +27,7 @@ export class Workspace {
   #documents: OpenDocument[] = [];
   #active: OpenDocument | undefined;
   #isUpdateWaiting = false;
+  #isRestored = false;
   #stopListening: () => void = () => {};
   #tabs = new Tabs(
     (one) => this.#activate(one),
@@ -86,6 +87,8 @@ export class Workspace {
     if (shown) {
       this.open(shown);
     }
+    this.#isRestored = true;
+    this.#update();
   }
 
   /** Shows the document at `path`, which is read unless it is open. */
@@ -206,7 +209,7 @@ export class Workspace {
     }
     const paths = this.#documents.map((one) => one.path);
     const open = JSON.stringify({ paths, active: active?.path });
-    if (sessionStorage.getItem(OPEN) !== open) {
+    if (this.#isRestored && sessionStorage.getItem(OPEN) !== open) {
       sessionStorage.setItem(OPEN, open);
       history.replaceState(null, "", this.#address());
     }
