@@ -27,6 +27,7 @@ export interface Surroundings {
 export type Mark = "unsaved" | "theirs";
 
 const ANSWER_TIME = 10_000; // ms that a save's answer may take to begin, before it is asked for again
+const SLOW = 4_000; // ms without a sign of an answer, after which a reader is told
 const PAUSE = 3_000; // ms between the tries of a save that nobody answers
 
 let opened = 0;
@@ -88,6 +89,7 @@ export class OpenDocument {
     this.#reading?.abort();
     const reading = (this.#reading = new AbortController());
     this.#showProgress(reading);
+    const slow = setTimeout(() => this.#readAmount(text("document.slow")), SLOW);
     try {
       const loaded = await this.#load(reading.signal, draft);
       const open = await factoryOf(this.path);
@@ -100,6 +102,8 @@ export class OpenDocument {
         const again = () => void this.read({ ...(charset && { charset }), ...(draft && { draft }) });
         this.#showFailure(reading.signal.aborted ? text("document.cancelled") : this.#reasonOf(error), again);
       }
+    } finally {
+      clearTimeout(slow);
     }
   }
 
@@ -355,7 +359,7 @@ export class OpenDocument {
         { className: "waiting" },
         element("p", {}, name),
         element("progress", { "aria-label": name }),
-        element("p", { className: "amount" }),
+        element("p", { className: "amount", role: "status" }),
         button(text("action.cancel"), () => reading.abort()),
       ),
     );
@@ -363,11 +367,17 @@ export class OpenDocument {
 
   #readProgress({ direction, bytes, total }: Progress): void {
     const bar = this.panel.querySelector("progress");
-    const amount = this.panel.querySelector(".amount");
-    if (bar && amount && direction === "received") {
+    if (bar && direction === "received") {
       bar.max = total;
       bar.value = bytes;
-      amount.textContent = text("document.progress", { done: bytesText(bytes), total: bytesText(total) });
+      this.#readAmount(text("document.progress", { done: bytesText(bytes), total: bytesText(total) }));
+    }
+  }
+
+  #readAmount(said: string): void {
+    const line = this.panel.querySelector(".waiting > .amount");
+    if (line) {
+      line.textContent = said;
     }
   }
 

@@ -9,7 +9,8 @@ import { en } from "./languages/en.js";
 export const LANGUAGES = { en: "English", de: "Deutsch" } as const;
 export type Language = keyof typeof LANGUAGES;
 
-const TEXTS: Record<Language, Record<string, string>> = {
+/** All texts, by language and key. */
+export const TEXTS: Record<Language, Record<string, string>> = {
   en: { ...en, ...textTexts.texts.en, ...packageTexts.texts.en },
   de: { ...de, ...textTexts.texts.de, ...packageTexts.texts.de },
 };
