@@ -18,6 +18,9 @@ namespace json::detail {
 #ifdef HAS_AVX2_KERNELS
 extern const StringKernels avx2StringKernels;
 #endif
+#ifdef HAS_NEON_KERNELS
+extern const StringKernels neonStringKernels;
+#endif
 
 namespace {
 
@@ -127,6 +130,9 @@ RunnableKernels findRunnable() {
     if (__builtin_cpu_supports("avx2") && __builtin_cpu_supports("bmi") &&
         __builtin_cpu_supports("popcnt"))
         runnable.add(avx2StringKernels);
+#endif
+#ifdef HAS_NEON_KERNELS
+    runnable.add(neonStringKernels);
 #endif
     return runnable;
 }

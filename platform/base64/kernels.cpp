@@ -12,6 +12,9 @@ namespace platform::base64 {
 #ifdef HAS_AVX2_KERNELS
 extern const Kernels avx2Kernels;
 #endif
+#ifdef HAS_NEON_KERNELS
+extern const Kernels neonKernels;
+#endif
 
 namespace {
 
@@ -79,6 +82,9 @@ RunnableKernels findRunnable() {
     if (__builtin_cpu_supports("avx2")) {
         runnable.add(avx2Kernels);
     }
+#endif
+#ifdef HAS_NEON_KERNELS
+    runnable.add(neonKernels);
 #endif
     return runnable;
 }

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 // The inner loops of base64: whole groups of three bytes to four characters, and back.
 //
-// Each exists for plain words and for AVX2; both give the same results. Neither reads or writes
-// outside the groups that it is given.
+// Each exists for plain words, for AVX2 and for NEON; all give the same results. None reads or
+// writes outside the groups that it is given.
 #pragma once
 
 #include <cstddef>
