@@ -15,6 +15,7 @@
 #include <utility>
 
 #include "host/bus/failed_reads.h"
+#include "host/bus/request_kind.h"
 #include "host/limits/freed_memory.h"
 #include "json/find_string.h"
 #include "json/parse_memory.h"
@@ -46,9 +47,11 @@ constexpr std::size_t waitingShare = 8;
 class Admission {
 public:
     Admission(std::shared_ptr<MessageService> client, std::shared_ptr<MemoryBudget> budget,
-              std::string channel, MessageHandler handler)
+              std::shared_ptr<RequestMetrics> metrics, std::string channel, MessageHandler handler)
         : client_(std::move(client)),
           budget_(std::move(budget)),
+          metrics_(std::move(metrics)),
+          kind_(requestKindOf(channel)),
           channel_(std::move(channel)),
           handler_(std::move(handler)) {}
 
@@ -88,6 +91,9 @@ private:
             refuse(request.message, "Too many large requests are waiting");
             return;
         }
+        if (kind_) {
+            metrics_->wait(*kind_);
+        }
         waiting_.push(std::move(request));
         waitingBytes_ += length;
         if (std::exchange(isHandling_, true)) {
@@ -113,6 +119,9 @@ private:
 
     void handleLarge(LargeRequest request) {
         const MemoryBudget::Reservation reservation = budget_->reserve(request.memory);
+        if (kind_) {
+            metrics_->endWait(*kind_);
+        }
         // Failures are not left to the bus, for which they would be those of another message.
         try {
             handler_(request.message);
@@ -134,9 +143,13 @@ private:
     void refuse(const JsonMessage& message, const std::string& reason) {
         spdlog::error("A request of {} bytes on channel \"{}\" is refused: {}",
                       message.payload().size(), channel_, reason);
-        if (channel_ == platform::messaging::readRequestChannel) {
+        if (!kind_) {
+            return;
+        }
+        metrics_->refuse(*kind_);
+        if (kind_ == RequestKind::read) {
             answerFailedRead(*client_, message.payload(), reason);
-        } else if (channel_ == platform::messaging::writeRequestChannel) {
+        } else {
             if (const auto rtcId = json::findString(message.payload(), "rtcId")) {
                 client_->publish(platform::messaging::writeResponsePrefix + *rtcId,
                                  DataBuffer::copyOf("false"));
@@ -146,6 +159,8 @@ private:
 
     const std::shared_ptr<MessageService> client_;
     const std::shared_ptr<MemoryBudget> budget_;
+    const std::shared_ptr<RequestMetrics> metrics_;
+    const std::optional<RequestKind> kind_;
     const std::string channel_;
     const MessageHandler handler_;
 
@@ -157,13 +172,14 @@ private:
 
 class AdmittingClient final : public MessageService {
 public:
-    AdmittingClient(std::shared_ptr<MessageService> client, std::shared_ptr<MemoryBudget> budget)
-        : client_(std::move(client)), budget_(std::move(budget)) {}
+    AdmittingClient(std::shared_ptr<MessageService> client, std::shared_ptr<MemoryBudget> budget,
+                    std::shared_ptr<RequestMetrics> metrics)
+        : client_(std::move(client)), budget_(std::move(budget)), metrics_(std::move(metrics)) {}
 
     futures::Future<std::shared_ptr<Subscription>> subscribe(const std::string& channel,
                                                              MessageHandler handler) override {
         const auto admission =
-            std::make_shared<Admission>(client_, budget_, channel, std::move(handler));
+            std::make_shared<Admission>(client_, budget_, metrics_, channel, std::move(handler));
         return client_->subscribe(
             channel, [admission](const JsonMessage& message) { admission->handle(message); });
     }
@@ -179,13 +195,16 @@ public:
 private:
     const std::shared_ptr<MessageService> client_;
     const std::shared_ptr<MemoryBudget> budget_;
+    const std::shared_ptr<RequestMetrics> metrics_;
 };
 
 }  // namespace
 
 std::shared_ptr<MessageService> admittingRequests(std::shared_ptr<MessageService> client,
-                                                  std::shared_ptr<MemoryBudget> budget) {
-    return std::make_shared<AdmittingClient>(std::move(client), std::move(budget));
+                                                  std::shared_ptr<MemoryBudget> budget,
+                                                  std::shared_ptr<RequestMetrics> metrics) {
+    return std::make_shared<AdmittingClient>(std::move(client), std::move(budget),
+                                             std::move(metrics));
 }
 
 }  // namespace host

@@ -6,6 +6,7 @@
 #include <cstddef>
 #include <memory>
 
+#include "host/metrics/request_metrics.h"
 #include "platform/messaging/memory_budget.h"
 #include "platform/messaging/message_service.h"
 
@@ -20,10 +21,13 @@ namespace host {
 /// that comes when too many bytes wait, is refused: the log says so, and the answer is an
 /// "exception" for a read request and `false` for a write request whose "rtcId" is known.
 ///
+/// Requests that wait for others to be done, and those that are refused, are counted in `metrics`.
+///
 /// The memory of a large message's values is given back to the system when they have been handled.
 /// What the handler throws for a large message is logged.
 std::shared_ptr<platform::messaging::MessageService> admittingRequests(
     std::shared_ptr<platform::messaging::MessageService> client,
-    std::shared_ptr<platform::messaging::MemoryBudget> budget);
+    std::shared_ptr<platform::messaging::MemoryBudget> budget,
+    std::shared_ptr<RequestMetrics> metrics = std::make_shared<RequestMetrics>());
 
 }  // namespace host

@@ -12,6 +12,7 @@
 #include <system_error>
 #include <utility>
 
+#include "host/bus/request_kind.h"
 #include "json/find_string.h"
 #include "platform/messaging/channels.h"
 
@@ -41,7 +42,7 @@ bool isSuccess(RequestKind kind, std::string_view answer) {
 // The request that a thread is handling, which counts it.
 class HandledRequest {
 public:
-    HandledRequest(const JsonMessage& message, RequestMetrics& metrics);
+    HandledRequest(const JsonMessage& message, RequestKind kind, RequestMetrics& metrics);
     HandledRequest(const HandledRequest&) = delete;
     HandledRequest& operator=(const HandledRequest&) = delete;
     ~HandledRequest();
@@ -65,11 +66,9 @@ private:
 // A request is answered on the thread that handles it.
 thread_local HandledRequest* requestOfThread = nullptr;
 
-HandledRequest::HandledRequest(const JsonMessage& message, RequestMetrics& metrics)
-    : message_(message),
-      metrics_(metrics),
-      kind_(message.channel() == platform::messaging::readRequestChannel ? RequestKind::read
-                                                                         : RequestKind::write) {
+HandledRequest::HandledRequest(const JsonMessage& message, RequestKind kind,
+                               RequestMetrics& metrics)
+    : message_(message), metrics_(metrics), kind_(kind) {
     metrics_.begin(kind_, message_.payload().size());
     requestOfThread = this;
 }
@@ -143,22 +142,21 @@ public:
 
 private:
     MessageHandler prepared(const std::string& channel, MessageHandler handler) const {
-        const bool isCounted = channel == platform::messaging::readRequestChannel ||
-                               channel == platform::messaging::writeRequestChannel;
-        return [isCounted, prepareThread = options_.prepareThread, metrics = options_.metrics,
-                handler = std::move(handler)](const JsonMessage& message) {
-            // Subscriptions have threads of their own, so they are this client's.
-            thread_local bool isPrepared = false;
-            if (prepareThread && !isPrepared) {
-                prepareThread();
-                isPrepared = true;
-            }
-            if (!isCounted) {
-                return handler(message);
-            }
-            const HandledRequest request(message, *metrics);
-            handler(message);
-        };
+        return
+            [kind = requestKindOf(channel), prepareThread = options_.prepareThread,
+             metrics = options_.metrics, handler = std::move(handler)](const JsonMessage& message) {
+                // Subscriptions have threads of their own, so they are this client's.
+                thread_local bool isPrepared = false;
+                if (prepareThread && !isPrepared) {
+                    prepareThread();
+                    isPrepared = true;
+                }
+                if (!kind) {
+                    return handler(message);
+                }
+                const HandledRequest request(message, *kind, *metrics);
+                handler(message);
+            };
     }
 
     void logIfOutside(const JsonMessage& request) const {

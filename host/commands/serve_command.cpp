@@ -45,6 +45,7 @@ namespace host {
 
 namespace {
 
+using platform::messaging::MemoryBudget;
 using platform::messaging::NatsBus;
 using platform::messaging::NatsOptions;
 
@@ -314,6 +315,7 @@ std::unique_ptr<NatsServer> startOwnServer(const ServeOptions& options, const We
 // What tells those who watch the host; it looks at the roots while it lives.
 std::unique_ptr<MetricsServer> makeMetricsServer(const ServeOptions& options,
                                                  const std::shared_ptr<const NatsBus>& bus,
+                                                 const std::shared_ptr<const MemoryBudget>& budget,
                                                  std::shared_ptr<const RequestMetrics> requests) {
     if (!options.metrics) {
         return nullptr;
@@ -323,6 +325,11 @@ std::unique_ptr<MetricsServer> makeMetricsServer(const ServeOptions& options,
     sources.requests = std::move(requests);
     sources.isConnected = [bus] { return bus->isConnected(); };
     sources.reconnects = [bus] { return bus->reconnects(); };
+    sources.backlog = [bus] {
+        const platform::messaging::NatsBacklog backlog = bus->backlog();
+        return BusBacklog{backlog.messages, backlog.bytes, backlog.dropped};
+    };
+    sources.requestMemory = [budget] { return RequestMemory{budget->reserved(), budget->size()}; };
     sources.areRootsReadable = [check = std::make_shared<HealthCheck>([roots = options.roots] {
                                     return areReadable(roots);
                                 })] { return check->isHealthy(); };
@@ -368,20 +375,20 @@ int runServe(const ServeOptions& options, int output) {
 
     ServingOptions serving;
     serving.roots = options.roots;
-    const std::unique_ptr<MetricsServer> metrics = makeMetricsServer(options, bus, serving.metrics);
+    const auto budget = std::make_shared<MemoryBudget>(memoryToHandle(options.memoryForRequests));
+    const std::unique_ptr<MetricsServer> metrics =
+        makeMetricsServer(options, bus, budget, serving.metrics);
     const LoadedLibrary library(options.bundle);
     if (confinements) {
         // The threads that handle requests come from this one.
         confinements->bundle.confineThisThread();
         serving.prepareThread = [&confinements] { confinements->documents.confineThisThread(); };
     }
-    const auto budget = std::make_shared<platform::messaging::MemoryBudget>(
-        memoryToHandle(options.memoryForRequests));
     const auto connectClient = [bus, budget, serving](const std::string& name) {
         // The bus is connected, so that this is no waiting. A request that waits for memory may be
         // handled on another thread than the one that brought it, and is counted on that.
-        return answeringFailedReads(
-            servingClient(admittingRequests(bus->connect(name).get(), budget), serving));
+        return answeringFailedReads(servingClient(
+            admittingRequests(bus->connect(name).get(), budget, serving.metrics), serving));
     };
     platform::messaging::setTransport([connectClient, guard](
                                           const std::string& name,

@@ -71,6 +71,8 @@ HttpAnswer MetricsServer::health() const {
 }
 
 std::string MetricsServer::metrics() const {
+    const BusBacklog backlog = sources_.backlog();
+    const RequestMemory memory = sources_.requestMemory();
     return metricHeader("editor_build_info", "gauge", "The version of the program.") +
            fmt::format("editor_build_info{{version=\"{}\"}} 1\n", sources_.version) +
            gauge("editor_bus_connected", "Whether the message servers are connected.",
@@ -78,6 +80,16 @@ std::string MetricsServer::metrics() const {
            metricHeader("editor_bus_reconnects_total", "counter",
                         "How many times the message servers had to be connected again.") +
            fmt::format("editor_bus_reconnects_total {}\n", sources_.reconnects()) +
+           gauge("editor_bus_waiting_messages", "Messages that wait to be handled.",
+                 backlog.messages) +
+           gauge("editor_bus_waiting_bytes", "The size of these.", backlog.bytes) +
+           metricHeader("editor_bus_dropped_messages_total", "counter",
+                        "Messages that were dropped because too many waited.") +
+           fmt::format("editor_bus_dropped_messages_total {}\n", backlog.dropped) +
+           gauge("editor_request_memory_bytes", "Memory that requests have reserved.",
+                 memory.reserved) +
+           gauge("editor_request_memory_limit_bytes", "What they may reserve together.",
+                 memory.size) +
            gauge("editor_roots_readable", "Whether the folders of --root can be read.",
                  sources_.areRootsReadable() ? 1 : 0) +
            memoryMetrics() + sources_.requests->text();

@@ -15,11 +15,26 @@
 
 namespace host {
 
+/// What a bus has taken from its servers and not handed out yet.
+struct BusBacklog {
+    std::uint64_t messages = 0;
+    std::uint64_t bytes = 0;
+    std::uint64_t dropped = 0;  ///< Messages for which there was no room, since it was connected.
+};
+
+/// The memory that requests may take together, in bytes.
+struct RequestMemory {
+    std::uint64_t reserved = 0;
+    std::uint64_t size = 0;
+};
+
 struct MetricsSources {
     std::string version;  ///< That of the program.
     std::shared_ptr<const RequestMetrics> requests;
     std::function<bool()> isConnected;          ///< To the message servers.
     std::function<std::uint64_t()> reconnects;  ///< How many times they had to be connected again.
+    std::function<BusBacklog()> backlog;
+    std::function<RequestMemory()> requestMemory;
     std::function<bool()> areRootsReadable;
 };
 

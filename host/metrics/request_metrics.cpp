@@ -37,6 +37,18 @@ void RequestMetrics::end(RequestKind kind, RequestOutcome outcome, std::size_t a
     ++counts.ended;
 }
 
+void RequestMetrics::wait(RequestKind kind) noexcept {
+    ++kinds_[indexOf(kind)].waiting;
+}
+
+void RequestMetrics::endWait(RequestKind kind) noexcept {
+    --kinds_[indexOf(kind)].waiting;
+}
+
+void RequestMetrics::refuse(RequestKind kind) noexcept {
+    ++kinds_[indexOf(kind)].refused;
+}
+
 std::string RequestMetrics::text() const {
     std::string text;
     const auto add = [&](std::string_view name, std::string_view type, std::string_view help,
@@ -61,6 +73,17 @@ std::string RequestMetrics::text() const {
             const std::uint64_t ended = counts.ended;
             return fmt::format("editor_requests_under_way{{kind=\"{}\"}} {}\n", kind,
                                counts.begun.load() - ended);
+        });
+    add("editor_requests_waiting", "gauge", "Large requests that wait for memory.",
+        [](const OfKind& counts, std::string_view kind) {
+            return fmt::format("editor_requests_waiting{{kind=\"{}\"}} {}\n", kind,
+                               counts.waiting.load());
+        });
+    add("editor_requests_refused_total", "counter",
+        "Requests that were refused for the memory that they would take.",
+        [](const OfKind& counts, std::string_view kind) {
+            return fmt::format("editor_requests_refused_total{{kind=\"{}\"}} {}\n", kind,
+                               counts.refused.load());
         });
     add("editor_request_bytes_total", "counter", "The size of the requests.",
         [](const OfKind& counts, std::string_view kind) {

@@ -25,6 +25,13 @@ public:
     void end(RequestKind kind, RequestOutcome outcome, std::size_t answerBytes,
              std::chrono::nanoseconds duration) noexcept;
 
+    /// A request begins, or ends, to wait for the memory that it takes.
+    void wait(RequestKind kind) noexcept;
+    void endWait(RequestKind kind) noexcept;
+
+    /// A request is refused for the memory that it would take.
+    void refuse(RequestKind kind) noexcept;
+
     /// In Prometheus' text format.
     std::string text() const;
 
@@ -39,6 +46,8 @@ private:
         Counter answerBytes{0};
         Counter begun{0};
         Counter ended{0};
+        Counter waiting{0};
+        Counter refused{0};
     };
 
     std::array<OfKind, 2> kinds_;

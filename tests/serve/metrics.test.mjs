@@ -57,6 +57,9 @@ test("it counts what it is asked, by kind and outcome", async (t) => {
   assert.equal(valueOf(metrics, 'editor_request_seconds_count{kind="read"}'), 3);
   assert.equal(valueOf(metrics, "editor_bus_connected"), 1);
   assert.equal(valueOf(metrics, "editor_roots_readable"), 1);
+  assert.equal(valueOf(metrics, "editor_bus_waiting_messages"), 0);
+  assert.equal(valueOf(metrics, "editor_request_memory_bytes"), 0);
+  assert.ok(valueOf(metrics, "editor_request_memory_limit_bytes") > 1e6);
   assert.ok(valueOf(metrics, "process_resident_memory_bytes") > 1e6);
   assert.match(metrics, /^editor_build_info\{version="[0-9.]+"\} 1$/m);
   const promtool = spawnSync("promtool", ["check", "metrics"], { input: metrics });

@@ -57,6 +57,7 @@ public:
     std::size_t maxPayload(const std::string& channel);
     bool isConnected() const { return first_->isConnected(); }
     std::uint64_t reconnects() const { return first_->reconnects(); }
+    NatsBacklog backlog() const;
     bool drain(std::chrono::milliseconds timeout);
 
 private:
@@ -275,6 +276,17 @@ std::size_t NatsBus::Core::maxPayload(const std::string& channel) {
     return std::max(inPieces.value_or(0), first_->maxPayload());
 }
 
+NatsBacklog NatsBus::Core::backlog() const {
+    NatsBacklog all;
+    for (const auto& source : first_->sources()) {
+        const NatsBacklog one = source->backlog();
+        all.messages += one.messages;
+        all.bytes += one.bytes;
+        all.dropped += one.dropped;
+    }
+    return all;
+}
+
 bool NatsBus::Core::drain(std::chrono::milliseconds timeout) {
     const Clock::time_point deadline = Clock::now() + timeout;
     first_->stop();
@@ -315,6 +327,10 @@ bool NatsBus::isConnected() const {
 
 std::uint64_t NatsBus::reconnects() const {
     return core_->reconnects();
+}
+
+NatsBacklog NatsBus::backlog() const {
+    return core_->backlog();
 }
 
 bool NatsBus::drain(std::chrono::milliseconds timeout) {

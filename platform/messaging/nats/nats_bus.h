@@ -80,6 +80,13 @@ struct NatsOptions {
     LongMessageOptions longMessages;
 };
 
+/// Messages of a NatsBus that wait, and those that it had no room for.
+struct NatsBacklog {
+    std::uint64_t messages = 0;
+    std::uint64_t bytes = 0;
+    std::uint64_t dropped = 0;
+};
+
 /// A bus over NATS servers: channels are subjects, verbatim. Messages are delivered at most once.
 ///
 /// Each subscription has threads of its own, which are started by `subscribe`; all other threads
@@ -115,6 +122,10 @@ public:
 
     /// How many times a lost connection has been replaced since the first `connect`.
     std::uint64_t reconnects() const;
+
+    /// What has come and waits to be handled, over all subscriptions, and how many messages the
+    /// subscriptions have dropped because too much waited. It begins anew with each connection.
+    NatsBacklog backlog() const;
 
     /// Ends the bus in good order: unsubscribes at the server, has the handlers finish the messages
     /// that were taken, sends what they published, and closes the connection. Returns false when

@@ -149,6 +149,20 @@ bool NatsSource::waitUntilDrained(std::chrono::steady_clock::time_point deadline
     return changed_.wait_until(lock, deadline, [this] { return finishedThreads_ == threads_; });
 }
 
+NatsBacklog NatsSource::backlog() {
+    const std::lock_guard lock(mutex_);
+    int messages = 0;
+    int bytes = 0;
+    std::int64_t dropped = 0;
+    if (!subscription_ ||
+        natsSubscription_GetPending(subscription_.get(), &messages, &bytes) != NATS_OK ||
+        natsSubscription_GetDropped(subscription_.get(), &dropped) != NATS_OK) {
+        return {};
+    }
+    return {static_cast<std::uint64_t>(messages), static_cast<std::uint64_t>(bytes),
+            static_cast<std::uint64_t>(dropped)};
+}
+
 bool NatsSource::reportDropped(const natsSubscription* subscription) {
     const std::lock_guard lock(mutex_);
     if (subscription_.get() != subscription) {

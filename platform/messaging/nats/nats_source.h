@@ -15,6 +15,7 @@
 #include "platform/messaging/delivery_threads.h"
 #include "platform/messaging/nats/connection.h"
 #include "platform/messaging/nats/handles.h"
+#include "platform/messaging/nats/nats_bus.h"
 
 namespace platform::messaging::nats {
 
@@ -49,6 +50,9 @@ public:
     /// Waits until all threads have been told that there are no more messages, by which they have
     /// finished those that they had. Returns false when `deadline` comes first.
     bool waitUntilDrained(std::chrono::steady_clock::time_point deadline);
+
+    /// What waits of the connection that stands, and was dropped of it.
+    NatsBacklog backlog();
 
     /// Logs that messages were dropped when `subscription` is this source's; returns whether it is.
     bool reportDropped(const natsSubscription* subscription);

@@ -21,7 +21,9 @@ namespace {
 
 using namespace platform::messaging;
 using platform::DataBuffer;
+using testing::AllOf;
 using testing::ElementsAre;
+using testing::HasSubstr;
 using testing::MatchesRegex;
 
 constexpr std::size_t budgetSize = std::size_t{64} << 20U;
@@ -67,13 +69,14 @@ protected:
                               .concurrentChannels = {readRequestChannel},
                               .concurrency = 2});
     std::shared_ptr<MemoryBudget> budget_ = std::make_shared<MemoryBudget>(budgetSize);
+    std::shared_ptr<RequestMetrics> metrics_ = std::make_shared<RequestMetrics>();
     std::vector<std::string> answers_;
     std::atomic<int> answerCount_ = 0;
 
 private:
     std::shared_ptr<MessageService> sender_ = bus_->connect("sender").get();
     std::shared_ptr<MessageService> client_ =
-        admittingRequests(bus_->connect("bundle").get(), budget_);
+        admittingRequests(bus_->connect("bundle").get(), budget_, metrics_);
     std::vector<std::shared_ptr<Subscription>> subscriptions_;
 };
 
@@ -161,6 +164,7 @@ TEST_F(RequestAdmission, AnswersFalseToAWriteThatIsBeyondTheBudget) {
     collectAnswers(writeResponsePrefix);
     send(request("1", tooLarge), writeRequestChannel);
     EXPECT_THAT(answers(), ElementsAre("false"));
+    EXPECT_THAT(metrics_->text(), HasSubstr("\neditor_requests_refused_total{kind=\"write\"} 1\n"));
 }
 
 TEST_F(RequestAdmission, RefusesWhatComesWhileTooMuchWaits) {
@@ -184,10 +188,15 @@ TEST_F(RequestAdmission, RefusesWhatComesWhileTooMuchWaits) {
     while (answerCount_ == 0) {
         std::this_thread::yield();
     }
+    EXPECT_THAT(metrics_->text(),
+                AllOf(HasSubstr("\neditor_requests_waiting{kind=\"read\"} " +
+                                std::to_string(fitting) + "\n"),
+                      HasSubstr("\neditor_requests_refused_total{kind=\"read\"} 1\n")));
     refused.count_down();
     EXPECT_THAT(
         answers(),
         ElementsAre(R"({"exception":"Too many large requests are waiting","status":false})"));
+    EXPECT_THAT(metrics_->text(), HasSubstr("\neditor_requests_waiting{kind=\"read\"} 0\n"));
 }
 
 TEST_F(RequestAdmission, GoesOnAfterHandlersThatThrow) {

@@ -178,6 +178,10 @@ TEST_P(PendingBound, DropsAndLogsWhatIsTooMuchForASlowHandler) {
     const auto mark = bus.collect("mark", marks);
     publisher.publish("mark", "x");
     marks.waitFor(1);
+    const NatsBacklog backlog = bus.bus->backlog();
+    EXPECT_EQ(backlog.messages, 5U);
+    EXPECT_EQ(backlog.bytes, 1000U);
+    EXPECT_EQ(backlog.dropped, 6U);
     release.count_down();
     // Five of 200 bytes had room, and nothing that came behind them.
     EXPECT_THAT(texts.waitFor(6), testing::SizeIs(6));
