@@ -142,6 +142,15 @@ SECTIONS = {
             Growth("write a package of parts of 1 KB", "µs per part"),
             Growth("read texts of 10 KB at once", "µs per request"),
         ]),
+    "saves": Section(
+        programs=["saves_benchmark"],
+        ours="guarded",
+        rows=[
+            Row("save a text", "ms", [], inputs="in memory"),
+            Row("save a text", "ms", [Ratio(0.75, ("synced",), "a third more than synced")],
+                inputs="60 MB on disk"),
+            Row("save a text", "ms", [], inputs="1 KB on disk"),
+        ]),
     "nats": Section(
         programs=[[str(BUILD / "bin" / "nats_benchmark"), REPETITIONS]],
         order=("what", "who"),
