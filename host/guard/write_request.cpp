@@ -147,7 +147,8 @@ std::optional<WriteRequest> readWriteRequest(std::string_view payload) {
 std::string withFilePath(std::string_view payload, const std::string& filePath) {
     std::string result = "{\"filePath\":" + json::serialize(json::Value(filePath)) + ",";
     result.reserve(result.size() + payload.size());
-    return result.append(payload.substr(1));
+    result.append(payload.substr(1));
+    return result;  // not what append() returns: that would copy it once more
 }
 
 }  // namespace host
