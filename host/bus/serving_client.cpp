@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "host/bus/serving_client.h"
 
+#include <limits.h>
 #include <spdlog/spdlog.h>
 
 #include <algorithm>
@@ -162,8 +163,8 @@ private:
     void logIfOutside(const JsonMessage& request) const {
         // A request may be so large that there is no memory to parse it once more.
         const std::optional<std::string> path = json::findString(request.payload(), "filePath");
-        if (!path || path->empty()) {
-            return;
+        if (!path || path->empty() || path->size() >= PATH_MAX) {
+            return;  // It names no file, inside or outside.
         }
         const fs::path file = withoutLinks(*path);
         if (std::none_of(options_.roots.begin(), options_.roots.end(),

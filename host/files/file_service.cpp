@@ -2,6 +2,7 @@
 #include "host/files/file_service.h"
 
 #include <fcntl.h>
+#include <limits.h>
 #include <spdlog/spdlog.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
@@ -216,6 +217,9 @@ private:
         const std::string& path = text("filePath");
         if (path.find('\0') != std::string::npos) {
             throw std::runtime_error("\"filePath\" holds a zero");
+        }
+        if (path.size() >= PATH_MAX) {
+            throw std::runtime_error("\"filePath\" is too long");
         }
         return path;
     }

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "host/guard/write_request.h"
 
+#include <limits.h>
 #include <simdjson.h>
 
 #include <algorithm>
@@ -109,7 +110,7 @@ bool readString(const Members& members, const std::string& key, std::string& tar
 
 // Whether the bundle takes `path` for one.
 bool isPath(std::string_view path) {
-    return path.find('\0') == std::string_view::npos &&
+    return path.size() < PATH_MAX && path.find('\0') == std::string_view::npos &&
            simdjson::validate_utf8(path.data(), path.size());
 }
 

@@ -3,6 +3,7 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <limits.h>
 #include <spdlog/sinks/ostream_sink.h>
 #include <spdlog/spdlog.h>
 
@@ -125,6 +126,7 @@ TEST_F(Serving, LogsNoOthers) {
     EXPECT_THAT(logOfWrite(outside() / "file", "true"), IsEmpty());
     EXPECT_THAT(logOfRead(outside() / "file", std::string(10'000, 'x')), IsEmpty());
     EXPECT_THAT(logOfRead(""), IsEmpty());
+    EXPECT_THAT(logOfRead(std::string(PATH_MAX, '/')), IsEmpty());
     options_.roots.clear();
     EXPECT_THAT(logOfRead(outside() / "file"), IsEmpty());
 }

@@ -7,6 +7,7 @@
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <limits.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -223,6 +224,7 @@ TEST_F(FileServiceTest, SaysWhatIsWrongWithARequest) {
              json::Object{{"filePath", "/"}},
              json::Object{{"operation", "list"}},
              json::Object{{"operation", "list"}, {"filePath", std::string("/\0", 2)}},
+             json::Object{{"operation", "versions"}, {"filePath", std::string(PATH_MAX, '/')}},
              json::Object{
                  {"operation", "restore"}, {"filePath", (root_ / "a.txt").string()}, {"time", 1.0}},
              json::Object{{"operation", "restore"},

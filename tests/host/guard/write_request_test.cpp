@@ -3,7 +3,9 @@
 #include "host/guard/write_request.h"
 
 #include <gtest/gtest.h>
+#include <limits.h>
 
+#include <cstddef>
 #include <string>
 
 #include "json/parser.h"
@@ -64,6 +66,15 @@ TEST(WriteRequest, IsNoneWhereTheBundleGivesNoAnswer) {
          }) {
         EXPECT_FALSE(readWriteRequest(payload)) << payload;
     }
+}
+
+TEST(WriteRequest, IsNoneWhosePathIsTooLong) {
+    const auto requestOf = [](std::size_t pathLength) {
+        return R"({"rtcId":"1","contentType":"a","content":"","encoding":"","filePath":")" +
+               std::string(pathLength, 'x') + "\"}";
+    };
+    EXPECT_TRUE(readWriteRequest(requestOf(PATH_MAX - 1)));
+    EXPECT_FALSE(readWriteRequest(requestOf(PATH_MAX)));
 }
 
 // Two readers that disagree could have the guard compare one file and the bundle write another.

@@ -4,6 +4,7 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <limits.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -92,6 +93,23 @@ TEST_F(Paths, TooLongAreErrors) {
     std::u16string longPath(10000, u'x');
     longPath.front() = u'/';
     EXPECT_THROW(exists(longPath), std::filesystem::filesystem_error);
+}
+
+TEST_F(Paths, TooLongAreNotRepeatedInTheError) {
+    try {
+        exists(std::u16string(1'000'000, u'/'));
+        FAIL();
+    } catch (const std::filesystem::filesystem_error& error) {
+        EXPECT_EQ(error.code(), std::errc::filename_too_long);
+        EXPECT_LT(std::string_view(error.what()).size(), 200U);
+    }
+}
+
+// Of a path of 4095 characters, which the system takes, and of one that is longer.
+TEST_F(Paths, AreTooLongFromTheLengthOnThatTheSystemRefuses) {
+    const std::u16string root(PATH_MAX - 1, u'/');
+    EXPECT_TRUE(exists(root));
+    EXPECT_THROW(exists(root + u'/'), std::filesystem::filesystem_error);
 }
 
 TEST_F(Paths, InFoldersThatMayNotBeEnteredAreErrors) {
