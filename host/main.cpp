@@ -113,7 +113,7 @@ int main(int argc, char** argv) {
     } catch (const host::ReaderGone&) {
         return host::exitRequestFailed;  // Who has seen enough, as head has, need not be told.
     } catch (const std::exception& error) {
-        std::cerr << host::programName << ": " << error.what() << '\n';
+        std::cerr << host::programName << ": " << host::asLine(error.what()) << '\n';
         return host::exitRequestFailed;
     }
 }

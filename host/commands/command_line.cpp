@@ -2,8 +2,12 @@
 #include "host/commands/command_line.h"
 
 #include <algorithm>
+#include <charconv>
 #include <chrono>
+#include <cstddef>
+#include <cstdint>
 #include <functional>
+#include <limits>
 #include <memory>
 #include <numeric>
 #include <optional>
@@ -13,6 +17,7 @@
 #include <string_view>
 #include <utility>
 
+#include "host/limits/limiting_sink.h"
 #include "host/server/nats_configuration.h"
 
 namespace host {
@@ -29,8 +34,20 @@ public:
     }
 
     std::string make_option_desc(const CLI::Option* option) const override {
+        return wrapped(option->get_description());
+    }
+
+    std::string make_subcommand(const CLI::App* command) const override {
+        std::ostringstream line;
+        CLI::detail::format_help(line, command->get_name(), wrapped(command->get_description()),
+                                 get_column_width());
+        return line.str();
+    }
+
+private:
+    std::string wrapped(const std::string& description) const {
         constexpr std::size_t width = 79;
-        std::istringstream words(option->get_description());
+        std::istringstream words(description);
         std::string text;
         std::size_t room = width - get_column_width();
         for (std::string word; words >> word; room -= word.size() + 1) {
@@ -55,6 +72,55 @@ CLI::Validator untold(CLI::Validator validator) {
 // is.
 CLI::Validator check(const std::function<std::string(std::string&)>& fault) {
     return CLI::Validator(fault, "");
+}
+
+// The bytes of which `text` speaks, such as "65536" or "500 MB"; nothing where it is no size, or
+// one of more bytes than can be counted.
+std::optional<std::uint64_t> bytesOf(const std::string& text) {
+    static const std::regex form("([0-9]+) *(?:([kmgtpe])i?)?b?", std::regex::icase);
+    std::smatch match;
+    std::uint64_t number = 0;
+    if (!std::regex_match(text, match, form) ||
+        std::from_chars(&*match[1].first, &*match[1].first + match.length(1), number).ec !=
+            std::errc()) {
+        return std::nullopt;
+    }
+    std::size_t shift = 0;
+    if (match.length(2) != 0) {
+        constexpr std::string_view units = "kmgtpeKMGTPE";
+        shift = 10 * (1 + units.find(*match[2].first) % (units.size() / 2));
+    }
+    const bool fits = number <= std::numeric_limits<std::uint64_t>::max() >> shift;
+    return fits ? std::optional(number << shift) : std::nullopt;
+}
+
+// An option `name` for a number of bytes. `fault` says what is wrong with a number; nothing if
+// nothing is.
+void declareSize(CLI::App& command, const std::string& name, std::uint64_t& bytes,
+                 const std::string& description,
+                 const std::function<std::string(std::uint64_t)>& fault) {
+    command
+        .add_option_function<std::string>(
+            name,
+            [&bytes, name, fault](const std::string& text) {
+                const std::optional<std::uint64_t> given = bytesOf(text);
+                if (!given) {
+                    throw CLI::ValidationError(name, "\"" + text + "\" is no size such as 500MB");
+                }
+                if (const std::string reason = fault(*given); !reason.empty()) {
+                    throw CLI::ValidationError(name, text + " is too little: " + reason);
+                }
+                bytes = *given;
+            },
+            description)
+        ->type_name("SIZE");
+}
+
+// An option `name` that makes `isOn` false.
+CLI::Option* declareNegation(CLI::App& command, const std::string& name, bool& isOn,
+                             const std::string& description) {
+    return command.add_flag_callback(
+        name, [&isOn] { isOn = false; }, description);
 }
 
 void declareTimeout(CLI::App& command, std::chrono::seconds& timeout) {
@@ -108,14 +174,18 @@ void declareOwnServer(CLI::App& command, NatsServerOptions& options, CLI::Option
     command
         .add_option("--port", options.port,
                     "The port of the host's own message server (default: any that is free)")
+        ->type_name("PORT")
         ->excludes(&others);
     command
         .add_option("--websocket-port", options.webSocketPort,
                     "Its port for browsers (default: any that is free)")
+        ->type_name("PORT")
         ->excludes(&others);
     command
-        .add_option("--allow-origin", options.allowedOrigins,
-                    "The origin of other web pages that may connect, such as http://localhost:3000")
+        .add_option(
+            "--allow-origin", options.allowedOrigins,
+            "The origin of another web page that may connect, such as http://localhost:3000; "
+            "may be given several times")
         ->type_name("ORIGIN")
         ->allow_extra_args(false)
         ->excludes(&others)
@@ -127,7 +197,7 @@ void declareOwnServer(CLI::App& command, NatsServerOptions& options, CLI::Option
         }));
     command
         .add_option("--nats-server", options.program,
-                    "The program of the server (default: nats-server, where programs are)")
+                    "The program of that server (default: nats-server, found as a shell finds it)")
         ->type_name("PATH")
         ->excludes(&others);
 }
@@ -136,7 +206,7 @@ CLI::Option& declareOtherServers(CLI::App& command, OtherServers& options) {
     CLI::Option& servers =
         *command
              .add_option("--nats", options.urls,
-                         "Message servers to work for, in place of one of the host's own")
+                         "Message servers to use in place of one of the host's own")
              ->type_name("URL,...")
              ->delimiter(',')
              ->allow_extra_args(false)
@@ -148,15 +218,15 @@ CLI::Option& declareOtherServers(CLI::App& command, OtherServers& options) {
             ->check(untold(CLI::ExistingFile))
             ->needs(&servers);
     };
-    declareFile("--creds", options.credentialsFile, "The credentials to show them");
-    declareFile("--nats-token-file", options.tokenFile, "Holds the token to show them");
+    declareFile("--creds", options.credentialsFile, "The credentials to log in with");
+    declareFile("--nats-token-file", options.tokenFile, "The token to log in with");
     CLI::Option* const user =
-        command.add_option("--nats-user", options.user, "The user to be there")
+        command.add_option("--nats-user", options.user, "The user name to log in with")
             ->type_name("NAME")
             ->needs(&servers);
-    user->needs(
-        declareFile("--nats-password-file", options.passwordFile, "Holds the password of that user")
-            ->needs(user));
+    user->needs(declareFile("--nats-password-file", options.passwordFile,
+                            "The password of that user, on its first line")
+                    ->needs(user));
     declareFile("--tls-ca", options.caFile,
                 "The authorities to trust, in PEM (default: the system's)");
     CLI::Option* const certificate =
@@ -174,7 +244,8 @@ CLI::Option& declareOtherServers(CLI::App& command, OtherServers& options) {
 }
 
 void declareWeb(CLI::App& command, WebOptions& options) {
-    CLI::Option* const none = command.add_flag("!--no-web", options.isServed, "Serve no web page");
+    CLI::Option* const none =
+        declareNegation(command, "--no-web", options.isServed, "Serve no web page");
     command
         .add_option("--web", options.folder,
                     "The folder to serve to browsers (default: a page that reads documents; none "
@@ -192,13 +263,13 @@ void declareWeb(CLI::App& command, WebOptions& options) {
                     throw CLI::ValidationError("--listen", error.what());
                 }
             },
-            "Where browsers find it (default: 127.0.0.1:8080)")
+            "The address of the web page (default: 127.0.0.1:8080)")
         ->type_name("HOST:PORT")
         ->excludes(none);
     command
         .add_option("--web-connections", options.connectionsOfAddress,
-                    "The most connections that one address may have to it (default: no limit of "
-                    "its own, for all who come through one proxy share an address)")
+                    "The most connections to the page from one address (default: any number, since "
+                    "all who come through one proxy share an address)")
         ->type_name("COUNT")
         ->excludes(none);
 }
@@ -214,8 +285,8 @@ void declareMetrics(CLI::App& command, ServeOptions& options) {
                     throw CLI::ValidationError("--metrics", error.what());
                 }
             },
-            "Where programs that watch the host find /metrics, in Prometheus' format, and /healthz "
-            "(default: nowhere)")
+            "The address of /metrics, in Prometheus' format, and /healthz, for programs that watch "
+            "the host (default: none)")
         ->type_name("HOST:PORT");
 }
 
@@ -235,11 +306,11 @@ void requireDistinctHosts(const ServeOptions& options) {
 // Options of the commands that save documents. `isOn` is what they do without.
 void declareGuard(CLI::App& command, GuardOptions& options) {
     if (options.isOn) {
-        command.add_flag("!--no-safe-saves", options.isOn,
-                         "Have texts written in place, as the bundle does by itself");
+        declareNegation(command, "--no-safe-saves", options.isOn,
+                        "Write texts in place, as the bundle does by itself");
     } else {
         command.add_flag("--safe-saves", options.isOn,
-                         "Have no fault of the machine make a save lose a text");
+                         "Save texts so that a failure of the machine loses none");
     }
     command
         .add_option("--history", options.folder,
@@ -252,7 +323,7 @@ void declareGuard(CLI::App& command, GuardOptions& options) {
                         std::to_string(options.versions) + ")")
         ->type_name("N")
         ->check(untold(CLI::Range(1U, 1'000'000U)));
-    command.add_flag("!--no-history", options.keepsVersions, "Keep no earlier versions");
+    declareNegation(command, "--no-history", options.keepsVersions, "Keep no earlier versions");
 }
 
 void declareServe(CLI::App& command, ServeOptions& options) {
@@ -262,8 +333,8 @@ void declareServe(CLI::App& command, ServeOptions& options) {
         ->type_name("DIR")
         ->allow_extra_args(false)
         ->check(untold(CLI::ExistingDirectory));
-    command.add_flag("!--no-confinement", options.isConfined,
-                     "Go without the kernel's help to keep clients to the folders of --root");
+    declareNegation(command, "--no-confinement", options.isConfined,
+                    "Do not have the kernel keep clients to the folders of --root");
     declareGuard(command, options.guard);
     command
         .add_option("--max-message", options.largestMessage,
@@ -286,12 +357,9 @@ void declareServe(CLI::App& command, ServeOptions& options) {
 }
 
 void declareStdio(CLI::App& command, StdioOptions& options) {
-    command
-        .add_option(
-            "--max-message", options.largestMessage,
-            "The largest message to take, in bytes or with a unit such as MB (default: 1 GB)")
-        ->type_name("SIZE")
-        ->transform(untold(CLI::AsSizeValue(false)));
+    declareSize(command, "--max-message", options.largestMessage,
+                "The largest message to take, in bytes or with a unit such as MB (default: 1 GB)",
+                [](std::uint64_t bytes) { return bytes == 0 ? "no message is so short" : ""; });
     declareGuard(command, options.guard);
 }
 
@@ -416,13 +484,13 @@ bool isOption(const CLI::App& app, const std::string& argument) {
 void describe(CLI::App& app, CommandLine& line) {
     app.formatter(std::make_shared<HelpFormatter>());
     app.get_formatter()->label("SUBCOMMAND", "COMMAND");
-    app.get_formatter()->label("Subcommands", "Commands");
     app.get_formatter()->label("Positionals", "Arguments");
     app.name(programName);
     app.description(
-        "Reads and writes documents through the document-serialization bundle, and serves it to "
-        "other programs.");
-    app.set_version_flag("--version", std::string(programName) + " " + PROGRAM_VERSION);
+        "Reads and writes documents through the bundle and serves it to other programs.");
+    app.set_version_flag("--version", std::string(programName) + " " + PROGRAM_VERSION,
+                         "Print the version and exit");
+    app.set_help_flag("-h,--help", "Print this help and exit");
     app.add_option("--bundle", line.bundle,
                    "The bundle to load (default: the one that belongs to the program)")
         ->type_name("PATH");
@@ -433,20 +501,15 @@ void describe(CLI::App& app, CommandLine& line) {
         ->type_name("LEVEL")
         ->check(untold(
             CLI::IsMember({"trace", "debug", "info", "warning", "error", "critical", "off"})));
-    app.add_option("--memory-limit", line.memoryLimit,
-                   "The most memory to take, in bytes or with a unit such as GB; what needs more "
-                   "fails (default: three quarters of the machine's; 0: no limit)")
-        ->type_name("SIZE")
-        ->transform(untold(CLI::AsSizeValue(false)))
-        ->check(CLI::Validator(
-            [](const std::string& bytes) {
-                // Less is not enough to start the threads and the bundle.
-                constexpr unsigned long long least = 64ULL << 20U;
-                return bytes == "0" || std::stoull(bytes) >= least
-                           ? std::string()
-                           : "the program itself takes some 64 MB";
-            },
-            ""));
+    declareSize(
+        app, "--memory-limit", line.memoryLimit,
+        "The most memory to take, in bytes or with a unit such as GB; what needs more fails "
+        "(default: three quarters of the machine's; 0: no limit)",
+        [](std::uint64_t bytes) {
+            // Less is not enough to start the threads and the bundle.
+            constexpr std::uint64_t least = 64ULL << 20U;
+            return bytes == 0 || bytes >= least ? "" : "the program itself takes some 64 MB";
+        });
     app.require_subcommand(1);
     app.fallthrough();
     declareRead(*app.add_subcommand("read", "Read files and print the response for each on a line"),
@@ -462,8 +525,11 @@ void describe(CLI::App& app, CommandLine& line) {
     declareWrite(*app.add_subcommand(
                      "write", "Write standard input to a file and print the answer, true or false"),
                  line.write);
-    app.footer(std::string("Exit status: ") + exitStatuses +
-               "\nCOMMAND --help tells the options of a command.");
+    for (CLI::App* command : app.get_subcommands({})) {
+        command->group("Commands");
+    }
+    app.footer(std::string("Exit status:\n") + exitStatuses +
+               "\n\nCOMMAND --help lists the options of a command.");
 }
 
 void parse(CLI::App& app, std::vector<std::string> arguments) {
@@ -492,7 +558,8 @@ std::string complaint(const CLI::App& app, const CLI::ParseError& error) {
     } else if (app.get_subcommands().empty() && dynamic_cast<const CLI::RequiredError*>(&error)) {
         text = "a command is missing";
     }
-    return std::string(programName) + ": " + text + "\nRun with --help for more information.\n";
+    return std::string(programName) + ": " + asLine(text) +
+           "\nRun with --help for more information.\n";
 }
 
 }  // namespace host

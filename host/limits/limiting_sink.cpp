@@ -5,7 +5,6 @@
 
 #include <array>
 #include <cstdio>
-#include <string_view>
 
 namespace host {
 
@@ -41,7 +40,8 @@ std::string escaped(std::string_view bytes) {
     return text;
 }
 
-// `text` as one line of at most longestText bytes: controls, and what is no UTF-8, as \xNN.
+}  // namespace
+
 std::string asLine(std::string_view text) {
     std::string line;
     std::size_t lengthIfCut = 0;  // What fits together with the mark.
@@ -59,8 +59,6 @@ std::string asLine(std::string_view text) {
     }
     return line;
 }
-
-}  // namespace
 
 LimitingSink::LimitingSink(std::shared_ptr<spdlog::sinks::sink> next, std::size_t lines,
                            std::chrono::milliseconds period)

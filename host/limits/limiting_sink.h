@@ -11,17 +11,21 @@
 #include <memory>
 #include <mutex>
 #include <string>
+#include <string_view>
 #include <utility>
 
 namespace host {
+
+/// `text` as one line of at most 2000 bytes: what is longer is cut, and controls (line breaks, the
+/// escapes that terminals obey) and bytes that are no UTF-8 are written as \xNN.
+std::string asLine(std::string_view text);
 
 /// Passes log lines on to another sink, but of those of one logger and one level no more than so
 /// many in a period of time; the lines beyond are left out and counted. Their number is logged, as
 /// one more line of that logger and level, with the first line of any kind after the period, or by
 /// a flush. So a flood of one kind hides no line of another.
 ///
-/// Each text becomes one line of less than 2 KB: what is longer is cut, and controls (line breaks,
-/// the escapes that terminals obey) and bytes that are no UTF-8 are written as \xNN.
+/// Each text becomes one line, as asLine makes it.
 ///
 /// A period begins with the first line after the one before. Time is that of the lines.
 class LimitingSink final : public spdlog::sinks::base_sink<std::mutex> {

@@ -4,6 +4,7 @@
 
 #include <filesystem>
 #include <initializer_list>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -18,6 +19,7 @@ using test::Outcome;
 using ::testing::AllOf;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
+using ::testing::Not;
 using ::testing::StartsWith;
 
 // A shell command in which "$0" is the program.
@@ -40,6 +42,19 @@ TEST(CommandLine, TellsTheOptionsOfACommand) {
     const Outcome stdio = test::run(hostCommand({"stdio", "--help"}));
     EXPECT_EQ(stdio.status, 0);
     EXPECT_THAT(stdio.output, HasSubstr("--max-message"));
+}
+
+TEST(CommandLine, TellsOfOptionsInLinesThatFitATerminal) {
+    for (const char* command : {"", "read", "write", "history", "serve", "stdio"}) {
+        const Outcome outcome = runInShell(std::string("\"$0\" ") + command + " --help");
+        EXPECT_EQ(outcome.status, 0);
+        // As the parser would show the default of an option such as --no-history.
+        EXPECT_THAT(outcome.output, Not(HasSubstr("{"))) << command;
+        std::istringstream lines(outcome.output);
+        for (std::string line; std::getline(lines, line);) {
+            EXPECT_LE(line.size(), 80U) << line;
+        }
+    }
 }
 
 TEST(CommandLine, TellsItsVersion) {
@@ -69,11 +84,43 @@ INSTANTIATE_TEST_SUITE_P(
                       std::vector<std::string>{"--log-level", "loud", "stdio"},
                       std::vector<std::string>{"stdio", "file"},
                       std::vector<std::string>{"stdio", "--max-message", "many"},
+                      std::vector<std::string>{"stdio", "--max-message", "0"},
+                      std::vector<std::string>{"--memory-limit", "16", "stdio"},
+                      std::vector<std::string>{"--memory-limit", "63MB", "stdio"},
+                      std::vector<std::string>{"--memory-limit", "-1", "stdio"},
+                      std::vector<std::string>{"--memory-limit", "1.5GB", "stdio"},
+                      std::vector<std::string>{"--memory-limit", "GB", "stdio"},
+                      std::vector<std::string>{"--memory-limit", "100 apples", "stdio"},
+                      std::vector<std::string>{"--memory-limit", "", "stdio"},
+                      std::vector<std::string>{"--memory-limit", "18446744073709551616", "stdio"},
+                      std::vector<std::string>{"--memory-limit", "16EB", "stdio"},
                       std::vector<std::string>{"read", "--text", "--utf8", "file"},
                       std::vector<std::string>{"write", "-"},
                       std::vector<std::string>{"write", "--text", "--content-type", "text/xml",
                                                "file"},
                       std::vector<std::string>{"stdio", "--bundle"}));
+
+TEST(CommandLine, TakesSizesWithTheirUnits) {
+    for (const char* size : {"0", "67108864", "64MB", "64 mib", "65536K", "1g", "15EB"}) {
+        EXPECT_EQ(runInShell(std::string("\"$0\" --memory-limit '") + size + "' stdio < /dev/null")
+                      .status,
+                  0)
+            << size;
+    }
+    EXPECT_THAT(test::run(hostCommand({"--memory-limit", "16", "stdio"})).errors,
+                HasSubstr("--memory-limit: 16 is too little: the program itself takes some 64 MB"));
+    EXPECT_THAT(test::run(hostCommand({"--memory-limit", "much", "stdio"})).errors,
+                HasSubstr("--memory-limit: \"much\" is no size such as 500MB"));
+}
+
+TEST(CommandLine, ShowsNoControlsOfNames) {
+    for (const Outcome& outcome :
+         {test::run(hostCommand({"--bundle", "/no/\x1B[31m\n.so", "stdio"})),
+          test::run(hostCommand({"re\x1B[31m\nad", "file"}))}) {
+        EXPECT_THAT(outcome.errors, HasSubstr("\\x1B[31m\\x0A"));
+        EXPECT_THAT(outcome.errors, Not(HasSubstr("\x1B")));
+    }
+}
 
 TEST(CommandLine, AsksForWhatWasProbablyMeant) {
     const auto complaintAbout = [](std::initializer_list<std::string> arguments) {
