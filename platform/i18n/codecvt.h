@@ -18,7 +18,9 @@ class Charset;
 class codecvt_string_to_ustring {
 public:
     /// `charset` is an IANA name or a usual alias, compared without case. `strict` decides what
-    /// malformed input does: true throws, false puts U+FFFD in its place.
+    /// malformed input does: true throws, false puts U+FFFD in its place. True also refuses what
+    /// could be decoded but would not encode again: a save would lose it. In charsets in which a
+    /// text has one right spelling (BOCU-1, GSM 03.38) that is every other one.
     /// Throws std::runtime_error naming the charset when it is unknown or empty.
     codecvt_string_to_ustring(const std::string& charset, bool strict);
     codecvt_string_to_ustring(codecvt_string_to_ustring&&) noexcept;
@@ -26,8 +28,8 @@ public:
     ~codecvt_string_to_ustring();
 
     /// Decodes `length` bytes at `data` as one whole text. A byte-order mark is kept as U+FEFF.
-    /// Throws std::runtime_error naming the charset and the byte offset of malformed input when
-    /// strict. Linear in `length`.
+    /// Throws std::runtime_error naming the charset and the byte offset of malformed input, or of
+    /// what could not be encoded again, when strict. Linear in `length`.
     std::u16string do_convert(const char* data, std::size_t length);
 
 private:
