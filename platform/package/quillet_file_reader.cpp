@@ -4,6 +4,8 @@
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
+#include <initializer_list>
+#include <memory>
 #include <optional>
 #include <span>
 #include <stdexcept>
@@ -67,8 +69,10 @@ std::vector<Fragment> orderedFragments(const Item& item) {
     return fragments;
 }
 
+}  // namespace
+
 // The archive as the Open Packaging Conventions see it.
-class PackageFile {
+class QuilletFileReader::PackageFile {
 public:
     explicit PackageFile(const std::string& path) : archive_(path) {
         for (const zip::Archive::Entry& entry : archive_.entries()) {
@@ -77,28 +81,37 @@ public:
                 add(name, entry);
             }
         }
-    }
-
-    QuilletFilePackage read() {
-        const Item* typesItem = find(contentTypesName);
-        if (typesItem == nullptr) {
-            throw std::runtime_error("is not a document package: it has no [Content_Types].xml");
-        }
-        const ContentTypes types = about("has a broken [Content_Types].xml, which", [&] {
-            return ContentTypes::parse(contentOf(*typesItem, maxPackageXmlBytes));
-        });
-        std::vector<Part> parts;
+        const Item& typesItem = readTypes();
+        relationships_ = find(relationshipsPartName(packageRoot));
         for (const Item& item : items_) {
-            const std::string* mediaType = types.find(item.name);
-            if (mediaType != nullptr && &item != typesItem && !relationshipsSource(item.name)) {
-                parts.push_back(readPart(item, *mediaType));
+            const std::string* mediaType = types_.find(item.name);
+            if (mediaType != nullptr && &item != &typesItem && !relationshipsSource(item.name)) {
+                parts_.push_back({item, *mediaType, find(relationshipsPartName(item.name))});
             }
         }
-        std::vector<Relationship> relationships = readRelationships(packageRoot);
+        requireWithinLimits();
+    }
+
+    const PackageSize& size() const noexcept { return size_; }
+
+    QuilletFilePackage read() {
+        std::vector<Part> parts;
+        parts.reserve(parts_.size());
+        for (const TypedItem& part : parts_) {
+            parts.push_back(readPart(part));
+        }
+        std::vector<Relationship> relationships = readRelationships(relationships_);
         return {parts, relationships};
     }
 
 private:
+    // An item that is a part, and the one that holds its relationships; null if it has none.
+    struct TypedItem {
+        const Item& item;
+        const std::string& mediaType;
+        const Item* relationships;
+    };
+
     void add(const std::string& name, const zip::Archive::Entry& entry) {
         const Piece fragment = pieceNamed(name).value_or(Piece{name, 0, true});
         const auto [place, isNew] =
@@ -114,12 +127,64 @@ private:
         return found == byKey_.end() ? nullptr : &items_[found->second];
     }
 
-    std::vector<std::uint8_t> contentOf(const Item& item, std::uint64_t maxSize) {
-        const std::vector<Fragment> fragments = orderedFragments(item);
+    // Fills in types_, and returns where they stood.
+    const Item& readTypes() {
+        const Item* item = find(contentTypesName);
+        if (item == nullptr) {
+            throw std::runtime_error("is not a document package: it has no [Content_Types].xml");
+        }
+        archive_.requireWithinLimits(entriesOf({item}));
+        types_ = about("has a broken [Content_Types].xml, which",
+                       [&] { return ContentTypes::parse(contentOf(*item, maxPackageXmlBytes)); });
+        return *item;
+    }
+
+    // Of null nothing.
+    static std::vector<const zip::Archive::Entry*> entriesOf(
+        std::initializer_list<const Item*> items) {
+        std::vector<const zip::Archive::Entry*> entries;
+        for (const Item* item : items) {
+            if (item != nullptr) {
+                for (const Fragment& fragment : item->fragments) {
+                    entries.push_back(fragment.entry);
+                }
+            }
+        }
+        return entries;
+    }
+
+    // Fills in size_. Throws when what will be read is too large. What has no content type is not
+    // counted, for it is not read.
+    void requireWithinLimits() {
+        std::vector<const zip::Archive::Entry*> all = entriesOf({relationships_});
+        for (const TypedItem& part : parts_) {
+            const auto more = entriesOf({&part.item, part.relationships});
+            all.insert(all.end(), more.begin(), more.end());
+        }
+        archive_.requireWithinLimits(all);
+        size_.parts = parts_.size();
+        for (const TypedItem& part : parts_) {
+            size_.content += sizeOf(part.item);
+        }
+        for (const zip::Archive::Entry* entry : all) {
+            size_.relationships += entry->size;
+            size_.compressed = std::max(size_.compressed, entry->compressedSize);
+        }
+        size_.relationships -= size_.content;
+    }
+
+    // Its expanded bytes, of entries within the limits.
+    static std::uint64_t sizeOf(const Item& item) {
         std::uint64_t size = 0;
-        for (const Fragment& fragment : fragments) {
+        for (const Fragment& fragment : item.fragments) {
             size += fragment.entry->size;
         }
+        return size;
+    }
+
+    std::vector<std::uint8_t> contentOf(const Item& item, std::uint64_t maxSize) {
+        const std::vector<Fragment> fragments = orderedFragments(item);
+        const std::uint64_t size = sizeOf(item);
         if (size > maxSize) {
             throw std::runtime_error("is too large: " + std::to_string(size) + " bytes, at most " +
                                      std::to_string(maxSize) + " are accepted");
@@ -133,23 +198,23 @@ private:
         return content;
     }
 
-    Part readPart(const Item& item, const std::string& mediaType) {
+    Part readPart(const TypedItem& typed) {
+        const Item& item = typed.item;
         return about("has a broken part: " + quoted(item.name), [&] {
             if (const std::string_view problem = partNameProblem(item.name); !problem.empty()) {
                 throw std::runtime_error("is not a valid part name: " + std::string(problem));
             }
             Part part;
             part.content = contentOf(item, zip::maxEntryBytes);
-            part.contentType = i18n::to_ustring(mediaType);
+            part.contentType = i18n::to_ustring(typed.mediaType);
             part.partUri = i18n::to_ustring(item.name);
-            part.relationships = readRelationships(item.name);
+            part.relationships = readRelationships(typed.relationships);
             return part;
         });
     }
 
-    // The relationships of `source`; none if it has no relationships part.
-    std::vector<Relationship> readRelationships(std::string_view source) {
-        const Item* item = find(relationshipsPartName(source));
+    // The relationships in `item`; none if it is null.
+    std::vector<Relationship> readRelationships(const Item* item) {
         if (item == nullptr) {
             return {};
         }
@@ -160,15 +225,36 @@ private:
     zip::Archive archive_;
     std::vector<Item> items_;  // in the archive's order
     std::unordered_map<std::string, std::size_t> byKey_;
+    ContentTypes types_;
+    std::vector<TypedItem> parts_;
+    const Item* relationships_ = nullptr;  // the package's own
+    PackageSize size_;
 };
-
-}  // namespace
 
 QuilletFileReader::QuilletFileReader(std::u16string path) : path_(std::move(path)) {}
 
-QuilletFilePackage QuilletFileReader::read() {
+QuilletFileReader::~QuilletFileReader() = default;
+
+// What `work` gives of the package's file, which is opened if need be.
+template <class Work>
+auto QuilletFileReader::withFile(Work work) {
     const std::string path = filesystem::make_native_access_form_with_cleanup(path_);
-    return about(quoted(path), [&] { return PackageFile(path).read(); });
+    return about(quoted(path), [&] {
+        if (!file_) {
+            file_ = std::make_unique<PackageFile>(path);
+        }
+        return work(*file_);
+    });
+}
+
+PackageSize QuilletFileReader::size() {
+    return withFile([](PackageFile& file) { return file.size(); });
+}
+
+QuilletFilePackage QuilletFileReader::read() {
+    QuilletFilePackage package = withFile([](PackageFile& file) { return file.read(); });
+    file_.reset();
+    return package;
 }
 
 }  // namespace platform::package

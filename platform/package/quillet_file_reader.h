@@ -2,16 +2,34 @@
 // Reads document packages: zip archives laid out by the Open Packaging Conventions.
 #pragma once
 
+#include <cstddef>
+#include <cstdint>
+#include <memory>
 #include <string>
 
 #include "platform/package/quillet_file_package.h"
 
 namespace platform::package {
 
+/// How large a package is, as its archive declares it. Reading fails when this is not true.
+struct PackageSize {
+    std::size_t parts = 0;
+    std::uint64_t content = 0;        ///< Bytes of the parts, expanded.
+    std::uint64_t relationships = 0;  ///< Bytes of what holds their relationships, expanded.
+    std::uint64_t compressed = 0;     ///< Bytes of the largest of all these as it is stored.
+};
+
 class QuilletFileReader {
 public:
     /// A reader of the package file at `path`. Touches nothing on disk.
     explicit QuilletFileReader(std::u16string path);
+    QuilletFileReader(const QuilletFileReader&) = delete;
+    QuilletFileReader& operator=(const QuilletFileReader&) = delete;
+    ~QuilletFileReader();
+
+    /// The size of the package, before memory is taken for its parts. The file stays open for
+    /// read(). Throws what read() throws, but says nothing about what is in the parts.
+    PackageSize size();
 
     /// Reads the package whole. Its parts are the entries of the archive that have a content type,
     /// in the archive's order, less the relationships parts, which become the relationships of the
@@ -24,7 +42,13 @@ public:
     QuilletFilePackage read();
 
 private:
+    class PackageFile;
+
+    template <class Work>
+    auto withFile(Work work);
+
     std::u16string path_;
+    std::unique_ptr<PackageFile> file_;  // Between size() and read().
 };
 
 }  // namespace platform::package

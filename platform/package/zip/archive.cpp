@@ -146,7 +146,6 @@ Archive::Archive(const std::string& path, std::chrono::milliseconds patience)
     }
     readDirectory(directory);
     checkLayout(directory.offset);
-    checkSizes();
 }
 
 // The end record is the last thing in the file but for its comment, in which its signature may
@@ -262,19 +261,20 @@ void Archive::checkLayout(std::uint64_t dataEnd) const {
     }
 }
 
-void Archive::checkSizes() const {
+void Archive::requireWithinLimits(std::span<const Entry* const> entries) const {
     std::uint64_t total = 0;
-    for (const Entry& entry : entries_) {
-        if (entry.size > maxEntryBytes) {
-            failForEntry(entry.name, "is too large: " + std::to_string(entry.size) +
-                                         " bytes, at most " + std::to_string(maxEntryBytes) +
-                                         " are accepted");
+    for (const Entry* entry : entries) {
+        if (entry->size > maxEntryBytes) {
+            failForEntry(entry->name, "is too large: " + std::to_string(entry->size) +
+                                          " bytes, at most " + std::to_string(maxEntryBytes) +
+                                          " are accepted");
         }
-        if (entry.method == methodDeflated && entry.size / maxDeflateRatio > entry.compressedSize) {
-            failForEntry(entry.name, "has a wrong size: its data cannot expand to " +
-                                         std::to_string(entry.size) + " bytes");
+        if (entry->method == methodDeflated &&
+            entry->size / maxDeflateRatio > entry->compressedSize) {
+            failForEntry(entry->name, "has a wrong size: its data cannot expand to " +
+                                          std::to_string(entry->size) + " bytes");
         }
-        total += entry.size;
+        total += entry->size;
     }
     if (total > maxTotalBytes) {
         fail("is too large: it expands to " + std::to_string(total) + " bytes, at most " +

@@ -8,9 +8,9 @@
 // deflated bytes only where these are known to be the very content.
 //
 // The archive is believed in nothing. Opening it takes time and memory in proportion to its
-// directory, whose size is limited, and refuses archives whose entries overlap, or claim more than
-// their data can expand to or than the limits allow (limits.h). So reading all entries takes no
-// more than that either.
+// directory, whose size is limited, and refuses archives whose entries overlap. Before entries are
+// read, requireWithinLimits refuses those that claim more than their data can expand to, or than
+// the limits allow (limits.h); what nobody reads may claim anything.
 #pragma once
 
 #include <chrono>
@@ -48,6 +48,11 @@ public:
     /// All entries, folders included, in the order of the directory.
     const std::vector<Entry>& entries() const noexcept { return entries_; }
 
+    /// Throws std::runtime_error naming what goes beyond the limits when one of `entries` of this
+    /// archive does, or all of them together do, or when one claims a size to which its data cannot
+    /// expand. To be called before memory is taken for them.
+    void requireWithinLimits(std::span<const Entry* const> entries) const;
+
     /// Reads and expands `entry` of this archive into `out`, which has `entry.size` bytes, and
     /// checks the result against its checksum. Throws std::runtime_error saying what is wrong with
     /// the entry (without its name).
@@ -75,7 +80,6 @@ private:
     Directory findZip64Directory(std::uint64_t locatorOffset) const;
     void readDirectory(const Directory& directory);
     void checkLayout(std::uint64_t dataEnd) const;
-    void checkSizes() const;
     std::uint64_t dataOffset(const Entry& entry) const;
     void expand(const Entry& entry, std::uint64_t offset, std::span<std::uint8_t> out);
     std::span<const std::uint8_t> readCompressed(const Entry& entry, std::uint64_t offset);

@@ -21,7 +21,7 @@ constexpr std::uint64_t maxDirectoryBytes = 64 * mebibyte;
 /// Bytes of one part, expanded. Several copies of a part exist while it becomes JSON.
 constexpr std::uint64_t maxEntryBytes = 1024 * mebibyte;
 
-/// Bytes of all entries together, expanded.
+/// Bytes of all entries that are read together, expanded.
 constexpr std::uint64_t maxTotalBytes = 2048 * mebibyte;
 
 /// Expanded bytes per byte of the archive. Sheets full of equal cells reach 150, archives made to

@@ -4,7 +4,10 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <cstdint>
+#include <filesystem>
 #include <stdexcept>
+#include <string>
 
 #include "tests/platform/package/package_test_support.h"
 
@@ -374,6 +377,71 @@ TEST_F(QuilletFileReaderTest, RefusesHugePackageXml) {
     expectRefused(buildZip({{"[Content_Types].xml", typesXml(spaces)}}), "is too large: 419431");
     expectRefused(usualPackage({{"_rels/.rels", relationshipsXmlOf(spaces)}}),
                   "is too large: 419431");
+}
+
+// An item of that name that claims to be far larger than a package may be.
+ZipEntry bomb(const std::string& name) {
+    ZipEntry entry{name, std::string(5'000'000, 'x')};
+    entry.method = 8;
+    entry.isZip64 = true;
+    entry.size = std::uint64_t{4} << 30;
+    return entry;
+}
+
+TEST_F(QuilletFileReaderTest, CountsNoItemsThatAreNoParts) {
+    const auto package = readUsual({{"a.xml", "<a/>"},
+                                    bomb("b.untyped"),
+                                    bomb("_rels/b.untyped.rels"),
+                                    bomb("[trash]/0000.xml"),
+                                    bomb("folder/")});
+    EXPECT_THAT(namesOf(package), ElementsAre(u"/a.xml"));
+}
+
+TEST_F(QuilletFileReaderTest, LimitsPartsAndTheirRelationships) {
+    expectRefused(usualPackage({bomb("a.xml")}), "entry \"a.xml\" is too large: 4294967296 bytes");
+    expectRefused(usualPackage({bomb("_rels/.rels")}), "entry \"_rels/.rels\" is too large");
+    expectRefused(usualPackage({{"a.xml", "<a/>"}, bomb("_rels/a.xml.rels")}),
+                  "entry \"_rels/a.xml.rels\" is too large");
+    expectRefused(buildZip({bomb("[Content_Types].xml")}),
+                  "entry \"[Content_Types].xml\" is too large");
+    ZipEntry half = bomb("a.xml/[0].piece");
+    half.size = std::uint64_t{1} << 63;
+    ZipEntry otherHalf = half;
+    otherHalf.name = "a.xml/[1].last.piece";
+    expectRefused(usualPackage({half, otherHalf}), "is too large: 9223372036854775808 bytes");
+    half.name = "[Content_Types].xml/[0].piece";
+    otherHalf.name = "[Content_Types].xml/[1].last.piece";
+    expectRefused(buildZip({half, otherHalf}), "is too large: 9223372036854775808 bytes");
+}
+
+TEST_F(QuilletFileReaderTest, TellsTheSizeOfWhatItReads) {
+    const std::string relationships =
+        relationshipsXmlOf("<Relationship Id='a' Type='t' Target='x'/>");
+    const std::string text(100'000, 'x');
+    const std::string bytes = usualPackage({{"a.xml", "<a/>"},
+                                            {"_rels/a.xml.rels", relationships},
+                                            {"_rels/.rels", relationships},
+                                            {"b.xml/[0].piece", text, true},
+                                            {"b.xml/[1].last.piece", "end"},
+                                            {"c.untyped", text}});
+    QuilletFileReader reader(folder_.file("a.docx", bytes));
+    const platform::package::PackageSize size = reader.size();
+    EXPECT_EQ(size.parts, 2U);
+    EXPECT_EQ(size.content, 4 + text.size() + 3);
+    EXPECT_EQ(size.relationships, 2 * relationships.size());
+    EXPECT_EQ(size.compressed, relationships.size());
+    const QuilletFilePackage package = reader.read();
+    EXPECT_THAT(namesOf(package), ElementsAre(u"/a.xml", u"/b.xml"));
+}
+
+TEST_F(QuilletFileReaderTest, ReadsTheFileWhoseSizeItTold) {
+    const std::u16string path = folder_.file("a.docx", usualPackage({{"a.xml", "<a/>"}}));
+    QuilletFileReader reader(path);
+    EXPECT_EQ(reader.size().content, 4U);
+    folder_.file("b.docx", usualPackage({{"b.xml", "<another/>"}}));
+    std::filesystem::rename(folder_.path() / "b.docx", folder_.path() / "a.docx");
+    EXPECT_THAT(namesOf(reader.read()), ElementsAre(u"/a.xml"));
+    EXPECT_THAT(namesOf(reader.read()), ElementsAre(u"/b.xml"));
 }
 
 TEST_F(QuilletFileReaderTest, ReadsSeveralHundredPartsAndEmbeddedPackages) {

@@ -49,6 +49,20 @@ protected:
                     ThrowsMessage<std::runtime_error>(HasSubstr(message)));
     }
 
+    void expectRefusedByLimits(const std::string& bytes, const std::string& message) {
+        const zip::Archive archive(write(bytes));
+        EXPECT_THAT([&] { archive.requireWithinLimits(entriesOf(archive)); },
+                    ThrowsMessage<std::runtime_error>(HasSubstr(message)));
+    }
+
+    static std::vector<const zip::Archive::Entry*> entriesOf(const zip::Archive& archive) {
+        std::vector<const zip::Archive::Entry*> entries;
+        for (const zip::Archive::Entry& entry : archive.entries()) {
+            entries.push_back(&entry);
+        }
+        return entries;
+    }
+
     void expectRefusedAtReading(const std::string& bytes, const std::string& message) {
         EXPECT_THAT([&] { readOnly(bytes); },
                     ThrowsMessage<std::runtime_error>(HasSubstr(message)));
@@ -196,6 +210,7 @@ TEST_F(ZipArchiveTest, NeverReturnsChangedContentWhicheverByteIsDamaged) {
         damaged[at] = static_cast<char>(damaged[at] ^ 0x55);
         try {
             zip::Archive archive(write(damaged));
+            archive.requireWithinLimits(entriesOf(archive));
             for (const zip::Archive::Entry& entry : archive.entries()) {
                 std::vector<std::uint8_t> out(entry.size);
                 archive.read(entry, out);
@@ -345,10 +360,10 @@ TEST_F(ZipArchiveTest, RefusesAnEntryBeyondTheLimitByItsDeclaredSize) {
     ZipEntry entry{"a", std::string(5'000'000, 'x')};
     entry.method = 8;
     entry.size = zip::maxEntryBytes + 1;
-    expectRefusedAtOpening(buildZip({entry}), "\"a\" is too large: 1073741825 bytes");
+    expectRefusedByLimits(buildZip({entry}), "\"a\" is too large: 1073741825 bytes");
     entry.isZip64 = true;
     entry.size = std::uint64_t{4} << 30;
-    expectRefusedAtOpening(buildZip({entry}), "\"a\" is too large: 4294967296 bytes");
+    expectRefusedByLimits(buildZip({entry}), "\"a\" is too large: 4294967296 bytes");
 }
 
 TEST_F(ZipArchiveTest, RefusesATotalBeyondTheLimit) {
@@ -357,14 +372,26 @@ TEST_F(ZipArchiveTest, RefusesATotalBeyondTheLimit) {
         entry.method = 8;
         entry.size = zip::maxEntryBytes * 3 / 4;
     }
-    expectRefusedAtOpening(buildZip(entries), "is too large: it expands to 2415919104 bytes");
+    expectRefusedByLimits(buildZip(entries), "is too large: it expands to 2415919104 bytes");
+}
+
+TEST_F(ZipArchiveTest, LimitsOnlyWhatIsAskedFor) {
+    ZipEntry huge{"b", std::string(5'000'000, 'x')};
+    huge.method = 8;
+    huge.isZip64 = true;
+    huge.size = std::uint64_t{4} << 30;
+    const zip::Archive archive(write(buildZip({{"a", "text"}, huge})));
+    const zip::Archive::Entry* const first = archive.entries().data();
+    EXPECT_NO_THROW(archive.requireWithinLimits({&first, 1}));
+    EXPECT_NO_THROW(archive.requireWithinLimits({}));
+    EXPECT_THROW(archive.requireWithinLimits(entriesOf(archive)), std::runtime_error);
 }
 
 TEST_F(ZipArchiveTest, RefusesASizeToWhichTheDataCannotExpand) {
     ZipEntry entry{"a", std::string(1000, 'x')};
     entry.method = 8;
     entry.size = 1000 * 1032 + 2000;
-    expectRefusedAtOpening(buildZip({entry}), "\"a\" has a wrong size");
+    expectRefusedByLimits(buildZip({entry}), "\"a\" has a wrong size");
 }
 
 TEST_F(ZipArchiveTest, AcceptsTheBestThatDeflateCanDo) {
@@ -374,7 +401,7 @@ TEST_F(ZipArchiveTest, AcceptsTheBestThatDeflateCanDo) {
 
 TEST_F(ZipArchiveTest, RefusesABombBeforeExpandingAnyOfIt) {
     const std::string bytes = buildZip({{"a", std::string(100 << 20, '\0'), true}});
-    expectRefusedAtOpening(bytes, "expands too much: from");
+    expectRefusedByLimits(bytes, "expands too much: from");
 }
 
 TEST_F(ZipArchiveTest, LooksForTheDirectoryOnceHoweverManyEndRecordsThereAre) {
