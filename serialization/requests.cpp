@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // The two request handlers.
 
+#include <cstddef>
 #include <utility>
 
 #include "json/parser.h"
@@ -25,9 +26,12 @@ void Serialization::handleReadRequest(const JsonMessage& message) {
     const std::string filePath = request[filePathKey].get<std::string>();
 
     std::u16string path = to_ustring(filePath);
-    json::Object result = contentType == packageContentType ? readPackageDocument(std::move(path))
-                                                            : readTextDocument(std::move(path));
-    publishReadResult(readResponsePrefix + rtcId, std::move(result));
+    const std::string channel = readResponsePrefix + rtcId;
+    const std::size_t longestAnswer = messageService->maxPayload(channel);
+    json::Object result = contentType == packageContentType
+                              ? readPackageDocument(std::move(path), longestAnswer)
+                              : readTextDocument(std::move(path), longestAnswer);
+    publishReadResult(channel, std::move(result), longestAnswer);
 }
 
 void Serialization::handleWriteRequest(const JsonMessage& message) {

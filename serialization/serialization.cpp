@@ -1,8 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "serialization/serialization.h"
 
+#include <algorithm>
 #include <cstddef>
 #include <optional>
+#include <stdexcept>
 #include <utility>
 
 #include "json/serialize.h"
@@ -11,6 +13,15 @@
 namespace EditorServices {
 
 using platform::DataBuffer;
+
+namespace {
+
+std::string tooLarge(std::size_t longestAnswer) {
+    return "The document is too large: its message would be longer than the " +
+           std::to_string(longestAnswer) + " bytes that can be sent";
+}
+
+}  // namespace
 
 Serialization::Serialization() {
     initializeMessageService();
@@ -39,20 +50,31 @@ void Serialization::publish(const std::string& channel, json::Value value) const
     messageService->publish(channel, DataBuffer::copyOf(text));
 }
 
-void Serialization::publishReadResult(const std::string& channel, json::Value result) const {
-    const std::size_t maxPayload = messageService->maxPayload(channel);
-    const std::optional<std::string> text = json::serialize(result, maxPayload);
+void Serialization::publishReadResult(const std::string& channel, json::Value result,
+                                      std::size_t longestAnswer) const {
+    const std::optional<std::string> text = json::serialize(result, longestAnswer);
     if (!text) {
-        publish(channel, json::Object{{kExceptionKey,
-                                       "The document is too large: its message would be longer "
-                                       "than the " +
-                                           std::to_string(maxPayload) + " bytes that can be sent"},
-                                      {kStatusKey, false}});
+        publish(channel,
+                json::Object{{kExceptionKey, tooLarge(longestAnswer)}, {kStatusKey, false}});
         return;
     }
     // A large document shall not be held three times.
     result = json::Value();
     messageService->publish(channel, DataBuffer::copyOf(*text));
+}
+
+// Reading a text takes up to three times its bytes beside them, for UTF-16 and the charset's own
+// form. Its JSON may have six bytes for each of its own; while that grows, it takes two and a half
+// times what it has in the end.
+void Serialization::awaitMemory(std::uintmax_t bytes, std::uintmax_t more,
+                                std::size_t longestAnswer) const {
+    if (bytes > longestAnswer) {
+        throw std::runtime_error(tooLarge(longestAnswer));
+    }
+    if (messageService != nullptr) {
+        const std::uintmax_t json = std::min<std::uintmax_t>(6 * bytes, longestAnswer);
+        messageService->awaitMemory(bytes + std::max(3 * bytes, json / 2 * 5) + more);
+    }
 }
 
 }  // namespace EditorServices

@@ -4,7 +4,9 @@
 // wire.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
+#include <limits>
 #include <memory>
 #include <string>
 #include <vector>
@@ -98,6 +100,9 @@ public:
     /// the object is destroyed.
     void stop() noexcept {}
 
+    /// No limit to the length of an answer.
+    static constexpr std::size_t anyLength = std::numeric_limits<std::size_t>::max();
+
     // Reading. An exception that leaves a request handler means that the request gets no answer.
 
     /// The payload as an object; empty when it is not one whole JSON object.
@@ -111,9 +116,10 @@ public:
     // Reading a text file. Paths are passed by value down the chain, so that each step owns its
     // own.
 
-    /// The result object of a read: "status" with "data", or with "exception". Throws nothing that
-    /// derives from std::exception. Linear in the size of the file, which is held in memory whole.
-    json::Object readTextDocument(std::u16string path) const;
+    /// The result object of a read: "status" with "data", or with "exception", which is all that
+    /// there is of a file that is longer than `longestAnswer` bytes. Throws nothing that derives
+    /// from std::exception. Linear in the size of the file, which is held in memory whole.
+    json::Object readTextDocument(std::u16string path, std::size_t longestAnswer = anyLength) const;
 
     /// The text of the file at `path` in the file's own charset, without a byte-order mark.
     /// Throws what readTextFile throws.
@@ -131,9 +137,11 @@ public:
     // Reading a document package.
 
     /// The result object of a read: "status" with the package's parts and relationships, or with
-    /// "exception"; "status" alone when nothing is at `path`. Throws nothing that derives from
-    /// std::exception.
-    json::Object readPackageDocument(std::u16string path) const;
+    /// "exception", which is all that there is of a package whose parts have more than
+    /// `longestAnswer` bytes; "status" alone when nothing is at `path`. Throws nothing that derives
+    /// from std::exception.
+    json::Object readPackageDocument(std::u16string path,
+                                     std::size_t longestAnswer = anyLength) const;
 
     /// The document JSON of `package`: its parts under "parts", its own relationships under
     /// "relationships". This and the conversions below throw std::runtime_error for text that is
@@ -218,10 +226,16 @@ private:
     /// Throws std::runtime_error "Out of memory!" when the message's buffer cannot be allocated.
     void publish(const std::string& channel, json::Value value) const;
 
-    /// The same for the result of a read. A result that is too long for the message service is
-    /// replaced by one that says so, {"exception": ..., "status": false}, without taking the memory
-    /// for its text.
-    void publishReadResult(const std::string& channel, json::Value result) const;
+    /// The same for the result of a read. A result that is longer than `longestAnswer` is replaced
+    /// by one that says so, {"exception": ..., "status": false}, without taking the memory for its
+    /// text.
+    void publishReadResult(const std::string& channel, json::Value result,
+                           std::size_t longestAnswer) const;
+
+    /// Returns when there is memory for a document of `bytes` with what it takes to answer with it,
+    /// and `more` bytes. Throws std::runtime_error when no answer of up to `longestAnswer` bytes
+    /// can hold it.
+    void awaitMemory(std::uintmax_t bytes, std::uintmax_t more, std::size_t longestAnswer) const;
 
     std::shared_ptr<platform::messaging::MessageService> messageService;
     std::shared_ptr<platform::messaging::Subscription> readSubscription;

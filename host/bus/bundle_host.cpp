@@ -14,6 +14,7 @@
 #include "host/bus/request_admission.h"
 #include "host/commands/exit_status.h"
 #include "host/guard/guarded_client.h"
+#include "host/limits/memory_limit.h"
 #include "platform/messaging/transport.h"
 
 namespace host {
@@ -35,11 +36,11 @@ constexpr std::size_t mostQueuedMessages = 4096;
 platform::messaging::Transport transportOf(const std::shared_ptr<InProcessBus>& bus, Guard guard,
                                            std::uint64_t memoryForRequests) {
     using namespace platform::messaging;
-    const auto budget = std::make_shared<MemoryBudget>(memoryForRequests);
+    const RequestBudgets budgets(memoryForRequests, memoryForDocuments(memoryForRequests));
     return [=](const std::string& name, const MessageServiceOptions&) {
         std::shared_ptr<MessageService> client = bus->connect(name).get();
         if (memoryForRequests != 0) {
-            client = answeringFailedReads(admittingRequests(std::move(client), budget));
+            client = answeringFailedReads(admittingRequests(std::move(client), budgets));
         }
         if (guard.saves) {
             client = savingSafely(std::move(client), guard);

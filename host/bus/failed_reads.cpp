@@ -87,6 +87,8 @@ public:
         return client_->maxPayload(channel);
     }
 
+    void awaitMemory(std::size_t bytes) override { client_->awaitMemory(bytes); }
+
 private:
     const std::shared_ptr<MessageService> client_;
 };

@@ -32,16 +32,36 @@ using platform::messaging::MessageHandler;
 using platform::messaging::MessageService;
 using platform::messaging::Subscription;
 
-// What each thread may take without asking: the values of a request to read, hundreds of times
-// over.
-constexpr std::size_t usualSmallRequest = std::size_t{4} << 20U;
-
-// The share of the budget that these take, with as many threads as a machine has that has so
-// little.
-constexpr std::size_t smallShare = 64;
+// What each thread may take without asking, of a budget of that size: the values of a request to
+// read, hundreds of times over; all threads together a small share, with as many as a machine has
+// that has so little.
+std::size_t smallWork(const MemoryBudget& budget) {
+    constexpr std::size_t usual = std::size_t{4} << 20U;
+    constexpr std::size_t share = 64;
+    return std::min(usual, budget.size() / share);
+}
 
 // The share of the budget whose size the messages may have together that wait.
 constexpr std::size_t waitingShare = 8;
+
+// Reserved for the document of the message that the thread handles; null when it handles none.
+thread_local MemoryBudget::Reservation* documentOfThread = nullptr;
+
+// Has `handler` handle `message`, and gives back what was reserved for its document.
+void handleOne(const MessageHandler& handler, const JsonMessage& message) {
+    class Document {
+    public:
+        Document() { documentOfThread = &reservation_; }
+        Document(const Document&) = delete;
+        Document& operator=(const Document&) = delete;
+        ~Document() { documentOfThread = nullptr; }
+
+    private:
+        MemoryBudget::Reservation reservation_;
+    };
+    const Document document;
+    handler(message);
+}
 
 // The requests on one channel.
 class Admission {
@@ -56,16 +76,16 @@ public:
           handler_(std::move(handler)) {}
 
     void handle(const JsonMessage& message) {
-        const std::size_t smallest = std::min(usualSmallRequest, budget_->size() / smallShare);
+        const std::size_t smallest = smallWork(*budget_);
         const std::size_t length = message.payload().size();
         // Most messages are so short that nothing has to be counted.
         if (length + json::mostMemoryToParse(length) <= smallest) {
-            handler_(message);
+            handleOne(handler_, message);
             return;
         }
         const std::size_t memory = length + json::memoryToParse(message.payload());
         if (memory <= smallest) {
-            handler_(message);
+            handleOne(handler_, message);
         } else if (memory > budget_->size()) {
             refuse(message, "The request is too large: it would take " + std::to_string(memory) +
                                 " bytes of memory, and requests may take " +
@@ -124,7 +144,7 @@ private:
         }
         // Failures are not left to the bus, for which they would be those of another message.
         try {
-            handler_(request.message);
+            handleOne(handler_, request.message);
         } catch (const std::exception& error) {
             logFailure(request, error.what());
         } catch (...) {
@@ -172,14 +192,14 @@ private:
 
 class AdmittingClient final : public MessageService {
 public:
-    AdmittingClient(std::shared_ptr<MessageService> client, std::shared_ptr<MemoryBudget> budget,
+    AdmittingClient(std::shared_ptr<MessageService> client, RequestBudgets budgets,
                     std::shared_ptr<RequestMetrics> metrics)
-        : client_(std::move(client)), budget_(std::move(budget)), metrics_(std::move(metrics)) {}
+        : client_(std::move(client)), budgets_(std::move(budgets)), metrics_(std::move(metrics)) {}
 
     futures::Future<std::shared_ptr<Subscription>> subscribe(const std::string& channel,
                                                              MessageHandler handler) override {
-        const auto admission =
-            std::make_shared<Admission>(client_, budget_, metrics_, channel, std::move(handler));
+        const auto admission = std::make_shared<Admission>(client_, budgets_.requests, metrics_,
+                                                           channel, std::move(handler));
         return client_->subscribe(
             channel, [admission](const JsonMessage& message) { admission->handle(message); });
     }
@@ -192,18 +212,34 @@ public:
         return client_->maxPayload(channel);
     }
 
+    // Nothing is held meanwhile for which others may wait here. So what is beyond the budget waits
+    // for all of it and goes on: the memory that was asked for is the most that may be needed.
+    void awaitMemory(std::size_t bytes) override {
+        MemoryBudget& budget = *budgets_.documents;
+        if (documentOfThread != nullptr) {
+            *documentOfThread = {};
+            if (bytes > smallWork(budget)) {
+                *documentOfThread = budget.reserve(std::min(bytes, budget.size()));
+            }
+        }
+    }
+
 private:
     const std::shared_ptr<MessageService> client_;
-    const std::shared_ptr<MemoryBudget> budget_;
+    const RequestBudgets budgets_;
     const std::shared_ptr<RequestMetrics> metrics_;
 };
 
 }  // namespace
 
+RequestBudgets::RequestBudgets(std::size_t requestBytes, std::size_t documentBytes)
+    : requests(std::make_shared<MemoryBudget>(requestBytes)),
+      documents(std::make_shared<MemoryBudget>(documentBytes)) {}
+
 std::shared_ptr<MessageService> admittingRequests(std::shared_ptr<MessageService> client,
-                                                  std::shared_ptr<MemoryBudget> budget,
+                                                  RequestBudgets budgets,
                                                   std::shared_ptr<RequestMetrics> metrics) {
-    return std::make_shared<AdmittingClient>(std::move(client), std::move(budget),
+    return std::make_shared<AdmittingClient>(std::move(client), std::move(budgets),
                                              std::move(metrics));
 }
 

@@ -12,9 +12,18 @@
 
 namespace host {
 
+/// The memory that is shared out. A document waits for some while its request has some, so each has
+/// a budget of its own: nobody who has memory of the second waits for memory of the first.
+struct RequestBudgets {
+    RequestBudgets(std::size_t requestBytes, std::size_t documentBytes);
+
+    std::shared_ptr<platform::messaging::MemoryBudget> requests;   ///< and the values in them
+    std::shared_ptr<platform::messaging::MemoryBudget> documents;  ///< that they ask for
+};
+
 /// A client that does what `client` does, except that the handler of a subscription gets a large
-/// message only when `budget` has the memory for it: its bytes, and what its JSON values take when
-/// they are parsed (json::memoryToParse). What is large is up to the size of the budget.
+/// message only when `budgets.requests` has the memory for it: its bytes, and what its JSON values
+/// take when they are parsed (json::memoryToParse). What is large is up to the size of the budget.
 ///
 /// Of the large messages of a channel one is handled at a time, in the order in which they come, so
 /// that small ones find a thread beside it. A message that goes beyond the budget altogether, or
@@ -25,9 +34,11 @@ namespace host {
 ///
 /// The memory of a large message's values is given back to the system when they have been handled.
 /// What the handler throws for a large message is logged.
+///
+/// awaitMemory() takes what it is asked for from `budgets.documents`; what goes beyond that
+/// altogether waits until it has all of it.
 std::shared_ptr<platform::messaging::MessageService> admittingRequests(
-    std::shared_ptr<platform::messaging::MessageService> client,
-    std::shared_ptr<platform::messaging::MemoryBudget> budget,
+    std::shared_ptr<platform::messaging::MessageService> client, RequestBudgets budgets,
     std::shared_ptr<RequestMetrics> metrics = std::make_shared<RequestMetrics>());
 
 }  // namespace host

@@ -141,6 +141,8 @@ public:
         return client_->maxPayload(channel);
     }
 
+    void awaitMemory(std::size_t bytes) override { client_->awaitMemory(bytes); }
+
 private:
     MessageHandler prepared(const std::string& channel, MessageHandler handler) const {
         return

@@ -32,6 +32,7 @@
 #include "host/files/file_service.h"
 #include "host/guard/guarded_client.h"
 #include "host/limits/confinement.h"
+#include "host/limits/memory_limit.h"
 #include "host/limits/open_files.h"
 #include "host/metrics/health_check.h"
 #include "host/metrics/metrics_server.h"
@@ -375,20 +376,21 @@ int runServe(const ServeOptions& options, int output) {
 
     ServingOptions serving;
     serving.roots = options.roots;
-    const auto budget = std::make_shared<MemoryBudget>(memoryToHandle(options.memoryForRequests));
+    const RequestBudgets budgets(memoryToHandle(options.memoryForRequests),
+                                 memoryForDocuments(options.memoryForRequests));
     const std::unique_ptr<MetricsServer> metrics =
-        makeMetricsServer(options, bus, budget, serving.metrics);
+        makeMetricsServer(options, bus, budgets.requests, serving.metrics);
     const LoadedLibrary library(options.bundle);
     if (confinements) {
         // The threads that handle requests come from this one.
         confinements->bundle.confineThisThread();
         serving.prepareThread = [&confinements] { confinements->documents.confineThisThread(); };
     }
-    const auto connectClient = [bus, budget, serving](const std::string& name) {
+    const auto connectClient = [bus, budgets, serving](const std::string& name) {
         // The bus is connected, so that this is no waiting. A request that waits for memory may be
         // handled on another thread than the one that brought it, and is counted on that.
         return answeringFailedReads(servingClient(
-            admittingRequests(bus->connect(name).get(), budget, serving.metrics), serving));
+            admittingRequests(bus->connect(name).get(), budgets, serving.metrics), serving));
     };
     platform::messaging::setTransport([connectClient, guard](
                                           const std::string& name,

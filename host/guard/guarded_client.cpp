@@ -104,6 +104,8 @@ public:
         return client_->maxPayload(channel);
     }
 
+    void awaitMemory(std::size_t bytes) override { client_->awaitMemory(bytes); }
+
 private:
     static void handleWrite(MessageService& client, Saves& saves, const MessageHandler& bundle,
                             const JsonMessage& message) {

@@ -23,4 +23,10 @@ constexpr std::uint64_t memoryForRequests(std::uint64_t limit) {
     return limit / 2;
 }
 
+/// What documents that are read, and their JSON, may take together, in bytes, beside
+/// `memoryForRequests`. The rest is for what is written, and the program.
+constexpr std::uint64_t memoryForDocuments(std::uint64_t memoryForRequests) {
+    return memoryForRequests / 4 * 3;
+}
+
 }  // namespace host

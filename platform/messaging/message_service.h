@@ -82,6 +82,11 @@ public:
     virtual std::size_t maxPayload([[maybe_unused]] const std::string& channel) const {
         return std::numeric_limits<std::size_t>::max();
     }
+
+    /// Returns when there is memory of `bytes` for the message that the calling handler handles.
+    /// The handler has it until it returns, or asks again, for other bytes then. Whoever is about
+    /// to take much memory asks before; services that do not share it out need not override this.
+    virtual void awaitMemory([[maybe_unused]] std::size_t bytes) {}
 };
 
 /// Options of a client, by name. None are defined for the in-process bus.

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 // Reads document packages into the document JSON.
 
+#include <cstddef>
+#include <cstdint>
 #include <exception>
 #include <string_view>
 #include <utility>
@@ -18,10 +20,26 @@ using platform::DataBuffer;
 using platform::filesystem::exists;
 using platform::i18n::codecvt_ustring_to_string;
 using platform::i18n::to_string;
+using platform::package::PackageSize;
 using platform::package::QuilletFilePackage;
 using platform::package::QuilletFileReader;
 
-json::Object Serialization::readPackageDocument(std::u16string path) const {
+namespace {
+
+/// The most bytes that reading a package of `size` takes beside the content of its parts and its
+/// JSON: images are a third longer as data URIs, and parts and relationships are more than their
+/// bytes.
+std::uintmax_t memoryBesideContent(const PackageSize& size) {
+    constexpr std::uintmax_t perPart = 3000;
+    constexpr std::uintmax_t perByteOfRelationships = 25;
+    return size.content / 3 + size.parts * perPart + size.relationships * perByteOfRelationships +
+           size.compressed;
+}
+
+}  // namespace
+
+json::Object Serialization::readPackageDocument(std::u16string path,
+                                                std::size_t longestAnswer) const {
     json::Object result;
     try {
         if (!exists(path)) {
@@ -30,6 +48,8 @@ json::Object Serialization::readPackageDocument(std::u16string path) const {
             return result;
         }
         QuilletFileReader reader(std::move(path));
+        const PackageSize size = reader.size();
+        awaitMemory(size.content, memoryBesideContent(size), longestAnswer);
         result = packageToJson(reader.read());
         result[kStatusKey] = true;
     } catch (const std::exception& error) {

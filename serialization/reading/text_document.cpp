@@ -6,7 +6,9 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstddef>
+#include <cstdint>
 #include <exception>
+#include <filesystem>
 #include <iostream>
 #include <stdexcept>
 #include <string>
@@ -75,6 +77,14 @@ std::string cleaned(std::string bytes, const std::string& charset) {
     return bytes;
 }
 
+/// The bytes of the regular file at `path`; 0 where there is none.
+std::uintmax_t sizeOf(const std::u16string& path) {
+    std::error_code error;
+    const std::uintmax_t size =
+        std::filesystem::file_size(make_native_access_form_with_cleanup(path), error);
+    return error ? 0 : size;
+}
+
 /// Opens `path` if there is a regular file; what cannot be opened as such reads as empty, so it
 /// returns nothing then. But some errors say nothing of the file: there was no memory, or another
 /// program did not give up its lease of the file. It may hold a text, which must not pass for
@@ -118,11 +128,16 @@ std::string readToEnd(const FileDescriptor& file, std::size_t expectedSize) {
 
 }  // namespace
 
-json::Object Serialization::readTextDocument(std::u16string path) const {
+json::Object Serialization::readTextDocument(std::u16string path, std::size_t longestAnswer) const {
     json::Object result;
     try {
         if (exists(path)) {
             result[kStatusKey] = true;
+            // What stays of a text is hardly shorter than its file: a byte-order mark goes, and
+            // escape sequences that a charset can do without.
+            const std::uintmax_t size = sizeOf(path);
+            requireTextLength(size);
+            awaitMemory(size, 0, longestAnswer);
             result[kDataKey] = readTextFileContent(std::move(path));
         } else {
             result[kStatusKey] = false;

@@ -34,6 +34,8 @@ using testing::SizeIs;
 
 constexpr std::size_t kMegabyte = 1'000'000;
 
+constexpr const char* kTooLarge = R"({"exception":"The document is too large: )";
+
 /// `size` bytes of the lines of an XML text.
 std::string xmlText(std::size_t size) {
     std::string text = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<text>\n";
@@ -57,11 +59,12 @@ std::string noise(std::size_t size) {
     return bytes;
 }
 
-/// A client of a bus that takes payloads up to a length.
+/// A client of a bus that takes payloads up to a length, and notes for how much memory is asked.
 class LimitedClient final : public platform::messaging::MessageService {
 public:
-    LimitedClient(std::shared_ptr<MessageService> client, const std::size_t& maxPayload)
-        : client_(std::move(client)), maxPayload_(maxPayload) {}
+    LimitedClient(std::shared_ptr<MessageService> client, const std::size_t& maxPayload,
+                  std::size_t& awaited)
+        : client_(std::move(client)), maxPayload_(maxPayload), awaited_(awaited) {}
 
     futures::Future<std::shared_ptr<platform::messaging::Subscription>> subscribe(
         const std::string& channel, platform::messaging::MessageHandler handler) override {
@@ -71,10 +74,12 @@ public:
         return client_->publish(channel, std::move(payload));
     }
     std::size_t maxPayload(const std::string&) const override { return maxPayload_; }
+    void awaitMemory(std::size_t bytes) override { awaited_ = bytes; }
 
 private:
     const std::shared_ptr<MessageService> client_;
     const std::size_t& maxPayload_;
+    std::size_t& awaited_;
 };
 
 class DocumentCopies : public testing::Test {
@@ -83,8 +88,8 @@ protected:
         using namespace platform::messaging;
         setTransport([this](const std::string& clientName, const MessageServiceOptions&) {
             futures::Promise<std::shared_ptr<MessageService>> limited;
-            limited.setValue(
-                std::make_shared<LimitedClient>(bus->connect(clientName).get(), maxPayload));
+            limited.setValue(std::make_shared<LimitedClient>(bus->connect(clientName).get(),
+                                                             maxPayload, awaited));
             return limited.getFuture();
         });
         runner = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
@@ -108,6 +113,7 @@ protected:
     Allocations read(const char* contentType, const std::string& path) {
         DataBuffer request = DataBuffer::copyOf(json::serialize(json::Value(
             json::Object{{"rtcId", "1"}, {"contentType", contentType}, {"filePath", path}})));
+        awaited = 0;
         test::beginAccount();
         client->publish("/zpr/service/readRequest_cpp", std::move(request)).get();
         bus->waitUntilIdle();
@@ -153,6 +159,24 @@ protected:
                                                               {"relationships", json::Array()}}}}));
     }
 
+    void writePackage(json::Array parts, json::Array relationships) {
+        write(json::serialize(json::Value(
+            json::Object{{"rtcId", "1"},
+                         {"contentType", "text/xml"},
+                         {"filePath", packagePath()},
+                         {"content", json::Object{{"parts", std::move(parts)},
+                                                  {"relationships", std::move(relationships)}}}})));
+        ASSERT_EQ(answer, "true");
+    }
+
+    void writePackage(const char* contentType, std::string content) {
+        writePackage({json::Object{{"partUri", "/part"},
+                                   {"contentType", contentType},
+                                   {"content", std::move(content)},
+                                   {"relationship", json::Null()}}},
+                     {});
+    }
+
     std::string packagePath() const { return (folder / "package.docx").string(); }
 
     double timesTheAnswer(const Allocations& allocations) const {
@@ -163,6 +187,7 @@ protected:
     std::shared_ptr<platform::messaging::InProcessBus> bus =
         platform::messaging::InProcessBus::create();
     std::size_t maxPayload = std::numeric_limits<std::size_t>::max();
+    std::size_t awaited = 0;
     std::mutex mutex;
     std::string answer;
     std::size_t answerSize = 0;
@@ -249,21 +274,121 @@ TEST_F(DocumentCopies, OfAPackageThatIsRead) {
 // The part's content, and as much of the answer's text, six bytes for one, as could be sent.
 TEST_F(DocumentCopies, OfAPackageWhoseAnswerIsTooLongToBeSent) {
     constexpr std::size_t size = 60 * kMegabyte;
-    write(json::serialize(json::Value(json::Object{
-        {"rtcId", "1"},
-        {"contentType", "text/xml"},
-        {"filePath", packagePath()},
-        {"content",
-         json::Object{{"parts", json::Array{json::Object{{"partUri", "/part.bin"},
-                                                         {"contentType", "x/y"},
-                                                         {"content", std::string(size, '\0')},
-                                                         {"relationship", json::Null()}}}},
-                      {"relationships", json::Array()}}}})));
-    ASSERT_EQ(answer, "true");
+    writePackage("x/y", std::string(size, '\0'));
     maxPayload = 64 * kMegabyte;
     const Allocations allocations = read("text/xml", packagePath());
-    EXPECT_THAT(answer, testing::StartsWith(R"({"exception":"The document is too large: )"));
+    EXPECT_THAT(answer, testing::StartsWith(kTooLarge));
     EXPECT_LE(allocations.peak, size + maxPayload + kMegabyte);
+    EXPECT_LE(allocations.peak, awaited);
+}
+
+// None at all, when what is in them is longer than can be sent.
+TEST_F(DocumentCopies, OfDocumentsThatAreLongerThanCanBeSent) {
+    maxPayload = 10 * kMegabyte;
+    writePackage("x/y", std::string(11 * kMegabyte, 'x'));
+    EXPECT_LE(read("text/xml", packagePath()).peak, kMegabyte / 2);
+    EXPECT_THAT(answer, testing::StartsWith(kTooLarge));
+
+    const std::string path = writeTextFile(std::string(maxPayload + 1, 'x'));
+    EXPECT_LE(read("text/plain", path).peak, kMegabyte / 2);
+    EXPECT_THAT(answer, testing::StartsWith(kTooLarge));
+    writeTextFile(std::string(maxPayload - kMegabyte, 'x'));
+    read("text/plain", path);
+    EXPECT_THAT(answer, testing::StartsWith(R"({"data":"xxx)"));
+}
+
+// Neither of a path that no file can have.
+TEST_F(DocumentCopies, OfAPathThatIsTooLong) {
+    const std::string path(4 * kMegabyte, '/');
+    for (const char* contentType : {"text/plain", "text/xml"}) {
+        const Allocations allocations = read(contentType, path);
+        EXPECT_THAT(answer, testing::HasSubstr("File name too long"));
+        EXPECT_LE(static_cast<double>(allocations.peak) / static_cast<double>(path.size()), 4.5);
+    }
+    EXPECT_LE(static_cast<double>(
+                  write(json::serialize(json::Value(json::Object{{"rtcId", "1"},
+                                                                 {"contentType", "text/plain"},
+                                                                 {"filePath", path},
+                                                                 {"encoding", "UTF-8"},
+                                                                 {"content", ""}})))
+                      .peak) /
+                  static_cast<double>(path.size()),
+              5.5);
+}
+
+class MemoryForTexts : public DocumentCopies, public testing::WithParamInterface<std::string> {};
+
+TEST_P(MemoryForTexts, IsAwaited) {
+    std::string text;
+    while (text.size() < 3 * kMegabyte) {
+        text += GetParam();
+    }
+    const Allocations allocations = read("text/plain", writeTextFile(text));
+    EXPECT_THAT(answer, testing::StartsWith(R"({"data":)"));
+    EXPECT_LE(allocations.peak, awaited);
+    // Beyond that, requests would wait for nothing.
+    EXPECT_LE(awaited, 16 * text.size());
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    DocumentCopies, MemoryForTexts,
+    testing::Values("plain text\n", "\x01", "Caf\xE9 cr\xE8me, \xE0 la carte et tout de suite. ",
+                    "\x1B$B%F%9%H\x1B(B text\n", "~{::Wb~} text\n", std::string("t\0", 2),
+                    std::string("\0\0\x4E\x2D\0\0\0\n", 8), "\xFF\xFE\x01\xE0\x80\x9F"));
+
+class MemoryForPackages : public DocumentCopies {
+protected:
+    void expectAwaited() {
+        const Allocations allocations = read("text/xml", packagePath());
+        EXPECT_THAT(answer, testing::StartsWith(R"({"parts":)"));
+        EXPECT_LE(allocations.peak, awaited);
+    }
+
+    static json::Object relationship(const std::string& id, const std::string& type) {
+        return {{"relationshipId", id},
+                {"relationshipType", type},
+                {"target", "x"},
+                {"targetMode", "External"}};
+    }
+};
+
+TEST_F(MemoryForPackages, IsAwaitedForImages) {
+    writePackage("image/png", noise(5 * kMegabyte));
+    expectAwaited();
+}
+
+TEST_F(MemoryForPackages, IsAwaitedForBytesThatAreEscaped) {
+    writePackage("x/y", std::string(5 * kMegabyte, '\0'));
+    expectAwaited();
+    EXPECT_LE(awaited, 18 * 5 * kMegabyte);
+}
+
+TEST_F(MemoryForPackages, IsAwaitedForBytesOfWhichTheLastAreEscaped) {
+    writePackage("x/y", std::string(4 * kMegabyte, 'x') + std::string(kMegabyte, '\0'));
+    expectAwaited();
+}
+
+TEST_F(MemoryForPackages, IsAwaitedForManyParts) {
+    json::Array parts;
+    for (int i = 0; i < 20'000; ++i) {
+        parts.push_back(json::Object{{"partUri", "/a part with a usual name " + std::to_string(i)},
+                                     {"contentType", "application/xml"},
+                                     {"content", "x"},
+                                     {"relationship", json::Array{relationship("a", "t")}}});
+    }
+    writePackage(std::move(parts), {});
+    expectAwaited();
+}
+
+TEST_F(MemoryForPackages, IsAwaitedForManyRelationships) {
+    for (const char* type : {"t", "http://schemas.example.org/relationships/hyperlink"}) {
+        json::Array relationships;
+        for (int i = 0; i < 50'000; ++i) {
+            relationships.push_back(relationship("r" + std::to_string(i), type));
+        }
+        writePackage({}, std::move(relationships));
+        expectAwaited();
+    }
 }
 
 }  // namespace

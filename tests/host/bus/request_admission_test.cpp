@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
+#include <chrono>
 #include <latch>
 #include <memory>
 #include <stdexcept>
@@ -68,15 +69,16 @@ protected:
         InProcessBus::create({.maxQueuedBytes = 1U << 30U,
                               .concurrentChannels = {readRequestChannel},
                               .concurrency = 2});
-    std::shared_ptr<MemoryBudget> budget_ = std::make_shared<MemoryBudget>(budgetSize);
+    const RequestBudgets budgets_{budgetSize, budgetSize / 4 * 3};
+    const std::shared_ptr<MemoryBudget> budget_ = budgets_.requests;
     std::shared_ptr<RequestMetrics> metrics_ = std::make_shared<RequestMetrics>();
     std::vector<std::string> answers_;
     std::atomic<int> answerCount_ = 0;
-
-private:
     std::shared_ptr<MessageService> sender_ = bus_->connect("sender").get();
     std::shared_ptr<MessageService> client_ =
-        admittingRequests(bus_->connect("bundle").get(), budget_, metrics_);
+        admittingRequests(bus_->connect("bundle").get(), budgets_, metrics_);
+
+private:
     std::vector<std::shared_ptr<Subscription>> subscriptions_;
 };
 
@@ -215,6 +217,61 @@ TEST_F(RequestAdmission, GoesOnAfterHandlersThatThrow) {
     }
     EXPECT_EQ(handled, 3);
     EXPECT_EQ(budget_->reserved(), 0u);
+}
+
+TEST_F(RequestAdmission, ReservesTheMemoryOfADocumentUntilItsRequestIsHandled) {
+    constexpr std::size_t document = budgetSize / 8;
+    std::vector<std::size_t> reserved;
+    handleReadsWith([&](const JsonMessage&) {
+        client_->awaitMemory(document);
+        reserved.push_back(budgets_.documents->reserved());
+        client_->awaitMemory(2 * document);
+        reserved.push_back(budgets_.documents->reserved());
+        client_->awaitMemory(100);
+        reserved.push_back(budgets_.documents->reserved());
+        client_->awaitMemory(document);
+        throw std::runtime_error("a failure");
+    });
+    send(request("1"));
+    bus_->waitUntilIdle();
+    EXPECT_THAT(reserved, ElementsAre(document, 2 * document, 0U));
+    EXPECT_EQ(budgets_.documents->reserved(), 0U);
+}
+
+TEST_F(RequestAdmission, HasDocumentsWaitForEachOther) {
+    const std::size_t document = budgets_.documents->size() / 3 * 2;
+    std::atomic<int> atOnce = 0;
+    std::atomic<bool> overlapped = false;
+    std::atomic<int> handled = 0;
+    handleReadsWith([&](const JsonMessage&) {
+        client_->awaitMemory(document);
+        overlapped = overlapped || ++atOnce > 1;
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+        --atOnce;
+        ++handled;
+    });
+    for (int i = 0; i < 4; ++i) {
+        send(request("1"));
+    }
+    bus_->waitUntilIdle();
+    EXPECT_FALSE(overlapped);
+    EXPECT_EQ(handled, 4);
+}
+
+TEST_F(RequestAdmission, GivesADocumentBeyondTheBudgetAllOfIt) {
+    std::size_t reserved = 0;
+    handleReadsWith([&](const JsonMessage&) {
+        client_->awaitMemory(10 * budgetSize);
+        reserved = budgets_.documents->reserved();
+    });
+    send(request("1"));
+    bus_->waitUntilIdle();
+    EXPECT_EQ(reserved, budgets_.documents->size());
+}
+
+TEST_F(RequestAdmission, ReservesNothingForADocumentOutsideOfARequest) {
+    client_->awaitMemory(budgetSize / 2);
+    EXPECT_EQ(budgets_.documents->reserved(), 0U);
 }
 
 }  // namespace
