@@ -1,11 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "host/limits/memory_limit.h"
 
+#include <pthread.h>
 #include <sys/resource.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <cstddef>
 #include <fstream>
 #include <limits>
 #include <string>
@@ -37,6 +39,24 @@ std::uint64_t controlGroupLimit() {
     return least;
 }
 
+// Has threads take as much for their stacks as they need and no more: the limit counts all of what
+// a stack may become, which by default is 8 MB for each of some twenty threads.
+void keepStacksSmall() {
+    constexpr std::size_t stackSize = std::size_t{1} << 20U;
+    pthread_attr_t attributes;
+    int error = ::pthread_getattr_default_np(&attributes);
+    if (error == 0) {
+        error = ::pthread_attr_setstacksize(&attributes, stackSize);
+        if (error == 0) {
+            error = ::pthread_setattr_default_np(&attributes);
+        }
+        ::pthread_attr_destroy(&attributes);
+    }
+    if (error != 0) {
+        throw std::system_error(error, std::generic_category(), "cannot set the size of stacks");
+    }
+}
+
 }  // namespace
 
 std::uint64_t defaultMemoryLimit() {
@@ -46,6 +66,7 @@ std::uint64_t defaultMemoryLimit() {
 }
 
 std::uint64_t limitMemory(std::uint64_t bytes) {
+    keepStacksSmall();
     rlimit limit{};
     if (::getrlimit(RLIMIT_DATA, &limit) != 0) {
         throw std::system_error(errno, std::generic_category(), "cannot get the memory limit");

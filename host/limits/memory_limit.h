@@ -11,8 +11,9 @@ namespace host {
 /// process may use when that is less.
 std::uint64_t defaultMemoryLimit();
 
-/// Makes allocations fail that would take the process's memory above `bytes`. A limit that was set
-/// from outside is never raised. Returns the limit that holds. Throws std::system_error when the
+/// Makes allocations fail that would take the process's memory above `bytes`, and has threads that
+/// are started from then on get stacks of 1 MB, all of which counts. A limit that was set from
+/// outside is never raised. Returns the limit that holds. Throws std::system_error when the
 /// system refuses.
 std::uint64_t limitMemory(std::uint64_t bytes);
 

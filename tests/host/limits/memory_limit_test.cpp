@@ -73,6 +73,21 @@ TEST_F(MemoryLimit, LeavesTheLimitOfTextsToTellOfAFileThatIsTooLargeForOne) {
               "{\"data\":\"text\",\"status\":true}\n");
 }
 
+TEST_F(MemoryLimit, IsNotUsedUpByTheStacksOfThreads) {
+    test::Subprocess program(hostCommand({"--memory-limit", "64MB", "stdio"}));
+    program.write(test::framedReadRequest("1", small));
+    EXPECT_NE(program.readSome(), "");  // it has started
+    std::ifstream status("/proc/" + std::to_string(program.id()) + "/status");
+    std::size_t kilobytes = 0;
+    for (std::string word; status >> word;) {
+        if (word == "VmData:") {
+            status >> kilobytes;
+        }
+    }
+    EXPECT_GT(kilobytes, 0U);
+    EXPECT_LT(kilobytes, 24U * 1024);
+}
+
 // A read request in which something nests `levels` deep beside what counts.
 std::string deepRequest(const std::string& rtcId, const std::string& file, std::size_t levels) {
     std::string request = test::readRequest(rtcId, file);
