@@ -9,7 +9,7 @@ export function loginForm(
   known: Partial<Settings>,
   wrong: string,
   submitted: (settings: Settings) => void,
-): HTMLFormElement {
+): HTMLElement {
   const server = element("input", { name: "server", required: true, spellcheck: false, value: known.server ?? "" });
   server.placeholder = "ws://127.0.0.1:4223";
   const user = element("input", { name: "user", autocomplete: "username", value: known.user ?? "" });
@@ -29,5 +29,5 @@ export function loginForm(
     submitted({ server: server.value.trim(), user: user.value.trim(), password: password.value });
   });
   queueMicrotask(() => (known.server ? password : server).focus());
-  return form;
+  return element("main", {}, form);
 }

@@ -26,6 +26,7 @@ export class FileTree {
   #tree = element("div", { role: "tree", className: "tree", tabIndex: 0, "aria-label": text("files.title") }, this.#rows);
   #filter = element("input", { type: "search", placeholder: text("files.filter"), "aria-label": text("files.filter") });
   #found = element("p", { role: "status", className: "found" });
+  #reading = new Map<TreeNode, Promise<void>>();
   #toRefresh = new Map<TreeNode, ReturnType<typeof setTimeout>>();
   #search = 0;
   #isRenderWaiting = false;
@@ -56,7 +57,7 @@ export class FileTree {
   /** Reads all folders again that are known. */
   async refresh(): Promise<void> {
     const known = [...this.#model.nodes()].filter((node) => node.kind === "folder" && node.state !== "unread");
-    await Promise.all(known.map((node) => this.#read(node)));
+    await Promise.all(known.map((node) => this.#readAgain(node)));
   }
 
   /** A file may have been written. */
@@ -68,7 +69,7 @@ export class FileTree {
     if (folder && folder.state !== "unread" && !this.#toRefresh.has(folder)) {
       const refresh = () => {
         this.#toRefresh.delete(folder);
-        void this.#read(folder).then(() => {
+        void this.#readAgain(folder).then(() => {
           // A file that is new has its node only now.
           const node = this.#model.find(path);
           if (node) {
@@ -110,7 +111,23 @@ export class FileTree {
     this.#render();
   }
 
-  async #read(folder: TreeNode): Promise<void> {
+  // What is under way may have missed what has changed since it began.
+  async #readAgain(folder: TreeNode): Promise<void> {
+    await this.#reading.get(folder);
+    await this.#read(folder);
+  }
+
+  #read(folder: TreeNode): Promise<void> {
+    const underWay = this.#reading.get(folder);
+    if (underWay) {
+      return underWay;
+    }
+    const reading = this.#readNow(folder).finally(() => this.#reading.delete(folder));
+    this.#reading.set(folder, reading);
+    return reading;
+  }
+
+  async #readNow(folder: TreeNode): Promise<void> {
     folder.state = "reading";
     this.#render();
     try {
@@ -147,7 +164,7 @@ export class FileTree {
   async #searchUnread(search: number): Promise<void> {
     for (let count = 0; count < MOST_SEARCHED && this.#model.isFiltered && search === this.#search; ++count) {
       const unread = [...this.#model.nodes()]
-        .filter((node) => node.kind === "folder" && node.state === "unread" && !node.name.startsWith("."))
+        .filter(({ kind, name, state }) => kind === "folder" && isToSearch[state] && !name.startsWith("."))
         .sort((one, other) => one.level - other.level)[0];
       if (!unread) {
         break;
@@ -324,6 +341,9 @@ export class FileTree {
     return row;
   }
 }
+
+// An earlier search may still be reading a folder, whose folders have to be looked into after that.
+const isToSearch = { unread: true, reading: true, read: false, failed: false };
 
 function startingWith(letter: string, rows: readonly TreeNode[], index: number): TreeNode | undefined {
   const isWanted = (node: TreeNode) => node.name.toLowerCase().startsWith(letter.toLowerCase());

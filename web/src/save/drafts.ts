@@ -59,6 +59,7 @@ export class Drafts {
   #ask<Result>(mode: IDBTransactionMode, question: (store: IDBObjectStore) => IDBRequest<Result>): Promise<Result> {
     const transaction = this.database.transaction(STORE, mode);
     const request = question(transaction.objectStore(STORE));
+    transaction.commit(); // not only when the request is done, and the page perhaps gone
     return new Promise((resolve, reject) => {
       transaction.oncomplete = () => resolve(request.result);
       transaction.onabort = transaction.onerror = () => reject(transaction.error ?? request.error);

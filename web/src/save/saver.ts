@@ -142,6 +142,7 @@ export class Saver {
 
   async #saved(edits: number, content: DocumentContent, { version }: SaveResult): Promise<void> {
     this.#savedEdits = edits;
+    this.target.update();
     if (version !== undefined) {
       this.#basedOn(version);
       return;

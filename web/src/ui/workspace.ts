@@ -50,14 +50,15 @@ export class Workspace {
   #welcome = element(
     "div",
     { className: "waiting" },
-    element("h1", {}, text("page.untitled")),
+    element("h2", {}, text("page.untitled")),
     element("p", {}, text("page.welcome")),
     element("p", {}, text("page.welcome.keys")),
   );
 
   constructor(private options: WorkspaceOptions) {
     const tools = element("div", { className: "tools", role: "toolbar", "aria-label": text("page.tools") }, this.#save, this.#versions, this.#link);
-    const head = element("header", { className: "head" }, this.#showFiles, this.#tabs.element, tools);
+    const title = element("h1", { className: "unseen" }, text("page.title"));
+    const head = element("header", { className: "head" }, title, this.#showFiles, this.#tabs.element, tools);
     this.#panels.append(this.#welcome);
     this.element.append(head, this.#tree.element, this.#panels, this.#state.element);
     document.addEventListener("keydown", (event) => this.#key(event));
