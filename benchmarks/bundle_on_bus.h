@@ -1,11 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
-// The loaded bundle on a bus of its own, with a client that sends requests and waits for answers.
+// The loaded bundle on a bus of its own, with a client that waits for its answers.
 #pragma once
 
 #include <chrono>
 #include <condition_variable>
 #include <cstddef>
-#include <memory>
 #include <mutex>
 #include <optional>
 #include <string>
@@ -13,41 +12,24 @@
 
 #include "framework/bundle_runner.h"
 #include "platform/data_buffer.h"
+#include "platform/messaging/channels.h"
 #include "platform/messaging/in_process_bus.h"
 #include "platform/messaging/message_service.h"
-#include "platform/messaging/transport.h"
+#include "tests/support/bundle_on_bus.h"
 
 namespace benchmarks {
 
-inline constexpr const char* readRequests = "/zpr/service/readRequest_cpp";
-inline constexpr const char* writeRequests = "/zpr/service/writeRequest_cpp";
+using platform::messaging::readRequestChannel;
+using platform::messaging::writeRequestChannel;
 
-/// Belongs to one thread. Every message of the bundle but notifications is taken for an answer.
+/// Belongs to one thread. Every message of the bundle but notifications counts as an answer.
 class BundleOnBus {
 public:
-    BundleOnBus() {
-        using namespace platform::messaging;
-        InProcessBusOptions options;
-        options.maxQueuedBytes = std::size_t{1} << 32U;
-        options.concurrentChannels = {readRequests};
-        bus_ = InProcessBus::create(std::move(options));
-        setTransport([bus = bus_](const std::string& clientName, const MessageServiceOptions&) {
-            return bus->connect(clientName);
-        });
-        client_ = bus_->connect("benchmark").get();
-        observation_ = bus_->observe([this](std::string_view sender, const JsonMessage& message) {
-            if (sender != "benchmark" && message.channel() != notifications) {
-                answered(message);
-            }
-        });
-        runner_ = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
-    }
-
-    platform::messaging::InProcessBus& bus() { return *bus_; }
+    platform::messaging::InProcessBus& bus() { return bundle_.bus(); }
 
     /// Sends `request` without waiting for its answer.
     void send(const char* channel, platform::DataBuffer request) {
-        client_->publish(channel, std::move(request)).get();
+        bundle_.send(channel, std::move(request));
     }
 
     /// Waits until `count` answers have come since the last call, and returns the last of them.
@@ -64,7 +46,7 @@ public:
     std::string answer(const char* channel, std::string_view request) {
         send(channel, platform::DataBuffer::copyOf(request));
         const platform::messaging::JsonMessage message = wait();
-        bus_->waitUntilIdle();
+        bus().waitUntilIdle();
         return std::string(message.payload());
     }
 
@@ -74,14 +56,22 @@ public:
         send(channel, std::move(request));
         static_cast<void>(wait());
         const auto end = std::chrono::steady_clock::now();
-        bus_->waitUntilIdle();
+        bus().waitUntilIdle();
         return std::chrono::duration<double>(end - start).count();
     }
 
 private:
-    static constexpr const char* notifications = "/zpr/service/notifyFileSystemRequest";
+    static platform::messaging::InProcessBusOptions options() {
+        platform::messaging::InProcessBusOptions options;
+        options.maxQueuedBytes = std::size_t{1} << 32U;
+        options.concurrentChannels = {readRequestChannel};
+        return options;
+    }
 
-    void answered(const platform::messaging::JsonMessage& message) {
+    void published(const platform::messaging::JsonMessage& message) {
+        if (message.channel() == platform::messaging::notificationChannel) {
+            return;
+        }
         {
             const std::lock_guard lock(mutex_);
             answer_ = message;
@@ -90,15 +80,14 @@ private:
         changed_.notify_one();
     }
 
-    std::shared_ptr<platform::messaging::InProcessBus> bus_;
-    std::shared_ptr<platform::messaging::MessageService> client_;
     std::mutex mutex_;  // guards what follows
     std::condition_variable changed_;
     std::optional<platform::messaging::JsonMessage> answer_;
     std::size_t answers_ = 0;
 
-    std::shared_ptr<platform::messaging::Subscription> observation_;
-    std::unique_ptr<framework::BundleRunner> runner_;
+    test::BundleOnBus<framework::BundleRunner> bundle_{
+        [this](const platform::messaging::JsonMessage& message) { published(message); }, options(),
+        SERIALIZATION_BUNDLE};
 };
 
 }  // namespace benchmarks

@@ -17,13 +17,12 @@ constexpr std::size_t textSize = std::size_t{18} * 1024;
 
 // Reports the time for one text on average over the charsets of a language.
 void detectLegacy(benchmark::State& state, const std::string& language) {
-    namespace corpus = platform::i18n::testing;
     std::vector<std::string> texts;
-    for (const corpus::CorpusEntry& entry : corpus::corpusEntries()) {
+    for (const test::CorpusEntry& entry : test::corpusEntries()) {
         if (entry.language == language && !entry.charset.starts_with("UTF-") &&
             !entry.charset.starts_with("ISO-2022")) {
-            const std::string text = corpus::grownTo(corpus::corpusText(language), textSize);
-            texts.push_back(corpus::iconvEncode(entry.iconvName, text).value());
+            const std::string text = test::grownTo(test::corpusText(language), textSize);
+            texts.push_back(test::iconvEncode(entry.iconvName, text).value());
         }
     }
     std::ostringstream diagnostics;

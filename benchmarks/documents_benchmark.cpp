@@ -37,12 +37,12 @@
 
 #include "benchmarks/bundle_on_bus.h"
 #include "benchmarks/peer_process.h"
-#include "benchmarks/scratch_folder.h"
 #include "host/limits/freed_memory.h"
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "json/value.h"
 #include "platform/i18n/codecvt.h"
+#include "tests/support/temporary_directory.h"
 
 namespace benchmarks {
 namespace {
@@ -57,8 +57,8 @@ std::string contentOf(const std::filesystem::path& path) {
     return {std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};
 }
 
-const ScratchFolder& scratch() {
-    static const ScratchFolder folder;
+const test::TemporaryDirectory& scratch() {
+    static const test::TemporaryDirectory folder(test::folderInMemory());
     return folder;
 }
 
@@ -85,7 +85,7 @@ std::string readRequest(const std::string& path, const char* contentType) {
 }
 
 json::Object answerTo(const std::string& request) {
-    return json::parse(bundle().answer(readRequests, request));
+    return json::parse(bundle().answer(readRequestChannel, request));
 }
 
 std::string writePackageRequest(json::Object document, const std::string& target) {
@@ -132,10 +132,10 @@ void measure(benchmark::State& state, std::size_t bytes, const std::function<dou
 
 void bundleReads(benchmark::State& state, const std::string& path, const char* contentType) {
     const std::string request = readRequest(path, contentType);
-    const std::string response = bundle().answer(readRequests, request);
+    const std::string response = bundle().answer(readRequestChannel, request);
     measure(state, response.size(), [&] {
         require(response.ends_with("\"status\":true}"), "the bundle cannot read the file");
-        return bundle().time(readRequests, DataBuffer::copyOf(request));
+        return bundle().time(readRequestChannel, DataBuffer::copyOf(request));
     });
 }
 
@@ -158,7 +158,7 @@ void peerReads(benchmark::State& state, Peer peer, const std::string& job,
     const char* contentType = job == "read-package" ? "text/xml" : "text/plain";
     const std::string expected = responseInUtf8(path, contentType, charset);
     const std::string request = readRequest(path, contentType);
-    const std::size_t bytes = bundle().answer(readRequests, request).size();
+    const std::size_t bytes = bundle().answer(readRequestChannel, request).size();
     const std::string saved = scratch() / "response";
     bool checked = false;
     measure(state, bytes, [&] {
@@ -173,11 +173,12 @@ void peerReads(benchmark::State& state, Peer peer, const std::string& job,
 
 void bundleWrites(benchmark::State& state, const std::string& request, const std::string& target,
                   const std::string& original) {
-    require(bundle().answer(writeRequests, request) == "true", "the bundle cannot write the file");
+    require(bundle().answer(writeRequestChannel, request) == "true",
+            "the bundle cannot write the file");
     state.counters["fileBytes"] = static_cast<double>(std::filesystem::file_size(target));
     state.counters["originalBytes"] = static_cast<double>(std::filesystem::file_size(original));
     measure(state, request.size(),
-            [&] { return bundle().time(writeRequests, DataBuffer::copyOf(request)); });
+            [&] { return bundle().time(writeRequestChannel, DataBuffer::copyOf(request)); });
 }
 
 void bundleWritesPackage(benchmark::State& state, const std::string& path) {
@@ -185,7 +186,7 @@ void bundleWritesPackage(benchmark::State& state, const std::string& path) {
     const std::string request = writePackageRequest(path, target);
     measure(state, request.size(), [&] {
         std::filesystem::remove(target);
-        return bundle().time(writeRequests, DataBuffer::copyOf(request));
+        return bundle().time(writeRequestChannel, DataBuffer::copyOf(request));
     });
     state.counters["fileBytes"] = static_cast<double>(std::filesystem::file_size(target));
     state.counters["originalBytes"] = static_cast<double>(std::filesystem::file_size(path));
@@ -212,10 +213,12 @@ void bundleSavesOneWord(benchmark::State& state, const std::string& path) {
     const std::string original = writePackageRequest(path, target);
     bool isChanged = false;
     require(changed.size() > original.size(), "no part was changed");
-    require(bundle().answer(writeRequests, original) == "true", "the bundle cannot write the file");
+    require(bundle().answer(writeRequestChannel, original) == "true",
+            "the bundle cannot write the file");
     measure(state, original.size(), [&] {
         isChanged = !isChanged;
-        return bundle().time(writeRequests, DataBuffer::copyOf(isChanged ? changed : original));
+        return bundle().time(writeRequestChannel,
+                             DataBuffer::copyOf(isChanged ? changed : original));
     });
 }
 
@@ -284,7 +287,8 @@ double secondsOf(const std::function<void()>& work) {
 }
 
 void expandsOnly(benchmark::State& state, const std::string& path) {
-    const std::size_t bytes = bundle().answer(readRequests, readRequest(path, "text/xml")).size();
+    const std::size_t bytes =
+        bundle().answer(readRequestChannel, readRequest(path, "text/xml")).size();
     measure(state, bytes, [&] { return secondsOf([&] { expandAll(path); }); });
 }
 
@@ -315,13 +319,13 @@ void bundleAnswersSmall(benchmark::State& state, const char* channel, const std:
 void bundleAnswersSmallRead(benchmark::State& state) {
     const std::string path = scratch() / "1kb.txt";
     std::ofstream(path) << std::string(1000, 'x');
-    bundleAnswersSmall(state, readRequests, readRequest(path, "text/plain"));
+    bundleAnswersSmall(state, readRequestChannel, readRequest(path, "text/plain"));
 }
 
 void bundleAnswersSmallWrite(benchmark::State& state) {
     const std::string path = scratch() / "1kb.txt";
     std::ofstream(path) << std::string(1000, 'x');
-    bundleAnswersSmall(state, writeRequests, writeTextRequest(path, "UTF-8", path));
+    bundleAnswersSmall(state, writeRequestChannel, writeTextRequest(path, "UTF-8", path));
 }
 
 template <typename... Arguments>

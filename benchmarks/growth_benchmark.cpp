@@ -15,10 +15,10 @@
 #include <utility>
 
 #include "benchmarks/bundle_on_bus.h"
-#include "benchmarks/scratch_folder.h"
 #include "host/limits/freed_memory.h"
 #include "json/serialize.h"
 #include "json/value.h"
+#include "tests/support/temporary_directory.h"
 
 namespace benchmarks {
 namespace {
@@ -28,8 +28,8 @@ using platform::DataBuffer;
 constexpr const char* packageType = "text/xml";
 constexpr const char* textType = "text/plain";
 
-const ScratchFolder& scratch() {
-    static const ScratchFolder folder;
+const test::TemporaryDirectory& scratch() {
+    static const test::TemporaryDirectory folder(test::folderInMemory());
     return folder;
 }
 
@@ -93,7 +93,7 @@ void measure(benchmark::State& state, const char* unit, double perSecond, std::s
 }
 
 void write(const std::string& text) {
-    if (bundle().answer(writeRequests, text) != "true") {
+    if (bundle().answer(writeRequestChannel, text) != "true") {
         throw std::runtime_error("the bundle cannot write");
     }
 }
@@ -107,7 +107,7 @@ void reads(benchmark::State& state, const char* contentType, const WriteRequest&
     write(makeRequest(path));
     const std::string read = readRequest(contentType, path);
     measure(state, unit, perSecond, items,
-            [&] { return bundle().time(readRequests, DataBuffer::copyOf(read)); });
+            [&] { return bundle().time(readRequestChannel, DataBuffer::copyOf(read)); });
     std::filesystem::remove(path);
 }
 
@@ -116,7 +116,7 @@ void writes(benchmark::State& state, const WriteRequest& makeRequest, const char
     const std::string path = scratch() / "document";
     const std::string text = makeRequest(path);
     measure(state, unit, perSecond, items,
-            [&] { return bundle().time(writeRequests, DataBuffer::copyOf(text)); });
+            [&] { return bundle().time(writeRequestChannel, DataBuffer::copyOf(text)); });
     std::filesystem::remove(path);
 }
 
@@ -128,7 +128,7 @@ void readsAtOnce(benchmark::State& state, std::size_t count) {
     measure(state, "\u00B5s per request", 1e6, count, [&] {
         const auto start = std::chrono::steady_clock::now();
         for (std::size_t i = 0; i < count; ++i) {
-            bundle().send(readRequests, DataBuffer::copyOf(read));
+            bundle().send(readRequestChannel, DataBuffer::copyOf(read));
         }
         static_cast<void>(bundle().wait(count));
         return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();

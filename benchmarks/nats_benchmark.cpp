@@ -26,16 +26,16 @@
 
 #include "framework/bundle_runner.h"
 #include "host/server/child_process.h"
+#include "platform/messaging/channels.h"
 #include "platform/messaging/nats/nats_bus.h"
 #include "platform/messaging/transport.h"
+#include "tests/support/temporary_directory.h"
 
 namespace {
 
 using namespace platform::messaging;
 using Clock = std::chrono::steady_clock;
 
-constexpr const char* readRequests = "/zpr/service/readRequest_cpp";
-constexpr const char* readResponses = "/zpr/service/readResponse/";
 constexpr std::size_t clientCount = 10;
 constexpr std::size_t workerCount = 2;
 constexpr std::int64_t patience = 30'000;  // milliseconds
@@ -54,7 +54,7 @@ std::string contentOf(const std::filesystem::path& file) {
 // A request begins with {"rtcId":"<id>", where the id has no quotes.
 std::string responseChannel(std::string_view request) {
     const std::string_view behind = request.substr(std::string_view(R"({"rtcId":")").size());
-    return readResponses + std::string(behind.substr(0, behind.find('"')));
+    return readResponsePrefix + std::string(behind.substr(0, behind.find('"')));
 }
 
 std::string requestFor(const std::string& id, const std::filesystem::path& file) {
@@ -145,7 +145,7 @@ NatsOptions busOptions(const std::string& url, const std::vector<std::string>& c
 }
 
 [[noreturn]] void runBundle(const std::string& url, const std::string& file) {
-    const auto bus = NatsBus::create(busOptions(url, {readRequests}));
+    const auto bus = NatsBus::create(busOptions(url, {readRequestChannel}));
     const auto client = bus->connect("host").get();
     setTransport([bus](const std::string& name, const MessageServiceOptions&) {
         return bus->connect(name);
@@ -160,7 +160,8 @@ class Client {
 public:
     Client(const std::string& url, std::string id)
         : connection_(connectTo(url)), id_(std::move(id)) {
-        check(natsConnection_SubscribeSync(&answers_, connection_, (readResponses + id_).c_str()));
+        check(natsConnection_SubscribeSync(&answers_, connection_,
+                                           (readResponsePrefix + id_).c_str()));
         check(natsSubscription_SetPendingLimits(answers_, -1, -1));
         check(natsConnection_Flush(connection_));
     }
@@ -272,14 +273,6 @@ void measure(std::vector<std::unique_ptr<Client>>& clients, const std::string& c
     separator = ",\n";
 }
 
-std::filesystem::path makeFolder() {
-    std::string name = (std::filesystem::temp_directory_path() / "nats-benchmark-XXXXXX").string();
-    if (::mkdtemp(name.data()) == nullptr) {
-        throw std::runtime_error("no temporary folder can be made");
-    }
-    return name;
-}
-
 void writeText(const std::filesystem::path& file, std::size_t size) {
     std::string text;
     while (text.size() < size) {
@@ -332,8 +325,8 @@ void measureAll(const std::filesystem::path& folder, const std::filesystem::path
     std::vector<std::string> bus = {"bus", url};
     for (Input& input : inputs) {
         const std::string request = requestFor(clients[0]->id(), input.file);
-        warmUp(*clients[0], readRequests, request);
-        const std::string answer = clients[0]->ask(readRequests, request);
+        warmUp(*clients[0], readRequestChannel, request);
+        const std::string answer = clients[0]->ask(readRequestChannel, request);
         input.answerSize = answer.size();
         const std::filesystem::path file = input.file.string() + ".answer";
         std::ofstream(file, std::ios_base::binary) << answer;
@@ -352,7 +345,7 @@ void measureAll(const std::filesystem::path& folder, const std::filesystem::path
         for (int i = 0; i < repetitions; ++i) {
             measure(clients, "echo/" + stem, input, "echo", separator);
             measure(clients, "bus/" + stem, input, "echo on the bus", separator);
-            measure(clients, readRequests, input, "bundle", separator);
+            measure(clients, readRequestChannel, input, "bundle", separator);
         }
     }
     std::cout << "\n]}\n";
@@ -372,10 +365,9 @@ int main(int argc, char** argv) {
         if (arguments.size() == 3 && arguments[0] == "bundle") {
             runBundle(arguments[1], arguments[2]);
         }
-        const std::filesystem::path folder = makeFolder();
-        measureAll(folder, std::filesystem::read_symlink("/proc/self/exe"),
+        const test::TemporaryDirectory folder;
+        measureAll(folder.path(), std::filesystem::read_symlink("/proc/self/exe"),
                    arguments.empty() ? 3 : std::stoi(arguments[0]));
-        std::filesystem::remove_all(folder);
         return 0;
     } catch (const std::exception& error) {
         std::cerr << "nats_benchmark: " << error.what() << '\n';

@@ -119,6 +119,6 @@ function(project_test name)
   # Without the values of parameters, which may be addresses and differ from run to run.
   gtest_discover_tests(${target} TEST_PREFIX "${name}." NO_PRETTY_VALUES DISCOVERY_TIMEOUT 60
                        PROPERTIES TIMEOUT 600
-                                  # Earlier versions shall not be kept among the user's own.
+                                  # Earlier versions must not be kept among the user's own.
                                   ENVIRONMENT "XDG_STATE_HOME=${PROJECT_BINARY_DIR}/Testing/state")
 endfunction()

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// BundleRunner: loads one bundle, runs it and takes it down again. A build with CppMicroServices
-// runs the bundle in that framework, one without it in the loader of this folder.
+// BundleRunner: loads one bundle, starts it and stops it again. A build with CppMicroServices runs
+// the bundle in that framework, one without it in the loader of this folder.
 #pragma once
 
 #include <filesystem>
@@ -14,12 +14,12 @@ namespace framework {
 /// CppMicroServices takes it from the manifest inside the file.
 class BundleRunner {
 public:
-    /// Loads the shared library `bundle`, creates its activator and starts it. A relative path
-    /// counts from the working folder. When this returns, Start has returned; what Start set going
-    /// on other threads may still be under way. Throws std::runtime_error naming the file when
-    /// there is no such file, when it is no loadable library or no bundle, when it creates no
-    /// activator, and when its start fails (with the text of that failure); an
-    /// activator that was created is destroyed then.
+    /// Loads the shared library `bundle`, creates its activator and starts it. A relative path is
+    /// relative to the working folder. When this returns, the bundle's Start has returned; what it
+    /// began on other threads may still be running. Throws std::runtime_error naming the file when
+    /// there is no such file, when it is not a loadable library or not a bundle, when it creates no
+    /// activator, and when its start fails (with the text of that failure); an activator that was
+    /// created is destroyed then.
     explicit BundleRunner(const std::filesystem::path& bundle);
 
     BundleRunner(const BundleRunner&) = delete;
@@ -31,7 +31,7 @@ public:
 
     /// Stops the bundle and destroys its activator, and with it the bundle's subscriptions. Does
     /// nothing the second time. Throws std::runtime_error naming the bundle when its Stop throws;
-    /// the activator is destroyed all the same.
+    /// the activator is destroyed anyway.
     void stop();
 
 private:

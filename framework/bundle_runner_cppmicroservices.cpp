@@ -27,7 +27,7 @@ public:
     RunningFramework(const RunningFramework&) = delete;
     RunningFramework& operator=(const RunningFramework&) = delete;
 
-    /// Stops the bundles too that still run.
+    /// Also stops the bundles that still run.
     ~RunningFramework() {
         try {
             framework_.Stop();
@@ -90,7 +90,7 @@ BundleRunner::~BundleRunner() {
     try {
         stop();
     } catch (const std::exception&) {
-        // The caller that wants to know calls stop itself.
+        // A caller that wants to know calls stop itself.
     }
 }
 

@@ -18,7 +18,7 @@
 
 namespace cppmicroservices {
 
-// The bundle gets to see only its address.
+// The bundle only gets its address.
 class BundleContextPrivate {};
 
 }  // namespace cppmicroservices
@@ -66,7 +66,7 @@ Function* entryPoint(const Library& library, const std::filesystem::path& bundle
     const std::string name = prefix + symbolicName(bundle);
     void* const address = dlsym(library.get(), name.c_str());
     if (address == nullptr) {
-        throw std::runtime_error(bundle.string() + " is no bundle: it has no function " + name);
+        throw std::runtime_error(bundle.string() + " is not a bundle: it has no function " + name);
     }
     return reinterpret_cast<Function*>(address);
 }
@@ -98,7 +98,7 @@ public:
         if (!activator_) {
             return;
         }
-        // On every way out the activator is destroyed, and then the context taken back.
+        // However this ends, the activator is destroyed first, and then the context is reset.
         const ContextEnd contextEnd{setContext_};
         const auto activator = std::move(activator_);
         attempt("stop", [&] { activator->Stop(BundleContext(context_)); });
@@ -110,7 +110,8 @@ private:
         ~ContextEnd() { setContext(nullptr); }
     };
 
-    // Runs code of the bundle. Its exceptions go no further: their types leave with the library.
+    // Runs code of the bundle. Its exceptions go no further: their types are unloaded with the
+    // library.
     template <typename Call>
     void attempt(const char* what, Call call) const {
         const std::string failure =
@@ -138,7 +139,7 @@ BundleRunner::~BundleRunner() {
     try {
         stop();
     } catch (const std::exception&) {
-        // The caller that wants to know calls stop itself.
+        // A caller that wants to know calls stop itself.
     }
 }
 

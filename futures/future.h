@@ -91,7 +91,7 @@ public:
     /// An invalid future.
     Future() noexcept = default;
 
-    /// A further future on `state`.
+    /// Another future on `state`.
     explicit Future(std::shared_ptr<detail::SharedFutureState<T>> state) noexcept
         : state_(std::move(state)) {}
 
@@ -118,7 +118,7 @@ public:
     template <typename F>
     Future<detail::ContinuationResult<F, T>> then(F&& callback);
 
-    /// Gives up on the outcome: when the state is still pending, whoever waits for it is told that
+    /// Gives up on the outcome: when the state is still pending, those that wait for it learn that
     /// it has been cancelled, and an outcome set later is dropped. The future stays valid.
     void cancel() {
         if (!state_) {
@@ -142,8 +142,8 @@ private:
 
 namespace detail {
 
-/// Calls `function` and returns the exception that it throws, or null. So that what happens next
-/// with the exception happens outside a handler, which would hold on to it.
+/// Calls `function` and returns the exception that it throws, or null. The exception can then be
+/// handled outside of a catch block, which would keep it alive.
 template <typename F>
 std::exception_ptr exceptionOf(F&& function) {
     try {
@@ -163,7 +163,7 @@ public:
     Continuation(Promise<R> result, Callback&& callback)
         : result_(std::move(result)), callback_(std::forward<Callback>(callback)) {}
 
-    // An exception from the callback's destructor has nowhere to go and ends the process. Written
+    // An exception from the callback's destructor cannot be delivered and ends the process. Written
     // out, since g++ 12 lets it out of a defaulted destructor.
     ~Continuation() noexcept override {}
 

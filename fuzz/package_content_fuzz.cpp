@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Reads packages made of any entries. Their checksums are right, so that the fuzzer gets behind
-// them.
+// Reads packages made of any entries. Their checksums are right, so that the fuzzer gets past them.
 //
 // An input is lines of which each makes one entry: its name, a tab, and its content, in which \1
 // stands for a line feed. A name that begins with \2 is deflated.
@@ -16,7 +15,7 @@
 
 namespace {
 
-testing_package::ZipEntry entryOf(std::string_view line) {
+test::ZipEntry entryOf(std::string_view line) {
     const std::size_t tab = std::min(line.find('\t'), line.size());
     const bool isDeflated = line.starts_with('\2');
     std::string name(line.substr(isDeflated ? 1 : 0, tab - (isDeflated ? 1 : 0)));
@@ -30,13 +29,13 @@ testing_package::ZipEntry entryOf(std::string_view line) {
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     std::string_view rest(reinterpret_cast<const char*>(data), size);
-    std::vector<testing_package::ZipEntry> entries;
+    std::vector<test::ZipEntry> entries;
     while (!rest.empty()) {
         const std::size_t end = std::min(rest.find('\n'), rest.size());
         entries.push_back(entryOf(rest.substr(0, end)));
         rest.remove_prefix(std::min(end + 1, rest.size()));
     }
-    const std::string archive = testing_package::buildZip(entries);
+    const std::string archive = test::buildZip(entries);
     fuzzing::readAndWriteBack(archive);
     return 0;
 }

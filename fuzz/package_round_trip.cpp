@@ -15,6 +15,7 @@
 #include "platform/i18n/codecvt.h"
 #include "platform/package/quillet_file_reader.h"
 #include "platform/package/quillet_file_writer.h"
+#include "tests/support/temporary_directory.h"
 
 namespace fuzzing {
 namespace {
@@ -34,29 +35,9 @@ std::u16string fileInMemory(std::span<const char> bytes) {
     return platform::i18n::to_ustring("/proc/self/fd/" + std::to_string(file));
 }
 
-// A folder that lasts as long as the process.
-class Folder {
-public:
-    Folder() : path_("/dev/shm/package-fuzz-XXXXXX") {
-        if (::mkdtemp(path_.data()) == nullptr) {
-            std::abort();
-        }
-    }
-    Folder(const Folder&) = delete;
-    Folder& operator=(const Folder&) = delete;
-    ~Folder() {
-        std::error_code ignored;
-        std::filesystem::remove_all(path_, ignored);
-    }
-    const std::string& path() const { return path_; }
-
-private:
-    std::string path_;
-};
-
 std::u16string fileOnDisk() {
-    static const Folder folder;
-    return platform::i18n::to_ustring(folder.path() + "/a.docx");
+    static const test::TemporaryDirectory folder(test::folderInMemory());
+    return platform::i18n::to_ustring((folder / "a.docx").string());
 }
 
 // The modes are left out: a relationship to no part comes back as external.

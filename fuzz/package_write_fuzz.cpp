@@ -21,6 +21,7 @@
 #include "platform/package/quillet_file_package.h"
 #include "platform/package/quillet_file_reader.h"
 #include "platform/package/quillet_file_writer.h"
+#include "tests/support/temporary_directory.h"
 
 namespace {
 
@@ -103,23 +104,11 @@ void requireSame(const QuilletFilePackage& read, const QuilletFilePackage& writt
     }
 }
 
-std::string makeFolder() {
-    std::string folder = (std::filesystem::temp_directory_path() / "write-fuzz-XXXXXX").string();
-    require(::mkdtemp(folder.data()) != nullptr);
-    return folder;
-}
-
-// Removed at the end of the process.
-struct Folder {
-    ~Folder() { std::filesystem::remove_all(path); }
-    const std::string path = makeFolder();
-};
-
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-    static const Folder folder;
-    const std::u16string path = platform::i18n::to_ustring(folder.path + "/package");
+    static const test::TemporaryDirectory folder(test::folderInMemory());
+    const std::u16string path = platform::i18n::to_ustring((folder / "package").string());
     const QuilletFilePackage package = packageOf({reinterpret_cast<const char*>(data), size});
     try {
         platform::package::QuilletFileWriter writer(path, {});

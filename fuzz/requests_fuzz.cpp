@@ -7,7 +7,6 @@
 // "filePath" is replaced by one of a few, so that nothing but the target's own folder is touched:
 // the last bits of its length say which.
 #include <spdlog/spdlog.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <array>
@@ -15,10 +14,7 @@
 #include <cstdint>
 #include <cstdlib>
 #include <filesystem>
-#include <fstream>
-#include <memory>
 #include <mutex>
-#include <stdexcept>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -27,56 +23,33 @@
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "platform/i18n/codecvt.h"
-#include "platform/messaging/in_process_bus.h"
-#include "platform/messaging/transport.h"
+#include "platform/messaging/channels.h"
 #include "serialization/serialization.h"
+#include "tests/support/bundle_on_bus.h"
+#include "tests/support/temporary_directory.h"
 
 namespace {
 
-using platform::messaging::InProcessBus;
 using platform::messaging::JsonMessage;
-using platform::messaging::MessageServiceOptions;
-
-constexpr const char* readRequests = "/zpr/service/readRequest_cpp";
-constexpr const char* writeRequests = "/zpr/service/writeRequest_cpp";
-constexpr const char* notifications = "/zpr/service/notifyFileSystemRequest";
-
-std::string makeFolder() {
-    // Failed requests are logged, which is expected here and slow.
-    spdlog::set_level(spdlog::level::off);
-    std::string folder = (std::filesystem::temp_directory_path() / "requests-fuzz-XXXXXX").string();
-    if (::mkdtemp(folder.data()) == nullptr) {
-        std::abort();
-    }
-    std::filesystem::create_directory(folder + "/folder");
-    return folder;
-}
+using platform::messaging::notificationChannel;
+using platform::messaging::readRequestChannel;
+using platform::messaging::readResponsePrefix;
+using platform::messaging::writeRequestChannel;
+using platform::messaging::writeResponsePrefix;
 
 class Target {
 public:
     Target() {
-        platform::messaging::setTransport(
-            [bus = bus_](const std::string& name, const MessageServiceOptions&) {
-                return bus->connect(name);
-            });
-        service_ = std::make_unique<EditorServices::Serialization>();
-        client_ = bus_->connect("client").get();
-        observation_ = bus_->observe([this](std::string_view from, const JsonMessage& message) {
-            if (from != "client") {
-                const std::lock_guard lock(mutex_);
-                published_.emplace_back(message.channel(), message.payload());
-            }
-        });
+        // Failed requests are logged, which is expected here and slow.
+        spdlog::set_level(spdlog::level::off);
+        std::filesystem::create_directory(folder_ / "folder");
     }
 
-    ~Target() { std::filesystem::remove_all(folder_); }
-
     void check(const char* channel, std::string_view message, std::string_view file) {
-        const std::array<std::string, 4> paths = {folder_ + "/file", folder_ + "/missing",
-                                                  folder_ + "/folder", folder_ + "/missing/file"};
+        const std::array<std::string, 4> paths = {folder_ / "file", folder_ / "missing",
+                                                  folder_ / "folder", folder_ / "missing/file"};
         std::filesystem::remove(paths[1]);
-        std::ofstream(paths[0], std::ios_base::binary)
-            .write(file.data(), static_cast<std::streamsize>(file.size()));
+        test::writeFile(paths[0], file);
 
         json::Object request = json::parse(message);
         std::string payload(message);
@@ -86,8 +59,7 @@ public:
             payload = json::serialize(json::Value(request));
             request = json::parse(payload);
         }
-        client_->publish(channel, platform::DataBuffer::copyOf(payload)).get();
-        bus_->waitUntilIdle();
+        service_.sendAndWait(channel, payload);
         checkPublished(channel, request);
     }
 
@@ -103,7 +75,7 @@ private:
             const std::lock_guard lock(mutex_);
             published.swap(published_);
         }
-        const bool isRead = channel == readRequests;
+        const bool isRead = channel == readRequestChannel;
         const bool isRequest = hasText(request, "rtcId") && hasText(request, "contentType") &&
                                hasText(request, "filePath");
         if (!isRequest || (published.empty() && !isRead)) {
@@ -112,14 +84,13 @@ private:
         }
         if (!isRead) {
             require(published.size() == 2);
-            require(published[0].first == notifications);
+            require(published[0].first == notificationChannel);
             require(json::parse(published[0].second).at("filePath") == request.at("filePath"));
         }
         require(published.size() == (isRead ? 1 : 2));
         const auto& [answered, answer] = published.back();
-        require(answered ==
-                (isRead ? "/zpr/service/readResponse/" : "/zpr/service/writeResponse/") +
-                    request.at("rtcId").get<std::string>());
+        require(answered == (isRead ? readResponsePrefix : writeResponsePrefix) +
+                                request.at("rtcId").get<std::string>());
         require(isRead ? json::parse(answer).at("status").is<bool>()
                        : answer == "true" || answer == "false");
     }
@@ -130,13 +101,13 @@ private:
         }
     }
 
-    const std::string folder_ = makeFolder();
-    std::shared_ptr<InProcessBus> bus_ = InProcessBus::create();
+    const test::TemporaryDirectory folder_;
     std::mutex mutex_;
     std::vector<std::pair<std::string, std::string>> published_;  // guarded by mutex_
-    std::shared_ptr<platform::messaging::MessageService> client_;
-    std::shared_ptr<platform::messaging::Subscription> observation_;
-    std::unique_ptr<EditorServices::Serialization> service_;
+    test::BundleOnBus<EditorServices::Serialization> service_{[this](const JsonMessage& message) {
+        const std::lock_guard lock(mutex_);
+        published_.emplace_back(message.channel(), message.payload());
+    }};
 };
 
 }  // namespace
@@ -146,7 +117,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     const std::string_view input(reinterpret_cast<const char*>(data), size);
     const std::size_t end = std::min(input.find('\0'), size);
     const std::string_view file = input.substr(std::min(end + 1, size));
-    target.check(readRequests, input.substr(0, end), file);
-    target.check(writeRequests, input.substr(0, end), file);
+    target.check(readRequestChannel, input.substr(0, end), file);
+    target.check(writeRequestChannel, input.substr(0, end), file);
     return 0;
 }

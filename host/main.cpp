@@ -20,17 +20,17 @@
 
 #include "host/bus/bundle_location.h"
 #include "host/commands/command_line.h"
-#include "host/commands/exit_status.h"
-#include "host/commands/standard_streams.h"
+#include "host/exit_status.h"
 #include "host/limits/freed_memory.h"
 #include "host/limits/limiting_sink.h"
 #include "host/limits/memory_limit.h"
+#include "host/standard_streams.h"
 #include "platform/posix/file_descriptor.h"
 
 namespace {
 
-// The lines that each logger may log of each level in that time. It is more than a person reads,
-// and not so much that whoever sends wrong messages without end can fill the disk.
+// The lines of each logger and level in that time: more than a person reads, and few enough that
+// endless wrong messages cannot fill the disk.
 constexpr std::size_t mostLogLines = 100;
 constexpr std::chrono::seconds logPeriod{10};
 
@@ -66,7 +66,7 @@ int run(const CLI::App& app, host::CommandLine& line, int output) {
     return host::runStdio(line.stdio, STDIN_FILENO, output);
 }
 
-// Tells what ended the parse early: help and version on `output`, an error on standard error.
+// Prints what ended the parse early: help and version to `output`, an error to standard error.
 int explain(const CLI::App& app, const CLI::ParseError& error, int output) {
     std::ostringstream help;
     std::ostringstream ignored;
@@ -95,14 +95,14 @@ int runCommandLine(int argc, char** argv, int output) {
     line.serve.memoryForRequests = memory;
     line.stdio.memoryForRequests = memory;
     const int status = run(app, line, output);
-    spdlog::default_logger()->flush();  // It may have lines to tell of that it left out.
+    spdlog::default_logger()->flush();  // It may still have to say how many lines it left out.
     return status;
 }
 
 }  // namespace
 
 int main(int argc, char** argv) {
-    // A reader that goes away shall be an error of the write, not the end of the process.
+    // A reader that goes away must be an error of the write, not the end of the process.
     std::signal(SIGPIPE, SIG_IGN);
     // The same for a file that grows past the process's limit.
     std::signal(SIGXFSZ, SIG_IGN);
@@ -111,7 +111,8 @@ int main(int argc, char** argv) {
         const platform::FileDescriptor output = host::divertStandardOutput();
         return runCommandLine(argc, argv, output.get());
     } catch (const host::ReaderGone&) {
-        return host::exitRequestFailed;  // Who has seen enough, as head has, need not be told.
+        return host::exitRequestFailed;  // A reader that has seen enough, as head has, need not be
+                                         // told.
     } catch (const std::exception& error) {
         std::cerr << host::programName << ": " << host::asLine(error.what()) << '\n';
         return host::exitRequestFailed;

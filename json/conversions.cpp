@@ -36,7 +36,7 @@ void appendUtf8(char32_t c, std::string& text) {
                  continuation(0)};
 }
 
-/// The C library tells overflow from underflow, which std::from_chars does not.
+/// The C library distinguishes overflow from underflow, which std::from_chars does not.
 double convertOutOfRange(std::string_view text) {
     static const locale_t cLocale = newlocale(LC_ALL_MASK, "C", nullptr);
     return strtod_l(std::string(text).c_str(), nullptr, cLocale);

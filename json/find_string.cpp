@@ -14,7 +14,7 @@ bool at(const Input& input, char c) {
     return input.position != input.end && *input.position == c;
 }
 
-/// Moves past `c` and the white space after it. Returns false when something else comes.
+/// Moves past `c` and the white space after it. Returns false when the next character is another.
 bool skip(Input& input, char c) {
     if (!at(input, c))
         return false;

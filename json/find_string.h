@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Looking one member up in a JSON text that is not parsed.
+// Looks up one member in a JSON text without parsing it.
 #pragma once
 
 #include <optional>
@@ -8,10 +8,10 @@
 
 namespace json {
 
-/// The string that the object which `text` begins with has under `key`, as parse(text) would give
-/// it; nothing when there is no such member, when it is no string, or when the text is malformed
-/// before or in it. Of several members of that key the first counts. What comes behind it, and what
-/// is within other members, is not checked.
+/// The string under `key` in the object that `text` begins with, as parse(text) would give it;
+/// nothing when there is no such member, when it is not a string, or when the text is malformed
+/// before or in it. Of several members with that key the first counts. The text after it, and that
+/// within other members, is not checked.
 ///
 /// Linear in the length of the text. Takes memory for one key or string at a time, whatever else
 /// the text holds. Throws nothing but std::bad_alloc.

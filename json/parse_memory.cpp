@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The bound counts each value where the text begins it: the first element of an array or object at
-// its opening, every other one at the comma before it.
+// Each value is counted where it begins in the text: the first element of an array or object at its
+// opening, every other one at the comma before it.
 #include "json/parse_memory.h"
 
 #include <algorithm>
@@ -34,10 +34,10 @@ constexpr std::size_t perArray = openArraySize + allocated(sizeof(Value));
 constexpr std::size_t perObject = openObjectSize + memberSize;
 constexpr std::size_t perComma = std::max(elementSize, memberSize);
 
-/// What a string takes beyond its bytes.
+/// What a string takes in addition to its bytes.
 constexpr std::size_t perString = allocated(1) - 1;
 
-// One container at a time moves to more room, of which all but the first time is counted above.
+// One container at a time moves to a larger allocation; all but the first are counted above.
 constexpr std::size_t always = 4096;
 
 }  // namespace

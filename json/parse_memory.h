@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// How much memory a JSON text takes when it is parsed, told before it is.
+// Estimates how much memory a JSON text will take when it is parsed.
 #pragma once
 
 #include <cstddef>
@@ -7,7 +7,7 @@
 
 namespace json {
 
-/// An upper bound on the bytes that parse(text) allocates at any one time, its result among them,
+/// An upper bound on the bytes that parse(text) allocates at any one time, its result included,
 /// with what glibc's malloc adds to each allocation. For a text of many small values it is up to
 /// three times what is really used, for long strings hardly more than their length.
 ///

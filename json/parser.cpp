@@ -105,7 +105,7 @@ Status parseContent(Input& input, const char* end, char*& out, char* outEnd) {
         out = copied.out;
         if (input.position == end)
             return Status::success;
-        // The kernel leaves "\u" and all that is no escape.
+        // The kernel leaves "\u" and all that is not an escape.
         ++input.position;
         if (atEnd(input))
             return Status::endOfInput;
@@ -316,7 +316,7 @@ public:
 private:
     /// What has to be remembered of an object that is open.
     struct OpenObject {
-        bool inOrder = true;       // each key so far comes behind the one before
+        bool inOrder = true;       // each key so far comes after the one before
         bool dropsMember = false;  // the value of the latest member is the front of `dropped`
         bool dataChecked = false;  // `data` is known to be an array of integers
         IntegerType type = IntegerType::none;  // what the latest "kqtype" that names a type names
@@ -500,7 +500,7 @@ Status TreeParser::parseKey(std::string& key) {
 Value& TreeParser::memberValue(Object& object, std::string key) {
     OpenObject& container = objects.top();
     const std::size_t size = object.size();
-    // In order, a member is put behind the last without a search.
+    // In order, a member is appended without a search.
     const auto member = container.inOrder ? object.try_emplace(object.end(), std::move(key))
                                           : object.emplace(std::move(key), Undefined()).first;
     if (object.size() > size) {
@@ -519,8 +519,8 @@ Status TreeParser::startData(Value& value) {
 }
 
 /// Remembers the type that a "kqtype" names, if it does. Data that came before it is to be read
-/// again as data of that type, and put into the object in the place of what is there. Whether that
-/// can be done does not depend on the type, so each data is checked once, and read when the object
+/// again as data of that type, and put into the object in place of what is there. Whether that can
+/// be done does not depend on the type, so each data is checked once, and read when the object
 /// ends: a request may repeat "kqtype" after long data many times.
 Status TreeParser::applyType(const Value& name) {
     if (!name.is<std::string>())

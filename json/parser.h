@@ -18,7 +18,7 @@
 
 namespace json {
 
-/// Parses the object that `text` begins with. A text that is no well-formed object, or that has
+/// Parses the object that `text` begins with. A text that is not a well-formed object, or that has
 /// anything before the opening brace, gives an empty object; what follows the closing brace is not
 /// looked at. Throws nothing but std::bad_alloc. Any bytes may come in: the time is linear in their
 /// number, and no stack is used in proportion to the nesting.
@@ -32,7 +32,7 @@ enum class Status : std::uint32_t {
     notNull = 1,              // the text is not "null"
     notBoolean = 2,           // the text is neither "true" nor "false"
     badUnicodeEscape = 5,     // "\u" without four hexadecimal digits, a high surrogate without "\u"
-    badEscape = 6,            // a backslash before a character that is no escape letter
+    badEscape = 6,            // a backslash before a character that is not an escape letter
     notString = 8,            // a string does not begin with a double quote
     notNumber = 11,           // a number does not begin with a digit, after an optional "-"
     noFraction = 12,          // a "." without a digit after it
@@ -43,7 +43,7 @@ enum class Status : std::uint32_t {
     badObjectSeparator = 17,  // an object member is followed by neither "," nor "}"
     noColon = 18,             // a key is not followed by ":"
     endOfInput = 19,          // the input ended too early; also any exception within typed data
-    badTypedElement = 20,     // an element of typed data is no integer
+    badTypedElement = 20,     // an element of typed data is not an integer
 };
 
 /// The bytes that a routine reads. Each routine moves `position` past what it consumes; after a

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Writes a tree of values by walking it with a stack of its own, so that no depth can exhaust the
-// thread's. The memory for the text is had at once, by an estimate of its length.
+// thread's. The memory for the text is allocated once, by an estimate of its length.
 #include "json/serialize.h"
 
 #include <algorithm>
@@ -23,8 +23,8 @@ namespace {
 
 // ---- Walking the tree ----
 
-/// Hands the parts of a tree to `Visitor` in the order of the text: `open`, `close`, `comma`,
-/// `key`, and `leaf` with what is held by each value that is no container; until it is `done`.
+/// Passes the parts of a tree to `Visitor` in the order of the text: `open`, `close`, `comma`,
+/// `key`, and `leaf` with the content of each value that is not a container; until it is `done`.
 template <typename Visitor>
 class TreeWalk {
 public:
@@ -103,8 +103,8 @@ std::size_t estimateEscapes(const std::string& text) {
     return text.size() / (samples * sampleSize) * escapes + text.size() / margin;
 }
 
-/// Adds up about how long the text of a tree gets. Gives up on a tree of many small values: to go
-/// through it twice takes longer than to enlarge the memory now and then.
+/// Estimates the length of the text of a tree. Gives up on a tree of many small values: visiting it
+/// twice takes longer than enlarging the memory now and then.
 class Estimate {
 public:
     bool done() const {
@@ -130,8 +130,7 @@ public:
         add(usualNumber);
     }
 
-    // Some more than nothing, since what is written last wants room for the longest that it could
-    // be.
+    // Not zero, since each write needs room for the longest text that it could produce.
     std::size_t length = 64;
 
 private:
@@ -145,7 +144,7 @@ private:
 
 // ---- Writing ----
 
-/// Writes the text of a tree, up to where it turns out longer than allowed.
+/// Writes the text of a tree, until it turns out longer than allowed.
 class Writer {
 public:
     /// `memory` gets the text; it is enlarged where `estimate` turns out too low.
@@ -222,16 +221,16 @@ private:
         return end - position >= count || enlarge(0, static_cast<std::size_t>(count));
     }
 
-    /// Makes room for `wanted` more bytes, or for as many as are allowed. `certain`: how many will
-    /// be written at least; returns false when the text is too long with them.
+    /// Makes room for `wanted` more bytes, or for as many as are allowed. `certain`: how many bytes
+    /// will be written at least; returns false when the text is too long with them.
     bool enlarge(std::size_t certain, std::size_t wanted) {
         const std::size_t used = end == nullptr ? 0 : length();
         if (used > maxLength || certain > maxLength - used) {
             tooLong = true;
             return false;
         }
-        // Some more than allowed, since what is written last wants room for the longest that it
-        // could be.
+        // A little more than allowed, since each write needs room for the longest text that it
+        // could produce.
         constexpr std::size_t margin = 2 * longestNumber;
         const std::size_t most = maxLength + std::min(margin, text.max_size() - maxLength);
         const std::size_t size = std::min(used + std::max(wanted, used / 2), most);

@@ -11,7 +11,7 @@
 
 namespace json::detail {
 namespace {
-// A table of its own for every including file is meant, for the reason above.
+// Every including file gets a table of its own, for the reason above.
 // NOLINTBEGIN(misc-definitions-in-headers)
 
 using Mask = unsigned long;  // bit i is about byte i of a block
@@ -28,7 +28,7 @@ inline std::size_t count(Mask mask) {
 }
 
 /// Of backslashes, those that begin an escape: in each run of them the first, the third and so on.
-/// The subtraction carries through each run and so finds whether what comes behind it is escaped.
+/// The subtraction carries through each run and so finds whether what follows it is escaped.
 constexpr Mask escapeStarts(Mask backslashes) {
     constexpr Mask oddBits = 0xAAAA'AAAA'AAAA'AAAA;
     return ((((backslashes << 1) | oddBits) - backslashes) ^ oddBits) & backslashes;

@@ -2,7 +2,6 @@
 // The kernels that every machine can run, and the choice among all.
 #include "json/string_kernels.h"
 
-#include <array>
 #include <cstddef>
 #include <cstdint>
 
@@ -12,6 +11,7 @@
 
 #include "json/string_kernel_loops.h"
 #include "json/word_bytes.h"
+#include "platform/runnable_kernels.h"
 
 namespace json::detail {
 
@@ -112,13 +112,7 @@ constexpr StringKernels sse2Kernels = kernelsOf<Sse2Block>("SSE2");
 
 #endif
 
-/// Held without memory from the heap, which may be exhausted when they are first asked for.
-struct RunnableKernels {
-    std::array<const StringKernels*, 3> kernels{};
-    std::size_t count = 0;
-
-    void add(const StringKernels& added) { kernels[count++] = &added; }
-};
+using RunnableKernels = platform::RunnableKernels<StringKernels, 3>;
 
 RunnableKernels findRunnable() {
     RunnableKernels runnable;
@@ -141,7 +135,7 @@ RunnableKernels findRunnable() {
 
 std::span<const StringKernels* const> runnableStringKernels() {
     static const RunnableKernels runnable = findRunnable();
-    return {runnable.kernels.data(), runnable.count};
+    return runnable.all();
 }
 
 const StringKernels& stringKernels() {

@@ -89,7 +89,7 @@ struct IsAlternative<T, std::variant<Held...>> {
 
 }  // namespace detail
 
-/// Exactly one of the ten held types; types that would only convert to one are none.
+/// Exactly one of the ten held types; types that would only convert to one do not count.
 template <typename T>
 concept HeldType = detail::IsAlternative<T, Storage>::value;
 

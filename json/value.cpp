@@ -32,7 +32,7 @@ struct CopyTask {
     Value* target;
 };
 
-/// Makes `target` an array of copies. Elements that hold others are left undefined and put on
+/// Makes `target` an array of copies. Elements that hold others are left undefined and added to
 /// `tasks`.
 void copyElements(const Array& source, Array& target, std::vector<CopyTask>& tasks) {
     target.reserve(source.size());
@@ -82,7 +82,7 @@ struct ArrayAssignment {
         return (*target)[index].is<Array>() && (*source)[index].is<Array>();
     }
 
-    /// Assigns what is no nested assignment of its own.
+    /// Assigns what is not a nested assignment of its own.
     void carryOut() const noexcept {
         if (!isInPlace()) {
             *target = std::move(*source);
@@ -100,7 +100,7 @@ struct ArrayAssignment {
 };
 
 void assignElements(Array& target, Array& source) {
-    // First all that takes memory, so that nothing has changed yet when there is none.
+    // All allocations come first, so that nothing has changed yet when one fails.
     std::vector<ArrayAssignment> assignments{{&target, &source}};
     for (std::size_t done = 0; done < assignments.size(); ++done) {
         const ArrayAssignment outer = assignments[done];
@@ -121,8 +121,8 @@ void assignElements(Array& target, Array& source) {
 constexpr int recursiveLevels = 32;
 
 /// How many destructors of values that hold others run on this thread, each within the one before.
-/// It is part of the memory that each thread is begun with: glibc would otherwise allocate it when
-/// a thread first comes here, and end the process if it could not.
+/// It is in the thread's initial memory: glibc would otherwise allocate it when a thread first
+/// comes here, and end the process on failure.
 [[gnu::tls_model("initial-exec")]] thread_local int runningDestructors = 0;
 
 Value& first(Value& container) {
@@ -150,12 +150,12 @@ bool hasOneElement(const Value& container) {
 /// Destroys the contents of a tree of any depth. A destructor may neither recurse that deep nor
 /// allocate a stack of its own, so the way back up is kept in the tree itself: going down from
 /// `current` to its last element, that element takes in `current` as its own first one, and what
-/// was first there moves up to the place that came free.
+/// was first there moves up to the place that became free.
 ///
 ///     current: [a, [b, c]]   becomes   current: [[a, b], c]
 ///
 /// From there c is destroyed, then [a, b] is the only element and becomes `current` again. Each
-/// container is gone down to once, so the time is linear.
+/// container is entered once, so the time is linear.
 void unwind(Value& root) noexcept {
     Value current(std::move(root));
     while (current.holdsElements()) {
@@ -177,7 +177,8 @@ void unwind(Value& root) noexcept {
 
 using Comparison = std::pair<const Value*, const Value*>;
 
-/// Compares two arrays but for those elements that hold others on both sides: these go on `tasks`.
+/// Compares two arrays except for elements that hold others on both sides, which are added to
+/// `tasks`.
 bool equalBut(const Array& left, const Array& right, std::vector<Comparison>& tasks) {
     if (left.size() != right.size())
         return false;

@@ -31,8 +31,8 @@ public:
     /// Makes an `Undefined` value.
     Value() noexcept = default;
 
-    /// Makes a value of the kind that holds a T. Only the ten held types themselves are taken: an
-    /// `int` has no kind (write `long(n)`, `double(n)`), and no pointer becomes a boolean.
+    /// Makes a value of the kind that holds a T. Only the ten held types themselves are accepted:
+    /// an `int` has no kind (write `long(n)`, `double(n)`), and no pointer becomes a boolean.
     template <typename T>
     requires HeldType<std::remove_cvref_t<T>>
     // NOLINTNEXTLINE(google-explicit-constructor,bugprone-forwarding-reference-overload)

@@ -56,7 +56,7 @@ void Serialization::handleWriteRequest(const JsonMessage& message) {
         written = writeTextDocument(std::move(path), std::move(content.get<std::string>()),
                                     std::move(encoding));
     }
-    // Whatever the result: a writer that answers false may have changed the file all the same.
+    // Sent whatever the result: a writer that answers false may still have changed the file.
     notifyFileSystem(filePath, existed);
     publish(writeResponsePrefix + rtcId, written);
 }

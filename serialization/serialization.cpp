@@ -45,7 +45,7 @@ bool Serialization::isControl(char16_t unit) const noexcept {
 
 void Serialization::publish(const std::string& channel, json::Value value) const {
     const std::string text = json::serialize(value);
-    // A large document shall not be held three times.
+    // A large document must not be held three times.
     value = json::Value();
     messageService->publish(channel, DataBuffer::copyOf(text));
 }
@@ -55,10 +55,10 @@ void Serialization::publishReadResult(const std::string& channel, json::Value re
     const std::optional<std::string> text = json::serialize(result, longestAnswer);
     if (!text) {
         publish(channel,
-                json::Object{{kExceptionKey, tooLarge(longestAnswer)}, {kStatusKey, false}});
+                json::Object{{exceptionKey, tooLarge(longestAnswer)}, {statusKey, false}});
         return;
     }
-    // A large document shall not be held three times.
+    // A large document must not be held three times.
     result = json::Value();
     messageService->publish(channel, DataBuffer::copyOf(*text));
 }

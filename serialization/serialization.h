@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "json/value.h"
+#include "platform/messaging/channels.h"
 #include "platform/messaging/message_service.h"
 #include "platform/package/quillet_file_package.h"
 
@@ -26,21 +27,21 @@ public:
     /// it. Throws what initializeMessageService throws.
     Serialization();
 
-    /// Releases the subscriptions, the write channel's first, and then the message service; that is
-    /// the whole disconnection.
+    /// Releases the subscriptions, the write channel's first, and then the message service; which
+    /// is all there is to disconnecting.
     ~Serialization() = default;
 
     Serialization(const Serialization&) = delete;
     Serialization& operator=(const Serialization&) = delete;
 
-    // The members stand in the order in which they are made and, reversed, released.
+    // The members are made in this order and released in the reverse one.
 
     const std::string serviceName{"EditorSerialization"};
 
-    const std::string readRequestChannel{"/zpr/service/readRequest_cpp"};
-    const std::string readResponsePrefix{"/zpr/service/readResponse/"};
-    const std::string writeRequestChannel{"/zpr/service/writeRequest_cpp"};
-    const std::string writeResponsePrefix{"/zpr/service/writeResponse/"};
+    const std::string readRequestChannel{platform::messaging::readRequestChannel};
+    const std::string readResponsePrefix{platform::messaging::readResponsePrefix};
+    const std::string writeRequestChannel{platform::messaging::writeRequestChannel};
+    const std::string writeResponsePrefix{platform::messaging::writeResponsePrefix};
 
     const std::string rtcIdKey{"rtcId"};
     const std::string contentTypeKey{"contentType"};
@@ -58,20 +59,20 @@ public:
     const std::string targetModeKey{"targetMode"};
     const std::string relationshipIdKey{"relationshipId"};
 
-    /// What cleaned text carries in the place of each code unit that it must not contain.
+    /// What cleaned text carries in place of each code unit that it must not contain.
     const char16_t replacementChar{u'\uFFFD'};
 
     const std::string applicationPrefix{"application/"};
     const std::string dataUriPrefix{"data:"};
     const std::string imagePrefix{"image/"};
 
-    /// A valid character, but office programs choke on it inside a package's text.
+    /// A valid character, but office programs fail on it inside a package's text.
     const char16_t zeroWidthSpace{u'\u200B'};
 
     /// Code units are compared with it as signed 32-bit integers.
     const std::int32_t firstNonCharacter{0xFFFE};
 
-    const std::string notifyFileSystemChannel{"/zpr/service/notifyFileSystemRequest"};
+    const std::string notifyFileSystemChannel{platform::messaging::notificationChannel};
     const std::string isExistingFileKey{"isExistingFile"};
 
     // Which code units cleaned text must not contain.
@@ -92,8 +93,8 @@ public:
     // Start-up and stop.
 
     /// Asks for the client `serviceName` and, once it is there, subscribes the two request channels
-    /// on the thread that delivers it. Failures after the asking are silent: the bundle then
-    /// answers no requests. Throws std::runtime_error when the client cannot even be asked for.
+    /// on the thread that delivers it. Later failures are silent: the bundle then answers no
+    /// requests. Throws std::runtime_error when it cannot even ask for the client.
     void initializeMessageService();
 
     /// Called when the host stops the bundle. Does nothing on purpose: requests are answered until
@@ -129,9 +130,10 @@ public:
     /// charset. Throws std::runtime_error when the file breaks off with an input error.
     std::u16string readTextFile(std::u16string path, std::string& charset) const;
 
-    /// The bytes of the file at `path`; none when it cannot be opened or is no regular file, whose
-    /// end might never come. Throws std::runtime_error when the file is larger than a text may be,
-    /// and when reading fails half-way, since a part of a document must not pass for the whole.
+    /// The bytes of the file at `path`; none when it cannot be opened or is not a regular file,
+    /// whose end might never come. Throws std::runtime_error when the file is larger than a text
+    /// may be, and when reading fails half-way, since a part of a document must not be mistaken for
+    /// the whole.
     std::string readFileBytes(std::u16string path) const;
 
     // Reading a document package.
@@ -165,7 +167,7 @@ public:
         const platform::package::QuilletFilePackage::Relationship& relationship) const;
 
     /// The "content" of a part: its bytes as they are, or a base64 data URI for the "image/" types,
-    /// unless the bytes are that very form already. Throws std::runtime_error "Out of memory!".
+    /// unless the bytes are such a URI already. Throws std::runtime_error "Out of memory!".
     std::string encodePartContent(std::vector<std::uint8_t> bytes,
                                   const std::string& contentType) const;
 
@@ -184,15 +186,14 @@ public:
     bool writeTextDocument(std::u16string path, std::string text, std::string charset) const;
 
     /// Truncates the file at `path` and writes `text` to it in `charset`, in place and without a
-    /// byte-order mark. True when the file could be opened, whatever became of the writing after
-    /// that. Throws std::runtime_error, with the file truncated, when the charset cannot hold the
-    /// text.
+    /// byte-order mark. True when the file could be opened, even if writing fails after that.
+    /// Throws std::runtime_error, with the file truncated, when the charset cannot hold the text.
     bool writeTextFileContent(std::u16string path, std::u16string text, std::string charset) const;
 
     /// Writes the package that `document` describes to `path`, replacing what is there as a whole
     /// or not at all. False when the path is empty, an element of the document is faulty or the
-    /// package cannot be written. Throws std::runtime_error when "parts" or "relationships" is no
-    /// array.
+    /// package cannot be written. Throws std::runtime_error when "parts" or "relationships" is not
+    /// an array.
     bool writePackageDocument(std::u16string path, json::Object document) const;
 
     /// The parts that the objects of `array` describe. This and the conversions below throw
@@ -206,19 +207,19 @@ public:
         json::Array array, bool allowInternal) const;
 
     /// The bytes of a part. "application/" content is text and is cleaned; "image/" content that is
-    /// a data URI is decoded, and throws std::runtime_error where it is no base64; all other
+    /// a data URI is decoded, and throws std::runtime_error where it is not base64; all other
     /// content is taken as it stands.
     std::vector<std::uint8_t> decodePartContent(std::string content,
                                                 const std::string& contentType) const;
 
-    /// `text` in UTF-8 with replacementChar in the place of each code unit that a package's text
-    /// must not contain.
+    /// `text` in UTF-8 with replacementChar in place of each code unit that a package's text must
+    /// not contain.
     std::vector<std::uint8_t> cleanTextToUtf8(std::string text) const;
 
-    /// Tells the host's file views that the file at `filePath` (UTF-8, as the request gave it) may
-    /// have changed; `existed` says whether something was there before. Returns without waiting for
-    /// anyone. Throws std::runtime_error "Out of memory!" when the message's buffer cannot be
-    /// allocated.
+    /// Announces to the host's file views that the file at `filePath` (UTF-8, as the request gave
+    /// it) may have changed; `existed` says whether something was there before. Returns without
+    /// waiting for anyone. Throws std::runtime_error "Out of memory!" when the message's buffer
+    /// cannot be allocated.
     void notifyFileSystem(std::string filePath, const bool& existed) const;
 
 private:

@@ -20,7 +20,7 @@ void Serialization::initializeMessageService() {
     auto creation = createMessageService(serviceName, MessageServiceOptions{});
 
     Promise<void> started;
-    // Nobody waits for start-up, so that it never blocks the host.
+    // Nobody waits for start-up, so it never blocks the host.
     static_cast<void>(started.getFuture());
 
     auto onMessageServiceReady = [this, started = std::move(started)](

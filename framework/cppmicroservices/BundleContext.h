@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// BundleContext: what the framework hands a bundle at start and stop. Stands in for the header of
+// BundleContext: what the framework gives a bundle at start and stop. Stands in for the header of
 // the same name of CppMicroServices 3.8, of which it has what our bundle and loader use.
 #pragma once
 
@@ -15,12 +15,12 @@ class BundleContextPrivate;
 /// interface.
 class BundleContext {
 public:
-    /// A context that leads nowhere.
+    /// A context without a framework.
     BundleContext() = default;
 
     explicit BundleContext(std::shared_ptr<BundleContextPrivate> context) : d(std::move(context)) {}
 
-    /// Whether a framework stands behind the context.
+    /// Whether the context belongs to a framework.
     explicit operator bool() const { return d != nullptr; }
 
 private:

@@ -85,8 +85,8 @@ public:
     }
 
     /// Waits for the outcome and takes it out: returns the value, or rethrows the exception. Throws
-    /// std::runtime_error when the state is or gets cancelled, and when the outcome is not to be
-    /// had because it was taken or a continuation waits for it.
+    /// std::runtime_error when the state is or gets cancelled, and when the outcome is not
+    /// available because it was taken or a continuation waits for it.
     T takeOutcome() {
         std::unique_lock lock(mutex);
         if (valueReturned || continuation) {
@@ -104,8 +104,8 @@ public:
             default:
                 throw std::runtime_error("Invalid Future state reached.");
         }
-        // The cell goes with the caller, so that the value is moved, and an exception released,
-        // without the lock.
+        // The caller keeps the cell, so that the value is moved, and an exception released, without
+        // the lock.
         const bool holdsException = status == FutureStatus::exception;
         const std::unique_ptr<Outcome> outcome = std::move(result);
         lock.unlock();
@@ -172,7 +172,7 @@ private:
         resolve(std::move(lock));
     }
 
-    // Passes a status that is no longer pending on to whoever waits for it.
+    // Passes a status that is no longer pending on to those that wait for it.
     void resolve(std::unique_lock<std::mutex> lock) {
         std::unique_ptr<ContinuationBase<T>> detached = std::move(continuation);
         if (detached && (status == FutureStatus::value || status == FutureStatus::exception)) {

@@ -12,7 +12,7 @@
 
 #include "host/bus/failed_reads.h"
 #include "host/bus/request_admission.h"
-#include "host/commands/exit_status.h"
+#include "host/exit_status.h"
 #include "host/guard/guarded_client.h"
 #include "host/limits/memory_limit.h"
 #include "platform/messaging/transport.h"
@@ -27,8 +27,8 @@ using platform::messaging::JsonMessage;
 // The name under which the host is a client of the bus.
 constexpr const char* clientName = "serialization_host";
 
-// What may wait for the bundle while the next message is taken in: enough to keep the bundle busy.
-// A larger message waits until nothing else does.
+// The bytes that may wait for the bundle while the next message is taken in: enough to keep it
+// busy. A larger message waits until nothing else does.
 constexpr std::size_t usualQueuedBytes = std::size_t{16} * 1024 * 1024;
 constexpr std::size_t mostQueuedMessages = 4096;
 
@@ -56,7 +56,7 @@ std::shared_ptr<InProcessBus> makeBus(std::size_t largestMessage, Guard guard,
                                       std::uint64_t memoryForRequests) {
     platform::messaging::InProcessBusOptions options;
     options.maxQueuedBytes = std::max(largestMessage, usualQueuedBytes);
-    // A large document shall not hold up the small ones behind it.
+    // A large document must not hold up the small ones behind it.
     options.concurrentChannels = {platform::messaging::readRequestChannel};
     std::shared_ptr<InProcessBus> bus = InProcessBus::create(std::move(options));
     platform::messaging::setTransport(transportOf(bus, std::move(guard), memoryForRequests));
@@ -78,7 +78,7 @@ BundleHost::BundleHost(const std::filesystem::path& bundle, std::size_t largestM
       client_(bus_->connect(clientName).get()),
       bundle_(bundle) {}
 
-// The transport holds the bus, and what guards its saves.
+// The transport keeps the bus and the guard of its saves alive.
 BundleHost::~BundleHost() {
     platform::messaging::setTransport({});
 }

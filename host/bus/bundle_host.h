@@ -26,10 +26,10 @@ public:
     /// Starts `bundle`, a shared library. `published` is called with every message that the bundle
     /// publishes, on the publishing thread and by several threads at once; while it runs, the
     /// request that the message answers is not done. Messages of up to `largestMessage` bytes can
-    /// be sent. What `guard` has saves for, it saves. Unless `memoryForRequests` is 0, the bundle
-    /// gets requests as admittingRequests() gives them, with a budget of so many bytes, and those
-    /// to read that fail for want of memory are answered. Throws std::runtime_error when the bundle
-    /// cannot be loaded or started.
+    /// be sent. Documents are saved by `guard`, if it has saves. Unless `memoryForRequests` is 0,
+    /// the bundle gets requests as admittingRequests() gives them, with a budget of so many bytes,
+    /// and those to read that fail for lack of memory are answered. Throws std::runtime_error when
+    /// the bundle cannot be loaded or started.
     BundleHost(const std::filesystem::path& bundle, std::size_t largestMessage,
                platform::messaging::MessageHandler published, Guard guard = {},
                std::uint64_t memoryForRequests = 0);
@@ -46,8 +46,8 @@ public:
     void waitUntilIdle();
 
     /// The same, but when that takes longer than `timeout`, calls `giveUp` and ends the process
-    /// with the exit status of a failed request: the bundle is still at work, and whatever ends it
-    /// in an orderly way would wait for it.
+    /// with the exit status of a failed request: the bundle is still at work, and any orderly end
+    /// would wait for it.
     void waitUntilIdle(std::chrono::seconds timeout, const std::function<void()>& giveUp);
 
 private:

@@ -22,7 +22,7 @@ using platform::messaging::MessageHandler;
 using platform::messaging::MessageService;
 using platform::messaging::Subscription;
 
-// What a DataBuffer throws, and the bundle with it.
+// The text of what a DataBuffer throws, and thus the bundle.
 constexpr std::string_view outOfMemory = "Out of memory!";
 
 void publishFailure(MessageService& client, const std::string& channel, const std::string& reason) {
@@ -34,8 +34,7 @@ void answerForWantOfMemory(MessageService& client, const JsonMessage& request) n
     try {
         answerFailedRead(client, request.payload(), std::string(outOfMemory));
     } catch (const std::exception&) {
-        // There is not even memory for this; the failure itself is logged by who called the
-        // handler.
+        // There is not even memory for this. The handler's caller logs the failure itself.
     }
 }
 

@@ -17,7 +17,7 @@ void answerFailedRead(platform::messaging::MessageService& client, std::string_v
                       const std::string& reason);
 
 /// A client that does what `client` does, and publishes an answer with an "exception" for each read
-/// request whose handler runs out of memory, and in the place of each answer to one that cannot be
+/// request whose handler runs out of memory, and in place of each answer to one that cannot be
 /// published. The futures of `client` have to be resolved when they are returned.
 std::shared_ptr<platform::messaging::MessageService> answeringFailedReads(
     std::shared_ptr<platform::messaging::MessageService> client);

@@ -7,8 +7,8 @@ namespace host {
 
 namespace {
 
-// Where the calling thread's publications go, if they do not go out. The bundle publishes on the
-// thread that calls its handler.
+// Where the calling thread's publications are collected; null when they go out. The bundle
+// publishes on the thread that calls its handler.
 thread_local std::vector<Publication>* keptBack = nullptr;
 
 class KeepingBack {

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What the bundle publishes while it handles one message, for who hands it that message.
+// Collects what the bundle publishes while it handles one message.
 #pragma once
 
 #include <functional>

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// The thread that brings a large message goes on with those that come meanwhile. So it is the bus's
-// own threads that handle everything, and when the bus waits for them, nothing is left undone.
+// The thread that delivers a large message goes on to handle those that arrive meanwhile. So the
+// bus's own threads handle everything, and once the bus has waited for them, nothing is left
+// undone.
 #include "host/bus/request_admission.h"
 
 #include <spdlog/spdlog.h>
@@ -32,16 +33,15 @@ using platform::messaging::MessageHandler;
 using platform::messaging::MessageService;
 using platform::messaging::Subscription;
 
-// What each thread may take without asking, of a budget of that size: the values of a request to
-// read, hundreds of times over; all threads together a small share, with as many as a machine has
-// that has so little.
+// What each thread may take without asking, of a budget of that size: hundreds of times the values of
+// a read request, but of all threads together a small share.
 std::size_t smallWork(const MemoryBudget& budget) {
     constexpr std::size_t usual = std::size_t{4} << 20U;
     constexpr std::size_t share = 64;
     return std::min(usual, budget.size() / share);
 }
 
-// The share of the budget whose size the messages may have together that wait.
+// The share of the budget that all waiting messages may have together.
 constexpr std::size_t waitingShare = 8;
 
 // Reserved for the document of the message that the thread handles; null when it handles none.
@@ -101,8 +101,8 @@ private:
         std::size_t memory;
     };
 
-    // Handles the request, and all that come until it is done; or leaves it to the thread that is
-    // at this already.
+    // Handles the request and all that arrive until it is done, or leaves it to the thread that is
+    // already doing so.
     void handleInTurn(LargeRequest request) {
         std::unique_lock lock(mutex_);
         const std::size_t length = request.message.payload().size();
@@ -142,7 +142,7 @@ private:
         if (kind_) {
             metrics_->endWait(*kind_);
         }
-        // Failures are not left to the bus, for which they would be those of another message.
+        // Failures do not reach the bus, which would log them for another message.
         try {
             handleOne(handler_, request.message);
         } catch (const std::exception& error) {

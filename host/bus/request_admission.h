@@ -26,9 +26,9 @@ struct RequestBudgets {
 /// take when they are parsed (json::memoryToParse). What is large is up to the size of the budget.
 ///
 /// Of the large messages of a channel one is handled at a time, in the order in which they come, so
-/// that small ones find a thread beside it. A message that goes beyond the budget altogether, or
-/// that comes when too many bytes wait, is refused: the log says so, and the answer is an
-/// "exception" for a read request and `false` for a write request whose "rtcId" is known.
+/// that other threads stay free for small ones. A message that exceeds the whole budget, or arrives
+/// when too many bytes wait, is refused: the log says so, and the answer is an "exception" for a
+/// read request and `false` for a write request whose "rtcId" is known.
 ///
 /// Requests that wait for others to be done, and those that are refused, are counted in `metrics`.
 ///

@@ -30,7 +30,7 @@ using platform::messaging::MessageHandler;
 using platform::messaging::MessageService;
 using platform::messaging::Subscription;
 
-// Whether an answer to a request of `kind` tells of success. A document that holds the text has its
+// Whether an answer to a request of `kind` reports success. A document that holds the text has its
 // quotes escaped.
 bool isSuccess(RequestKind kind, std::string_view answer) {
     constexpr std::size_t longestFailure = 4096;
@@ -40,7 +40,7 @@ bool isSuccess(RequestKind kind, std::string_view answer) {
                      answer.find(R"("status":false)") == std::string_view::npos;
 }
 
-// The request that a thread is handling, which counts it.
+// The request that a thread is handling; it counts the request when it is done.
 class HandledRequest {
 public:
     HandledRequest(const JsonMessage& message, RequestKind kind, RequestMetrics& metrics);
@@ -93,7 +93,7 @@ bool mayBeRefusal(const std::string& channel, std::string_view answer) {
            (channel.starts_with(platform::messaging::writeResponsePrefix) && answer != "true");
 }
 
-// With symbolic links followed, as far as there are any files.
+// With symbolic links followed, as far as the path exists.
 fs::path withoutLinks(const fs::path& path) {
     std::error_code error;
     fs::path result = fs::weakly_canonical(path, error);
@@ -163,7 +163,7 @@ private:
     }
 
     void logIfOutside(const JsonMessage& request) const {
-        // A request may be so large that there is no memory to parse it once more.
+        // There may be no memory to parse a large request once more.
         const std::optional<std::string> path = json::findString(request.payload(), "filePath");
         if (!path || path->empty() || path->size() >= PATH_MAX) {
             return;  // It names no file, inside or outside.

@@ -38,7 +38,7 @@ struct ServingOptions {
     /// Called once on each thread that handles messages, before its first message.
     std::function<void()> prepareThread;
 
-    /// Told when the client may not subscribe, which the bundle keeps to itself.
+    /// Set when the client may not subscribe, which the bundle does not report.
     std::shared_ptr<SubscriptionFailure> subscriptionFailure =
         std::make_shared<SubscriptionFailure>();
 
@@ -46,9 +46,9 @@ struct ServingOptions {
     std::shared_ptr<RequestMetrics> metrics = std::make_shared<RequestMetrics>();
 };
 
-/// A client that does what `client` does, and `options` says. An answer that reports no success, to
-/// a request for a path outside the roots, is followed by a warning in the log: for its client it
-/// looks like that for a file that is not there.
+/// A client that does what `client` does and what `options` says. When a request for a path outside
+/// the roots fails, the log has a warning: to its client, the answer looks like that for a missing
+/// file.
 std::shared_ptr<platform::messaging::MessageService> servingClient(
     std::shared_ptr<platform::messaging::MessageService> client, ServingOptions options);
 

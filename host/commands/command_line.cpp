@@ -68,8 +68,7 @@ CLI::Validator untold(CLI::Validator validator) {
     return validator.description("");
 }
 
-// A check of an option's value by `fault`, which tells what is wrong with it; nothing if nothing
-// is.
+// A check of an option's value by `fault`, which says what is wrong with it; empty if nothing is.
 CLI::Validator check(const std::function<std::string(std::string&)>& fault) {
     return CLI::Validator(fault, "");
 }
@@ -167,7 +166,7 @@ std::string faultOfServerUrl(const std::string& url) {
         R"((nats|tls)://(\[[0-9A-Fa-f:.]+\]|[^/:\[\]\s]+)(:[0-9]{1,5})?/?)");
     return std::regex_match(url, form)
                ? ""
-               : "\"" + url + "\" is no address of a server such as nats://127.0.0.1:4222";
+               : "\"" + url + "\" is not the address of a server, such as nats://127.0.0.1:4222";
 }
 
 void declareOwnServer(CLI::App& command, NatsServerOptions& options, CLI::Option& others) {
@@ -192,12 +191,12 @@ void declareOwnServer(CLI::App& command, NatsServerOptions& options, CLI::Option
         ->check(check([](const std::string& origin) {
             return isOrigin(origin) ? ""
                                     : "\"" + origin +
-                                          "\" is no origin such as "
+                                          "\" is not an origin such as "
                                           "http://localhost:3000";
         }));
     command
         .add_option("--nats-server", options.program,
-                    "The program of that server (default: nats-server, found as a shell finds it)")
+                    "The program of the server (default: nats-server, from the usual folders)")
         ->type_name("PATH")
         ->excludes(&others);
 }
@@ -347,7 +346,7 @@ void declareServe(CLI::App& command, ServeOptions& options) {
     declareOwnServer(command, options.ownServer,
                      declareOtherServers(command, options.otherServers));
     command.final_callback([&command, &options] {
-        // A worker among others need not be where browsers go.
+        // A worker among others need not serve browsers.
         if (!options.otherServers.urls.empty() && command.count("--web") == 0 &&
             command.count("--listen") == 0) {
             options.web.isServed = false;
@@ -377,7 +376,7 @@ void declareWrite(CLI::App& command, WriteOptions& options) {
                     "UTF-8; with --text that of the file, if there is one)")
         ->type_name("CHARSET");
     command.add_flag("--text", options.isUtf8Text,
-                     "Take the input for a text in UTF-8, as read --text prints it");
+                     "Read the input as a text in UTF-8, as read --text prints it");
     declareGuard(command, options.guard);
     declareTimeout(command, options.timeout);
     command.final_callback([&options] {
@@ -423,7 +422,7 @@ std::size_t editDistance(std::string_view from, std::string_view to) {
     return row.back();
 }
 
-// The one of `names` that somebody probably meant who wrote `word`.
+// The one of `names` that was probably meant by `word`.
 std::optional<std::string> nearest(const std::string& word, const std::vector<std::string>& names) {
     const auto distance = [&word](const std::string& name) { return editDistance(word, name); };
     const auto best = std::min_element(
@@ -447,7 +446,7 @@ std::string question(const std::optional<std::string>& name) {
     return name ? "; did you mean \"" + *name + "\"?" : "";
 }
 
-// What is wrong with the word that `app` could not make anything of.
+// What is wrong with the word that `app` did not understand.
 std::string unknown(const CLI::App& app, const std::string& word) {
     const std::vector<CLI::App*> commands = app.get_subcommands();
     if (word.starts_with("-")) {
@@ -495,7 +494,7 @@ void describe(CLI::App& app, CommandLine& line) {
                    "The bundle to load (default: the one that belongs to the program)")
         ->type_name("PATH");
     app.add_option("--log-level", line.logLevel,
-                   "The least serious messages to tell on standard error: trace, debug, info, "
+                   "The least serious messages to show on standard error: trace, debug, info, "
                    "warning, error, critical or off (default: " +
                        line.logLevel + ")")
         ->type_name("LEVEL")
@@ -544,7 +543,7 @@ void parse(CLI::App& app, std::vector<std::string> arguments) {
         }
     }
     if (dashes != arguments.end()) {
-        arguments.erase(dashes);  // Now that nothing behind it looks like an option.
+        arguments.erase(dashes);  // Now that nothing after it looks like an option.
     }
     std::reverse(arguments.begin(), arguments.end());  // as the parser takes them
     app.parse(std::move(arguments));

@@ -35,16 +35,16 @@ struct CommandLine {
     WriteOptions write;
 };
 
-/// Declares the program's commands and options in `app`, a parse of which fills in `line`; its
-/// values by then are the defaults. Both have to outlive each other's use.
+/// Declares the program's commands and options in `app`, which fills in `line` when it parses; the
+/// values that `line` has then are the defaults. Both must live until the parsing is done.
 void describe(CLI::App& app, CommandLine& line);
 
 /// Has `app` parse `arguments`, those of the program without its own name. One that looks like an
 /// option, but is none and names a file, is taken for that file, since a pattern of the shell may
-/// expand to such names; so is everything behind "--". Throws CLI::ParseError.
+/// expand to such names; so is everything after "--". Throws CLI::ParseError.
 void parse(CLI::App& app, std::vector<std::string> arguments);
 
-/// What to tell somebody whose command line could not be parsed by `app`, in whole lines.
+/// The message, in whole lines, for a command line that `app` could not parse.
 std::string complaint(const CLI::App& app, const CLI::ParseError& error);
 
 }  // namespace host

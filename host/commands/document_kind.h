@@ -6,9 +6,9 @@
 
 namespace host {
 
-/// Whether `file` is to be read as a document package: it begins as zip archives do, of which the
-/// bundle can say what is wrong with it if it is another one. False for anything else, also for
-/// what is no regular file or cannot be read.
+/// Whether `file` is to be read as a document package: it begins like a zip archive. If it is some
+/// other archive, the bundle can say what is wrong with it. False for anything else, including what
+/// is not a regular file or cannot be read.
 bool isDocumentPackage(const std::filesystem::path& file);
 
 }  // namespace host

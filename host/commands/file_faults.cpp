@@ -24,7 +24,7 @@ bool may(const std::string& path, int access) {
     return ::faccessat(AT_FDCWD, path.c_str(), access, AT_EACCESS) == 0;
 }
 
-// What something of this mode is that is no regular file, such as "is a folder".
+// What a file of this mode is when it is not a regular one, such as "is a folder".
 std::string kindOf(mode_t mode) {
     return S_ISDIR(mode)    ? "is a folder"
            : S_ISFIFO(mode) ? "is a pipe"
@@ -32,7 +32,7 @@ std::string kindOf(mode_t mode) {
                             : "is a device";
 }
 
-// Why the folder of a file that there is not cannot take it.
+// Why a file that does not exist cannot be created in its folder.
 std::string whyNoNewFile(const std::string& path) {
     std::string folder = std::filesystem::path(path).parent_path();
     folder = folder.empty() ? "." : folder;
@@ -42,7 +42,7 @@ std::string whyNoNewFile(const std::string& path) {
                                : "the folder " + folder + ": " + lastError();
     }
     if (!S_ISDIR(status.st_mode)) {
-        return folder + " is no folder";
+        return folder + " is not a folder";
     }
     return may(folder, W_OK | X_OK) ? "" : "the folder " + folder + ": " + lastError();
 }

@@ -10,8 +10,8 @@ namespace host {
 /// can be opened.
 std::string whyNotReadable(const std::string& path);
 
-/// Why `path` cannot be written, such as "the folder /a/b does not exist"; empty when nothing is
-/// found that would keep it from being.
+/// Why `path` cannot be written, such as "the folder /a/b does not exist"; empty when no reason is
+/// found.
 std::string whyNotWritable(const std::string& path);
 
 }  // namespace host

@@ -7,6 +7,9 @@
 #include <system_error>
 #include <utility>
 
+#include "platform/text/case.h"
+#include "platform/text/quoted.h"
+
 namespace host {
 
 namespace {
@@ -16,17 +19,8 @@ constexpr std::string_view lengthHeader = "Content-Length";
 constexpr std::string_view blanks = " \t";
 constexpr int endOfInput = -1;
 constexpr std::size_t bufferSize = std::size_t{64} * 1024;
-// A payload's storage starts at this size at most, and doubles as its bytes come.
+// A payload's buffer starts with at most this size, and doubles as its bytes arrive.
 constexpr std::size_t firstPayloadPiece = std::size_t{1024} * 1024;
-
-char lowerAscii(char c) {
-    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
-}
-
-bool equalWithoutCase(std::string_view left, std::string_view right) {
-    return std::equal(left.begin(), left.end(), right.begin(), right.end(),
-                      [](char l, char r) { return lowerAscii(l) == lowerAscii(r); });
-}
 
 std::string_view withoutLeadingBlanks(std::string_view text) {
     return text.substr(std::min(text.find_first_not_of(blanks), text.size()));
@@ -35,11 +29,7 @@ std::string_view withoutLeadingBlanks(std::string_view text) {
 // `text` in quotes for a message to a terminal: shortened, and without control characters.
 std::string quoted(std::string_view text) {
     constexpr std::size_t longest = 60;
-    std::string result = "\"";
-    for (char c : text.substr(0, longest)) {
-        result += c >= 0x20 && c < 0x7F ? c : '?';
-    }
-    return result + (text.size() > longest ? "...\"" : "\"");
+    return '"' + platform::text::printable(text, longest) + '"';
 }
 
 }  // namespace
@@ -88,7 +78,7 @@ FrameReader::Headers FrameReader::readHeaders() {
     return headers;
 }
 
-// The next line without its end; nothing for the empty line that closes the headers.
+// The next line without its line end; nothing for the empty line after the headers.
 std::optional<std::string> FrameReader::readHeaderLine() {
     std::string line;
     for (;;) {
@@ -124,7 +114,7 @@ void FrameReader::readHeader(std::string_view line, Headers& headers) const {
     }
     const std::string_view name = line.substr(0, colon);
     const std::string_view value = withoutLeadingBlanks(line.substr(colon + 1));
-    if (equalWithoutCase(name, channelHeader)) {
+    if (platform::text::equalIgnoringCase(name, channelHeader)) {
         if (headers.channel) {
             fail("it has two Channel headers");
         }
@@ -132,7 +122,7 @@ void FrameReader::readHeader(std::string_view line, Headers& headers) const {
             fail("its Channel is empty");
         }
         headers.channel = value;
-    } else if (equalWithoutCase(name, lengthHeader)) {
+    } else if (platform::text::equalIgnoringCase(name, lengthHeader)) {
         if (headers.length) {
             fail("it has two Content-Length headers");
         }
@@ -177,8 +167,8 @@ platform::DataBuffer FrameReader::readPayload(std::size_t length) {
     }
 }
 
-// Reads `count` bytes, or fewer where the input ends. What the buffer does not hold goes straight
-// to its place.
+// Reads `count` bytes, or fewer where the input ends. Bytes that are not in the buffer yet are read
+// straight into place.
 std::size_t FrameReader::readPayloadBytes(char* to, std::size_t count) {
     std::size_t have = std::min(count, filled_ - used_);
     if (have > 0) {

@@ -6,11 +6,11 @@
 //     \r\n
 //     <payload>
 //
-// Both headers stand in each frame, once, in either order. Their names are compared without case,
-// and blanks between the colon and the value do not count; a value runs to the end of its line. A
-// channel is any bytes but CR and LF, of which there is at least one and the first is no blank. A
-// header line is at most maxHeaderLine bytes long. Any departure from this is an error: a stream
-// that has lost its frames cannot be trusted to find them again.
+// Each frame has both headers once, in either order. Their names are compared without case, and
+// blanks between the colon and the value do not count; a value runs to the end of its line. A
+// channel is any bytes but CR and LF, at least one, and the first is not a blank. A header line is
+// at most maxHeaderLine bytes long. Any departure from this is an error: a stream that has lost its
+// frames cannot be trusted to find them again.
 #pragma once
 
 #include <cstddef>
@@ -43,15 +43,15 @@ public:
 /// Reads up to `room` bytes to `to` and returns how many; zero means the end of the input.
 using ByteSource = std::function<std::size_t(char* to, std::size_t room)>;
 
-/// Takes a stream of bytes apart into frames.
+/// Splits a stream of bytes into frames.
 class FrameReader {
 public:
     /// Reads from `source`; frames with a payload of more than `maxPayload` bytes are refused.
     FrameReader(ByteSource source, std::size_t maxPayload);
 
-    /// The next frame, or nothing when the input ends where a frame may end. Memory is taken as the
-    /// payload's bytes come, not as its header promises. Throws FramingError, or what the source
-    /// throws; the reader is of no use after that.
+    /// The next frame, or nothing when the input ends where a frame may end. Memory is allocated as
+    /// the payload's bytes arrive, not as its header promises. Throws FramingError, or what the
+    /// source throws; the reader cannot be used after that.
     std::optional<Frame> next();
 
 private:
@@ -75,7 +75,7 @@ private:
     std::size_t filled_ = 0;
 };
 
-/// The headers, with the empty line behind them, of a frame with `length` bytes of payload for
+/// The headers, with the empty line after them, of a frame with `length` bytes of payload for
 /// `channel`. Throws std::invalid_argument when no frame can carry that channel.
 std::string frameHeaders(std::string_view channel, std::size_t length);
 

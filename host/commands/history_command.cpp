@@ -9,9 +9,9 @@
 #include <stdexcept>
 #include <vector>
 
-#include "host/commands/exit_status.h"
 #include "host/commands/read_command.h"
-#include "host/commands/standard_streams.h"
+#include "host/exit_status.h"
+#include "host/standard_streams.h"
 #include "platform/posix/file_descriptor.h"
 
 namespace host {

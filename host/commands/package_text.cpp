@@ -20,7 +20,7 @@ std::string_view withoutLeadingSpace(std::string_view text) {
     return text;
 }
 
-// Why `object` is no package; empty when it is one.
+// Why `object` is not a package; empty when it is one.
 std::string faultOf(json::Object& object) {
     if (object["parts"].is<json::Array>() && object["relationships"].is<json::Array>()) {
         return "";
@@ -31,8 +31,8 @@ std::string faultOf(json::Object& object) {
     return "it lacks the arrays \"parts\" and \"relationships\"";
 }
 
-// Which part keeps `package` from being written, as the bundle takes only text for the bodies of
-// application/ types; empty when there is none.
+// Why `package` cannot be written, naming the part: the bundle takes only text as the body of a
+// part of an application/ type. Empty when it can.
 std::string refusalOf(json::Object& package) {
     for (json::Value& part : package["parts"].get<json::Array>()) {
         if (!part.is<json::Object>()) {
@@ -48,7 +48,8 @@ std::string refusalOf(json::Object& package) {
         if (members["contentType"].get<std::string>().starts_with("application/") &&
             !simdjson::validate_utf8(content.data(), content.size())) {
             return "the part " + members["partUri"].get<std::string>() +
-                   " is no text, as one of an application/ type has to be; spell its type "
+                   " is not text, as that of a part of an application/ type has to be; spell its "
+                   "type "
                    "\"Application/...\" to have its bytes stored as they are";
         }
     }

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Tells whether a text is a document package's JSON, as the answer to a read request holds it.
+// Whether a text is a document package's JSON, as in the answer to a read request.
 #pragma once
 
 #include <string>
@@ -7,11 +7,11 @@
 
 namespace host {
 
-/// What was found in a text: a package, or why it is none.
+/// A package that was found in a text, or why there is none.
 struct PackageText {
-    std::string_view json;  ///< The JSON object of the package, in the text that was looked at.
+    std::string_view json;  ///< The JSON object of the package, within the text.
     std::string fault;      ///< Why there is no package, for people; empty when there is one.
-    std::string refusal;    ///< Why it cannot be written, as far as can be seen; for people.
+    std::string refusal;    ///< Why it cannot be written, as far as is known; for people.
 };
 
 /// Looks for one JSON object with the arrays "parts" and "relationships" in `text`, with nothing

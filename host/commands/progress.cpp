@@ -14,14 +14,14 @@ namespace {
 
 constexpr std::chrono::seconds patience{1};
 constexpr std::chrono::milliseconds interval{250};
-// The cursor stays at the line's beginning, so that whatever is printed next takes its place.
+// The cursor stays at the line's beginning, so that the next output overwrites the line.
 constexpr const char* eraseLine = "\r\x1B[K";
 
 }  // namespace
 
 Progress::Progress(std::string work) : work_(std::move(work)) {
     if (::isatty(STDERR_FILENO) == 1) {
-        // Signals stay with the threads that know what to do with them: this one inherits the mask.
+        // This thread inherits the signal mask, so signals go to the threads that handle them.
         sigset_t all;
         sigset_t before;
         ::sigfillset(&all);

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Tells somebody at a terminal that the program is at work.
+// Shows a user at a terminal that the program is at work.
 #pragma once
 
 #include <chrono>
@@ -10,7 +10,7 @@
 
 namespace host {
 
-/// A line at the end of the terminal on standard error, which tells what is being done and since
+/// A line at the end of the terminal on standard error, which says what is being done and since
 /// when. It appears when the work has taken a second; without a terminal there is none.
 class Progress {
 public:
@@ -20,13 +20,13 @@ public:
     Progress(const Progress&) = delete;
     Progress& operator=(const Progress&) = delete;
 
-    /// Takes the line away.
+    /// Removes the line.
     ~Progress();
 
     /// What is being done now, such as "reading file 3 of 20": no longer than a terminal is wide.
     void tell(std::string work);
 
-    /// Takes the line away until it changes the next time, so that something else can be printed.
+    /// Removes the line until it changes the next time, so that something else can be printed.
     void clear();
 
 private:

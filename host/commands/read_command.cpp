@@ -6,27 +6,26 @@
 #include <sys/mman.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <cstddef>
 #include <map>
 #include <mutex>
 #include <optional>
 #include <span>
 #include <string_view>
-#include <system_error>
 #include <utility>
 
 #include "host/bus/bundle_host.h"
 #include "host/commands/document_kind.h"
-#include "host/commands/exit_status.h"
 #include "host/commands/file_faults.h"
 #include "host/commands/progress.h"
-#include "host/commands/standard_streams.h"
 #include "host/commands/text_file.h"
+#include "host/exit_status.h"
+#include "host/standard_streams.h"
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "json/value.h"
 #include "platform/posix/file_descriptor.h"
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -34,7 +33,7 @@ namespace {
 
 using platform::messaging::JsonMessage;
 
-// Requests that are sent before the first of their responses is printed: enough to keep every
+// The number of requests sent before the first of their responses is printed: enough to keep every
 // processor busy, few enough that their responses fit in memory.
 constexpr std::size_t batchSize = 16;
 
@@ -67,7 +66,7 @@ bool isUtf8(std::string_view text) {
     return simdjson::validate_utf8(text.data(), text.size());
 }
 
-// The "rtcId" of the request for `file`, which lies in the command line's list of files.
+// The "rtcId" of the request for `file`, an element of the command line's list of files.
 std::string rtcIdOf(const ReadOptions& options, const std::string& file) {
     return std::to_string(&file - options.files.data());
 }
@@ -83,7 +82,7 @@ const T* find(const json::Object& object, const char* key) {
 platform::FileDescriptor copyInput(int input) {
     platform::FileDescriptor copy(::memfd_create("standard input", MFD_CLOEXEC));
     if (!copy) {
-        throw std::system_error(errno, std::generic_category(), "cannot keep the standard input");
+        platform::throwSystemError("cannot keep the standard input");
     }
     std::string piece(std::size_t{1} << 20U, '\0');
     while (const std::size_t count = readSome(input, piece.data(), piece.size())) {
@@ -92,7 +91,7 @@ platform::FileDescriptor copyInput(int input) {
     return copy;
 }
 
-// What a text is that begins as other files do; empty when it begins as none of these.
+// The kind of file that `text` seems to be by its beginning; empty when it may be a text.
 std::string otherKindOf(std::string_view text) {
     return text.starts_with("PK\3\4") ? "a zip archive, as document packages are"
            : text.starts_with("\xD0\xCF\x11\xE0\xA1\xB1\x1A\xE1")
@@ -188,7 +187,7 @@ private:
         return allSucceeded;
     }
 
-    // Prints, in the place of a response that did not come, one that says so.
+    // Prints, in place of a response that did not come, one that says so.
     std::string printNone(const std::string& file, const std::string& reason) {
         if (options_.form != ReadOptions::Form::text) {
             json::Object result{{"exception", reason}, {"status", false}};
@@ -198,7 +197,7 @@ private:
     }
 
     // Prints the response to the request for `file` in the form that is wanted. Returns what is
-    // wrong with it; nothing when it tells of success.
+    // wrong with it; nothing when it reports success.
     std::string print(const std::string& file, std::string_view response) {
         if (options_.form == ReadOptions::Form::response) {
             writeAll(output_, {response, "\n"});
@@ -238,8 +237,8 @@ private:
         writeAll(output_, {json::serialize(inUtf8(json::Value(std::move(result)))), "\n"});
     }
 
-    // What is wrong with the response; nothing when it tells of success. Tells of a text that may
-    // not be meant to be read as one.
+    // What is wrong with the response; nothing when it reports success. Warns of a text that is
+    // probably some other kind of file.
     std::string faultOf(const std::string& file, const json::Object& result) const {
         if (const bool* const status = find<bool>(result, "status");
             status == nullptr || !*status) {

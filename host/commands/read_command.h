@@ -24,8 +24,8 @@ struct ReadOptions {
 /// Sends a read request for each file and writes what comes of it to `output` in the order of the
 /// files: a line for each, also for one that there is no response for, or in the form `text` the
 /// texts one after the other. `input` is what is read for "-". What fails, and what may not be what
-/// was meant, is told on standard error. Returns the exit status. Throws when the bundle cannot be
-/// started, `input` not be read or `output` not be written.
+/// was meant, is reported on standard error. Returns the exit status. Throws when the bundle cannot
+/// be started, `input` not be read or `output` not be written.
 int runRead(const ReadOptions& options, int input, int output);
 
 }  // namespace host

@@ -26,9 +26,8 @@
 #include "host/bus/failed_reads.h"
 #include "host/bus/request_admission.h"
 #include "host/bus/serving_client.h"
-#include "host/commands/exit_status.h"
-#include "host/commands/standard_streams.h"
 #include "host/commands/stop_signals.h"
+#include "host/exit_status.h"
 #include "host/files/file_service.h"
 #include "host/guard/guarded_client.h"
 #include "host/limits/confinement.h"
@@ -37,6 +36,7 @@
 #include "host/metrics/health_check.h"
 #include "host/metrics/metrics_server.h"
 #include "host/server/private_folder.h"
+#include "host/standard_streams.h"
 #include "platform/messaging/channels.h"
 #include "platform/messaging/nats/nats_bus.h"
 #include "platform/messaging/transport.h"
@@ -50,7 +50,7 @@ using platform::messaging::MemoryBudget;
 using platform::messaging::NatsBus;
 using platform::messaging::NatsOptions;
 
-// Has nothing make clients of a bus any more, and so keep it, from the end of its life on.
+// Resets the process's transport, which keeps the bus alive, at the end of its life.
 class TransportEnd {
 public:
     TransportEnd() = default;
@@ -59,7 +59,7 @@ public:
     ~TransportEnd() { platform::messaging::setTransport({}); }
 };
 
-// The name under which the host is known to the servers.
+// The host's name for the servers.
 constexpr const char* clientName = "serialization_host";
 
 // How long the servers may be out of reach when the host starts.
@@ -68,19 +68,20 @@ constexpr std::chrono::seconds longestConnect{5};
 // How long the requests that were taken may need when the host ends.
 constexpr std::chrono::seconds longestDrain{60};
 
-// Servers would take what is behind white space for the next word of their protocol.
+// To servers, what follows white space is the next word of their protocol.
 void requireGroup(const std::string& group) {
     const bool isValid = !group.empty() && std::all_of(group.begin(), group.end(), [](char c) {
         return c > ' ' && c != '\x7f';
     });
     if (!isValid) {
-        throw std::runtime_error("\"" + group +
-                                 "\" is no name for --group: it may hold neither white space nor "
-                                 "characters other than those of ASCII");
+        throw std::runtime_error(
+            "\"" + group +
+            "\" is not a name for --group: it may hold neither white space nor "
+            "characters other than those of ASCII");
     }
 }
 
-// Tells of a folder that cannot be read before clients are told that their documents are empty.
+// Warns of a folder that cannot be read, before clients are told that their documents are empty.
 void requireReadable(const std::vector<std::filesystem::path>& roots) {
     for (const std::filesystem::path& root : roots) {
         const platform::FileDescriptor opened(
@@ -153,9 +154,9 @@ constexpr std::uint64_t memoryToHandle(std::uint64_t memoryForRequests) {
 
 std::shared_ptr<NatsBus> makeBus(NatsOptions options, const ServeOptions& serve) {
     options.connectTimeout = longestConnect;
-    // Counting them takes files that the threads which ask may not be allowed to open.
+    // Counting the processors opens files that the threads which ask may not be allowed to open.
     options.concurrency = std::max(2U, std::thread::hardware_concurrency());
-    // A large document shall not hold up the small ones behind it.
+    // A large document must not hold up the small ones behind it.
     options.concurrentChannels = {platform::messaging::readRequestChannel,
                                   platform::messaging::filesRequestChannel};
     options.longMessages.answerPrefixes = {
@@ -171,14 +172,14 @@ std::shared_ptr<NatsBus> makeBus(NatsOptions options, const ServeOptions& serve)
 // What each kind of thread may open.
 struct Confinements {
     Confinement bundle;     // While it starts: its framework may read it once more.
-    Confinement documents;  // While it handles requests: it is no document.
+    Confinement documents;  // While it handles requests: it is not a document.
     Confinement network;
     Confinement web;
     Confinement metrics;
 };
 
-// What is needed to find servers by name, to trust them, and to tell them who the host is; again
-// each time that a connection is made.
+// What is needed to find servers by name, to trust them, and to tell them who the host is; needed
+// again for each new connection.
 std::vector<std::filesystem::path> filesOf(const OtherServers& servers) {
     if (servers.urls.empty()) {
         return {};
@@ -187,7 +188,7 @@ std::vector<std::filesystem::path> filesOf(const OtherServers& servers) {
     for (const std::filesystem::path& file :
          {servers.credentialsFile, servers.caFile, servers.certificateFile, servers.keyFile}) {
         if (!file.empty()) {
-            // By its folder, for who replaces such a file does so by renaming another.
+            // By its folder, since such files are replaced by renaming.
             files.push_back(std::filesystem::absolute(file).parent_path());
         }
     }
@@ -216,10 +217,10 @@ std::optional<Confinements> confinementsOf(const ServeOptions& options,
         Confinement(Grants{})};
 }
 
-// Keeps a library loaded, so that it can be loaded again by who cannot open all of its files.
+// Keeps a library loaded, so that a confined thread can load it again without opening its files.
 class LoadedLibrary {
 public:
-    // Whether that fails is found, and told, by who loads it again.
+    // A failure is reported when the library is loaded again.
     explicit LoadedLibrary(const std::filesystem::path& file)
         : handle_(::dlopen(file.c_str(), RTLD_NOW | RTLD_LOCAL)) {}
     LoadedLibrary(const LoadedLibrary&) = delete;
@@ -257,8 +258,8 @@ bool connect(NatsBus& bus, const Confinement* confinement, const std::shared_fut
     return true;
 }
 
-// The page's address, with what the page needs to connect in the fragment, which browsers keep to
-// themselves.
+// The page's address, with what the page needs to connect in the fragment, which browsers do not
+// send.
 std::string pageUrl(const WebServer& web, const NatsServer* server) {
     std::string url = web.origin() + "/";
     if (server != nullptr) {
@@ -313,7 +314,7 @@ std::unique_ptr<NatsServer> startOwnServer(const ServeOptions& options, const We
     return std::make_unique<NatsServer>(std::move(own), folder);
 }
 
-// What tells those who watch the host; it looks at the roots while it lives.
+// The server for monitoring; it checks the roots while it lives.
 std::unique_ptr<MetricsServer> makeMetricsServer(const ServeOptions& options,
                                                  const std::shared_ptr<const NatsBus>& bus,
                                                  const std::shared_ptr<const MemoryBudget>& budget,
@@ -354,7 +355,7 @@ int runServe(const ServeOptions& options, int output) {
     });
 
     const std::filesystem::path webFolder = webFolderOf(options.web);
-    // What keeps earlier versions opens files that clients may not reach.
+    // The thread that keeps earlier versions opens files that clients may not reach.
     const Guard guard = makeGuard(options.guard, options.roots);
     const std::optional<Confinements> confinements = confinementsOf(options, webFolder);
     // The web page's origin is part of the server's configuration.

@@ -15,7 +15,7 @@
 
 namespace host {
 
-/// Message servers that run elsewhere, and how the host identifies itself to them.
+/// Message servers that run elsewhere, and the host's credentials for them.
 struct OtherServers {
     std::vector<std::string> urls;  ///< Empty: the host runs a server of its own.
     std::filesystem::path credentialsFile;
@@ -45,13 +45,13 @@ struct ServeOptions {
     OtherServers otherServers;
     WebOptions web;
 
-    /// Where programs that watch the host ask it how it is; nothing: nowhere.
+    /// The address for programs that monitor the host; nothing: none.
     std::optional<ListenAddress> metrics;
 
     /// The folders below which clients may have files read and written; empty: everywhere.
     std::vector<std::filesystem::path> roots;
 
-    /// Whether the kernel keeps the host to these folders. Without, they have no effect.
+    /// Whether the kernel confines the host to these folders. Otherwise they have no effect.
     bool isConfined = true;
     GuardOptions guard;
 
@@ -62,10 +62,10 @@ struct ServeOptions {
     std::size_t largestMessage = std::size_t{1} << 30;
 };
 
-/// Serves the bundle's clients until the process is asked to end (StopSignals), and finishes then
-/// what was taken. Writes to `output`, a line each, how clients connect: "page: ", "metrics: ",
-/// "nats: " and "websocket: " with the URL, password included, as far as they are the host's own.
-/// To be called while the process has no other threads. Returns the exit status. Throws
+/// Serves the bundle's clients until the process gets a signal to end (StopSignals), then finishes
+/// the requests that it has taken. Writes to `output`, a line each, how clients connect: "page: ",
+/// "metrics: ", "nats: " and "websocket: " with the URL, password included, as far as they are the
+/// host's own. Must be called before the process has other threads. Returns the exit status. Throws
 /// std::runtime_error when the servers or the bundle cannot be started, when the bundle gets no
 /// requests, and when the kernel cannot confine.
 ///

@@ -3,7 +3,6 @@
 
 #include <poll.h>
 #include <spdlog/spdlog.h>
-#include <sys/eventfd.h>
 
 #include <array>
 #include <atomic>
@@ -19,11 +18,12 @@
 #include <utility>
 
 #include "host/bus/bundle_host.h"
-#include "host/commands/exit_status.h"
 #include "host/commands/framing.h"
-#include "host/commands/standard_streams.h"
 #include "host/commands/stop_signals.h"
-#include "platform/posix/file_descriptor.h"
+#include "host/exit_status.h"
+#include "host/standard_streams.h"
+#include "platform/posix/event.h"
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -31,17 +31,13 @@ namespace {
 
 using platform::messaging::JsonMessage;
 
-// Writes messages as frames, one after the other whoever brings them, until a write fails.
+// Writes messages as frames, one at a time, until a write fails.
 class FrameOutput {
 public:
-    explicit FrameOutput(int output) : output_(output), broken_(::eventfd(0, EFD_CLOEXEC)) {
-        if (broken_.get() < 0) {
-            throw std::system_error(errno, std::generic_category(), "cannot make an eventfd");
-        }
-    }
+    explicit FrameOutput(int output) : output_(output) {}
 
-    // Any thread may call it. A message that no frame can carry is left out; what comes after a
-    // failed write is too, for its reader could not tell where it begins.
+    // Any thread may call it. A message that no frame can carry is left out. So are all messages
+    // after a failed write: a reader could not tell where they begin.
     void write(const JsonMessage& message) {
         std::string headers;
         try {
@@ -59,7 +55,7 @@ public:
         } catch (const std::system_error& error) {
             spdlog::error("{}", error.what());
             isBroken_ = true;
-            ::eventfd_write(broken_.get(), 1);
+            broken_.set();
         }
     }
 
@@ -69,10 +65,10 @@ public:
     // `stop` became readable.
     bool waitForInput(int input, int stop) const {
         std::array<pollfd, 3> waited{
-            {{input, POLLIN, 0}, {broken_.get(), POLLIN, 0}, {stop, POLLIN, 0}}};
+            {{input, POLLIN, 0}, {broken_.descriptor(), POLLIN, 0}, {stop, POLLIN, 0}}};
         while (::poll(waited.data(), waited.size(), -1) < 0) {
             if (errno != EINTR) {
-                throw std::system_error(errno, std::generic_category(), "cannot wait for input");
+                platform::throwSystemError("cannot wait for input");
             }
         }
         return !isBroken_ && waited[2].revents == 0;
@@ -80,12 +76,12 @@ public:
 
 private:
     int output_;
-    platform::FileDescriptor broken_;  // Becomes readable when a write has failed.
+    platform::Event broken_;  // A write has failed.
     std::atomic<bool> isBroken_ = false;
     std::mutex mutex_;  // Held while a frame is written.
 };
 
-// Sends on the messages of `input` until it ends. Returns the exit status that it leads to.
+// Sends the messages of `input` to the bundle until it ends. Returns the exit status.
 int takeMessages(FrameReader& input, BundleHost& host, const std::shared_future<void>& stop) {
     try {
         while (std::optional<Frame> frame = input.next()) {
@@ -94,7 +90,7 @@ int takeMessages(FrameReader& input, BundleHost& host, const std::shared_future<
         return exitDone;
     } catch (const FramingError& error) {
         if (stop.wait_for(std::chrono::seconds(0)) == std::future_status::ready) {
-            return exitDone;  // The rest of a frame was not waited for.
+            return exitDone;  // The signal cut a frame short.
         }
         spdlog::error("{}", error.what());
         return exitWrongUsage;
@@ -107,7 +103,7 @@ int takeMessages(FrameReader& input, BundleHost& host, const std::shared_future<
 }  // namespace
 
 int runStdio(const StdioOptions& options, int input, int output) {
-    // Who is asked to end takes no more requests, but does not leave those half done that it took.
+    // When asked to end, the command takes no more requests but finishes those that it has taken.
     blockStopSignals();
     FrameOutput frames(output);
     const Guard guard = makeGuard(options.guard, {});

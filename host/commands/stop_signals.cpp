@@ -4,18 +4,17 @@
 #include <poll.h>
 #include <signal.h>
 #include <spdlog/spdlog.h>
-#include <sys/eventfd.h>
 #include <sys/signalfd.h>
 #include <unistd.h>
 
 #include <array>
-#include <cerrno>
 #include <cstdlib>
 #include <cstring>
 #include <system_error>
 #include <utility>
 
-#include "host/commands/exit_status.h"
+#include "host/exit_status.h"
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -27,12 +26,6 @@ sigset_t stopSignals() {
     ::sigaddset(&signals, SIGTERM);
     ::sigaddset(&signals, SIGINT);
     return signals;
-}
-
-// Whoever waits for `event` would otherwise wait for ever.
-void announce(const platform::FileDescriptor& event) {
-    while (::eventfd_write(event.get(), 1) != 0) {
-    }
 }
 
 }  // namespace
@@ -47,22 +40,20 @@ void blockStopSignals() {
 StopSignals::StopSignals(std::function<void()> abandon) : abandon_(std::move(abandon)) {
     const sigset_t signals = stopSignals();
     signals_ = platform::FileDescriptor(::signalfd(-1, &signals, SFD_CLOEXEC));
-    came_ = platform::FileDescriptor(::eventfd(0, EFD_CLOEXEC));
-    end_ = platform::FileDescriptor(::eventfd(0, EFD_CLOEXEC));
-    if (signals_.get() < 0 || came_.get() < 0 || end_.get() < 0) {
-        throw std::system_error(errno, std::generic_category(), "cannot wait for signals");
+    if (!signals_) {
+        platform::throwSystemError("cannot wait for signals");
     }
     thread_ = std::thread(&StopSignals::take, this);
 }
 
 StopSignals::~StopSignals() {
-    announce(end_);
+    end_.set();
     thread_.join();
 }
 
 void StopSignals::take() {
     bool isFirst = true;
-    std::array<pollfd, 2> waited{{{signals_.get(), POLLIN, 0}, {end_.get(), POLLIN, 0}}};
+    std::array<pollfd, 2> waited{{{signals_.get(), POLLIN, 0}, {end_.descriptor(), POLLIN, 0}}};
     for (;;) {
         if (::poll(waited.data(), waited.size(), -1) < 0) {
             continue;
@@ -81,7 +72,7 @@ void StopSignals::take() {
         spdlog::info("ending, as asked to by signal {}; another one ends the program at once",
                      signal.ssi_signo);
         whenFirst_.set_value();
-        announce(came_);
+        came_.set();
     }
 }
 

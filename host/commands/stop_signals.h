@@ -6,16 +6,17 @@
 #include <future>
 #include <thread>
 
+#include "platform/posix/event.h"
 #include "platform/posix/file_descriptor.h"
 
 namespace host {
 
 /// Blocks SIGTERM and SIGINT in the calling thread and in those that it starts from now on, so that
-/// StopSignals takes them. To be called before any other thread is started.
+/// StopSignals takes them. Must be called before any other thread is started.
 void blockStopSignals();
 
-/// Takes SIGTERM and SIGINT as requests to end in good order: the first is told to whoever waits
-/// for it, the second ends the process at once, with the exit status of a failure.
+/// Handles SIGTERM and SIGINT: the first signal asks the program to end in good order, the second
+/// ends the process at once, with the exit status of a failure.
 class StopSignals {
 public:
     /// `abandon` is called, on a thread that is started now, before the process is ended at once.
@@ -25,23 +26,23 @@ public:
     StopSignals(const StopSignals&) = delete;
     StopSignals& operator=(const StopSignals&) = delete;
 
-    /// From now on, the signals wait.
+    /// From now on, signals stay pending.
     ~StopSignals();
 
     /// Becomes ready with the first signal.
     const std::shared_future<void>& first() const noexcept { return first_; }
 
-    /// A descriptor that is readable from the first signal on, for those who wait for others too.
-    /// By then `first` is ready.
-    int descriptor() const noexcept { return came_.get(); }
+    /// A descriptor that is readable from the first signal on, to be polled with others. By then
+    /// `first` is ready.
+    int descriptor() const noexcept { return came_.descriptor(); }
 
 private:
     void take();
 
     std::function<void()> abandon_;
     platform::FileDescriptor signals_;
-    platform::FileDescriptor came_;
-    platform::FileDescriptor end_;  // Becomes readable when this object's life ends.
+    platform::Event came_;
+    platform::Event end_;  // This object's life ends.
     std::promise<void> whenFirst_;
     std::shared_future<void> first_ = whenFirst_.get_future().share();
     std::thread thread_;

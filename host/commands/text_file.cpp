@@ -27,14 +27,14 @@ namespace {
 using platform::i18n::codecvt_string_to_ustring;
 using platform::i18n::codecvt_ustring_to_string;
 
-// A character that a charset lacks, and where it stands first.
+// A character that a charset lacks, and its first position.
 struct Misfit {
     std::u16string character;
     std::size_t line;
     std::size_t column;
 };
 
-// How many characters are named of those that a charset lacks.
+// How many of the characters that a charset lacks are named.
 constexpr std::size_t mostMisfits = 5;
 
 bool canEncode(std::u16string_view text, codecvt_ustring_to_string& converter) {
@@ -113,7 +113,7 @@ std::optional<std::string> readRegularFile(const std::string& path) {
 }
 
 std::string charsetOf(std::string_view bytes) {
-    std::ostringstream diagnostics;  // It tells what nobody asked for here.
+    std::ostringstream diagnostics;  // Its messages are of no use here.
     return platform::i18n::detect_charset(bytes.data(), bytes.size(), diagnostics, u"<unknown>");
 }
 

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// A text file's bytes and what they mean, where a command has to know more of it than the bundle
-// tells: its charset, whether it has a byte-order mark, and what else it might be.
+// A text file's bytes and their meaning, for commands that need to know more than the bundle says:
+// its charset, whether it has a byte-order mark, and what else it might be.
 #pragma once
 
 #include <optional>
@@ -9,11 +9,12 @@
 
 namespace host {
 
-/// A text file as it stands on disk.
+/// A text file as it is on disk.
 struct TextFile {
     std::string bytes;
-    std::string charset = "UTF-8";  ///< In which the bundle reads and writes it, by its IANA name.
-    std::u16string text;            ///< The whole text, a byte-order mark included.
+    std::string charset =
+        "UTF-8";          ///< The IANA name of the charset in which the bundle reads and writes it.
+    std::u16string text;  ///< The whole text, a byte-order mark included.
 
     bool hasMark() const { return text.starts_with(u'\uFEFF'); }
     std::u16string_view withoutMark() const {
@@ -35,11 +36,11 @@ TextFile readTextFile(const std::string& path);
 /// `bytes` of `charset` as UTF-8. Throws std::runtime_error when they are not valid in it.
 std::string toUtf8(std::string_view bytes, const std::string& charset);
 
-/// `text` with U+FFFD in the place of each byte that belongs to no character of UTF-8.
+/// `text` with U+FFFD in place of each byte that is not part of a valid UTF-8 character.
 std::string asValidUtf8(std::string_view text);
 
 /// `text` in `charset`. Throws std::runtime_error, which names those of its characters that the
-/// charset lacks and where the first of them stands, when it cannot hold all of it.
+/// charset lacks and the position of the first one, when it cannot hold all of it.
 std::string encode(std::u16string_view text, const std::string& charset);
 
 /// Whether `charset` has all characters of `text`. Throws std::runtime_error when it is unknown.

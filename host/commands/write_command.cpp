@@ -21,17 +21,18 @@
 
 #include "host/bus/bundle_host.h"
 #include "host/commands/document_kind.h"
-#include "host/commands/exit_status.h"
 #include "host/commands/file_faults.h"
 #include "host/commands/package_text.h"
 #include "host/commands/progress.h"
-#include "host/commands/standard_streams.h"
 #include "host/commands/stop_signals.h"
 #include "host/commands/text_file.h"
+#include "host/exit_status.h"
+#include "host/standard_streams.h"
 #include "json/serialize.h"
 #include "json/value.h"
 #include "platform/data_buffer.h"
 #include "platform/i18n/codecvt.h"
+#include "platform/text/case.h"
 
 namespace host {
 
@@ -44,7 +45,7 @@ struct Free {
     void operator()(char* memory) const noexcept { std::free(memory); }
 };
 
-// All that the standard input holds. Grows without copies where the system can move memory.
+// All of the standard input. Grows without copies where the system can move memory.
 class Content {
 public:
     Content(int input, Progress& progress) {
@@ -80,7 +81,7 @@ private:
 };
 
 // The text of `request` with a last member "content" of the JSON text `content`. The package, which
-// may be large, becomes part of the request as it stands.
+// may be large, becomes part of the request unchanged.
 platform::DataBuffer withContent(json::Object request, std::string_view content) {
     std::string begin = json::serialize(std::move(request));
     begin.back() = ',';
@@ -98,9 +99,7 @@ bool hasDocumentName(const std::filesystem::path& file) {
     constexpr std::array extensions{".docm", ".docx", ".dotm", ".dotx", ".potm", ".potx", ".ppam",
                                     ".ppsm", ".ppsx", ".pptm", ".pptx", ".sldm", ".sldx", ".vsdm",
                                     ".vsdx", ".xlam", ".xlsb", ".xlsm", ".xlsx", ".xltm", ".xltx"};
-    std::string extension = file.extension();
-    std::transform(extension.begin(), extension.end(), extension.begin(),
-                   [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + 32) : c; });
+    const std::string extension = platform::text::toLowerAscii(file.extension().string());
     return std::find(extensions.begin(), extensions.end(), extension) != extensions.end();
 }
 
@@ -147,7 +146,8 @@ Request makePackageRequest(const WriteOptions& options, PackageText package) {
 Request makeTextRequest(const WriteOptions& options, std::string bytes,
                         const std::string& encoding) {
     if (std::string fault = faultOfText(bytes, encoding); !fault.empty()) {
-        // Not sent: of a text that decodes and does not encode again, an empty file is made.
+        // Not sent: the bundle would make an empty file of a text that decodes and does not encode
+        // again.
         return {platform::DataBuffer(), std::move(fault)};
     }
     const std::string contentType =
@@ -167,8 +167,8 @@ Request makeUtf8TextRequest(const WriteOptions& options, std::string_view conten
     TextFile file = readTextFile(options.file);
     const std::string& charset = options.encoding.empty() ? file.charset : options.encoding;
     if (charset == file.charset && text == file.withoutMark()) {
-        // Some charsets have several spellings of one text: the file keeps its own, which a
-        // charset that means bytes stores as it is.
+        // Some charsets have several spellings of one text. ISO-8859-1 stores bytes as they are, so
+        // the file keeps its own spelling.
         return makeTextRequest(options, std::move(file.bytes), "ISO-8859-1");
     }
     constexpr std::u16string_view mark = u"\uFEFF";
@@ -190,7 +190,7 @@ Request makeRequest(const WriteOptions& options, std::string_view content) {
             return makePackageRequest(options, std::move(package));
         }
         if (options.contentType == packageContentType) {
-            throw std::runtime_error("the content is no document package: " + package.fault);
+            throw std::runtime_error("the content is not a document package: " + package.fault);
         }
         requireNoDocument(options, package.fault);
     }
@@ -198,7 +198,7 @@ Request makeRequest(const WriteOptions& options, std::string_view content) {
                            options.encoding.empty() ? "UTF-8" : options.encoding);
 }
 
-// Why the bundle answered false, after `refusal`, what was seen in the request before.
+// Why the bundle answered false; `refusal` is what was wrong with the request, if anything.
 std::string whyRefused(const std::string& refusal, const WriteOptions& options) {
     const std::string reason = refusal.empty() ? whyNotWritable(options.file) : refusal;
     return reason.empty() ? "cannot be written" : "cannot be written: " + reason;
@@ -211,11 +211,11 @@ std::string whyNoAnswer(const std::string& file) {
     return reason.empty() ? "no answer" : "no answer: " + reason;
 }
 
-// Has the bundle do what `request` says. Returns its answer; nothing when there is none.
+// Sends `request` to the bundle. Returns its answer; nothing when there is none.
 std::optional<std::string> send(const WriteOptions& options, platform::DataBuffer request) {
-    // What the look at the content took, the threads that answer the request cannot use.
+    // The threads that answer the request cannot use the memory that parsing the content has taken.
     ::malloc_trim(0);
-    // A signal that asks the program to end does not cut a save short, unless it comes again.
+    // A first signal to end does not cut a save short; a second one does.
     blockStopSignals();
     const StopSignals signals([] {});
     std::mutex mutex;

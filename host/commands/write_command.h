@@ -26,13 +26,15 @@ struct WriteOptions {
 
 /// Reads the content from `input` to its end, sends a write request for it and writes the answer to
 /// `output`, followed by a line feed. Without a content type, a document package's JSON goes to the
-/// package writer and everything else is text. A text that comes in as UTF-8 leaves a file that it
-/// is the text of as it is, byte for byte, and otherwise keeps the file's byte-order mark.
+/// package writer and everything else is text. A text that comes in as UTF-8 and is the text of the
+/// file already leaves the file unchanged, byte for byte; any other keeps the file's byte-order
+/// mark.
 ///
-/// What fails is told on standard error. Returns the exit status. Throws when the bundle cannot be
-/// started, `input` not be read or `output` not be written. The same, before the file is touched,
-/// when a text that comes in as UTF-8 does not fit the charset, and when the content is no package
-/// but the file is one, or named as one, unless a content type says that a text is meant.
+/// Failures are reported on standard error. Returns the exit status. Throws when the bundle cannot
+/// be started, `input` not be read or `output` not be written. The same, before the file is
+/// touched, when a text that comes in as UTF-8 does not fit the charset, and when the content is
+/// not a package but the file is one, or named as one, unless a content type says that a text is
+/// meant.
 int runWrite(const WriteOptions& options, int input, int output);
 
 }  // namespace host

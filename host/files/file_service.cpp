@@ -7,7 +7,6 @@
 #include <sys/mman.h>
 #include <sys/stat.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <cmath>
 #include <cstddef>
@@ -19,7 +18,6 @@
 #include <stdexcept>
 #include <string>
 #include <string_view>
-#include <system_error>
 #include <utility>
 #include <vector>
 
@@ -35,6 +33,7 @@
 #include "platform/messaging/channels.h"
 #include "platform/posix/file_descriptor.h"
 #include "platform/posix/open_regular_file.h"
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -47,7 +46,7 @@ using platform::messaging::MessageService;
 
 constexpr std::size_t entriesOfAPage = 1000;
 
-// The regular file at `path`; none where there is nothing.
+// The regular file at `path`; none where there is none.
 FileDescriptor openDocument(const std::string& path) {
     FileDescriptor file = platform::openWithoutHanging(path, O_RDONLY);
     struct stat status {};
@@ -55,7 +54,7 @@ FileDescriptor openDocument(const std::string& path) {
         return file;
     }
     if (!file || ::fstat(file.get(), &status) != 0) {
-        throw std::system_error(errno, std::generic_category(), "The file cannot be opened");
+        platform::throwSystemError("The file cannot be opened");
     }
     if (!S_ISREG(status.st_mode)) {
         throw std::runtime_error("It is not a regular file");
@@ -66,7 +65,7 @@ FileDescriptor openDocument(const std::string& path) {
 std::string bytesOf(const FileDescriptor& file) {
     struct stat status {};
     if (::fstat(file.get(), &status) != 0) {
-        throw std::system_error(errno, std::generic_category(), "The file cannot be read");
+        platform::throwSystemError("The file cannot be read");
     }
     platform::i18n::requireTextLength(static_cast<std::uintmax_t>(status.st_size));
     return readContent(file.get());
@@ -178,13 +177,13 @@ private:
         return {};
     }
 
-    // What the bundle answers to a read request of the version. The bundle's thread may not open
-    // the version where it is kept, but can open a copy in memory.
+    // The bundle's answer to a read request for the version. The bundle's thread may not open the
+    // version in its folder, but it can open a copy in memory.
     std::string readVersion() {
         const FileDescriptor version = earlierVersion();
         const FileDescriptor copy(::memfd_create("earlier version", MFD_CLOEXEC));
         if (!copy) {
-            throw std::system_error(errno, std::generic_category(), "It cannot be read");
+            platform::throwSystemError("It cannot be read");
         }
         copyContent(version.get(), copy.get());
         json::Object request{{"rtcId", ""},

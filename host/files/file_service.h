@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The service that tells clients about files, beside the bundle that reads and writes them. It
-// creates, moves and deletes nothing; but it can make an earlier version of a document the present
-// one.
+// The service that tells clients about files, next to the bundle, which reads and writes them. It
+// creates, moves and deletes nothing, but it can restore an earlier version of a document.
 #pragma once
 
 #include <filesystem>
@@ -17,9 +16,9 @@ namespace host {
 class FileService {
 public:
     /// Subscribes to the requests through `client`, whose futures have to be resolved when they are
-    /// returned. What threads of the subscription may open is what clients may see. Without a
-    /// history in `guard` there are no earlier versions. `roots` are the folders that clients are
-    /// told of, in which their documents are.
+    /// returned. Clients may see what the subscription's threads may open. Without a history in
+    /// `guard` there are no earlier versions. `roots` are the folders of documents that clients are
+    /// shown.
     FileService(std::shared_ptr<platform::messaging::MessageService> client, Guard guard,
                 std::vector<std::filesystem::path> roots);
 

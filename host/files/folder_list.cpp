@@ -7,14 +7,13 @@
 #include <sys/stat.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <memory>
 #include <string_view>
-#include <system_error>
 #include <utility>
 
 #include "platform/posix/atomic_file.h"
 #include "platform/posix/file_descriptor.h"
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -30,7 +29,7 @@ Folder open(const std::string& path) {
     platform::FileDescriptor file(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     Folder folder(file ? ::fdopendir(file.get()) : nullptr);
     if (!folder) {
-        throw std::system_error(errno, std::generic_category(), "The folder cannot be opened");
+        platform::throwSystemError("The folder cannot be opened");
     }
     static_cast<void>(file.release());  // It is the folder's now.
     return folder;

@@ -22,9 +22,9 @@ struct FolderPage {
 };
 
 /// The first `most` entries of the folder at `path` whose names come after `after`. Names that are
-/// no UTF-8, which no request can hold, and the temporary files of saves are left out. Throws
-/// std::system_error. All names of the folder are read for each page, but only what the page has is
-/// looked at.
+/// not UTF-8, which no request can hold, and the temporary files of saves are left out. Throws
+/// std::system_error. All names of the folder are read for each page, but only the entries of the
+/// page are examined.
 FolderPage listFolder(const std::string& path, const std::string& after, std::size_t most);
 
 }  // namespace host

@@ -10,8 +10,9 @@
 #include <memory>
 #include <new>
 #include <stdexcept>
-#include <system_error>
 #include <vector>
+
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -64,7 +65,7 @@ std::string versionOf(int file) {
             sum.add(block.data(), static_cast<std::size_t>(count));
             offset += count;
         } else if (errno != EINTR) {
-            throw std::system_error(errno, std::generic_category(), "cannot be read");
+            platform::throwSystemError("cannot be read");
         }
     }
 }

@@ -7,11 +7,11 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstddef>
-#include <system_error>
 #include <vector>
 
 #include "json/parser.h"
 #include "json/string_kernels.h"
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -19,8 +19,8 @@ namespace {
 
 constexpr std::size_t blockSize = std::size_t{64} * 1024;
 
-// Reads up to `size` bytes; fewer at the end of the file only, and less than none when it
-// cannot be read.
+// Reads up to `size` bytes; fewer only at the end of the file, and a negative number when it cannot
+// be read.
 ssize_t readBlock(int file, off_t offset, std::vector<char>& block, std::size_t size = blockSize) {
     block.resize(size);
     std::size_t length = 0;
@@ -46,7 +46,7 @@ void writeBlock(int file, off_t offset, std::string_view bytes) {
     while (!bytes.empty()) {
         const ssize_t count = ::pwrite(file, bytes.data(), bytes.size(), offset);
         if (count < 0 && errno != EINTR) {
-            throw std::system_error(errno, std::generic_category(), "cannot be written");
+            platform::throwSystemError("cannot be written");
         }
         if (count > 0) {
             bytes.remove_prefix(static_cast<std::size_t>(count));
@@ -85,8 +85,8 @@ const char* unescapeUnit(const char* in, const char* end, char*& out) {
     return in;
 }
 
-// Makes `text` a block of what string content from `in` on stands for. Returns how far it came; not
-// at all where the content is malformed.
+// Decodes a block of string content from `in` on into `text`. Returns where it stopped, which is
+// `in` where the content is malformed.
 const char* unescapeBlock(const char* in, const char* end, std::string& text) {
     constexpr std::ptrdiff_t longestCharacter = 8;
     text.resize(blockSize);
@@ -167,7 +167,7 @@ std::string readContent(int file) {
     std::vector<char> block;
     do {
         if (readBlock(file, static_cast<off_t>(content.size()), block) < 0) {
-            throw std::system_error(errno, std::generic_category(), "cannot be read");
+            platform::throwSystemError("cannot be read");
         }
         content.append(block.data(), block.size());
     } while (block.size() == blockSize);
@@ -178,7 +178,7 @@ void copyContent(int from, int to) {
     std::vector<char> block;
     for (off_t offset = 0;; offset += static_cast<off_t>(block.size())) {
         if (readBlock(from, offset, block) < 0) {
-            throw std::system_error(errno, std::generic_category(), "cannot be read");
+            platform::throwSystemError("cannot be read");
         }
         writeBlock(to, offset, {block.data(), block.size()});
         if (block.size() < blockSize) {

@@ -7,14 +7,14 @@
 
 namespace host {
 
-/// Whether `file` holds just `bytes`. False also where it cannot be read.
+/// Whether `file` holds just `bytes`. False if it cannot be read.
 bool hasContent(int file, std::string_view bytes);
 
 /// The same for the bytes that the string `literal` of a JSON text stands for, quotes included.
-/// They are compared without being held in memory at once. False also where it is malformed.
+/// They are compared without being held in memory at once. False if it is malformed.
 bool hasContentOf(int file, std::string_view literal);
 
-/// Whether two files hold the same. False also where one cannot be read.
+/// Whether two files hold the same. False if one cannot be read.
 bool haveSameContent(int one, int other);
 
 /// All that `file` holds. Throws std::system_error.

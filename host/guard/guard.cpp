@@ -18,7 +18,7 @@ std::string environment(const char* name) {
     return value == nullptr ? "" : value;
 }
 
-// Where the system has programs keep what is not for the user to see; empty when it says nothing.
+// The folder in which the system has programs keep their own data; empty when it names none.
 fs::path usersFolder() {
     if (const std::string service = environment("STATE_DIRECTORY"); !service.empty()) {
         return service;

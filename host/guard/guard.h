@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Safe saves as a command has them: which, and where they keep their files.
+// How a command saves documents safely, and where it keeps locks and earlier versions.
 #pragma once
 
 #include <cstddef>
@@ -22,7 +22,7 @@ struct GuardOptions {
     std::size_t versions = 20;     ///< Of each document.
 };
 
-/// What guards the saves of a process.
+/// The safe saves of a process.
 struct Guard {
     std::shared_ptr<History> history;  // null: no earlier versions are kept
     std::shared_ptr<Saves> saves;      // null: saves are the bundle's alone
@@ -32,10 +32,10 @@ struct Guard {
         std::make_shared<platform::messaging::MessageHandler>();
 };
 
-/// The guard for clients that may use the folders `roots`; all when there are none. Its folder has
-/// to lie outside of them. Without a folder, or where the user's own cannot be used, it does
-/// without earlier versions and without locks between processes, and the log says so. Throws
-/// std::runtime_error when a folder that was named cannot be used. To be called before the thread
+/// The guard for clients that may use the folders `roots`, or all folders when there are none. Its
+/// own folder must be outside of them. Without a folder, or where the user's own cannot be used,
+/// there are no earlier versions and no locks between processes, and the log says so. Throws
+/// std::runtime_error when a folder that was named cannot be used. Must be called before the thread
 /// is confined.
 Guard makeGuard(const GuardOptions& options, const std::vector<std::filesystem::path>& roots);
 

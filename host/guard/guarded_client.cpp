@@ -74,7 +74,7 @@ public:
     GuardedClient(const GuardedClient&) = delete;
     GuardedClient& operator=(const GuardedClient&) = delete;
 
-    // The code of the bundle's handler goes with the bundle, which owns its client.
+    // The bundle owns its client, and the code of its handler is unloaded with it.
     ~GuardedClient() override { *guard_.read = nullptr; }
 
     futures::Future<std::shared_ptr<Subscription>> subscribe(const std::string& channel,

@@ -10,10 +10,10 @@
 
 namespace host {
 
-/// A client that does what `client` does, except that write requests reach their handler by way of
-/// the saves of `guard`, and what that publishes for them is what has become of the document. A
-/// request that is malformed reaches the handler as it is. The handler of read requests is noted in
-/// `guard` when it is subscribed.
+/// A client that does what `client` does, except that write requests reach their handler through
+/// the saves of `guard`, and the answers say what has become of the document. A request that is
+/// malformed reaches the handler as it is. The handler of read requests is stored in `guard` when
+/// it is subscribed.
 std::shared_ptr<platform::messaging::MessageService> savingSafely(
     std::shared_ptr<platform::messaging::MessageService> client, Guard guard);
 

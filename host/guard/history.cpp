@@ -93,7 +93,7 @@ void removeFile(const fs::path& path) {
     fs::remove(path, ignored);
 }
 
-// Removes a copy whose maker has ended before it was complete.
+// Removes a copy that was never completed, because its process has ended.
 void removeIfAbandoned(const fs::path& path) {
     std::error_code error;
     const fs::file_time_type changed = fs::last_write_time(path, error);
@@ -239,7 +239,7 @@ FileDescriptor History::open(const std::string& document, std::int64_t time) {
     return promise.get_future().get();
 }
 
-// The root below which `document` lies; the file system's where all documents have versions.
+// The root that holds `document`; the root of the file system where all documents have versions.
 fs::path History::rootOf(const std::string& document) const {
     if (options_.roots.empty()) {
         return "/";
@@ -252,7 +252,8 @@ fs::path History::rootOf(const std::string& document) const {
     throw std::runtime_error("is below no folder whose documents have earlier versions");
 }
 
-// Where versions of `document` may be. Without roots of one's own, they may have been kept for any.
+// Where versions of `document` may be. Without roots of its own, this process may find them under
+// any root.
 std::vector<fs::path> History::foldersOf(const std::string& document) const {
     std::vector<fs::path> roots;
     if (options_.roots.empty()) {
@@ -305,7 +306,7 @@ void History::makeCopy(const FileDescriptor& old, const std::string& document, S
             syncToDisk(made, unfinished);
         }
         EarlierVersion version{now(), fs::file_size(unfinished)};
-        // Two within a millisecond get times of their own.
+        // Two versions within a millisecond get different times.
         const std::vector<File> others = filesOf(document);
         if (!others.empty()) {
             version.time = std::max(version.time, others.front().version.time + 1);
@@ -330,8 +331,8 @@ void History::removeSurplus(const std::string& document) {
     }
 }
 
-// What was removed as surplus still counts until all is counted anew, which is done each hour and
-// when it is too much.
+// Surplus versions that were removed still count until everything is counted anew, each hour and
+// when the share is exceeded.
 void History::keepToShare(const fs::path& root, std::uint64_t added) {
     Usage& usage = usage_[root];
     usage.bytes += added;
@@ -351,7 +352,7 @@ void History::keepToShare(const fs::path& root, std::uint64_t added) {
 }
 
 // Removes what is too old, and the oldest versions until the others take no more than `most` bytes,
-// and some less when they took more. Returns what they take.
+// and a little less if they took more. Returns what they take.
 std::uint64_t History::removeOldest(const fs::path& root, std::uint64_t most) const {
     std::vector<File> files;
     std::uint64_t bytes = 0;

@@ -38,7 +38,7 @@ struct EarlierVersion {
 struct HistoryOptions {
     std::filesystem::path folder;  // is made if need be
 
-    /// Only documents below these have versions; none: all documents have.
+    /// Only documents below these have versions; empty: all documents have.
     std::vector<std::filesystem::path> roots;
 
     std::size_t versions = 20;  // of each document
@@ -47,9 +47,8 @@ struct HistoryOptions {
     double share = 0.1;
 };
 
-/// Keeps earlier versions, and finds them. All files of it are handled by a thread of its own,
-/// which has the rights of the thread that makes the object: the threads that use it may be
-/// confined.
+/// Keeps earlier versions, and finds them. A thread of its own, with the rights of the thread that
+/// makes the object, handles all its files, so the threads that use it may be confined.
 class History {
 public:
     /// Throws std::filesystem::filesystem_error when the folder cannot be made.
@@ -68,8 +67,8 @@ public:
 
     /// Has the content of `old` copied as the newest version of `document`. Returns at once.
     /// Versions that are too many, older than 30 days, or beyond the share of the disk are removed,
-    /// the oldest first. What fails is told in the log; when copies are much slower than saves,
-    /// versions are left out.
+    /// the oldest first. Failures are logged. When copies are much slower than saves, versions are
+    /// left out.
     void keep(platform::FileDescriptor old, std::string document);
 
     /// The same, but returns when the copy is made and safe on disk, or has failed.
@@ -83,7 +82,7 @@ public:
     /// std::runtime_error when there is none.
     platform::FileDescriptor open(const std::string& document, std::int64_t time);
 
-    /// Waits until all that was to be kept is.
+    /// Waits until all versions that were handed over are kept.
     void waitUntilIdle();
 
 private:
@@ -108,7 +107,7 @@ private:
 
     HistoryOptions options_;
 
-    // Of each root, what its versions take and when that was counted; for the thread alone.
+    // What the versions of each root take and when that was counted; used by the thread alone.
     struct Usage {
         std::uint64_t bytes = 0;
         std::uint64_t most = 0;

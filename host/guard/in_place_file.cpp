@@ -6,25 +6,23 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <cerrno>
 #include <stdexcept>
 #include <system_error>
 
 #include "host/guard/file_content.h"
 #include "platform/posix/open_regular_file.h"
+#include "platform/posix/system_error.h"
 
 namespace host {
 
 namespace {
 
-[[noreturn]] void failForSystem(const char* what) {
-    throw std::system_error(errno, std::generic_category(), what);
-}
+using platform::throwSystemError;
 
 off_t sizeOf(int file) {
     struct stat status {};
     if (::fstat(file, &status) != 0) {
-        failForSystem("cannot be examined");
+        throwSystemError("cannot be examined");
     }
     return status.st_size;
 }
@@ -36,7 +34,7 @@ void reserveRoom(int file, off_t size) {
         result = size == 0 ? 0 : ::fallocate(file, FALLOC_FL_KEEP_SIZE, 0, size);
     } while (result != 0 && errno == EINTR);
     if (result != 0 && errno != EOPNOTSUPP && errno != ENOSYS) {
-        failForSystem("cannot be written");
+        throwSystemError("cannot be written");
     }
 }
 
@@ -46,14 +44,14 @@ InPlaceFile::InPlaceFile(const std::string& path)
     : file_(platform::openWithoutHanging(path, O_RDWR)) {
     struct stat status {};
     if (!file_ || ::fstat(file_.get(), &status) != 0) {
-        failForSystem("cannot be opened");
+        throwSystemError("cannot be opened");
     }
     if (!S_ISREG(status.st_mode)) {
         throw std::runtime_error("is not a regular file");
     }
     copy_ = platform::FileDescriptor(::memfd_create("old content", MFD_CLOEXEC));
     if (!copy_) {
-        failForSystem("cannot be kept while it is written");
+        throwSystemError("cannot be kept while it is written");
     }
     copyContent(file_.get(), copy_.get());
 }
@@ -72,10 +70,10 @@ void InPlaceFile::writeContentOf(int from) const {
     reserveRoom(file_.get(), size);
     copyContent(from, file_.get());
     if (::ftruncate(file_.get(), size) != 0) {
-        failForSystem("cannot be written");
+        throwSystemError("cannot be written");
     }
     if (::fsync(file_.get()) != 0) {
-        failForSystem("cannot be saved");
+        throwSystemError("cannot be saved");
     }
 }
 

@@ -13,7 +13,7 @@ class InPlaceFile {
 public:
     /// Opens the file at `path`, links followed, for reading and writing, and copies its content. A
     /// lease that another program holds is waited for. Throws std::system_error when that fails,
-    /// and std::runtime_error when it is no regular file.
+    /// and std::runtime_error when it is not a regular file.
     explicit InPlaceFile(const std::string& path);
 
     int descriptor() const noexcept { return file_.get(); }
@@ -21,7 +21,7 @@ public:
     /// The copy of the old content.
     const platform::FileDescriptor& copy() const noexcept { return copy_; }
 
-    /// Writes the content of the open file `from` in the place of the old, safe on disk. Throws
+    /// Writes the content of the open file `from` in place of the old, safe on disk. Throws
     /// std::system_error when that fails, after the old content has been put back.
     void replaceContent(int from) const;
 

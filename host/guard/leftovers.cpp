@@ -72,7 +72,7 @@ void Leftovers::removeBeside(const std::string& path) noexcept {
             removeOldFrom(std::move(opened));
         }
     } catch (const std::exception&) {
-        // They are looked for again with a later save.
+        // A later save looks for them again.
         return;
     }
 }

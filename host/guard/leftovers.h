@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Clears away what saves left behind that were killed.
+// Removes what saves that were killed have left behind.
 #pragma once
 
 #include <chrono>
@@ -12,11 +12,11 @@
 
 namespace host {
 
-/// Removes temporary files of saves that are older than a day. A folder is looked through once an
-/// hour at most.
+/// Removes temporary files of saves that are older than a day. A folder is searched at most once an
+/// hour.
 class Leftovers {
 public:
-    /// Looks through the folder of the document at `path`. Failures do not matter.
+    /// Searches the folder of the document at `path`. Failures are ignored.
     void removeBeside(const std::string& path) noexcept;
 
 private:

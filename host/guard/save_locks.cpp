@@ -11,6 +11,7 @@
 #include <thread>
 
 #include "host/guard/document_version.h"
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -46,12 +47,12 @@ SaveLocks::Held::Held(int file, std::size_t number, std::mutex& mutex)
     if (file_ < 0) {
         return;
     }
-    // Asked for again and again, since there is no other way to wait for it no longer than so.
+    // Tried again and again: there is no other way to wait for a lock with a time limit.
     const auto end = std::chrono::steady_clock::now() + longestWait;
     while (setLock(file_, F_WRLCK, number_) != 0) {
         const bool isHeld = errno == EAGAIN || errno == EACCES || errno == EINTR;
         if (!isHeld) {
-            throw std::system_error(errno, std::generic_category(), "cannot be locked");
+            platform::throwSystemError("cannot be locked");
         }
         if (std::chrono::steady_clock::now() > end) {
             throw std::runtime_error("is locked by the save of another worker");

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Keeps the saves of one document apart, also those of several workers.
+// Makes the saves of one document wait for each other, within a process and between workers.
 #pragma once
 
 #include <array>
@@ -12,14 +12,14 @@
 
 namespace host {
 
-/// Locks for documents. Each document has one of a fixed number, by a digest of its path, so that
-/// some share one. Between processes they are locks on single bytes of one file that all of them
-/// open, which end with the process that holds them, however it ends. They bind nobody but those
-/// who ask for them here.
+/// Locks for documents. Each document has one of a fixed number of locks, chosen by a digest of its
+/// path, so some documents share one. Between processes they are locks on single bytes of one file
+/// that all of them open, which end with the process that holds them, however it ends. Only
+/// programs that use this class respect them.
 class SaveLocks {
 public:
-    /// Without a `file`, or where it cannot be opened, the locks are those of this process alone;
-    /// the log says so.
+    /// Without a `file`, or where it cannot be opened, the locks work within this process only; the
+    /// log says so.
     explicit SaveLocks(const std::filesystem::path& file);
 
     /// A lock, until the end of its life.

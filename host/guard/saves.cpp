@@ -27,23 +27,22 @@ namespace {
 using platform::AtomicFile;
 using platform::FileDescriptor;
 
-// Whether the reason of a failure is one that a save in place may get round: it is not that the
-// disk is full or broken.
+// Whether a save in place may succeed after this failure: the disk is neither full nor broken.
 bool isForbidden(const std::error_code& error) {
     return error == std::errc::permission_denied || error == std::errc::operation_not_permitted ||
            error == std::errc::read_only_file_system ||
            error == std::errc::device_or_resource_busy || error == std::errc::cross_device_link;
 }
 
-// Whether the reason of a failure is that there can be no file, or that links go in a circle. The
-// bundle then finds the same.
+// Whether a failure means that there can be no file, or that links form a circle. The bundle then
+// finds the same.
 bool isNowhere(const std::error_code& error) {
     return error == std::errc::no_such_file_or_directory || error == std::errc::not_a_directory ||
            error == std::errc::filename_too_long ||
            error == std::errc::too_many_symbolic_link_levels;
 }
 
-// The regular file at `path`, opened to read; none where there is no such thing.
+// The regular file at `path`, opened for reading; none where there is none.
 FileDescriptor openRegular(const std::string& path) {
     return platform::openRegularFile(path).descriptor;
 }
@@ -78,7 +77,7 @@ void syncWithFolder(int file, const std::filesystem::path& document) {
 }
 
 // Whether the file holds the text that `request` asks for. The text is nearly always stored as it
-// comes; but some charsets can write the same text in several ways.
+// is in the request; but some charsets can write the same text in several ways.
 bool holdsTextOf(const WriteRequest& request, int file) {
     if (hasContentOf(file, request.text)) {
         return true;
@@ -98,7 +97,7 @@ bool holdsTextOf(const WriteRequest& request, int file) {
     }
 }
 
-// One save, of which the document's lock is held when its place is taken.
+// One save. The document's lock is held while the new file takes its place.
 class Save {
 public:
     Save(const WriteRequest& request, const AskBundle& askBundle, SaveLocks& locks,
@@ -115,7 +114,7 @@ public:
         try {
             if (!request_.baseVersion.is<json::Undefined>() &&
                 !request_.baseVersion.is<std::string>()) {
-                throw std::runtime_error("\"baseVersion\" is no string");
+                throw std::runtime_error("\"baseVersion\" is not a string");
             }
             const bool isSaved = request_.isPackage ? savePackage() : saveText();
             return {isSaved, existed_, isSaved ? version_ : std::string()};
@@ -208,7 +207,7 @@ private:
         return true;
     }
 
-    // Where there is no document to lose.
+    // For where there is no document to lose.
     bool saveUnguarded() {
         if (request_.baseVersion.is<std::string>() && existed_) {
             throw std::runtime_error("has no version");
@@ -234,11 +233,11 @@ private:
         return answer.isWritten;
     }
 
-    // Whether the bundle, writing the package over a copy of `current`, leaves the copy as it is.
+    // Whether the bundle leaves a copy of `current` unchanged when it writes the package over it.
     bool packageComesOutAs(const FileDescriptor& current) {
         AtomicFile copy(request_.filePath);
         copyContent(current.get(), copy.content());
-        // It writes by renaming another file, so that the copy has to be found by its name.
+        // It writes by renaming another file, so the copy must be opened again by its name.
         const std::string path = copy.temporaryPath();
         if (!askBundle_(path).isWritten) {
             return false;
@@ -247,8 +246,8 @@ private:
         return written && haveSameContent(written.get(), current.get());
     }
 
-    // Whether the document has the version that the client knows, if it named one. Called with the
-    // lock held.
+    // Whether the document has the version that the client knows, if it named one. The lock must be
+    // held.
     bool isBasedOn(const FileDescriptor& current, bool exists) const {
         if (request_.baseVersion.is<json::Undefined>()) {
             return true;
@@ -260,7 +259,7 @@ private:
         return expected == (current ? versionOf(current.get()) : std::string());
     }
 
-    // A client that had no answer asks again, and shall not take its own save for another's. That
+    // A client that had no answer asks again, and must not take its own save for another's. That
     // save may have failed at its last step, which was to sync.
     bool isRepetition(int current, bool isSame) {
         if (isSame) {

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Saves that no fault can make lose a document.
+// Saves that cannot lose a document, whatever fails.
 //
 // The bundle writes texts in place and tells only whether it could open the file. So it is given
 // another path, of a new file in the same folder, and what it wrote there is compared with what was
@@ -23,18 +23,18 @@
 
 namespace host {
 
-/// What the bundle made of a write request.
+/// The bundle's answer to a write request.
 struct BundleAnswer {
     bool isWritten = false;
     bool existed = false;
 };
 
-/// Has the bundle handle the request, with another path in it unless that is empty. Throws
+/// Has the bundle handle the request, with another path in it unless `otherPath` is empty. Throws
 /// BundleFailure.
 using AskBundle = std::function<BundleAnswer(const std::string& otherPath)>;
 
-/// The bundle ended a request with an exception, and so without an answer. It is no std::exception,
-/// which would be a failure of the save that has an answer.
+/// The bundle ended a request with an exception, and so without an answer. It is not a
+/// std::exception, which would be a failed save with an answer.
 struct BundleFailure {
     std::exception_ptr exception;
 };
@@ -45,21 +45,20 @@ struct SaveResult {
     std::string version;  // that was made, where the request names the one it is based on
 };
 
-/// Makes saves, several at once if need be.
+/// Saves documents, several at once if need be.
 class Saves {
 public:
     /// `history` gets what saves replace; it may be null. `lockFile` is that of SaveLocks.
     Saves(const std::filesystem::path& lockFile, std::shared_ptr<History> history);
 
-    /// Makes the save that `request` asks for. It is made when isSaved is true; else the document
-    /// is as it was, but when only the folder could not be made safe on disk, and the log has the
-    /// reason. Throws BundleFailure where the bundle gives no answer; the document is as it was
-    /// then.
+    /// Saves what `request` holds. When isSaved is false, the document is as it was (unless only
+    /// its folder could not be made safe on disk), and the log has the reason. Throws BundleFailure
+    /// where the bundle gives no answer; the document is as it was then.
     SaveResult save(const WriteRequest& request, const AskBundle& askBundle);
 
     /// Makes the content of the open file `version` that of the document at `path`, which it
-    /// replaces as a save does. Throws std::runtime_error when that fails; the document is as it
-    /// was then, but when only the folder could not be made safe on disk.
+    /// replaces as a save does. Throws std::runtime_error when that fails; the document is then as
+    /// it was, unless only its folder could not be made safe on disk.
     void restore(const std::string& path, int version);
 
 private:

@@ -26,7 +26,7 @@ bool skipString(json::Input& input) {
     return input.position != input.end && ++input.position != input.end;
 }
 
-// Moves past a value, to the comma or brace behind it.
+// Moves past a value, to the comma or brace after it.
 bool skipValue(json::Input& input) {
     std::size_t depth = 0;
     while (input.position != input.end) {
@@ -62,14 +62,14 @@ bool skipOver(json::Input& input, char expected) {
     return json::skipWhitespace(input) == json::Status::success;
 }
 
-// The members that count here; a request may have any number of others.
+// The members that matter here; a request may have any number of others.
 constexpr std::array<std::string_view, 6> names = {"rtcId",   "contentType", "filePath",
                                                    "content", "encoding",    "baseVersion"};
 
 using Members = std::map<std::string, std::string_view>;
 
 // The texts of the values of an object's members, the first of each name. Nothing where the object
-// cannot be told apart into members.
+// cannot be split into members.
 std::optional<Members> membersOf(std::string_view object) {
     json::Input input{object.data(), object.data() + object.size()};
     if (!object.starts_with('{') || !skipOver(input, '{')) {
@@ -108,7 +108,7 @@ bool readString(const Members& members, const std::string& key, std::string& tar
     return json::parseString(input, target) == json::Status::success;
 }
 
-// Whether the bundle takes `path` for one.
+// Whether the bundle accepts `path` as one.
 bool isPath(std::string_view path) {
     return path.size() < PATH_MAX && path.find('\0') == std::string_view::npos &&
            simdjson::validate_utf8(path.data(), path.size());

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What a guard needs to know of a write request before the bundle gets it.
+// Reads the members of a write request that the guard needs before the bundle gets it.
 #pragma once
 
 #include <optional>
@@ -21,7 +21,7 @@ struct WriteRequest {
 };
 
 /// The request that `payload` holds, or nothing where it is none that the bundle would answer: it
-/// is no object, or lacks a member or has one of another kind. The content of a package is passed
+/// is not an object, or lacks a member or has one of another kind. The content of a package is passed
 /// over without a look at what is between its brackets. The result lasts no longer than `payload`.
 /// Linear in the size of `payload`.
 std::optional<WriteRequest> readWriteRequest(std::string_view payload);

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Landlock by its three system calls, for which the C library has no functions.
+// Uses Landlock through its three system calls, for which the C library has no functions.
 //
 // Each version of the kernel's interface knows some access rights to files. A domain handles all
 // that the running kernel knows, which denies them everywhere, and gives back a few below the
@@ -30,10 +30,12 @@
 #include <stdexcept>
 #include <system_error>
 
+#include "platform/posix/system_error.h"
+
 namespace host {
 namespace {
 
-// What the header of older systems lacks.
+// What older systems' header lacks.
 constexpr std::uint64_t truncateAccess = 1U << 14U;
 constexpr std::uint64_t deviceControlAccess = 1U << 15U;
 
@@ -43,7 +45,7 @@ constexpr std::uint64_t readAccess = LANDLOCK_ACCESS_FS_READ_FILE | LANDLOCK_ACC
 constexpr std::uint64_t writeAccess = LANDLOCK_ACCESS_FS_WRITE_FILE | LANDLOCK_ACCESS_FS_MAKE_REG |
                                       LANDLOCK_ACCESS_FS_REMOVE_FILE | truncateAccess;
 
-// What a kernel of `version` knows, and can therefore deny.
+// The rights that a kernel of `version` knows and can therefore deny.
 constexpr std::uint64_t knownTo(int version) {
     std::uint64_t access = allOfVersion1;
     access |= version >= 2 ? LANDLOCK_ACCESS_FS_REFER : 0;
@@ -52,7 +54,7 @@ constexpr std::uint64_t knownTo(int version) {
     return access;
 }
 
-// Below 1, with the reason in errno, if there is none.
+// Below 1, with the reason in errno, if the kernel has none.
 int versionOfKernel() {
     return static_cast<int>(
         ::syscall(SYS_landlock_create_ruleset, nullptr, 0, LANDLOCK_CREATE_RULESET_VERSION));
@@ -64,7 +66,7 @@ platform::FileDescriptor makeRules(std::uint64_t handledAccess) {
     platform::FileDescriptor rules(static_cast<int>(
         ::syscall(SYS_landlock_create_ruleset, &attributes, sizeof attributes, 0)));
     if (rules.get() < 0) {
-        throw std::system_error(errno, std::generic_category(), "files cannot be confined");
+        platform::throwSystemError("files cannot be confined");
     }
     return rules;
 }
@@ -73,7 +75,8 @@ platform::FileDescriptor makeRules(std::uint64_t handledAccess) {
     throw std::system_error(error, std::generic_category(), path.string() + " cannot be granted");
 }
 
-// Points at a file or a folder, at the end of symbolic links, without opening it for anything.
+// A descriptor that refers to a file or folder, with symbolic links followed, without opening its
+// content.
 platform::FileDescriptor pointAt(const std::filesystem::path& path) {
     platform::FileDescriptor file(::open(path.c_str(), O_PATH | O_CLOEXEC));
     if (file.get() < 0) {
@@ -140,7 +143,7 @@ void Confinement::confineThisThread() const {
     // Without it a confined thread could run a program that has more rights than its user.
     if (::prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) != 0 ||
         ::syscall(SYS_landlock_restrict_self, rules_.get(), 0) != 0) {
-        throw std::system_error(errno, std::generic_category(), "a thread cannot be confined");
+        platform::throwSystemError("a thread cannot be confined");
     }
 }
 

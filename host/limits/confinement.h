@@ -11,15 +11,15 @@
 
 namespace host {
 
-/// What confined threads may open. All else is closed to them.
+/// What confined threads may open; nothing else.
 ///
 /// A grant is for the file or the folder that has the path when the grant is made, not for the
-/// path: it follows a folder that is renamed, and leaves out what takes its name later. So grant
-/// the folder of a file that programs replace by renaming, as they do with /etc/resolv.conf.
+/// path: it follows a folder that is renamed, and does not cover what takes its name later. So
+/// grant the folder of a file that programs replace by renaming, as they do with /etc/resolv.conf.
 struct Grants {
     /// Folders below which files may be read, written, created, truncated, removed and renamed
     /// within their folder: what saving a document takes. Folders, links, devices and other special
-    /// files cannot be created, and nothing be moved from one folder to another.
+    /// files cannot be created, and nothing can be moved from one folder to another.
     std::vector<std::filesystem::path> readWrite;
 
     /// Folders below which files may be read and folders listed, and single files to read.
@@ -34,30 +34,31 @@ int confinementVersion();
 
 /// Confines threads to the files that were granted.
 ///
-/// What counts is where a file is when it is opened, whatever path leads there: symbolic links,
-/// "..", /proc and renaming or relinking between a check and its use do not get out. A hard link or
-/// a bind mount below a granted folder is below it, though. Descriptors that are open stay open,
-/// and libraries have to be loaded before.
+/// It matters where a file is when it is opened, not which path leads there: symbolic links, "..",
+/// /proc and renaming or relinking between a check and its use do not get out. A hard link or a
+/// bind mount below a granted folder is below it, though. Descriptors that are open stay open, and
+/// libraries have to be loaded before.
 ///
 /// Handlers of messages run on threads that the message service starts when they are subscribed, so
 /// they are confined if the thread that subscribes is.
 ///
-/// Three things are beyond the kernel's means. Files outside can still be seen to exist and their
-/// sizes, times and permissions be read, but no content and no folder's list. Their permissions,
-/// owners and times could be changed by a program that did such things by path, as ours does not.
-/// And a pipe that the process holds open can be opened again as /proc/self/fd/N. The bundle reads
-/// and writes no pipes, and sockets and eventfd cannot be opened like that.
+/// Three things the kernel cannot prevent. Threads can still see that files outside exist, and read
+/// their sizes, times and permissions, but no content and no list of a folder. Their permissions,
+/// owners and times could be changed by path, which our program never does. And a pipe that the
+/// process holds open can be opened again as /proc/self/fd/N. The bundle reads and writes no pipes,
+/// and sockets and eventfd cannot be opened like that.
 class Confinement {
 public:
-    /// Opens what is granted; confines nothing yet. `version` is that of a kernel whose confinement
-    /// is wanted, no newer than the running one. Throws std::runtime_error naming what is not
-    /// there, or what is no folder and should be, and saying why when the kernel cannot confine.
+    /// Opens what is granted; without confining anything yet. `version` is that of a kernel whose
+    /// confinement is wanted, no newer than the running one. Throws std::runtime_error naming what
+    /// is not there, or what should be a folder and is not, and saying why when the kernel cannot
+    /// confine.
     explicit Confinement(const Grants& grants, int version = confinementVersion());
 
     /// Confines the calling thread, and every thread and process that it starts from now on, for
     /// the rest of their lives. None of them can run another program then, nor gain privileges from
     /// one. A thread that is confined twice may open what both allow. The process's other threads
-    /// are left as they are. Throws std::system_error.
+    /// are not affected. Throws std::system_error.
     void confineThisThread() const;
 
 private:

@@ -6,8 +6,8 @@
 namespace host {
 
 void keepFreedMemory() {
-    // What is larger comes from the system and goes back to it every time. The C library would take
-    // more, but of large documents too much would then be kept while others are made.
+    // Larger blocks come from the system and go back to it every time. The C library would allow
+    // more, but would then keep too much of large documents while others are made.
     constexpr int largestKept = 12 << 20;
     ::mallopt(M_MMAP_THRESHOLD, largestKept);
     ::mallopt(M_TRIM_THRESHOLD, static_cast<int>(keptMemory));

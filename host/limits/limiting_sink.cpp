@@ -3,20 +3,21 @@
 
 #include <simdjson.h>
 
-#include <array>
-#include <cstdio>
+#include <string_view>
+
+#include "platform/text/quoted.h"
 
 namespace host {
 
 namespace {
 
-// Of one line, in bytes: with the names of logger and level it stays below 2 KB.
+// The longest line in bytes: with the names of logger and level it stays below 2 KB.
 constexpr std::size_t longestText = 2000;
 constexpr std::string_view cutMark = "...";
 
 bool isControl(std::string_view character) {
     const auto first = static_cast<unsigned char>(character[0]);
-    // The second range is that of C1, two bytes of UTF-8 each.
+    // The second range is that of the C1 controls, of two bytes in UTF-8.
     return first < 0x20 || first == 0x7F ||
            (first == 0xC2 && static_cast<unsigned char>(character[1]) < 0xA0);
 }
@@ -33,9 +34,7 @@ std::string_view firstCharacter(std::string_view text) {
 std::string escaped(std::string_view bytes) {
     std::string text;
     for (const char byte : bytes) {
-        std::array<char, 5> code{};
-        std::snprintf(code.data(), code.size(), "\\x%02X", static_cast<unsigned char>(byte));
-        text += code.data();
+        text += platform::text::escapedByte(byte);
     }
     return text;
 }
@@ -44,7 +43,7 @@ std::string escaped(std::string_view bytes) {
 
 std::string asLine(std::string_view text) {
     std::string line;
-    std::size_t lengthIfCut = 0;  // What fits together with the mark.
+    std::size_t lengthIfCut = 0;  // The length that leaves room for the mark.
     while (!text.empty()) {
         const std::string_view character = firstCharacter(text);
         const std::string_view bytes = character.empty() ? text.substr(0, 1) : character;

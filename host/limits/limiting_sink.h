@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Keeps a log readable and from growing without bound, since clients can have a line logged for
-// each message, with text of theirs in it.
+// Keeps a log readable and bounded, since clients can cause a line for each message, with text of
+// theirs in it.
 #pragma once
 
 #include <spdlog/sinks/base_sink.h>
@@ -23,11 +23,11 @@ std::string asLine(std::string_view text);
 /// Passes log lines on to another sink, but of those of one logger and one level no more than so
 /// many in a period of time; the lines beyond are left out and counted. Their number is logged, as
 /// one more line of that logger and level, with the first line of any kind after the period, or by
-/// a flush. So a flood of one kind hides no line of another.
+/// a flush. So a flood of one kind does not hide lines of another.
 ///
 /// Each text becomes one line, as asLine makes it.
 ///
-/// A period begins with the first line after the one before. Time is that of the lines.
+/// A period begins with the first line after the previous period. Its times are those of the lines.
 class LimitingSink final : public spdlog::sinks::base_sink<std::mutex> {
 public:
     /// At most `lines` in `period` go to `next`.
@@ -55,7 +55,8 @@ private:
     const std::shared_ptr<spdlog::sinks::sink> next_;
     const std::size_t lines_;
     const std::chrono::milliseconds length_;
-    std::map<Kind, Period> periods_;  // those that have not ended; as few as loggers have levels
+    std::map<Kind, Period>
+        periods_;  // periods that have not ended; at most one for each logger and level
 };
 
 }  // namespace host

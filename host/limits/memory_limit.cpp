@@ -11,7 +11,8 @@
 #include <fstream>
 #include <limits>
 #include <string>
-#include <system_error>
+
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -24,7 +25,7 @@ std::uint64_t limitIn(const std::string& path) {
     return file >> bytes ? bytes : std::numeric_limits<std::uint64_t>::max();
 }
 
-// The limit of the process's own control group (version 2) and of those that it is in.
+// The limit of the process's own control group (version 2) and of the groups around it.
 std::uint64_t controlGroupLimit() {
     std::ifstream groups("/proc/self/cgroup");
     std::uint64_t least = std::numeric_limits<std::uint64_t>::max();
@@ -69,11 +70,11 @@ std::uint64_t limitMemory(std::uint64_t bytes) {
     keepStacksSmall();
     rlimit limit{};
     if (::getrlimit(RLIMIT_DATA, &limit) != 0) {
-        throw std::system_error(errno, std::generic_category(), "cannot get the memory limit");
+        platform::throwSystemError("cannot get the memory limit");
     }
     limit.rlim_cur = std::min<rlim_t>({bytes, limit.rlim_cur, limit.rlim_max});
     if (::setrlimit(RLIMIT_DATA, &limit) != 0) {
-        throw std::system_error(errno, std::generic_category(), "cannot set the memory limit");
+        platform::throwSystemError("cannot set the memory limit");
     }
     return limit.rlim_cur;
 }

@@ -1,14 +1,14 @@
 // SPDX-License-Identifier: Apache-2.0
-// A bound on the memory of the process, so that a document that is too large for the machine is an
-// error of its request and not the end of the process, or of another.
+// A bound on the memory of the process, so that a document that is too large for the machine fails
+// its request and does not end this process or another.
 #pragma once
 
 #include <cstdint>
 
 namespace host {
 
-/// Three quarters of the memory, in bytes, that the machine has, or that the control group of the
-/// process may use when that is less.
+/// Three quarters of the machine's memory in bytes, or of what the process's control group may use
+/// if that is less.
 std::uint64_t defaultMemoryLimit();
 
 /// Makes allocations fail that would take the process's memory above `bytes`, and has threads that

@@ -4,21 +4,21 @@
 #include <sys/resource.h>
 
 #include <algorithm>
-#include <cerrno>
-#include <system_error>
+
+#include "platform/posix/system_error.h"
 
 namespace host {
 
 void raiseOpenFileLimit() {
-    // More than all clients of the web page can use. What the system allows may be a billion.
+    // More than all clients of the web page can use; the system may allow a billion.
     constexpr rlim_t enough = 16'384;
     rlimit limit{};
     if (::getrlimit(RLIMIT_NOFILE, &limit) != 0) {
-        throw std::system_error(errno, std::generic_category(), "cannot get the limit of files");
+        platform::throwSystemError("cannot get the limit of files");
     }
     limit.rlim_cur = std::max(limit.rlim_cur, std::min(limit.rlim_max, enough));
     if (::setrlimit(RLIMIT_NOFILE, &limit) != 0) {
-        throw std::system_error(errno, std::generic_category(), "cannot set the limit of files");
+        platform::throwSystemError("cannot set the limit of files");
     }
 }
 

@@ -5,7 +5,7 @@
 namespace host {
 
 /// Raises the limit of open files, which for most processes is at 1,024 by default, towards what
-/// the system allows the process to have. Leaves it as it is when that is not more. Throws
+/// the system allows the process to have. Leaves it unchanged when that is not more. Throws
 /// std::system_error.
 void raiseOpenFileLimit();
 

@@ -16,14 +16,6 @@ namespace host {
 
 namespace {
 
-HttpAnswer plainText(unsigned status, std::string text) {
-    HttpAnswer answer;
-    answer.status = status;
-    answer.type = "text/plain; charset=utf-8";
-    answer.body = std::move(text);
-    return answer;
-}
-
 std::string gauge(std::string_view name, std::string_view help, std::uint64_t value) {
     return metricHeader(name, "gauge", help) + fmt::format("{} {}\n", name, value);
 }
@@ -47,7 +39,7 @@ void MetricsServer::start(std::function<void()> prepare) {
 
 HttpAnswer MetricsServer::answer(const HttpRequest& request) const {
     if (request.method != "GET" && request.method != "HEAD") {
-        return plainText(405, "Only GET and HEAD are answered here.\n");
+        return plainText(405, "Only GET and HEAD are supported.\n");
     }
     if (request.path == "/healthz") {
         return health();

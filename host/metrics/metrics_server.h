@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Tells programs that watch servers how the host is: /metrics for Prometheus, /healthz for load
-// balancers and the like.
+// The host's state for monitoring programs: /metrics for Prometheus, /healthz for load balancers.
 #pragma once
 
 #include <cstdint>
@@ -45,7 +44,7 @@ public:
 
     const ListenAddress& address() const noexcept { return server_.address(); }
 
-    /// Begins to answer, on a thread that calls `prepare` first. To be called once. Throws what
+    /// Begins to answer, on a thread that calls `prepare` first. Must be called once. Throws what
     /// `prepare` throws.
     void start(std::function<void()> prepare);
 

@@ -69,7 +69,7 @@ std::string RequestMetrics::text() const {
         });
     add("editor_requests_under_way", "gauge", "Requests that the bundle is handling.",
         [](const OfKind& counts, std::string_view kind) {
-            // In this order, so that what begins in between does not make it negative.
+            // In this order, so that requests that begin in between do not make it negative.
             const std::uint64_t ended = counts.ended;
             return fmt::format("editor_requests_under_way{{kind=\"{}\"}} {}\n", kind,
                                counts.begun.load() - ended);

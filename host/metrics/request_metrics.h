@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Counts of what the bundle is asked and answers, for whoever watches a server.
+// Counts of the bundle's requests and answers, for those who watch a server.
 #pragma once
 
 #include <array>

@@ -14,6 +14,8 @@
 #include <system_error>
 #include <utility>
 
+#include "platform/posix/system_error.h"
+
 namespace host {
 
 namespace {
@@ -26,17 +28,17 @@ struct Pipe {
 Pipe makePipe() {
     int ends[2];
     if (::pipe2(ends, O_CLOEXEC) != 0) {
-        throw std::system_error(errno, std::generic_category(), "cannot make a pipe");
+        platform::throwSystemError("cannot make a pipe");
     }
     return {platform::FileDescriptor(ends[0]), platform::FileDescriptor(ends[1])};
 }
 
-// Whether both are of the same name, as "NAME=value".
+// Whether two variables, each as "NAME=value", have the same name.
 bool haveSameName(std::string_view one, std::string_view other) {
     return one.substr(0, one.find('=')) == other.substr(0, other.find('='));
 }
 
-// The environment for programs: `own`, which must last, and what the host has besides.
+// The environment for programs: the host's own and `own`, which must outlive the result.
 std::vector<char*> makeEnvironment(const std::vector<std::string>& own) {
     std::vector<char*> variables;
     for (const std::string& variable : own) {
@@ -62,26 +64,26 @@ std::vector<char*> makeEnvironment(const std::vector<std::string>& own) {
     ::prctl(PR_SET_PDEATHSIG, SIGKILL);
     // The host may have ended before it was asked to take the program with it.
     bool isReady = ::getppid() == host;
-    // The signals that the host blocks or ignores are the program's to handle.
+    // The program handles the signals that the host blocks or ignores.
     sigset_t none;
     ::sigemptyset(&none);
     ::sigprocmask(SIG_SETMASK, &none, nullptr);
     ::signal(SIGPIPE, SIG_DFL);
     ::signal(SIGXFSZ, SIG_DFL);
     // The host's bound on its own memory would end the program where it makes the host's requests
-    // fail. What is set from outside is the hard limit.
+    // fail. A limit that was set from outside is the hard one.
     rlimit memory{};
     isReady = isReady && ::getrlimit(RLIMIT_DATA, &memory) == 0;
     memory.rlim_cur = memory.rlim_max;
     isReady = isReady && ::setrlimit(RLIMIT_DATA, &memory) == 0;
-    // Some libraries open files that would be the program's too.
+    // Some libraries open files that the program would inherit.
     isReady = isReady && ::close_range(3, ~0U, CLOSE_RANGE_CLOEXEC) == 0 &&
               ::dup2(output, STDOUT_FILENO) >= 0 && ::dup2(output, STDERR_FILENO) >= 0;
     if (isReady) {
         ::execve(program, arguments, environment);
     }
     const int error = errno;
-    // Nothing can be done about a failure to tell of the failure.
+    // A failure to report the failure cannot be reported either.
     [[maybe_unused]] const ssize_t told = ::write(failure, &error, sizeof error);
     ::_exit(127);
 }
@@ -106,7 +108,7 @@ ChildProcess::ChildProcess(const std::filesystem::path& program,
                       failure.write.get(), host);
     }
     if (id_ < 0) {
-        throw std::system_error(errno, std::generic_category(), "cannot start a process");
+        platform::throwSystemError("cannot start a process");
     }
     failure.write = {};
     int error = 0;

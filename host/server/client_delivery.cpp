@@ -2,8 +2,8 @@
 // The server has a way to end slowly ("lame duck mode"), but it does not wait for its clients:
 // after a fixed time it closes their connections, one by one, each with a tenth of a second for
 // what is still to be sent. Of 200 messages of 1 MB to a client that paused for six seconds, 3 came
-// through; and with nothing to wait for at all, the end took that fixed time and a second for each
-// client. So the server is asked what it holds, and the system what is still on its way.
+// through; and even with nothing to wait for, the end took that fixed time and a second for each
+// client. So the host asks the server what it holds, and the system what is still on its way.
 #include "host/server/client_delivery.h"
 
 #include <cstdint>

@@ -4,13 +4,12 @@
 #include <sys/random.h>
 
 #include <array>
-#include <cerrno>
 #include <map>
 #include <regex>
 #include <string_view>
-#include <system_error>
 
 #include "platform/messaging/channels.h"
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -75,7 +74,7 @@ std::string editorPermissions(const std::string& user) {
            "\n      subscribe: " + list(subscribe) + "\n    }";
 }
 
-// Without a list of origins, the server lets pages of any origin in; but no page has the server's.
+// Without a list of origins, the server accepts pages of any origin; but no page has the server's.
 std::string originText(const std::vector<std::string>& origins) {
     return origins.empty() ? "same_origin: true" : "allowed_origins: " + list(origins);
 }
@@ -129,7 +128,7 @@ std::string configurationText(const NatsConfiguration& configuration) {
 std::string makePassword() {
     std::array<unsigned char, 32> bytes{};
     if (::getentropy(bytes.data(), bytes.size()) != 0) {
-        throw std::system_error(errno, std::generic_category(), "cannot make a password");
+        platform::throwSystemError("cannot make a password");
     }
     constexpr std::string_view digits = "0123456789abcdef";
     std::string password;

@@ -16,22 +16,21 @@ struct Login {
 };
 
 /// The two users of the host's own server. The worker may do everything, and is the host. An editor
-/// is whoever has been told the password: it may publish requests, and subscribe to the
-/// notifications and to the answers for clients whose "rtcId" begins with the editor's name and a
-/// dot.
+/// is anyone who has the password: it may publish requests, and subscribe to the notifications and
+/// to the answers for clients whose "rtcId" begins with the editor's name and a dot.
 struct NatsUsers {
     Login worker;
     Login editor;
 };
 
 struct NatsConfiguration {
-    std::filesystem::path runtimeFolder;  ///< Where the server tells which ports it has.
+    std::filesystem::path runtimeFolder;  ///< Where the server writes which ports it has.
     std::uint16_t port = 0;           ///< For clients, on the loopback address; 0: any free one.
     std::uint16_t webSocketPort = 0;  ///< The same, for clients in a browser.
     NatsUsers users;
     /// The origins, as "http://localhost:3000", of the web pages that may connect. No two of them
-    /// may have the same host (see commonHost). Programs that are no browsers name no origin and
-    /// may always connect.
+    /// may have the same host (see commonHost). Programs other than browsers name no origin and may
+    /// always connect.
     std::vector<std::string> allowedOrigins;
 };
 

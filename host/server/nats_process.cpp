@@ -18,8 +18,8 @@
 #include <system_error>
 #include <vector>
 
-#include "host/commands/standard_streams.h"
 #include "host/limits/memory_limit.h"
+#include "host/standard_streams.h"
 #include "json/parser.h"
 #include "json/value.h"
 
@@ -27,8 +27,8 @@ namespace host {
 
 namespace {
 
-// The limit from which on the server, a Go program, would rather collect garbage than grow: of the
-// memory that the host leaves free by default, two thirds.
+// The limit above which the server, a Go program, collects garbage rather than grows: two thirds of
+// the memory that the host leaves free by default.
 std::string memoryLimitVariable() {
     return "GOMEMLIMIT=" + std::to_string(defaultMemoryLimit() / 9 * 2);
 }
@@ -39,7 +39,7 @@ using std::chrono::milliseconds;
 // How long the server may take to end when it is asked to.
 constexpr milliseconds longestStop{5'000};
 
-// How often to look for another event while the server's output is followed.
+// How often to check for another event while the server's output is read.
 constexpr milliseconds eventInterval{10};
 
 // Where Debian has the program, which is not among the folders of most users' PATH.
@@ -65,7 +65,7 @@ std::vector<std::filesystem::path> portsFilesIn(const std::filesystem::path& fol
     return files;
 }
 
-// What servers that were killed have left, so that it is not taken for what the next one says.
+// Removes what killed servers have left, so that it is not mistaken for what the next one writes.
 std::filesystem::path withoutPortsFiles(std::filesystem::path folder) {
     for (const std::filesystem::path& file : portsFilesIn(folder)) {
         std::filesystem::remove(file);
@@ -176,7 +176,7 @@ NatsProcess::State NatsProcess::followOnce(milliseconds timeout) {
     return waited[0].revents == 0 || logOutput() ? State::runs : State::hasEnded;
 }
 
-// Logs what the server has said; false when it has ended.
+// Logs what the server has written; false when it has ended.
 bool NatsProcess::logOutput() {
     std::array<char, 4096> chunk{};
     const std::size_t count = readSome(process_.output(), chunk.data(), chunk.size());
@@ -188,7 +188,7 @@ bool NatsProcess::logOutput() {
     return count > 0;
 }
 
-// Most of what the server says is of no interest: it warns of what is meant to be.
+// Most of the server's output is of no interest: it warns of intended settings.
 void NatsProcess::log(const std::string& line) {
     const bool isError = line.find("[ERR]") != std::string::npos;
     const bool isFatal = line.find("[FTL]") != std::string::npos ||

@@ -39,18 +39,17 @@ public:
     /// The ports on which the server takes connections; nothing until it does.
     std::optional<NatsPorts> ports() const;
 
-    /// Logs what the server says until the state is another than `runs`, or for `timeout`.
+    /// Logs the server's output until the state is no longer `runs`, or for `timeout`.
     State follow(std::chrono::milliseconds timeout);
 
-    /// Logs what the server says until `end` is ready: a server that nobody listens to comes to a
-    /// stop when it has something to say.
+    /// Logs the server's output until `end` is ready: a server whose output nobody reads blocks.
     void followUntil(const std::future<void>& end);
 
-    /// Ends the server, if need be by force.
+    /// Ends the server, by force if need be.
     void end();
 
-    /// Waits for the server's end and tells how it was, with the last error that the server told
-    /// of.
+    /// Waits for the server's end and returns its reason, with the last error that the server
+    /// logged.
     std::string collect();
 
 private:

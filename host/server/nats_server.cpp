@@ -4,7 +4,6 @@
 #include <fcntl.h>
 #include <poll.h>
 #include <spdlog/spdlog.h>
-#include <sys/eventfd.h>
 #include <sys/stat.h>
 
 #include <algorithm>
@@ -17,8 +16,8 @@
 #include <system_error>
 #include <utility>
 
-#include "host/commands/standard_streams.h"
 #include "host/server/client_delivery.h"
+#include "host/standard_streams.h"
 
 namespace host {
 
@@ -30,14 +29,14 @@ using std::chrono::milliseconds;
 // How long the server may take to be ready.
 constexpr milliseconds longestStart{30'000};
 
-// How long its clients may take to read what it has for them before it is stopped.
+// How long clients may take to read their answers before the server is stopped.
 constexpr milliseconds longestDelivery{10'000};
 
-// How often to look whether the server is ready.
+// How often to check whether the server is ready.
 constexpr milliseconds readyInterval{10};
 
-// How long to wait before the server is started again: twice as long each time, from the first to
-// the last of these, and from the first again after the server has run for a while.
+// How long to wait before the server is started again: twice as long each time, from the shortest
+// to the longest pause, and the shortest again after the server has run for a while.
 constexpr milliseconds shortestPause{50};
 constexpr milliseconds longestPause{5'000};
 constexpr milliseconds longEnoughRun{10'000};
@@ -59,10 +58,7 @@ void writePrivateFile(const std::filesystem::path& file, std::string_view text) 
 }  // namespace
 
 NatsServer::NatsServer(NatsServerOptions options, const PrivateFolder& folder)
-    : program_(findNatsServer(options.program)), folder_(folder), stop_(::eventfd(0, EFD_CLOEXEC)) {
-    if (stop_.get() < 0) {
-        throw std::system_error(errno, std::generic_category(), "cannot make an eventfd");
-    }
+    : program_(findNatsServer(options.program)), folder_(folder) {
     configuration_.runtimeFolder = folder_.path();
     configuration_.port = options.port;
     configuration_.webSocketPort = options.webSocketPort;
@@ -89,7 +85,7 @@ platform::messaging::NatsOptions NatsServer::workerConnection() const {
 }
 
 NatsServer::~NatsServer() {
-    ::eventfd_write(stop_.get(), 1);
+    stop_.set();
     supervisor_.join();
 }
 
@@ -118,22 +114,22 @@ void NatsServer::supervise(std::promise<void> ready) {
             pause = shortestPause;
         }
         spdlog::warn("nats-server has ended ({}) and is started again", *end);
-        if (isReadable(stop_.get(), pause)) {
+        if (isReadable(stop_.descriptor(), pause)) {
             break;
         }
         pause = std::min(2 * pause, longestPause);
     }
-    // Here, since the thread that made the folder may be confined to others by now.
+    // On this thread, since the one that made the folder may be confined by now.
     folder_.remove();
 }
 
-// Runs the server until it ends and tells how it ended; nothing when it has been stopped.
+// Runs the server until it ends. Returns the reason; nothing when it was stopped on purpose.
 std::optional<std::string> NatsServer::runOnce(const std::function<void()>& whenReady) {
     using State = NatsProcess::State;
     try {
         const std::filesystem::path file = folder_.path() / "nats-server.conf";
         writePrivateFile(file, configurationText(configuration_));
-        NatsProcess process(program_, file, stop_.get());
+        NatsProcess process(program_, file, stop_.descriptor());
         State state = State::runs;
         const Clock::time_point latest = Clock::now() + longestStart;
         while (state == State::runs && !process.ports()) {
@@ -158,7 +154,7 @@ std::optional<std::string> NatsServer::runOnce(const std::function<void()>& when
     }
 }
 
-// Has the server take the same ports whenever it is started again.
+// Makes a restarted server take the same ports.
 void NatsServer::keepPorts(const NatsPorts& ports) {
     if (configuration_.port == 0 || configuration_.webSocketPort == 0) {
         configuration_.port = ports.client;

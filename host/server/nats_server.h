@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 // The nats-server that the host runs for itself, so that browsers and other programs of this
-// machine can be the bundle's clients without anything to set up.
+// machine can be the bundle's clients without any set-up.
 //
-// One thread looks after it: it starts the server, reads what it says, and starts it again when it
-// ends, with the same ports and passwords. The thread needs files that the rest of the host may be
-// kept from, so a NatsServer is to be made before any confinement.
+// One thread supervises it: it starts the server, reads its output, and starts it again when it
+// ends, with the same ports and passwords. The thread needs files that the rest of the host may not
+// open, so a NatsServer must be made before any confinement.
 #pragma once
 
 #include <cstdint>
@@ -20,24 +20,24 @@
 #include "host/server/nats_process.h"
 #include "host/server/private_folder.h"
 #include "platform/messaging/nats/nats_bus.h"
-#include "platform/posix/file_descriptor.h"
+#include "platform/posix/event.h"
 
 namespace host {
 
 struct NatsServerOptions {
-    std::filesystem::path program;  ///< Empty: nats-server, where programs are.
+    std::filesystem::path program;  ///< Empty: nats-server, from the usual folders.
     std::uint16_t port = 0;         ///< On the loopback address; 0: any free one.
     std::uint16_t webSocketPort = 0;
     std::vector<std::string> allowedOrigins;  ///< As in NatsConfiguration.
 };
 
-/// A supervised nats-server. It is stopped at the end of this object's life, when its clients have
-/// taken what it holds for them or some seconds are over, and dies with the host however that ends.
+/// A supervised nats-server. It is stopped with this object, once its clients have read what it
+/// holds for them or some seconds have passed, and ends with the host however that ends.
 class NatsServer {
 public:
     /// Starts the server, with its files in `folder`, and waits until it takes connections. Throws
     /// std::runtime_error when there is no such program, naming the package that has it, and when
-    /// it does not start, with what it says. The folder is removed when the server has ended.
+    /// it does not start, with its output. The folder is removed when the server has ended.
     NatsServer(NatsServerOptions options, const PrivateFolder& folder);
 
     NatsServer(const NatsServer&) = delete;
@@ -66,7 +66,7 @@ private:
     std::filesystem::path program_;
     const PrivateFolder& folder_;
     NatsConfiguration configuration_;  // The ports change until the server is first ready.
-    platform::FileDescriptor stop_;    // Becomes readable when the server is to be stopped.
+    platform::Event stop_;             // The server is to be stopped.
     std::thread supervisor_;
 };
 

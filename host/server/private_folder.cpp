@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// Who has a lock (flock) on a folder owns it, and the system takes the lock back from a process
-// however that ends. Between making a folder and locking it, another process can find it unlocked
-// and remove it; whoever made it then finds it locked by the other, or gone, and makes a new one.
+// The process with a lock (flock) on a folder owns it, and the system releases the lock however
+// that process ends. Between making a folder and locking it, another process can find it unlocked
+// and remove it; the maker then finds it locked by the other, or gone, and makes a new one.
 // (systemd-tmpfiles, which removes what is old from /tmp, leaves locked folders alone too.)
 #include "host/server/private_folder.h"
 
@@ -64,12 +64,12 @@ void removeLeftovers(const fs::path& parent) {
     }
 }
 
-// A message server that cannot write its files says nothing of use.
+// A message server that cannot write its files gives no useful error.
 void requireRoom(const fs::path& folder) {
     constexpr off_t enough = off_t{64} * 1024;
     const FileDescriptor file(::open(folder.c_str(), O_WRONLY | O_TMPFILE | O_CLOEXEC, S_IRUSR));
     const int error = file ? ::posix_fallocate(file.get(), 0, enough) : errno;
-    // Some file systems have no files without a name; on them, it is found out later.
+    // Some file systems have no files without a name; there, a lack of room shows only later.
     if (error != 0 && error != EOPNOTSUPP && error != EISDIR) {
         fail(folder.parent_path(), error);
     }

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// A folder for the files of one run of the program, which nobody else may look into.
+// A private folder for the files of one run of the program.
 #pragma once
 
 #include <filesystem>
@@ -8,21 +8,21 @@
 
 namespace host {
 
-/// Creates a folder for this user's eyes only, and removes it with all that is in it at the end of
-/// its life. A process that is killed leaves it behind, and the next one that makes such a folder
+/// A folder that only this user can read, removed with all its content at the end of the object's
+/// life. A process that is killed leaves it behind, and the next one that makes such a folder
 /// removes it.
 class PrivateFolder {
 public:
-    /// Below $XDG_RUNTIME_DIR where there is such a folder, which is in memory and goes with the
-    /// user's session, else below $TMPDIR or /tmp. Throws std::runtime_error naming the place when
-    /// it takes no folder, or has no room for files.
+    /// Below $XDG_RUNTIME_DIR where there is such a folder, which is in memory and lasts as long as
+    /// the user's session, else below $TMPDIR or /tmp. Throws std::runtime_error naming the place
+    /// when no folder can be made there, or it has no room for files.
     PrivateFolder();
 
     PrivateFolder(const PrivateFolder&) = delete;
     PrivateFolder& operator=(const PrivateFolder&) = delete;
     ~PrivateFolder() { remove(); }
 
-    /// Removes the folder before its time. Does nothing when it has been removed.
+    /// Removes the folder early. Does nothing when it has been removed.
     void remove() const noexcept;
 
     const std::filesystem::path& path() const noexcept { return path_; }

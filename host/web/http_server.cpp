@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-// libmicrohttpd reads and writes the connections, told by epoll which of them are ready; its time
-// limit is one for silence, which a client escapes by sending a byte now and then. So here each
-// connection also has a deadline, for its whole head and then for its whole answer, past which its
-// socket is shut down. Everything happens on one thread, so nothing needs a lock.
+// libmicrohttpd reads and writes the connections, as epoll reports them ready. Its time limit
+// counts idle time only, which a client evades by sending a byte now and then. So each connection
+// also has a deadline, for its whole head and then for its whole answer, after which its socket is
+// shut down. Everything happens on one thread, so nothing needs a lock.
 #include "host/web/http_server.h"
 
 #include <microhttpd.h>
@@ -10,7 +10,6 @@
 #include <netinet/in.h>
 #include <poll.h>
 #include <spdlog/spdlog.h>
-#include <sys/eventfd.h>
 #include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
@@ -28,6 +27,8 @@
 #include <stdexcept>
 #include <system_error>
 #include <unordered_map>
+
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -55,13 +56,14 @@ Addresses resolve(const ListenAddress& address) {
     return {found, &::freeaddrinfo};
 }
 
-// A socket that listens at the first of the addresses that can be had.
+// A socket that listens at the first of the addresses that is available.
 platform::FileDescriptor listenAt(const ListenAddress& address) {
     const Addresses addresses = resolve(address);
     for (const addrinfo* each = addresses.get(); each != nullptr; each = each->ai_next) {
         platform::FileDescriptor socket(
             ::socket(each->ai_family, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
-        // A restarted program gets its port back while old connections are still remembered.
+        // A restarted program can have its port again although the system remembers old
+        // connections.
         const int yes = 1;
         if (socket && ::setsockopt(socket.get(), SOL_SOCKET, SO_REUSEADDR, &yes, sizeof yes) == 0 &&
             ::bind(socket.get(), each->ai_addr, each->ai_addrlen) == 0 &&
@@ -83,17 +85,17 @@ std::uint16_t portOf(const platform::FileDescriptor& socket) {
                      : reinterpret_cast<const sockaddr_in&>(address).sin_port);
 }
 
-// Connections that the process can take: half of the files that it may open. The other half is for
-// the files that are sent and for the rest of the program.
+// The connections that the process can afford: half of the files that it may open. The other half
+// is for files that are being sent and for the rest of the program.
 unsigned affordableConnections() {
     rlimit files{};
     if (::getrlimit(RLIMIT_NOFILE, &files) != 0) {
-        throw std::system_error(errno, std::generic_category(), "cannot get the limit of files");
+        platform::throwSystemError("cannot get the limit of files");
     }
     return static_cast<unsigned>(std::clamp<rlim_t>(files.rlim_cur / 2, 1, 1U << 20U));
 }
 
-// The library would cut a path at a NUL, and the file of another name would be sent.
+// The library would cut the path at a NUL and send the file of another name.
 std::size_t unescape(void*, MHD_Connection*, char* text) {
     return std::strstr(text, "%00") != nullptr ? std::strlen(text) : ::MHD_http_unescape(text);
 }
@@ -156,7 +158,7 @@ private:
 
     Daemon startDaemon(platform::FileDescriptor socket) {
         return {::MHD_start_daemon(MHD_USE_EPOLL, 0, nullptr, nullptr, &Loop::answer, this,
-                                   // The library closes it, also when it fails.
+                                   // The library closes it even on failure.
                                    MHD_OPTION_LISTEN_SOCKET, socket.release(),
                                    MHD_OPTION_CONNECTION_LIMIT,
                                    std::min(limits_.connections, affordableConnections()),
@@ -172,7 +174,7 @@ private:
         return ::MHD_get_connection_info(connection, MHD_CONNECTION_INFO_CONNECTION_FD)->connect_fd;
     }
 
-    // No exception may leave this one and the next for the library, which is written in C.
+    // No exception may leave this function and the next: the library is written in C.
 
     static void connectionChanged(void* self, MHD_Connection* connection, void**,
                                   MHD_ConnectionNotificationCode change) {
@@ -216,7 +218,7 @@ private:
     }
 
     // In milliseconds, as poll takes it. When the last connection ends, the library has to run once
-    // more before it is told of new ones.
+    // more before it learns of new ones.
     int timeout() const {
         MHD_UNSIGNED_LONG_LONG wanted = 0;
         if (::MHD_get_timeout(daemon_.get(), &wanted) == MHD_YES && wanted == 0) {
@@ -233,7 +235,7 @@ private:
         nextLook_ = now + deadlineInterval;
         for (const auto& [socket, deadline] : deadlines_) {
             if (deadline < now) {
-                ::shutdown(socket, SHUT_RDWR);  // The library finds that it has ended.
+                ::shutdown(socket, SHUT_RDWR);  // The library notices that it has ended.
             }
         }
     }
@@ -243,15 +245,20 @@ private:
     std::unordered_map<int, Clock::time_point> deadlines_;  // by the connection's socket
     Clock::time_point nextLook_;
     bool wasIdle_ = false;
-    Daemon daemon_;  // Ends first, since it tells of the connections' ends.
+    Daemon daemon_;  // Destroyed first, since it reports the ends of connections.
     int epoll_ = -1;
 };
 
+HttpAnswer plainText(unsigned status, std::string text) {
+    HttpAnswer answer;
+    answer.status = status;
+    answer.type = "text/plain; charset=utf-8";
+    answer.body = std::move(text);
+    return answer;
+}
+
 HttpServer::HttpServer(const ListenAddress& address, const HttpLimits& limits)
-    : address_(address), limits_(limits), stop_(::eventfd(0, EFD_CLOEXEC)) {
-    if (!stop_) {
-        throw std::system_error(errno, std::generic_category(), "cannot make an eventfd");
-    }
+    : address_(address), limits_(limits) {
     try {
         socket_ = listenAt(address);
         address_.port = portOf(socket_);
@@ -261,7 +268,7 @@ HttpServer::HttpServer(const ListenAddress& address, const HttpLimits& limits)
 }
 
 HttpServer::~HttpServer() {
-    ::eventfd_write(stop_.get(), 1);
+    stop_.set();
     if (thread_.joinable()) {
         thread_.join();
     }
@@ -270,7 +277,7 @@ HttpServer::~HttpServer() {
 void HttpServer::start(std::function<void()> prepare, Handler handler) {
     std::promise<void> running;
     std::future<void> whenRunning = running.get_future();
-    // The thread has the promise, since it may be busy with it still when the future is ready.
+    // The thread owns the promise, since it may still be using it when the future is ready.
     thread_ = std::thread([this, running = std::move(running), prepare = std::move(prepare),
                            handler = std::move(handler)]() mutable {
         std::optional<Loop> loop;
@@ -281,7 +288,7 @@ void HttpServer::start(std::function<void()> prepare, Handler handler) {
             return running.set_exception(std::current_exception());
         }
         running.set_value();
-        loop->run(stop_.get());
+        loop->run(stop_.descriptor());
     });
     whenRunning.get();
 }

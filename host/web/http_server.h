@@ -12,11 +12,12 @@
 #include <vector>
 
 #include "host/web/listen_address.h"
+#include "platform/posix/event.h"
 #include "platform/posix/file_descriptor.h"
 
 namespace host {
 
-/// The head of a request. What it points to lasts for the call of the handler.
+/// The head of a request. Its texts are valid during the call of the handler.
 struct HttpRequest {
     std::string_view method;
     std::string_view path;  ///< Decoded, without the query. Of one that holds a NUL, as it came.
@@ -31,6 +32,9 @@ struct HttpAnswer {
     std::vector<std::pair<std::string, std::string>> headers;  ///< Any others.
 };
 
+/// An answer of `text` for people and programs.
+HttpAnswer plainText(unsigned status, std::string text);
+
 /// What clients can use of the host. A client that exceeds a limit is disconnected.
 struct HttpLimits {
     std::chrono::milliseconds head{3'000};     ///< From the connection to the end of the head.
@@ -39,23 +43,23 @@ struct HttpLimits {
     /// The memory of a connection: for the head of the request, and for that of the answer.
     std::size_t memory = std::size_t{16} * 1024;
 
-    /// Connections at a time; further ones wait. Fewer where the process may not open that many
+    /// Connections at a time; more have to wait. Fewer where the process may not open that many
     /// files.
     unsigned connections = 4096;
 
-    /// Of these, for each address; further ones are refused. 0: all. Everybody who comes through
-    /// the same proxy has the same address, and so has every program of this machine.
+    /// Of these, for each address; more are refused. 0: no limit. All clients behind one proxy have
+    /// the same address, and so have all programs of this machine.
     unsigned connectionsOfAddress = 0;
 };
 
-/// An HTTP server with one thread, on which it waits for all clients at once, so none of them keeps
-/// others waiting by being slow. A connection carries one request; bodies of requests are ignored.
+/// An HTTP server with one thread, which waits for all clients at once, so slow clients do not
+/// delay others. A connection carries one request; bodies of requests are ignored.
 class HttpServer {
 public:
     using Handler = std::function<HttpAnswer(const HttpRequest&)>;
 
     /// Listens at `address`; requests wait until `start`. Throws std::runtime_error when the
-    /// address is not to be had.
+    /// address is not available.
     explicit HttpServer(const ListenAddress& address, const HttpLimits& limits = {});
 
     HttpServer(const HttpServer&) = delete;
@@ -68,7 +72,7 @@ public:
     const ListenAddress& address() const noexcept { return address_; }
 
     /// Begins to answer with what `handler` returns, on a thread that calls `prepare` first. An
-    /// exception of `handler` is logged and answered with status 500. To be called once. Throws
+    /// exception of `handler` is logged and answered with status 500. Must be called once. Throws
     /// what `prepare` throws, and std::runtime_error when the server cannot be started.
     void start(std::function<void()> prepare, Handler handler);
 
@@ -78,7 +82,7 @@ private:
     ListenAddress address_;
     HttpLimits limits_;
     platform::FileDescriptor socket_;
-    platform::FileDescriptor stop_;  // Becomes readable when the thread is to end.
+    platform::Event stop_;  // The thread is to end.
     std::thread thread_;
 };
 

@@ -10,7 +10,7 @@ namespace host {
 
 ListenAddress ListenAddress::parse(const std::string& text) {
     const auto fail = [&text] {
-        throw std::invalid_argument("\"" + text + "\" is no address such as 127.0.0.1:8080");
+        throw std::invalid_argument("\"" + text + "\" is not an address such as 127.0.0.1:8080");
     };
     const std::size_t colon = text.rfind(':');
     if (colon == std::string::npos || colon == 0) {

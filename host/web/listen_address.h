@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Where a server listens, as people write it and as browsers name it.
+// The address where a server listens: how people write it and browsers name it.
 #pragma once
 
 #include <cstdint>

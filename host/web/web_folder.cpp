@@ -16,7 +16,7 @@ namespace host {
 
 namespace {
 
-// No link is followed, and the open waits for nobody at the other end of a pipe.
+// Follows no link, and does not wait for a writer when it is a pipe.
 constexpr int openFlags = O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK;
 
 constexpr std::array<std::pair<std::string_view, std::string_view>, 17> typesByEnding{{
@@ -75,7 +75,7 @@ std::optional<WebFolder::File> WebFolder::open(std::string_view path) const {
     if (rest.empty() || rest.ends_with('/')) {
         rest += "index.html";
     }
-    // Name by name, so that no name is taken for more than one.
+    // Name by name, so that no name can stand for several.
     platform::FileDescriptor opened;
     int folder = folder_.get();
     for (std::size_t begin = 0; begin <= rest.size();) {

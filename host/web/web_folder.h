@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The files of a folder, as a web server gives them out.
+// The files of a folder, for a web server.
 #pragma once
 
 #include <filesystem>
@@ -11,8 +11,8 @@
 
 namespace host {
 
-/// A folder whose files are given out by the paths of URLs. Nothing outside of it is, whatever the
-/// path, and nothing that is reached through a symbolic link or whose name begins with a dot.
+/// A folder whose files are found by the paths of URLs. Files outside of it are never found, nor
+/// any that is reached through a symbolic link or has a name that begins with a dot.
 class WebFolder {
 public:
     struct File {

@@ -8,20 +8,12 @@ namespace host {
 
 namespace {
 
-// Pages run their own scripts and no others, stand in no frame of another site's, and connect to
-// message servers.
+// Pages run only their own scripts, cannot be framed by other sites, and may connect to message
+// servers.
 constexpr const char* contentPolicy =
     "default-src 'self'; img-src 'self' data: blob:; font-src 'self' data:; "
     "style-src 'self' 'unsafe-inline'; worker-src 'self' blob:; connect-src 'self' ws: wss:; "
     "object-src 'none'; base-uri 'none'; form-action 'none'; frame-ancestors 'none'";
-
-HttpAnswer plainText(unsigned status, std::string text) {
-    HttpAnswer answer;
-    answer.status = status;
-    answer.type = "text/plain; charset=utf-8";
-    answer.body = std::move(text);
-    return answer;
-}
 
 }  // namespace
 
@@ -47,7 +39,7 @@ void WebServer::start(std::function<void()> prepare) {
 
 HttpAnswer WebServer::answer(const HttpRequest& request) const {
     if (request.method != "GET" && request.method != "HEAD") {
-        HttpAnswer refusal = plainText(405, "Only GET and HEAD are answered here.\n");
+        HttpAnswer refusal = plainText(405, "Only GET and HEAD are supported.\n");
         refusal.headers.emplace_back("Allow", "GET, HEAD");
         return refusal;
     }

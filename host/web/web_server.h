@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Serves a folder over HTTP, so that a browser has a page from which to reach the bundle.
+// Serves a folder over HTTP: the page through which a browser reaches the bundle.
 #pragma once
 
 #include <filesystem>
@@ -21,11 +21,11 @@ public:
               const HttpLimits& limits = {});
 
     /// "http://127.0.0.1:8080": the origin of the pages. When it is on the loopback address,
-    /// requests that were meant for another are refused, so that no page of another site can have
-    /// its name point at this machine and read what is served.
+    /// requests with another Host are refused, so that no other site can point its name at this
+    /// machine and read what is served.
     std::string origin() const { return server_.address().origin(); }
 
-    /// Begins to answer, on a thread that calls `prepare` first. To be called once. Throws what
+    /// Begins to answer, on a thread that calls `prepare` first. Must be called once. Throws what
     /// `prepare` throws.
     void start(std::function<void()> prepare);
 
@@ -33,7 +33,7 @@ private:
     HttpAnswer answer(const HttpRequest& request) const;
 
     const WebFolder folder_;
-    HttpServer server_;  // Ends first: its thread uses the folder.
+    HttpServer server_;  // Destroyed first: its thread uses the folder.
 };
 
 }  // namespace host

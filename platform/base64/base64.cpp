@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Base64 around the kernels, which convert whole groups: the last group's padding, white space, and
-// what is no base64.
+// what is not base64.
 #include "platform/base64/base64.h"
 
 #include <algorithm>
@@ -30,7 +30,7 @@ bool isInAlphabet(char c) {
 }
 
 // Reads the characters of a group from `text`, from `at` on, over white space. Returns how many
-// there are before the text ends, and moves `at` behind the last of them, or to the end.
+// there are before the text ends, and moves `at` past the last of them, or to the end.
 std::size_t readGroup(std::string_view text, std::size_t& at, Group& group) {
     std::size_t count = 0;
     for (; at < text.size() && count < group.size(); ++at) {
@@ -50,7 +50,7 @@ void checkPadding(std::string_view text, std::size_t start, std::size_t leftOver
         if (text[i] == '=') {
             ++count;
         } else if (!platform::text::isspace_ascii(text[i])) {
-            fail("data behind the padding", i);
+            fail("data after the padding", i);
         }
     }
     const std::size_t missing = leftOver == 0 ? 0 : charactersPerGroup - leftOver;
@@ -100,8 +100,8 @@ DataBuffer base64decode(std::string_view text) {
     std::size_t length = 0;
     std::size_t leftOver = 0;  // characters of an incomplete group
     for (std::size_t at = 0; at < end;) {
-        // Most text is nothing but groups; what comes between them is stepped over a group at a
-        // time.
+        // Most text consists of whole groups only; white space between them is skipped one group at
+        // a time.
         const std::size_t groups = base64::kernels().decode(
             text.data() + at, (end - at) / charactersPerGroup, bytes.data() + length);
         at += groups * charactersPerGroup;

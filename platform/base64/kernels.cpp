@@ -7,6 +7,8 @@
 #include <cstdint>
 #include <string_view>
 
+#include "platform/runnable_kernels.h"
+
 namespace platform::base64 {
 
 #ifdef HAS_AVX2_KERNELS
@@ -67,16 +69,8 @@ std::size_t decode(const char* text, std::size_t groups, char* bytes) {
     return groups;
 }
 
-// Held without memory from the heap, which may be exhausted when they are first asked for.
-struct RunnableKernels {
-    std::array<const Kernels*, 2> kernels{};
-    std::size_t count = 0;
-
-    void add(const Kernels& added) { kernels[count++] = &added; }
-};
-
-RunnableKernels findRunnable() {
-    RunnableKernels runnable;
+RunnableKernels<Kernels, 2> findRunnable() {
+    RunnableKernels<Kernels, 2> runnable;
     runnable.add(plainKernels);
 #ifdef HAS_AVX2_KERNELS
     if (__builtin_cpu_supports("avx2")) {
@@ -94,8 +88,8 @@ RunnableKernels findRunnable() {
 constexpr Kernels plainKernels = {"plain", encode, decode};
 
 std::span<const Kernels* const> runnableKernels() {
-    static const RunnableKernels runnable = findRunnable();
-    return {runnable.kernels.data(), runnable.count};
+    static const RunnableKernels<Kernels, 2> runnable = findRunnable();
+    return runnable.all();
 }
 
 const Kernels& kernels() {

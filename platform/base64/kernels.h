@@ -20,7 +20,7 @@ struct Kernels {
     void (*encode)(const char* bytes, std::size_t groups, char* text);
 
     /// Decodes up to `groups` groups, up to the first that has a character outside the alphabet.
-    /// Returns their number. What is behind their bytes, of those of all groups, may be
+    /// Returns their number. What follows their bytes, up to the end of all groups, may be
     /// overwritten.
     std::size_t (*decode)(const char* text, std::size_t groups, char* bytes);
 };
@@ -28,7 +28,7 @@ struct Kernels {
 /// Kernels that every machine can run.
 extern const Kernels plainKernels;
 
-/// The quickest kernels that this machine can run.
+/// The fastest kernels that this machine can run.
 const Kernels& kernels();
 
 /// All kernels that this machine can run.

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Questions to the file system about UTF-16 paths.
+// Asks the file system about UTF-16 paths.
 #include "platform/filesystem/filesystem.h"
 
 #include <limits.h>

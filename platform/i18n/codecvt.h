@@ -14,7 +14,7 @@ class Charset;
 }
 
 /// Decodes bytes of one charset to UTF-16. A converter is cheap to keep and holds no text between
-/// calls, but is not to be used by two threads at once.
+/// calls, but must not be used by two threads at once.
 class codecvt_string_to_ustring {
 public:
     /// `charset` is an IANA name or a usual alias, compared without case. `strict` decides what
@@ -39,8 +39,8 @@ private:
 /// Encodes UTF-16 to bytes of one charset. Sharing is as for codecvt_string_to_ustring.
 class codecvt_ustring_to_string {
 public:
-    /// As for codecvt_string_to_ustring; not strict puts the charset's substitution character in
-    /// the place of what it cannot hold.
+    /// As for codecvt_string_to_ustring; otherwise the charset's substitution character replaces
+    /// what it cannot hold.
     codecvt_ustring_to_string(const std::string& charset, bool strict);
     codecvt_ustring_to_string(codecvt_ustring_to_string&&) noexcept;
     codecvt_ustring_to_string& operator=(codecvt_ustring_to_string&&) noexcept;
@@ -62,8 +62,9 @@ std::u16string to_ustring(std::string_view bytes, codecvt_string_to_ustring& con
 std::string to_string(std::u16string_view text, codecvt_ustring_to_string& converter);
 
 /// Whether `bytes` are known to be valid in `charset` and to come back as they are when they are
-/// decoded and encoded again. It is found without converting them, so it may be false of bytes that
-/// do come back. Throws std::runtime_error when the charset is unknown. Linear in their number.
+/// decoded and encoded again. This is checked without converting them, so the result may be false
+/// for bytes that do come back. Throws std::runtime_error when the charset is unknown. Linear in
+/// their number.
 bool comesBackUnchanged(std::string_view bytes, const std::string& charset);
 
 /// Strict UTF-8 to UTF-16. Throws std::runtime_error naming the byte offset of malformed input.

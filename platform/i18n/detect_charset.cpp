@@ -2,9 +2,9 @@
 // Detection of the charset of a text file.
 //
 // In this order: a byte-order mark; ASCII, charsets of escape sequences, UTF-8, and UTF-16 and
-// UTF-32 without a mark; the legacy charsets, by what the text costs in each
-// (detection/likeliest_charset.cpp). Whatever is returned decodes the whole file and, but for
-// escape sequences that no converter writes, encodes it back to the same bytes.
+// UTF-32 without a mark; the legacy charsets, by the text's cost in each
+// (detection/likeliest_charset.cpp). The result decodes the whole file and, but for escape
+// sequences that no converter writes, encodes it back to the same bytes.
 #include "platform/i18n/detect_charset.h"
 
 #include <simdjson.h>
@@ -68,8 +68,7 @@ std::string markedCharset(std::string_view bytes) {
 }
 
 bool isAscii(std::string_view bytes) {
-    // To the end in any case: without a way out of the loop the compiler makes it many times
-    // faster.
+    // Always goes to the end: without an early exit, the compiler makes the loop many times faster.
     unsigned char all = 0;
     for (const char byte : bytes) {
         all |= static_cast<unsigned char>(byte);
@@ -77,7 +76,7 @@ bool isAscii(std::string_view bytes) {
     return all < 0x80;
 }
 
-// Whether so much of the sample is control codes that it is no text in any legacy charset.
+// Whether so much of the sample is control codes that it is not text in any legacy charset.
 bool isBinary(std::string_view sample) {
     // Counted in bytes, block by block, for the compiler to do many at once.
     constexpr std::size_t blockSize = 255;
@@ -95,8 +94,8 @@ bool isBinary(std::string_view sample) {
     return controls * 20 > sample.size() + 20;
 }
 
-// Whether the sample is UTF-8 but for a few damaged places. Legacy charsets could decode it, as
-// nonsense.
+// Whether the sample is UTF-8 except for a few damaged places. Legacy charsets could decode it, but
+// to nonsense.
 bool isDamagedUtf8(std::string_view sample) {
     std::size_t characters = 0;
     std::size_t damaged = 0;
@@ -126,7 +125,7 @@ std::string legacyCharset(std::string_view bytes) {
         }
         const detail::LegacyCharset::Fit fit = likely->charset->fit(bytes);
         if (fit.decodes) {
-            // Where the right charset would not give the bytes back, no other is right either.
+            // When the right charset would not give the bytes back, no other one is right either.
             return fit.name == likely->charset->name()
                        ? detail::largestThatAgrees(*likely->charset, bytes).name()
                        : fit.name;

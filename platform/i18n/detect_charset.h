@@ -10,8 +10,8 @@
 
 namespace platform::i18n {
 
-/// The longest text in bytes that detect_charset takes: 1 GiB. What becomes of a longer one, in
-/// UTF-16 and escaped for a message, does not fit the memory of most machines.
+/// The longest text in bytes that detect_charset takes: 1 GiB. A longer one, in UTF-16 and escaped
+/// for a message, would not fit in the memory of most machines.
 inline constexpr std::size_t maxTextLength = std::size_t{1} << 30;
 
 /// Throws std::runtime_error, which names both lengths, when `length` is above maxTextLength.
@@ -22,9 +22,9 @@ void requireTextLength(std::uintmax_t length);
 /// strictly; they also encode back to the same bytes, except where escape sequences of ISO-2022 or
 /// HZ are spelt in a way that no converter writes. A byte-order mark decides; empty, ASCII and
 /// valid UTF-8 input is "UTF-8"; of charsets that agree on all bytes, the one that holds more
-/// characters is named; what fits nothing is "ISO-8859-1", which holds every byte, and only then
-/// one line that names `sourceName` is written to `diagnostics`. Throws std::runtime_error when
-/// `length` is above maxTextLength. Linear in `length`.
+/// characters is named; input that fits no charset is "ISO-8859-1", which holds every byte, and
+/// only then one line that names `sourceName` is written to `diagnostics`. Throws
+/// std::runtime_error when `length` is above maxTextLength. Linear in `length`.
 std::string detect_charset(const char* data, std::size_t length, std::ostream& diagnostics,
                            std::u16string_view sourceName);
 

@@ -7,30 +7,30 @@ namespace platform::messaging {
 /// The channel on which the bundle takes read requests.
 inline constexpr const char* readRequestChannel = "/zpr/service/readRequest_cpp";
 
-/// What precedes the "rtcId" of a read request in the channel of its response.
+/// The prefix of the channel of a read response; the request's "rtcId" follows.
 inline constexpr const char* readResponsePrefix = "/zpr/service/readResponse/";
 
 /// The channel on which the bundle takes write requests.
 inline constexpr const char* writeRequestChannel = "/zpr/service/writeRequest_cpp";
 
-/// What precedes the "rtcId" of a write request in the channel of its response.
+/// The prefix of the channel of a write response; the request's "rtcId" follows.
 inline constexpr const char* writeResponsePrefix = "/zpr/service/writeResponse/";
 
-/// The channel on which the bundle tells that a file may have changed.
+/// The channel on which the bundle announces that a file may have changed.
 inline constexpr const char* notificationChannel = "/zpr/service/notifyFileSystemRequest";
 
-/// The channel on which the host takes questions about files.
+/// The channel on which the host takes requests about files.
 inline constexpr const char* filesRequestChannel = "/zpr/service/filesRequest_host";
 
-/// What precedes the "rtcId" of such a question in the channel of its answer.
+/// The prefix of the channel of its answer; the request's "rtcId" follows.
 inline constexpr const char* filesResponsePrefix = "/zpr/service/filesResponse/";
 
-/// What follows a request channel in the one on which requests are offered that are too long for
-/// one message.
+/// Appended to a request channel, the channel for offers of requests that are too long for one
+/// message.
 inline constexpr const char* offerSuffix = "/offer";
 
-/// What precedes "<worker>.<rtcId>" in the channel on which a client speaks to one worker about a
-/// message in pieces.
+/// The prefix of the channel on which a client speaks to one worker about a message in pieces;
+/// "<worker>.<rtcId>" follows.
 inline constexpr const char* piecesPrefix = "/zpr/service/piece.";
 
 }  // namespace platform::messaging

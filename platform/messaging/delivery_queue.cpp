@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The queue is a plain deque under a mutex; the threads take messages off it until it is closed.
+// The queue is a plain deque under a mutex; the threads take messages from it until it is closed.
 #include "platform/messaging/delivery_queue.h"
 
 #include <condition_variable>
@@ -53,8 +53,8 @@ private:
     std::deque<QueuedMessage> messages_;
     bool ended_ = false;
 
-    // What was left at the end, to be destroyed without the mutex. Made with the queue, because
-    // even an empty one takes memory, and a queue has to end where there is none.
+    // The messages left at the end, to be destroyed without the mutex. Made with the queue, because
+    // even an empty one takes memory, and closing a queue must not need any.
     std::deque<QueuedMessage> dropped_;
 };
 

@@ -13,7 +13,7 @@
 
 namespace platform::messaging {
 
-/// A message on its way to a handler, with what its sender wants to have released along the way.
+/// A message on its way to a handler, with what its sender wants released on the way.
 struct QueuedMessage {
     JsonMessage message;
 
@@ -40,9 +40,9 @@ public:
     virtual void end() = 0;
 };
 
-/// Hands the messages of a source to a handler: one at a time and in the source's order when there
-/// is one thread, several at once when there are more. What the handler throws is logged with the
-/// channel, and dropped.
+/// Gives the messages of a source to a handler: one at a time and in the source's order when there
+/// is one thread, several at once when there are more. Exceptions of the handler are logged with
+/// the channel, and dropped.
 class DeliveryThreads {
 public:
     /// Starts `count` threads, at least one. Throws std::system_error when one cannot be started.
@@ -57,7 +57,7 @@ public:
 
     /// Ends the source and delivery. When it returns, the handler is not running, on any thread,
     /// and has been destroyed; when the handler itself calls it, that one call goes on, and the
-    /// handler is destroyed after it. To be called once, or by one thread at a time.
+    /// handler is destroyed after it. Must be called once, or by one thread at a time.
     void close();
 
 private:
@@ -65,7 +65,8 @@ private:
 
     static void deliver(State& state);
 
-    // The threads share it, since the one that closes from inside the handler outlives this object.
+    // The threads share it, since a thread that closes it from inside the handler outlives this
+    // object.
     std::shared_ptr<State> state_;
     std::vector<std::thread> threads_;
     bool closed_ = false;

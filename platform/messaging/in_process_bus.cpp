@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// A message's way: it is counted against the bound, shown to the observers, and queued at each
-// subscription of its channel. Everything that lasts is in the core, which clients, subscriptions
+// The path of a message: it is counted against the bound, shown to the observers, and queued at
+// each subscription of its channel. All lasting state is in the core, which clients, subscriptions
 // and the bus share; queues and observers guard themselves.
 #include "platform/messaging/in_process_bus.h"
 
@@ -20,7 +20,8 @@
 namespace platform::messaging {
 namespace {
 
-// What a bus has accepted and not finished. The holds that it hands out may outlive the bus.
+// The messages that a bus has accepted and not finished. The holds that it hands out may outlive
+// the bus.
 class Backlog : public std::enable_shared_from_this<Backlog> {
 public:
     using Hold = std::shared_ptr<const void>;

@@ -27,11 +27,11 @@ struct InProcessBusOptions {
     std::size_t concurrency = 0;
 };
 
-/// Is told of a message and of the client that published it; the name is valid during the call.
+/// Is called with a message and the client that published it; the name is valid during the call.
 using MessageObserver = std::function<void(std::string_view clientName, const JsonMessage&)>;
 
-/// An in-process bus. Every subscription has a queue and threads of its own, so a slow handler
-/// holds up no other subscription. Payloads are never copied; the subscribers of a channel share
+/// An in-process bus. Every subscription has a queue and threads of its own, so a slow handler does
+/// not delay other subscriptions. Payloads are never copied; the subscribers of a channel share
 /// them.
 ///
 /// The futures of its clients' operations are resolved when they are returned. A publish future

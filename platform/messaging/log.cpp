@@ -39,7 +39,7 @@ void logFailure(std::string_view callback, std::string_view channel) noexcept {
             logError(callback, channel, "an exception that is not derived from std::exception");
         }
     } catch (...) {
-        // A failure to log is no reason to end the process.
+        // A failure to log must not end the process.
     }
 }
 

@@ -9,7 +9,7 @@
 namespace platform::messaging {
 
 /// The logger "messaging": one of that name that exists already, or else one that writes to
-/// standard error. Valid for as long as the process lives.
+/// standard error. Valid for the life of the process.
 spdlog::logger& logger();
 
 /// Logs the exception that is being handled as the failure of `callback` ("handler", "observer")

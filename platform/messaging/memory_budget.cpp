@@ -16,7 +16,7 @@ struct MemoryBudget::State {
 
     bool fits(std::size_t bytes) const { return bytes <= size - reserved; }
 
-    // Allocates nothing: memory may be what has run out.
+    // Allocates nothing: memory may have run out.
     void release(std::size_t bytes) noexcept {
         {
             const std::lock_guard lock(mutex);

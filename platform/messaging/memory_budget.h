@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// A share of the process's memory that requests and messages are taken in by: what is large
+// A share of the process's memory, from which requests and messages take theirs: what is large
 // reserves its bytes before it allocates them.
 #pragma once
 
@@ -12,7 +12,7 @@
 
 namespace platform::messaging {
 
-/// A number of bytes that reservations are taken from. It allocates nothing itself.
+/// A number of bytes from which reservations are taken. It allocates nothing itself.
 ///
 /// Reserve everything that a piece of work needs at once: two that hold a part of the budget while
 /// they wait for the rest would wait for each other.
@@ -37,7 +37,7 @@ public:
             return bytes_;
         }
 
-        /// Gives back all but `bytes`; nothing when fewer are reserved.
+        /// Gives back all but `bytes`; does nothing when fewer are reserved.
         void shrink(std::size_t bytes) noexcept;
 
     private:
@@ -60,19 +60,19 @@ public:
     /// The bytes that are reserved now.
     std::size_t reserved() const;
 
-    /// Reserves `bytes` if they are free and nobody waits in `reserve` for their turn.
+    /// Reserves `bytes` if they are free and no call of `reserve` is waiting.
     std::optional<Reservation> tryReserve(std::size_t bytes);
 
     /// Reserves `bytes` as soon as they are free. Calls are served in the order in which they come,
-    /// so that a large one is not overtaken for ever by small ones. Throws std::length_error when
-    /// the budget has fewer bytes altogether.
+    /// so that small ones cannot delay a large one for ever. Throws std::length_error when the
+    /// budget has fewer bytes altogether.
     Reservation reserve(std::size_t bytes);
 
     /// Has `callback` called whenever bytes have been given back, on the thread that gives them
-    /// back: whoever was refused by `tryReserve` may try again. It must neither throw nor end the
-    /// handle, and it must not take a lock under which others give bytes back. It lasts as long as
-    /// the returned handle: when the handle's destruction returns, it is not running and will not
-    /// run again.
+    /// back: those that `tryReserve` has refused may try again. It must neither throw nor end the
+    /// handle, and it must not take a lock that is held while bytes are given back. It lasts as
+    /// long as the returned handle: when the handle's destruction returns, it is not running and
+    /// will not run again.
     [[nodiscard]] std::shared_ptr<Subscription> onRoom(std::function<void()> callback);
 
 private:

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// A callback that can be taken back while other threads call it.
+// A callback that can be revoked while other threads call it.
 #pragma once
 
 #include <algorithm>
@@ -24,7 +24,7 @@ public:
     RevocableFunction& operator=(const RevocableFunction&) = delete;
     ~RevocableFunction() = default;
 
-    /// Calls the function, unless it has been revoked, and lets its exceptions pass.
+    /// Calls the function, unless it has been revoked. Its exceptions pass through.
     void operator()(Args... args) {
         if (!enter()) {
             return;
@@ -33,9 +33,9 @@ public:
         function_(std::forward<Args>(args)...);
     }
 
-    /// Takes the function back, once. Waits for the calls on other threads; after it, the function
-    /// is not running and has been destroyed. When the function itself revokes it, the calls on
-    /// this thread go on, and the function is destroyed as the last of them ends.
+    /// Revokes the function, once. Waits for the calls on other threads; when it returns, the
+    /// function is not running and has been destroyed. When the function itself revokes it, the
+    /// calls on this thread go on, and the function is destroyed as the last of them ends.
     void revoke() {
         std::function<void(Args...)> ended;  // destroyed without the mutex
         std::unique_lock lock(mutex_);

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The choice of what carries the messages of this process.
+// Chooses what carries the messages of this process.
 #pragma once
 
 #include <functional>
@@ -15,8 +15,8 @@ namespace platform::messaging {
 using Transport = std::function<futures::Future<std::shared_ptr<MessageService>>(
     const std::string& clientName, const MessageServiceOptions& options)>;
 
-/// Sets what createMessageService calls from now on. An empty function, and the time before the
-/// first call, mean an InProcessBus with default options that the whole process shares.
+/// Sets what createMessageService calls from now on. Until the first call, and after one with an
+/// empty function, that is an InProcessBus with default options, which the whole process shares.
 /// Thread-safe.
 [[gnu::visibility("default")]] void setTransport(Transport transport);
 

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Several sources of one subscription whose messages are handled one at a time.
+// Lets several sources of one subscription take turns, so that messages are handled one at a time.
 #pragma once
 
 #include <condition_variable>
@@ -12,11 +12,11 @@
 
 namespace platform::messaging {
 
-/// Whose message is being handled. Shared by the sources.
+/// Which source's message is being handled. Shared by the sources.
 class Turns : public std::enable_shared_from_this<Turns> {
 public:
-    /// Waits until no message is being handled. What is returned ends the turn; null when there
-    /// will be no more.
+    /// Waits until no message is being handled. The result ends the turn when it is destroyed; null
+    /// when there will be no more.
     std::shared_ptr<const void> take() {
         std::unique_lock lock(mutex_);
         changed_.wait(lock, [this] { return ended_ || !taken_; });
@@ -50,7 +50,7 @@ private:
     bool ended_ = false;
 };
 
-/// A source that hands out a message when it is its turn.
+/// A source that gives out messages when it is its turn.
 class TurnTakingSource final : public MessageSource {
 public:
     TurnTakingSource(std::shared_ptr<MessageSource> source, std::shared_ptr<Turns> turns)

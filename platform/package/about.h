@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Errors that say what they are about.
+// Adds the subject to error texts.
 #pragma once
 
 #include <stdexcept>

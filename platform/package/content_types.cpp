@@ -10,6 +10,7 @@
 #include "platform/package/package_xml.h"
 #include "platform/package/part_name.h"
 #include "platform/package/relationships.h"
+#include "platform/text/case.h"
 
 namespace platform::package {
 namespace {
@@ -17,15 +18,15 @@ namespace {
 constexpr std::string_view relationshipsExtension = "rels";
 constexpr std::string_view xmlMediaType = "application/xml";
 
-// Enters a type under `key`. Saying the same twice does no harm, saying two things is refused.
-// Media types mean the same in any case.
+// Enters a type under `key`. Repeating a type is harmless, two different types are an error. Media
+// types compare without case.
 template <class Map>
 void enter(Map& types, std::string key, std::string_view mediaType) {
     if (mediaType.empty()) {
         throw std::runtime_error("has an empty content type for " + quoted(key));
     }
     const auto [place, isNew] = types.try_emplace(std::move(key), mediaType);
-    if (!isNew && toLowerAscii(place->second) != toLowerAscii(mediaType)) {
+    if (!isNew && !text::equalIgnoringCase(place->second, mediaType)) {
         throw std::runtime_error("has two content types for " + quoted(place->first));
     }
 }

@@ -15,8 +15,8 @@ namespace platform::package {
 
 class ContentTypes {
 public:
-    /// Reads [Content_Types].xml. Throws std::runtime_error saying what is wrong with it when it is
-    /// not what it should be, or gives one part or one extension two types.
+    /// Reads [Content_Types].xml. Throws std::runtime_error with the reason when it is invalid, or
+    /// gives one part or one extension two types.
     static ContentTypes parse(std::span<const std::uint8_t> xml);
 
     /// The media type of the part `name`, compared without case; null if it has none. Valid as long

@@ -16,6 +16,7 @@
 #include "platform/i18n/codecvt.h"
 #include "platform/package/about.h"
 #include "platform/package/part_name.h"
+#include "platform/text/case.h"
 
 namespace platform::package {
 namespace {
@@ -31,7 +32,7 @@ constexpr char separator = '\n';
 constexpr std::size_t maxDepth = 256;
 
 // What the parser's hash tables are salted with, so that nobody can make a document whose names
-// collide. Left to itself, the parser gets a salt in a way that ends the process if there is none.
+// collide. By itself, the parser gets a salt in a way that ends the process if there is none.
 unsigned long hashSalt() {
     static const unsigned long salt = [] {
         unsigned long number = 0;
@@ -99,7 +100,7 @@ private:
         XML_SetElementHandler(parser_.get(), onStart, onEnd);
         XML_SetXmlDeclHandler(parser_.get(), onDeclaration);
         XML_SetStartDoctypeDeclHandler(parser_.get(), onDocumentType);
-        // With a mark in front, the parser does not take zeros among the text for UTF-16.
+        // With a mark in front, the parser does not mistake zeros in the text for UTF-16.
         feed(byteOrderMark, XML_FALSE);
         utf8.remove_prefix(utf8.starts_with(byteOrderMark) ? byteOrderMark.size() : 0);
         feed(utf8, XML_TRUE);
@@ -183,7 +184,7 @@ private:
 
     // Some producers write "utf8", which is not a registered name but can mean nothing else.
     void checkEncoding(const std::string& encoding) const {
-        const std::string name = toLowerAscii(encoding);
+        const std::string name = text::toLowerAscii(encoding);
         const bool isRight = isUtf16_ ? name == "utf-16" || name == "utf-16le" || name == "utf-16be"
                                       : name == "utf-8" || name == "utf8";
         if (!isRight) {

@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 // The XML of the package itself, content types and relationships: small documents of one level,
-// whose elements are told by namespace and local name and whose attributes have no namespace.
+// whose elements are identified by namespace and local name and whose attributes have no namespace.
 //
-// It is read strictly. What one reader refuses and another one guesses the meaning of is a way to
-// hide something in a package.
+// It is read strictly. Where one reader refuses and another one guesses, something could be hidden
+// in a package.
 #pragma once
 
 #include <cstdint>
@@ -24,10 +24,10 @@ constexpr std::string_view relationshipsNamespace =
 /// as many parts as an archive may have, or the links of a worksheet full of them, are some 15 MB.
 constexpr std::uint64_t maxPackageXmlBytes = std::uint64_t{32} << 20U;
 
-/// An element while it is visited. What it returns is UTF-8 and valid for that long.
+/// An element while it is visited. Its texts are UTF-8 and valid during the visit.
 class XmlElement {
 public:
-    /// `attributes` are names and values by turns, with a null pointer behind the last.
+    /// `attributes` are names and values in turn, with a null pointer after the last.
     XmlElement(std::string_view localName, const char* const* attributes)
         : localName_(localName), attributes_(attributes) {}
 
@@ -36,7 +36,7 @@ public:
     /// The value of the attribute `name`, which has no namespace; nothing if there is none.
     std::optional<std::string_view> attribute(std::string_view name) const;
 
-    /// The same. Throws std::runtime_error naming element and attribute if there is none.
+    /// The same, but throws std::runtime_error naming element and attribute if there is none.
     std::string_view requiredAttribute(std::string_view name) const;
 
 private:

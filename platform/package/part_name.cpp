@@ -6,23 +6,21 @@
 #include <cstddef>
 #include <vector>
 
+#include "platform/text/case.h"
+#include "platform/text/quoted.h"
+
 namespace platform::package {
 namespace {
+
+using text::equalIgnoringCase;
+using text::toLowerAscii;
 
 constexpr std::string_view relationshipsFolder = "_rels";
 constexpr std::string_view relationshipsExtension = ".rels";
 
-constexpr char lowered(char c) {
-    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
-}
-
-bool equalsIgnoringCase(std::string_view a, std::string_view b) {
-    return a.size() == b.size() && toLowerAscii(a) == toLowerAscii(b);
-}
-
 bool endsWithIgnoringCase(std::string_view text, std::string_view end) {
     return text.size() >= end.size() &&
-           equalsIgnoringCase(text.substr(text.size() - end.size()), end);
+           equalIgnoringCase(text.substr(text.size() - end.size()), end);
 }
 
 // The byte for which the percent escape at `at` stands.
@@ -83,7 +81,7 @@ std::string_view lastSegment(std::string_view name) {
 
 // Whether `reference` begins with a scheme, as absolute URIs do.
 bool hasScheme(std::string_view reference) {
-    const auto isLetter = [](char c) { return lowered(c) >= 'a' && lowered(c) <= 'z'; };
+    const auto isLetter = [](char c) { return toLowerAscii(c) >= 'a' && toLowerAscii(c) <= 'z'; };
     if (reference.empty() || !isLetter(reference.front())) {
         return false;
     }
@@ -114,12 +112,6 @@ std::string withoutDotSegments(std::string_view path) {
 }
 
 }  // namespace
-
-std::string toLowerAscii(std::string_view text) {
-    std::string lower(text);
-    std::transform(lower.begin(), lower.end(), lower.begin(), lowered);
-    return lower;
-}
 
 std::string partNameKey(std::string_view name) {
     return toLowerAscii(withEscapesResolved(name));
@@ -185,7 +177,7 @@ std::optional<Piece> pieceNamed(std::string_view name) {
 
 bool isTrash(std::string_view name) {
     constexpr std::string_view folder = "/[trash]/";
-    return equalsIgnoringCase(name.substr(0, folder.size()), folder);
+    return equalIgnoringCase(name.substr(0, folder.size()), folder);
 }
 
 std::optional<std::string> targetPartKey(std::string_view source, std::string_view target) {

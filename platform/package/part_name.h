@@ -16,16 +16,13 @@ constexpr std::string_view contentTypesName = "/[Content_Types].xml";
 /// The source of package-level relationships, which is the package and not a part.
 constexpr std::string_view packageRoot = "/";
 
-/// `text` with its ASCII letters in lower case.
-std::string toLowerAscii(std::string_view text);
-
-/// What two names that mean the same part have in common: percent escapes resolved and ASCII
+/// The key under which two names of the same part are equal: percent escapes resolved, ASCII
 /// letters in lower case.
 std::string partNameKey(std::string_view name);
 
-/// What keeps `name` from being a part name, as the end of a sentence ("it has an empty segment");
-/// empty for a valid name. Beside what the format allows, white space, brackets and the like and
-/// characters outside ASCII are accepted, which producers write and which mean one thing only.
+/// Why `name` cannot be a part name, as the end of a sentence ("it has an empty segment"); empty
+/// for a valid name. Besides what the format allows, white space, brackets and similar characters
+/// and those outside ASCII are accepted: producers write them, and they are unambiguous.
 std::string_view partNameProblem(std::string_view name);
 
 /// The extension in ASCII lower case: what follows the last "." of the last segment. Empty if none.
@@ -53,7 +50,7 @@ std::optional<Piece> pieceNamed(std::string_view name);
 bool isTrash(std::string_view name);
 
 /// The key (partNameKey) of the part to which `target` leads from `source`, whether it exists or
-/// not; nothing if it can lead to no part: an absolute URI, another host, or the package itself.
+/// not; nothing if it cannot lead to a part: an absolute URI, another host, or the package itself.
 std::optional<std::string> targetPartKey(std::string_view source, std::string_view target);
 
 }  // namespace platform::package

@@ -29,20 +29,20 @@ public:
     /// An empty package.
     QuilletFilePackage() = default;
 
-    /// Takes the contents of both vectors over; they are left empty.
+    /// Moves the contents out of both vectors, which are left empty.
     QuilletFilePackage(std::vector<Part>& parts, std::vector<Relationship>& relationships)
         : parts_(std::exchange(parts, {})), relationships_(std::exchange(relationships, {})) {}
 
-    /// The parts in the order of the file: a copy, or, of a package that is given up
-    /// (`std::move(package).getParts()`), the parts themselves without one.
+    /// The parts in the order of the file: a copy, or the parts themselves if the package is given
+    /// up (`std::move(package).getParts()`).
     std::vector<Part> getParts() const& { return parts_; }
     std::vector<Part> getParts() && { return std::exchange(parts_, {}); }
 
-    /// The package-level relationships, copied or given up as the parts are.
+    /// The package-level relationships, copied or moved like the parts.
     std::vector<Relationship> getRelationships() const& { return relationships_; }
     std::vector<Relationship> getRelationships() && { return std::exchange(relationships_, {}); }
 
-    /// The same for looking at, valid until the package is changed or destroyed.
+    /// The same without a copy, valid until the package is changed or destroyed.
     const std::vector<Part>& parts() const noexcept { return parts_; }
     const std::vector<Relationship>& relationships() const noexcept { return relationships_; }
 

@@ -30,7 +30,7 @@ namespace {
 using Part = QuilletFilePackage::Part;
 using Relationship = QuilletFilePackage::Relationship;
 
-// An entry that is all of a part, or one piece of it.
+// An entry that is a whole part, or one piece of it.
 struct Fragment {
     std::uint64_t number;
     bool isLast;
@@ -71,7 +71,7 @@ std::vector<Fragment> orderedFragments(const Item& item) {
 
 }  // namespace
 
-// The archive as the Open Packaging Conventions see it.
+// The archive seen as a package.
 class QuilletFileReader::PackageFile {
 public:
     explicit PackageFile(const std::string& path) : archive_(path) {

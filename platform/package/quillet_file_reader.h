@@ -33,12 +33,12 @@ public:
 
     /// Reads the package whole. Its parts are the entries of the archive that have a content type,
     /// in the archive's order, less the relationships parts, which become the relationships of the
-    /// parts they belong to. What is no regular file is refused, and not waited for.
+    /// parts they belong to. What is not a regular file is refused, and not waited for.
     ///
     /// Throws std::runtime_error beginning with the path and saying what is wrong with which part
-    /// when the file cannot be read, is no package, is damaged, or goes beyond zip/limits.h, and
+    /// when the file cannot be read, is not a package, is damaged, or goes beyond zip/limits.h, and
     /// when the path is not valid UTF-16. Takes time and memory in proportion to the expanded
-    /// content, each part of which is expanded once, to where it stays.
+    /// content, each part of which is expanded once, directly into its place.
     QuilletFilePackage read();
 
 private:

@@ -23,6 +23,7 @@
 #include "platform/package/zip/reusable_entries.h"
 #include "platform/package/zip/writer.h"
 #include "platform/posix/atomic_file.h"
+#include "platform/text/case.h"
 
 namespace platform::package {
 namespace {
@@ -43,17 +44,18 @@ constexpr std::array<std::string_view, 13> compressedTypes = {
     "video/mp4",  "application/zip", "application/gzip"};
 
 bool isCompressed(std::string_view mediaType) {
-    const std::string withoutParameters = toLowerAscii(mediaType.substr(0, mediaType.find(';')));
+    const std::string withoutParameters =
+        text::toLowerAscii(mediaType.substr(0, mediaType.find(';')));
     return std::find(compressedTypes.begin(), compressedTypes.end(), withoutParameters) !=
            compressedTypes.end();
 }
 
 std::string withLowerCaseTopLevel(const std::string& mediaType) {
     const std::size_t slash = std::min(mediaType.find('/'), mediaType.size());
-    return toLowerAscii(mediaType.substr(0, slash)).append(mediaType, slash);
+    return text::toLowerAscii(mediaType.substr(0, slash)).append(mediaType, slash);
 }
 
-// What keeps a part of this name from being read back; empty if nothing does.
+// Why a part of this name could not be read back; empty if it could.
 std::string_view nameProblem(std::string_view name) {
     if (const std::string_view problem = partNameProblem(name); !problem.empty()) {
         return problem;
@@ -117,7 +119,7 @@ public:
                                   std::u16string(corePropertiesName), id, 1});
     }
 
-    // Takes over what it can of `previous`.
+    // Reuses what it can of `previous`.
     void write(AtomicFile& file, zip::ReusableEntries& previous) {
         zip::Writer archive(file, previous);
         addXml(archive, contentTypesName, contentTypes());
@@ -195,7 +197,7 @@ private:
         archive.add(name.substr(1), content, mayDeflate);
     }
 
-    // For names that are no valid text, which an error has to show all the same.
+    // For names that are not valid text, which an error has to show anyway.
     i18n::codecvt_ustring_to_string toPrintable_{"UTF-8", false};
     std::vector<Item> items_;
     std::unordered_set<std::string> keys_;  // of all items

@@ -15,7 +15,7 @@ class AtomicFile;
 namespace platform::package {
 
 /// Writes a package to a file in two steps: `write` prepares the new file beside the target,
-/// `close` puts it in the target's place or drops it. Whoever reads the target finds the old
+/// `close` puts it in the target's place or discards it. Readers of the target find the old
 /// document or the new one, whatever fails in between (see AtomicFile).
 class QuilletFileWriter {
 public:
@@ -33,7 +33,7 @@ public:
     /// types, the package's relationships, then the parts in their order, each followed by its
     /// relationships. Equal packages give equal bytes if both are written to new files or over
     /// equal ones: where the target has an entry of the same name and content, the deflated bytes
-    /// of that are taken over, whoever wrote them.
+    /// of that are reused, whichever program wrote them.
     ///
     /// A relationship becomes external if its flag is 0 and also if its target can be no part of
     /// the package: an absolute URI, or a reference that leads to none of its parts. The top-level
@@ -47,10 +47,9 @@ public:
     /// Time in proportion to the content; memory for the largest part once or twice more.
     void write(const QuilletFilePackage& package);
 
-    /// Ends the writing: puts what was written in the place of the target, safe on disk when it
-    /// returns, or, if `discard`, drops it. Does nothing when nothing was written since the last
-    /// call. Throws std::runtime_error beginning with the path when that fails; what was written is
-    /// dropped.
+    /// Ends the writing: replaces the target by what was written, safe on disk when it returns, or
+    /// discards it if `discard`. Does nothing when nothing was written since the last call. Throws
+    /// std::runtime_error beginning with the path when that fails; what was written is dropped.
     void close(bool discard);
 
 private:

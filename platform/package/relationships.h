@@ -16,8 +16,8 @@ namespace platform::package {
 constexpr std::string_view relationshipsMediaType =
     "application/vnd.openxmlformats-package.relationships+xml";
 
-/// Reads a relationships part. Targets are kept as they stand. Throws std::runtime_error saying
-/// what is wrong with it when it is not what it should be, or has two relationships of one id.
+/// Reads a relationships part. Targets are kept as they stand. Throws std::runtime_error with the
+/// reason when it is invalid, or has two relationships with one id.
 std::vector<QuilletFilePackage::Relationship> parseRelationships(std::span<const std::uint8_t> xml);
 
 /// The relationships part for `relationships`. Those of which `isExternal` is true are written as

@@ -15,22 +15,18 @@
 #include <cstdio>
 #include <optional>
 #include <stdexcept>
-#include <system_error>
 #include <utility>
 #include <vector>
 
 #include "platform/posix/open_regular_file.h"
+#include "platform/posix/system_error.h"
 
 namespace platform {
 namespace {
 
-constexpr std::size_t kBufferSize = 65'536;
-constexpr std::size_t kMaxAttributeSize = 65'536;  // of a value, and of the list of all names
-constexpr const char* kAccessControlList = "system.posix_acl_access";
-
-[[noreturn]] void failForSystem(const char* what) {
-    throw std::system_error(errno, std::generic_category(), what);
-}
+constexpr std::size_t bufferSize = 65'536;
+constexpr std::size_t maxAttributeSize = 65'536;  // of a value, and of the list of all names
+constexpr const char* accessControlList = "system.posix_acl_access";
 
 // Repeats `call` as long as a signal interrupts it.
 template <class Call>
@@ -47,8 +43,8 @@ std::string folderOf(const std::string& path) {
     return path.substr(0, path.rfind('/') + 1);
 }
 
-// The path at the end of the symbolic links that begin at `path`, where there may be nothing. Links
-// in the folders on the way there are the system's business.
+// The path at the end of the symbolic links that begin at `path`, where there may be nothing. The
+// system follows the links in the folders on the way.
 std::string followLinks(std::string path) {
     constexpr int maxLinks = 40;  // as the system itself
     for (int i = 0; i < maxLinks; ++i) {
@@ -58,40 +54,40 @@ std::string followLinks(std::string path) {
             return path;
         }
         if (length < 0) {
-            failForSystem("cannot be found");
+            throwSystemError("cannot be found");
         }
         const std::string link(buffer.data(), static_cast<std::size_t>(length));
         path = link.starts_with('/') ? link : folderOf(path).append(link);
     }
     errno = ELOOP;
-    failForSystem("cannot be found");
+    throwSystemError("cannot be found");
 }
 
-constexpr std::string_view kNameBegin = ".~saving-";
-constexpr std::string_view kNameEnd = ".tmp";
-constexpr std::size_t kNameDigits = 16;
+constexpr std::string_view nameBegin = ".~saving-";
+constexpr std::string_view nameEnd = ".tmp";
+constexpr std::size_t nameDigits = 16;
 
 // A name that no other save uses, short enough for every file system.
 std::string randomName() {
     std::uint64_t number = 0;
     if (uninterrupted([&] { return ::getrandom(&number, sizeof number, 0); }) != sizeof number) {
-        failForSystem("cannot be saved: no random name for a temporary file");
+        throwSystemError("cannot be saved: no random name for a temporary file");
     }
-    std::array<char, kNameDigits + 1> digits{};
+    std::array<char, nameDigits + 1> digits{};
     std::snprintf(digits.data(), digits.size(), "%016llx", static_cast<unsigned long long>(number));
-    return std::string(kNameBegin).append(digits.data()).append(kNameEnd);
+    return std::string(nameBegin).append(digits.data()).append(nameEnd);
 }
 
-// A path that leads to the file of `descriptor`, wherever that file is by now. Unlike the
-// descriptor of a file that was opened without reading it, it can be asked for extended attributes.
+// A path that leads to the file of `descriptor`, wherever that file is now. Unlike the descriptor
+// of a file that was opened without reading it, it can be asked for extended attributes.
 std::string pathTo(const FileDescriptor& descriptor) {
     return "/proc/self/fd/" + std::to_string(descriptor.get());
 }
 
 // The value of the extended attribute `name` of the file at `path`, or nothing, with the reason in
-// errno, if it cannot be had.
+// errno, if it cannot be read.
 std::optional<std::string> attributeOf(const std::string& path, const char* name) {
-    std::string value(kMaxAttributeSize, '\0');
+    std::string value(maxAttributeSize, '\0');
     const ssize_t size = ::getxattr(path.c_str(), name, value.data(), value.size());
     if (size < 0) {
         return std::nullopt;
@@ -100,9 +96,9 @@ std::optional<std::string> attributeOf(const std::string& path, const char* name
     return value;
 }
 
-// The names of the extended attributes of the file at `path`; none where there is no such thing.
+// The names of the extended attributes of the file at `path`; none where there is no such file.
 std::vector<std::string> attributeNamesOf(const std::string& path) {
-    std::string list(kMaxAttributeSize, '\0');
+    std::string list(maxAttributeSize, '\0');
     const ssize_t size = ::listxattr(path.c_str(), list.data(), list.size());
     list.resize(static_cast<std::size_t>(std::max<ssize_t>(size, 0)));
     std::vector<std::string> names;
@@ -112,8 +108,8 @@ std::vector<std::string> attributeNamesOf(const std::string& path) {
     return names;
 }
 
-// Whether an attribute is worth taking over: what users noted, and the label that access depends
-// on. Others say things about the old content, such as its signature.
+// Whether an attribute is copied: the users' own, and the label that access depends on. Others
+// describe the old content, such as its signature.
 bool isLasting(const std::string& attributeName) {
     return attributeName.starts_with("user.") || attributeName == "security.selinux";
 }
@@ -127,7 +123,7 @@ AtomicFile::AtomicFile(const std::string& path) {
     if (targetName_.empty() || targetName_ == "." || targetName_ == "..") {
         throw std::runtime_error(path.empty() ? "has no name" : "is a folder");
     }
-    buffer_.reserve(kBufferSize);
+    buffer_.reserve(bufferSize);
     openFolder(folder.empty() ? "." : folder);
     examineTarget();
     createTemporary();
@@ -140,7 +136,7 @@ AtomicFile::~AtomicFile() {
 }
 
 // The folder is held open so that everything happens in it even if it is renamed meanwhile. A
-// folder that may be written but not listed cannot be opened in the way that syncing it needs.
+// folder that may be written but not listed cannot be opened for syncing.
 void AtomicFile::openFolder(const std::string& folder) {
     folder_ = FileDescriptor(
         uninterrupted([&] { return ::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); }));
@@ -150,14 +146,14 @@ void AtomicFile::openFolder(const std::string& folder) {
             [&] { return ::open(folder.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC); }));
     }
     if (!folder_) {
-        failForSystem("cannot be saved: its folder cannot be opened");
+        throwSystemError("cannot be saved: its folder cannot be opened");
     }
 }
 
-// The target is held, so that all that the new file takes over is that of one file, even if another
-// folder or file is put at its path meanwhile. Holding it opens it neither for reading, which may
-// not be allowed, nor for writing. Replacing a file needs no permission to write it, so that is
-// asked for.
+// The target is held by a descriptor, so that everything that the new file takes over comes from
+// one file, even if another one takes its path meanwhile. The descriptor opens it neither for
+// reading, which may not be allowed, nor for writing. Replacing a file needs no permission to write
+// it, so that permission is checked.
 void AtomicFile::examineTarget() {
     FileDescriptor target(uninterrupted([&] {
         return ::openat(folder_.get(), targetName_.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC);
@@ -167,20 +163,20 @@ void AtomicFile::examineTarget() {
     }
     struct stat status {};
     if (!target || ::fstat(target.get(), &status) != 0) {
-        failForSystem("cannot be examined");
+        throwSystemError("cannot be examined");
     }
     if (!S_ISREG(status.st_mode)) {
         throw std::runtime_error(S_ISDIR(status.st_mode) ? "is a folder" : "is not a regular file");
     }
     if (::faccessat(AT_FDCWD, pathTo(target).c_str(), W_OK, AT_EACCESS) != 0) {
-        failForSystem("may not be written");
+        throwSystemError("may not be written");
     }
     target_ = std::move(target);
     targetStatus_ = status;
 }
 
-// The content of an existing document stays private until its permissions are known to be right; a
-// new one gets what the process gives to new files.
+// The new content of an existing document stays private until its permissions have been set; a new
+// document gets the process's usual permissions.
 void AtomicFile::createTemporary() {
     constexpr int attempts = 100;
     const mode_t mode = target_ ? 0600 : 0666;
@@ -197,16 +193,16 @@ void AtomicFile::createTemporary() {
         }
     }
     if (!temporary_) {
-        failForSystem("cannot be saved: no file can be created in its folder");
+        throwSystemError("cannot be saved: no file can be created in its folder");
     }
 }
 
 bool AtomicFile::isTemporaryName(std::string_view name) {
-    if (name.size() != kNameBegin.size() + kNameDigits + kNameEnd.size() ||
-        !name.starts_with(kNameBegin) || !name.ends_with(kNameEnd)) {
+    if (name.size() != nameBegin.size() + nameDigits + nameEnd.size() ||
+        !name.starts_with(nameBegin) || !name.ends_with(nameEnd)) {
         return false;
     }
-    return name.substr(kNameBegin.size(), kNameDigits).find_first_not_of("0123456789abcdef") ==
+    return name.substr(nameBegin.size(), nameDigits).find_first_not_of("0123456789abcdef") ==
            std::string_view::npos;
 }
 
@@ -245,10 +241,10 @@ void AtomicFile::startSync() const noexcept {
 }
 
 void AtomicFile::write(std::string_view bytes) {
-    if (buffer_.size() + bytes.size() > kBufferSize) {
+    if (buffer_.size() + bytes.size() > bufferSize) {
         flush();
     }
-    if (bytes.size() >= kBufferSize) {
+    if (bytes.size() >= bufferSize) {
         writeAll(bytes);
     } else {
         buffer_.append(bytes);
@@ -265,7 +261,7 @@ void AtomicFile::writeAll(std::string_view bytes) {
         const ssize_t count =
             uninterrupted([&] { return ::write(temporary_.get(), bytes.data(), bytes.size()); });
         if (count < 0) {
-            failForSystem("cannot be saved");
+            throwSystemError("cannot be saved");
         }
         bytes.remove_prefix(static_cast<std::size_t>(count));
     }
@@ -277,14 +273,14 @@ void AtomicFile::commit() {
         takeOverAccess();
     }
     if (uninterrupted([&] { return ::fsync(temporary_.get()); }) != 0) {
-        failForSystem("cannot be saved");
+        throwSystemError("cannot be saved");
     }
     if (::close(temporary_.release()) != 0) {
-        failForSystem("cannot be saved");
+        throwSystemError("cannot be saved");
     }
     if (::renameat(folder_.get(), temporaryName_.c_str(), folder_.get(), targetName_.c_str()) !=
         0) {
-        failForSystem("cannot be replaced");
+        throwSystemError("cannot be replaced");
     }
     temporaryName_.clear();
     syncFolder();
@@ -297,19 +293,20 @@ void AtomicFile::takeOverAccess() {
     takeOverAttributes();
     takeOverAccessControlList();
     if (::fchmod(temporary_.get(), mode) != 0) {
-        failForSystem("cannot be saved with its permissions");
+        throwSystemError("cannot be saved with its permissions");
     }
 }
 
-// Returns the permissions that the file may have with the owner and the group that it got.
+// Returns the permissions that are safe with the owner and the group that the file got.
 mode_t AtomicFile::takeOverOwner() {
     const auto change = [this](uid_t owner, gid_t group) {
         if (::fchown(temporary_.get(), owner, group) == 0) {
             return true;
         }
-        const bool isUnknownHere = errno == EINVAL;  // as owners from outside a container are
+        const bool isUnknownHere =
+            errno == EINVAL;  // for example an owner from outside a container
         if (errno != EPERM && !isUnknownHere) {
-            failForSystem("cannot be saved with its owner");
+            throwSystemError("cannot be saved with its owner");
         }
         return false;
     };
@@ -324,7 +321,7 @@ mode_t AtomicFile::takeOverOwner() {
     return (mode & 01707U) | forAll << 3U;
 }
 
-// Attributes are copied as far as the system lets them be.
+// Attributes are copied as far as the system permits.
 void AtomicFile::takeOverAttributes() {
     for (const std::string& name : attributeNamesOf(pathTo(target_))) {
         const auto value =
@@ -335,19 +332,18 @@ void AtomicFile::takeOverAttributes() {
     }
 }
 
-// Without its list, or with one that the folder gave to the new file, others could read the
-// document who should not.
+// Without its list, or with one inherited from the folder, people could read the document who
+// should not.
 void AtomicFile::takeOverAccessControlList() {
     const auto hasNone = [] { return errno == ENODATA || errno == ENOTSUP; };
     bool done = false;
-    if (const auto list = attributeOf(pathTo(target_), kAccessControlList)) {
-        done =
-            ::fsetxattr(temporary_.get(), kAccessControlList, list->data(), list->size(), 0) == 0;
+    if (const auto list = attributeOf(pathTo(target_), accessControlList)) {
+        done = ::fsetxattr(temporary_.get(), accessControlList, list->data(), list->size(), 0) == 0;
     } else if (hasNone()) {
-        done = ::fremovexattr(temporary_.get(), kAccessControlList) == 0 || hasNone();
+        done = ::fremovexattr(temporary_.get(), accessControlList) == 0 || hasNone();
     }
     if (!done) {
-        failForSystem("cannot be saved with its access control list");
+        throwSystemError("cannot be saved with its access control list");
     }
 }
 
@@ -357,7 +353,7 @@ void AtomicFile::syncFolder() {
     }
     // Some file systems cannot sync folders, and say so.
     if (uninterrupted([&] { return ::fsync(folder_.get()); }) != 0 && errno != EINVAL) {
-        failForSystem("has been replaced, but that may not be safe on disk");
+        throwSystemError("has been replaced, but that may not be safe on disk");
     }
 }
 

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Replaces files so that whoever looks sees the old content or the new one, whatever fails in
-// between. All system calls of a save are made here.
+// Replaces files so that a reader sees the old content or the new one, whatever fails in between.
+// All system calls of a save are made here.
 #pragma once
 
 #include <sys/stat.h>
@@ -12,18 +12,17 @@
 
 namespace platform {
 
-/// New content for one file. It is collected in a temporary file in the same folder, which takes
-/// the place of the target when it is committed and is removed when it is not.
+/// The new content of one file. It is collected in a temporary file in the same folder, which
+/// replaces the target when it is committed and is removed otherwise.
 ///
 /// A symbolic link is followed: the file at its end is replaced, or created if there is none. The
 /// new file has the permissions, the owner and group, the access control list and the user's
-/// extended attributes of the old one. Where the process may not give a file away, the owner
-/// becomes its own, and nobody gets permissions who did not have them. Other hard links keep the
-/// old content.
+/// extended attributes of the old one. Where the process may not give files away, its own user
+/// becomes the owner, and nobody gains permissions. Other hard links keep the old content.
 class AtomicFile {
 public:
     /// Creates the temporary file for `path` (UTF-8). Throws std::runtime_error when the target is
-    /// no regular file or may not be written, even if it could be replaced, and when its folder
+    /// not a regular file or may not be written, even if it could be replaced, and when its folder
     /// takes no new file.
     explicit AtomicFile(const std::string& path);
 
@@ -39,9 +38,8 @@ public:
     /// Whether there is a file to be replaced.
     bool hasTarget() const noexcept { return static_cast<bool>(target_); }
 
-    /// Whether a new file can stand for the target in all: that has no other hard links, is no
-    /// mount point, and belongs to somebody whom the process may give files to. True without a
-    /// target.
+    /// Whether a new file can fully replace the target: it has no other hard links, is not a mount
+    /// point, and the process may give files to its owner. True without a target.
     bool canStandForTarget() const;
 
     /// What is at the target's name now, opened to be read; none where there is no regular file, or
@@ -55,10 +53,10 @@ public:
     /// then. Opening it gives the temporary file.
     std::string contentPath() const;
 
-    /// The same for who replaces the temporary file by renaming another.
+    /// The same for programs that replace the temporary file by renaming another.
     std::string temporaryPath() const;
 
-    /// Whether the new content is in the place of the old.
+    /// Whether the new content has replaced the old.
     bool isCommitted() const noexcept { return temporaryName_.empty(); }
 
     /// Has the system begin to write to the disk what is in the temporary file, so that commit()
@@ -69,9 +67,9 @@ public:
     /// must not be called.
     void write(std::string_view bytes);
 
-    /// Puts the new content in the place of the old, safe on disk when it returns. Throws
-    /// std::system_error when something fails; the old content then still stands, except when only
-    /// the last step failed, which is to make the replacement itself safe. To be called once.
+    /// Replaces the old content by the new, safe on disk when it returns. Throws std::system_error
+    /// when something fails; the old content is then still there, unless only the last step failed,
+    /// which makes the replacement itself safe. Must be called once.
     void commit();
 
 private:

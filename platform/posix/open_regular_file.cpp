@@ -14,11 +14,10 @@ namespace {
 constexpr std::chrono::milliseconds shortestWait(1);
 constexpr std::chrono::milliseconds longestWait(50);
 
-// Opens the file at `path`, of which there is a lease, when that is gone. The file is held by a
-// descriptor that opens nothing while that is waited for, and then opened by it: so what is opened
-// is the regular file that was looked at, whatever has been put in its place. Asking again and
-// again sees a lease that is given up as soon as a blocking open would, but for a few milliseconds,
-// and ends on systems where the kernel never takes a lease away.
+// Opens the file at `path` once the lease of it is gone. Meanwhile a descriptor that opens nothing
+// refers to the file, which is then opened through it: so it is the same regular file that was
+// examined, whatever has taken its path. Trying again and again is only milliseconds slower than a
+// blocking open, and it ends on systems where the kernel never takes a lease away.
 FileDescriptor openWhenLeaseIsGone(const std::string& path, int flags,
                                    std::chrono::milliseconds patience) {
     const auto end = std::chrono::steady_clock::now() + patience;
@@ -48,7 +47,7 @@ FileDescriptor openWithoutHanging(const std::string& path, int flags, mode_t mod
     flags |= O_CLOEXEC | O_NONBLOCK | O_NOCTTY;
     FileDescriptor file(::open(path.c_str(), flags, mode));
     if (!file && errno == EWOULDBLOCK) {
-        // The file is there, and may be gone when it is opened.
+        // The file exists now, and may be gone when it is opened.
         return openWhenLeaseIsGone(path, flags & ~(O_CREAT | O_EXCL), patience);
     }
     return file;

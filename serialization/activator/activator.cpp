@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The activator, and the functions by which the host's framework reaches it. They are all that the
-// bundle exports; the suffix of their names is the bundle's symbolic name.
+// The activator, and the functions through which the host's framework reaches it. The bundle
+// exports nothing else; the suffix of their names is the bundle's symbolic name.
 
 #include <atomic>
 #include <memory>
@@ -17,13 +17,13 @@ using cppmicroservices::BundleContextPrivate;
 class Activator final : public BundleActivator {
 public:
     /// Makes the service object, which connects itself to the message service. A service object of
-    /// an earlier start goes away when the new one is in its place, and stays when making that one
+    /// an earlier start is destroyed when the new one exists, and stays when making the new one
     /// fails.
     void Start(BundleContext) override {
         service_ = std::make_unique<EditorServices::Serialization>();
     }
 
-    /// The service object works on until the activator is destroyed.
+    /// The service object keeps working until the activator is destroyed.
     void Stop(BundleContext) override {
         if (service_) {
             service_->stop();

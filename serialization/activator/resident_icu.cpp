@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // Keeps ICU in the process when the bundle is unloaded. ICU's caches last as long as the process,
 // and only the program as a whole may free them (u_cleanup). Were ICU unloaded along with the
-// bundle, they would be lost, and made anew with the next loading.
+// bundle, they would be lost, and made anew when it is loaded again.
 
 #include <dlfcn.h>
 #include <unicode/ucnv.h>

@@ -43,18 +43,19 @@ json::Object Serialization::readPackageDocument(std::u16string path,
     json::Object result;
     try {
         if (!exists(path)) {
-            // No "exception" here, unlike for a text file: clients tell the two cases apart by it.
-            result[kStatusKey] = false;
+            // No "exception" here, unlike for a text file: which is how clients tell the two cases
+            // apart.
+            result[statusKey] = false;
             return result;
         }
         QuilletFileReader reader(std::move(path));
         const PackageSize size = reader.size();
         awaitMemory(size.content, memoryBesideContent(size), longestAnswer);
         result = packageToJson(reader.read());
-        result[kStatusKey] = true;
+        result[statusKey] = true;
     } catch (const std::exception& error) {
-        result[kExceptionKey] = error.what();
-        result[kStatusKey] = false;
+        result[exceptionKey] = error.what();
+        result[statusKey] = false;
     }
     return result;
 }
@@ -71,7 +72,7 @@ json::Array Serialization::partsToJson(std::vector<QuilletFilePackage::Part> par
     json::Array array;
     array.reserve(parts.size());
     for (QuilletFilePackage::Part& part : parts) {
-        // Each part is given away as it is converted, so that a large package is not held twice.
+        // Each part is moved out as it is converted, so that a large package is not held twice.
         array.push_back(partToJson(std::move(part)));
     }
     return array;
@@ -106,7 +107,7 @@ json::Object Serialization::relationshipToJson(
     object[relationshipIdKey] = to_string(relationship.relationshipId, converter);
     object[relationshipTypeKey] = to_string(relationship.relationshipType, converter);
     object[targetKey] = to_string(relationship.target, converter);
-    // Empty whatever the record says: clients decide by the target.
+    // Always empty: clients decide by the target.
     object[targetModeKey] = "";
     return object;
 }
@@ -119,7 +120,7 @@ std::string Serialization::encodePartContent(std::vector<std::uint8_t> bytes,
     }
     std::string dataUri = dataUriPrefix + contentType + ";base64,";
     if (text.starts_with(dataUri)) {
-        // Stored as a data URI by someone; encoding it once more would hide the image.
+        // The part holds a data URI already; encoding it once more would hide the image.
         return std::string(text);
     }
     DataBuffer image = DataBuffer::copyOf(text);

@@ -1,11 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
-// The keys of a read request's result object, whichever reader makes it.
+// The keys of a read request's result object, for both readers.
 #pragma once
 
 namespace EditorServices {
 
-inline constexpr const char* kStatusKey = "status";
-inline constexpr const char* kDataKey = "data";
-inline constexpr const char* kExceptionKey = "exception";
+inline constexpr const char* statusKey = "status";
+inline constexpr const char* dataKey = "data";
+inline constexpr const char* exceptionKey = "exception";
 
 }  // namespace EditorServices

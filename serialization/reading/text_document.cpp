@@ -21,6 +21,7 @@
 #include "platform/i18n/detect_charset.h"
 #include "platform/posix/file_descriptor.h"
 #include "platform/posix/open_regular_file.h"
+#include "platform/posix/system_error.h"
 #include "serialization/reading/result_keys.h"
 #include "serialization/serialization.h"
 
@@ -41,13 +42,13 @@ using platform::i18n::to_ustring;
 
 namespace {
 
-constexpr char16_t kByteOrderMark = u'\uFEFF';
+constexpr char16_t byteOrderMark = u'\uFEFF';
 
 /// The byte-order mark in `charset`; empty where there is none.
 std::string markIn(const std::string& charset) {
     try {
         codecvt_ustring_to_string converter(charset, true);
-        return converter.do_convert(&kByteOrderMark, 1);
+        return converter.do_convert(&byteOrderMark, 1);
     } catch (const std::runtime_error&) {
         return {};
     }
@@ -60,7 +61,7 @@ std::string detectedCharset(const std::string& bytes) {
 std::u16string decode(const std::string& bytes, const std::string& charset) {
     codecvt_string_to_ustring converter(charset, true);
     std::u16string text = to_ustring(bytes, converter);
-    if (!text.empty() && text.front() == kByteOrderMark) {
+    if (!text.empty() && text.front() == byteOrderMark) {
         text.erase(0, 1);
     }
     restoreEndOfFileMarks(text, charset);
@@ -85,10 +86,10 @@ std::uintmax_t sizeOf(const std::u16string& path) {
     return error ? 0 : size;
 }
 
-/// Opens `path` if there is a regular file; what cannot be opened as such reads as empty, so it
-/// returns nothing then. But some errors say nothing of the file: there was no memory, or another
-/// program did not give up its lease of the file. It may hold a text, which must not pass for
-/// empty: throws std::system_error then.
+/// Opens `path` if there is a regular file; returns nothing when there is none or it cannot be
+/// opened, which reads as empty. But some errors say nothing about the file: there was no memory,
+/// or another program did not give up its lease. The file may then hold a text and must not read as
+/// empty: throws std::system_error.
 OpenedFile openText(const std::string& path) {
     OpenedFile opened = platform::openRegularFile(path);
     if (opened.error == ENOMEM || opened.error == EWOULDBLOCK) {
@@ -100,11 +101,11 @@ OpenedFile openText(const std::string& path) {
 /// Everything that `file` still holds, which is probably `expectedSize` bytes.
 /// Throws std::system_error on an input error, and as soon as it is more than a text may have.
 std::string readToEnd(const FileDescriptor& file, std::size_t expectedSize) {
-    constexpr std::size_t kSmallestPiece = 4096;
+    constexpr std::size_t smallestPiece = 4096;
     std::string bytes;
     std::size_t length = 0;
     // One byte more than expected, so that the end is seen without growing.
-    const std::size_t room = std::max(expectedSize + 1, kSmallestPiece);
+    const std::size_t room = std::max(expectedSize + 1, smallestPiece);
     bytes.resize(room);
     for (;;) {
         const ssize_t count = ::read(file.get(), bytes.data() + length, bytes.size() - length);
@@ -112,7 +113,7 @@ std::string readToEnd(const FileDescriptor& file, std::size_t expectedSize) {
             continue;
         }
         if (count < 0) {
-            throw std::system_error(errno, std::generic_category(), "The file cannot be read");
+            platform::throwSystemError("The file cannot be read");
         }
         if (count == 0) {
             bytes.resize(length);
@@ -132,20 +133,20 @@ json::Object Serialization::readTextDocument(std::u16string path, std::size_t lo
     json::Object result;
     try {
         if (exists(path)) {
-            result[kStatusKey] = true;
+            result[statusKey] = true;
             // What stays of a text is hardly shorter than its file: a byte-order mark goes, and
             // escape sequences that a charset can do without.
             const std::uintmax_t size = sizeOf(path);
             requireTextLength(size);
             awaitMemory(size, 0, longestAnswer);
-            result[kDataKey] = readTextFileContent(std::move(path));
+            result[dataKey] = readTextFileContent(std::move(path));
         } else {
-            result[kStatusKey] = false;
-            result[kExceptionKey] = "File does not exist";
+            result[statusKey] = false;
+            result[exceptionKey] = "File does not exist";
         }
     } catch (const std::exception& error) {
-        result[kStatusKey] = false;
-        result[kExceptionKey] = error.what();
+        result[statusKey] = false;
+        result[exceptionKey] = error.what();
     }
     return result;
 }
@@ -154,7 +155,7 @@ std::string Serialization::readTextFileContent(std::u16string path) const {
     std::string bytes = readFileBytes(std::move(path));
     const std::string charset = detectedCharset(bytes);
     if (comesBackUnchanged(bytes, charset)) {
-        // As good as every file, so that a large one is not held in UTF-16 too.
+        // Nearly every file takes this path, so a large one is not held in UTF-16 too.
         return cleaned(std::move(bytes), charset);
     }
     const std::u16string text = decode(bytes, charset);
@@ -174,7 +175,7 @@ std::string Serialization::readFileBytes(std::u16string path) const {
     if (!opened.descriptor) {
         return {};
     }
-    // Before memory is taken for a file that no text is made of.
+    // Checked before memory is taken for a file that is too large.
     const auto size = static_cast<std::size_t>(opened.status.st_size);
     requireTextLength(size);
     return readToEnd(opened.descriptor, size);

@@ -11,15 +11,16 @@
 #include <string>
 #include <vector>
 
+#include "json/parser.h"
 #include "tests/support/running_bundle.h"
 #include "tests/support/source_root.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
 
-using test::kWriteRequests;
 using test::Message;
 using test::RunningBundle;
+using test::writeRequestChannel;
 using testing::SizeIs;
 
 /// The examples with one of `extensions`, by name.
@@ -40,7 +41,7 @@ std::vector<std::filesystem::path> packages() {
     return examples({".docx", ".xlsx", ".pptx"});
 }
 
-/// The charset that a text's name tells: "name.charset.txt", with "-with-mark" where it has one.
+/// The charset in a text's name: "name.charset.txt", with "-with-mark" where it has one.
 std::string charsetOf(const std::filesystem::path& path) {
     const std::string charset = path.stem().extension().string();
     return charset.empty() ? "UTF-8" : charset.substr(1, charset.find("-with-mark") - 1);
@@ -65,7 +66,7 @@ protected:
         request["content"] = std::move(content);
         request["encoding"] = encoding;
         const std::vector<Message> answers =
-            bundle.send(kWriteRequests, json::serialize(std::move(request)));
+            bundle.send(writeRequestChannel, json::serialize(std::move(request)));
         EXPECT_THAT(answers, SizeIs(2));
         return answers.at(1) == Message{"/zpr/service/writeResponse/1", "true"};
     }

@@ -109,7 +109,7 @@ TEST(FutureRace, GivesTheOutcomeOfOneSetterToOneTaker) {
         EXPECT_NE(setValue == "value", setException == "value");
         const char* won = setValue == "value" ? "value" : "set";
         EXPECT_EQ(setValue == "value" ? setException : setValue, resolvedText);
-        // One taker has what it set, and the other is told so.
+        // One taker gets the value, and the other the error.
         EXPECT_THAT(get, AnyOf(StrEq(won), StrEq(getTakenText)));
         EXPECT_THAT(then, AnyOf(StrEq("value"), StrEq(thenTakenText)));
         if (then == "value") {

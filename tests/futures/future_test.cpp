@@ -598,7 +598,7 @@ TEST(ThenDeathTest, EndsTheProcessWhenTheCallbacksDestructorThrows) {
 
 enum class Ending { value, exception, cancelled, invalid };
 
-// What unwrap's result tells about an inner future.
+// The outcome of unwrap's result for an inner future.
 std::string outcomeOf(Future<void>& future) {
     try {
         future.get();

@@ -15,7 +15,9 @@
 #include "host/commands/framing.h"
 #include "json/serialize.h"
 #include "json/value.h"
-#include "tests/host/subprocess.h"
+#include "platform/messaging/channels.h"
+#include "tests/support/message.h"
+#include "tests/support/subprocess.h"
 
 namespace test {
 
@@ -42,17 +44,7 @@ inline std::string framed(std::string_view channel, std::string_view payload) {
 
 /// A read request of a text file, framed.
 inline std::string framedReadRequest(const std::string& rtcId, const std::string& file) {
-    return framed("/zpr/service/readRequest_cpp", readRequest(rtcId, file));
-}
-
-struct Message {
-    std::string channel;
-    std::string payload;
-    bool operator==(const Message&) const = default;
-};
-
-inline void PrintTo(const Message& message, std::ostream* out) {
-    *out << message.channel << ' ' << message.payload;
+    return framed(platform::messaging::readRequestChannel, readRequest(rtcId, file));
 }
 
 /// The messages that `frames` consists of. Throws host::FramingError when it is anything else.

@@ -9,6 +9,7 @@
 #include <string_view>
 
 #include "cppmicroservices/BundleActivator.h"
+#include "platform/messaging/channels.h"
 #include "platform/messaging/message_service.h"
 
 namespace {
@@ -27,7 +28,7 @@ public:
 
         client_ = platform::messaging::createMessageService("unresponsive", {}).get();
         subscription_ = client_
-                            ->subscribe("/zpr/service/readRequest_cpp",
+                            ->subscribe(platform::messaging::readRequestChannel,
                                         [this](const JsonMessage& message) { handle(message); })
                             .get();
     }

@@ -12,13 +12,13 @@ namespace test {
 /// The bytes of a zip archive with items of these names, and with a comment.
 inline std::string zipArchive(const std::vector<std::string>& names,
                               const std::string& comment = "") {
-    std::vector<testing_package::ZipEntry> entries;
+    std::vector<test::ZipEntry> entries;
     for (const std::string& name : names) {
         entries.emplace_back(name, "<x/>");
     }
-    testing_package::ZipOptions options;
+    test::ZipOptions options;
     options.comment = comment;
-    return testing_package::buildZip(entries, options);
+    return test::buildZip(entries, options);
 }
 
 }  // namespace test

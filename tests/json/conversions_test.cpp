@@ -71,7 +71,7 @@ TEST(StringToDouble, UnderflowsToDenormalsAndToZero) {
 }
 
 TEST(StringToDouble, RoundsTextsOfAnyLengthCorrectly) {
-    // Half-way between two doubles, and just above it far behind the digits that a double holds.
+    // Half-way between two doubles, and just above it far beyond the digits that a double holds.
     const std::string halfway = std::string("9007199254740993.") + std::string(2000, '0');
     EXPECT_EQ(string_to_double(halfway), 9007199254740992.0);
     EXPECT_EQ(string_to_double(halfway + "1"), 9007199254740994.0);

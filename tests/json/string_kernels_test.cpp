@@ -16,7 +16,7 @@
 namespace json::detail {
 namespace {
 
-using tests::GuardedMemory;
+using test::GuardedMemory;
 
 // ---- What the kernels are to do, byte by byte ----
 

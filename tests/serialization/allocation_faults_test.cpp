@@ -13,32 +13,25 @@
 #include <string>
 #include <vector>
 
+#include "json/parser.h"
 #include "tests/support/failing_malloc.h"
+#include "tests/support/process_state.h"
 #include "tests/support/running_bundle.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
 
 using test::Failing;
-using test::kNotifications;
-using test::kReadRequests;
-using test::kReadResponses;
-using test::kWriteRequests;
-using test::kWriteResponses;
 using test::Message;
+using test::notificationChannel;
 using test::readFile;
+using test::readRequestChannel;
+using test::readResponsePrefix;
 using test::RunningBundle;
+using test::writeRequestChannel;
+using test::writeResponsePrefix;
 using testing::AnyOf;
 using testing::ElementsAre;
-
-std::size_t openDescriptors() {
-    std::size_t count = 0;
-    for ([[maybe_unused]] const auto& entry :
-         std::filesystem::directory_iterator("/proc/self/fd")) {
-        ++count;
-    }
-    return count;
-}
 
 class AllocationFaults : public testing::TestWithParam<Failing> {
 protected:
@@ -83,7 +76,7 @@ protected:
         prepare();
         const std::vector<Message> whole = bundle.send(channel, request);
         ASSERT_FALSE(whole.empty());
-        const std::size_t descriptors = openDescriptors();
+        const std::size_t descriptors = test::openDescriptors();
         for (long failing = 0, allocations = 1; failing <= allocations; ++failing) {
             SCOPED_TRACE("allocation " + std::to_string(failing));
             prepare();
@@ -94,7 +87,7 @@ protected:
             ASSERT_FALSE(HasFailure());
             faults += failing < allocations ? 1 : 0;
         }
-        EXPECT_EQ(openDescriptors(), descriptors);
+        EXPECT_EQ(test::openDescriptors(), descriptors);
         prepare();
         EXPECT_EQ(bundle.send(channel, request), whole);
         RecordProperty("faults", std::to_string(faults));
@@ -113,7 +106,7 @@ void expectReadOutcome(const std::vector<Message>& got, const std::vector<Messag
         return;
     }
     ASSERT_EQ(got.size(), 1u);
-    EXPECT_EQ(got[0].channel, std::string(kReadResponses) + "1");
+    EXPECT_EQ(got[0].channel, std::string(readResponsePrefix) + "1");
     json::Object answer = json::parse(got[0].payload);
     EXPECT_EQ(answer["status"], json::Value(false)) << got[0].payload;
     EXPECT_THAT(answer["exception"].get<std::string>(), AnyOf("std::bad_alloc", "Out of memory!"));
@@ -122,11 +115,11 @@ void expectReadOutcome(const std::vector<Message>& got, const std::vector<Messag
 // A notification, and after it true or false; each may be missing.
 void expectWriteOutcome(const std::vector<Message>& got, const std::vector<Message>& whole) {
     ASSERT_LE(got.size(), 2u);
-    if (got.size() == 2 || (got.size() == 1 && got[0].channel == kNotifications)) {
+    if (got.size() == 2 || (got.size() == 1 && got[0].channel == notificationChannel)) {
         EXPECT_EQ(got[0], whole[0]);
     }
-    if (got.size() == 2 || (got.size() == 1 && got[0].channel != kNotifications)) {
-        EXPECT_EQ(got.back().channel, std::string(kWriteResponses) + "1");
+    if (got.size() == 2 || (got.size() == 1 && got[0].channel != notificationChannel)) {
+        EXPECT_EQ(got.back().channel, std::string(writeResponsePrefix) + "1");
         EXPECT_THAT(got.back().payload, AnyOf("true", "false"));
     }
 }
@@ -139,20 +132,22 @@ TEST_P(AllocationFaults, OfATextsReadNeverGiveAnythingButTheTextOrTheReason) {
     }
     test::writeFile(path, text);
     failEach(
-        kReadRequests, RunningBundle::request(path, "text/plain", "1"), [] {}, expectReadOutcome);
+        readRequestChannel, RunningBundle::request(path, "text/plain", "1"), [] {},
+        expectReadOutcome);
 }
 
 TEST_P(AllocationFaults, OfAPackagesReadNeverGiveAnythingButThePackageOrTheReason) {
     const test::SparedThread spared;
-    bundle.send(kWriteRequests, writeRequest(path, "text/xml", packageContent("<text/>")));
+    bundle.send(writeRequestChannel, writeRequest(path, "text/xml", packageContent("<text/>")));
     failEach(
-        kReadRequests, RunningBundle::request(path, "text/xml", "1"), [] {}, expectReadOutcome);
+        readRequestChannel, RunningBundle::request(path, "text/xml", "1"), [] {},
+        expectReadOutcome);
 }
 
 TEST_P(AllocationFaults, OfATextsWriteLeaveTheOldTextTheNewOneOrNone) {
     const std::string newText = "\xCF\xF0\xE8\xE2\xE5\xF2";
     failEach(
-        kWriteRequests, writeRequest(path, "text/plain", newText),
+        writeRequestChannel, writeRequest(path, "text/plain", newText),
         [&] { test::writeFile(path, "old"); },
         [&](const std::vector<Message>& got, const std::vector<Message>& whole) {
             expectWriteOutcome(got, whole);
@@ -166,13 +161,13 @@ TEST_P(AllocationFaults, OfATextsWriteLeaveTheOldTextTheNewOneOrNone) {
 
 TEST_P(AllocationFaults, OfAPackagesWriteLeaveTheOldPackageOrTheNewOne) {
     const test::SparedThread spared;
-    bundle.send(kWriteRequests, writeRequest(path, "text/xml", packageContent("old")));
+    bundle.send(writeRequestChannel, writeRequest(path, "text/xml", packageContent("old")));
     const std::string oldPackage = readFile(path);
     const std::string request = writeRequest(path, "text/xml", packageContent("new"));
-    bundle.send(kWriteRequests, request);
+    bundle.send(writeRequestChannel, request);
     const std::string newPackage = readFile(path);
     failEach(
-        kWriteRequests, request, [&] { test::writeFile(path, oldPackage); },
+        writeRequestChannel, request, [&] { test::writeFile(path, oldPackage); },
         [&](const std::vector<Message>& got, const std::vector<Message>& whole) {
             expectWriteOutcome(got, whole);
             EXPECT_THAT(readFile(path), AnyOf(oldPackage, newPackage));

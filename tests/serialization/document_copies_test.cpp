@@ -20,6 +20,7 @@
 #include "json/serialize.h"
 #include "json/value.h"
 #include "platform/data_buffer.h"
+#include "platform/messaging/channels.h"
 #include "platform/messaging/in_process_bus.h"
 #include "platform/messaging/transport.h"
 #include "tests/support/counting_malloc.h"
@@ -32,9 +33,9 @@ using platform::messaging::JsonMessage;
 using test::Allocations;
 using testing::SizeIs;
 
-constexpr std::size_t kMegabyte = 1'000'000;
+constexpr std::size_t megabyte = 1'000'000;
 
-constexpr const char* kTooLarge = R"({"exception":"The document is too large: )";
+constexpr const char* tooLarge = R"({"exception":"The document is too large: )";
 
 /// `size` bytes of the lines of an XML text.
 std::string xmlText(std::size_t size) {
@@ -115,7 +116,7 @@ protected:
             json::Object{{"rtcId", "1"}, {"contentType", contentType}, {"filePath", path}})));
         awaited = 0;
         test::beginAccount();
-        client->publish("/zpr/service/readRequest_cpp", std::move(request)).get();
+        client->publish(platform::messaging::readRequestChannel, std::move(request)).get();
         bus->waitUntilIdle();
         return test::endAccount();
     }
@@ -123,7 +124,8 @@ protected:
     /// What a write of the document in `request` allocates, the request itself among it.
     Allocations write(const std::string& request) {
         test::beginAccount();
-        client->publish("/zpr/service/writeRequest_cpp", DataBuffer::copyOf(request)).get();
+        client->publish(platform::messaging::writeRequestChannel, DataBuffer::copyOf(request))
+            .get();
         bus->waitUntilIdle();
         return test::endAccount();
     }
@@ -139,10 +141,10 @@ protected:
 
     /// A package of a text of 8 MB and four images of 3 MB.
     std::string packageRequest() const {
-        const std::string image = noise(3 * kMegabyte);
+        const std::string image = noise(3 * megabyte);
         json::Array parts{json::Object{{"partUri", "/text.xml"},
                                        {"contentType", "application/xml"},
-                                       {"content", xmlText(8 * kMegabyte)},
+                                       {"content", xmlText(8 * megabyte)},
                                        {"relationship", json::Null()}}};
         for (int i = 0; i < 4; ++i) {
             parts.push_back(json::Object{{"partUri", "/image" + std::to_string(i) + ".png"},
@@ -198,23 +200,23 @@ protected:
 
 // The file's bytes, the text of the answer, and the message.
 TEST_F(DocumentCopies, OfAUtf8TextThatIsRead) {
-    const std::string path = writeTextFile(xmlText(8 * kMegabyte));
+    const std::string path = writeTextFile(xmlText(8 * megabyte));
     const Allocations allocations = read("text/plain", path);
-    ASSERT_GT(answerSize, 8 * kMegabyte);
+    ASSERT_GT(answerSize, 8 * megabyte);
     EXPECT_THAT(allocations.large, SizeIs(3));
     EXPECT_LE(timesTheAnswer(allocations), 2.05);
 }
 
-// The same; the sample by which the charset is told is small.
+// The same; the sample for detecting the charset is small.
 TEST_F(DocumentCopies, OfATextInALegacyCharsetThatIsRead) {
     std::string text;
-    while (text.size() < 8 * kMegabyte) {
+    while (text.size() < 8 * megabyte) {
         text +=
             "\x82\xB1\x82\xEA\x82\xCD\x93\xFA\x96\x7B\x8C\xEA\x82\xCC\x95\xB6\x8F\xCD\x81\x42 "
             "text\n";
     }
     const Allocations allocations = read("text/plain", writeTextFile(text));
-    ASSERT_GT(answerSize, 8 * kMegabyte);
+    ASSERT_GT(answerSize, 8 * megabyte);
     EXPECT_THAT(allocations.large, SizeIs(3));
     EXPECT_LE(timesTheAnswer(allocations), 2.05);
 }
@@ -222,7 +224,7 @@ TEST_F(DocumentCopies, OfATextInALegacyCharsetThatIsRead) {
 // The request and the text in it.
 TEST_F(DocumentCopies, OfATextThatIsWritten) {
     for (const char* charset : {"UTF-8", "Shift_JIS"}) {
-        const std::string request = textRequest(xmlText(8 * kMegabyte), charset);
+        const std::string request = textRequest(xmlText(8 * megabyte), charset);
         const Allocations allocations = write(request);
         EXPECT_EQ(answer, "true");
         EXPECT_THAT(allocations.large, SizeIs(2)) << charset;
@@ -243,7 +245,7 @@ TEST_F(DocumentCopies, OfAPackageThatIsWritten) {
 // The request, its text, and the bytes that the text is decoded to; the image's base64 and that as
 // a data URI, or the answer's text and the message.
 TEST_F(DocumentCopies, OfAPackageOfOneImage) {
-    const std::string content = "data:image/png;base64," + std::string(16 * kMegabyte, 'A');
+    const std::string content = "data:image/png;base64," + std::string(16 * megabyte, 'A');
     const std::string request = json::serialize(json::Value(json::Object{
         {"rtcId", "1"},
         {"contentType", "text/xml"},
@@ -266,40 +268,40 @@ TEST_F(DocumentCopies, OfAPackageThatIsRead) {
     write(packageRequest());
     ASSERT_EQ(answer, "true");
     const Allocations allocations = read("text/xml", packagePath());
-    ASSERT_GT(answerSize, 24 * kMegabyte);
+    ASSERT_GT(answerSize, 24 * megabyte);
     EXPECT_THAT(allocations.large, SizeIs(2 + 4 * 4 + 2));
     EXPECT_LE(timesTheAnswer(allocations), 2.05);
 }
 
 // The part's content, and as much of the answer's text, six bytes for one, as could be sent.
 TEST_F(DocumentCopies, OfAPackageWhoseAnswerIsTooLongToBeSent) {
-    constexpr std::size_t size = 60 * kMegabyte;
+    constexpr std::size_t size = 60 * megabyte;
     writePackage("x/y", std::string(size, '\0'));
-    maxPayload = 64 * kMegabyte;
+    maxPayload = 64 * megabyte;
     const Allocations allocations = read("text/xml", packagePath());
-    EXPECT_THAT(answer, testing::StartsWith(kTooLarge));
-    EXPECT_LE(allocations.peak, size + maxPayload + kMegabyte);
+    EXPECT_THAT(answer, testing::StartsWith(tooLarge));
+    EXPECT_LE(allocations.peak, size + maxPayload + megabyte);
     EXPECT_LE(allocations.peak, awaited);
 }
 
 // None at all, when what is in them is longer than can be sent.
 TEST_F(DocumentCopies, OfDocumentsThatAreLongerThanCanBeSent) {
-    maxPayload = 10 * kMegabyte;
-    writePackage("x/y", std::string(11 * kMegabyte, 'x'));
-    EXPECT_LE(read("text/xml", packagePath()).peak, kMegabyte / 2);
-    EXPECT_THAT(answer, testing::StartsWith(kTooLarge));
+    maxPayload = 10 * megabyte;
+    writePackage("x/y", std::string(11 * megabyte, 'x'));
+    EXPECT_LE(read("text/xml", packagePath()).peak, megabyte / 2);
+    EXPECT_THAT(answer, testing::StartsWith(tooLarge));
 
     const std::string path = writeTextFile(std::string(maxPayload + 1, 'x'));
-    EXPECT_LE(read("text/plain", path).peak, kMegabyte / 2);
-    EXPECT_THAT(answer, testing::StartsWith(kTooLarge));
-    writeTextFile(std::string(maxPayload - kMegabyte, 'x'));
+    EXPECT_LE(read("text/plain", path).peak, megabyte / 2);
+    EXPECT_THAT(answer, testing::StartsWith(tooLarge));
+    writeTextFile(std::string(maxPayload - megabyte, 'x'));
     read("text/plain", path);
     EXPECT_THAT(answer, testing::StartsWith(R"({"data":"xxx)"));
 }
 
 // Neither of a path that no file can have.
 TEST_F(DocumentCopies, OfAPathThatIsTooLong) {
-    const std::string path(4 * kMegabyte, '/');
+    const std::string path(4 * megabyte, '/');
     for (const char* contentType : {"text/plain", "text/xml"}) {
         const Allocations allocations = read(contentType, path);
         EXPECT_THAT(answer, testing::HasSubstr("File name too long"));
@@ -320,7 +322,7 @@ class MemoryForTexts : public DocumentCopies, public testing::WithParamInterface
 
 TEST_P(MemoryForTexts, IsAwaited) {
     std::string text;
-    while (text.size() < 3 * kMegabyte) {
+    while (text.size() < 3 * megabyte) {
         text += GetParam();
     }
     const Allocations allocations = read("text/plain", writeTextFile(text));
@@ -353,18 +355,18 @@ protected:
 };
 
 TEST_F(MemoryForPackages, IsAwaitedForImages) {
-    writePackage("image/png", noise(5 * kMegabyte));
+    writePackage("image/png", noise(5 * megabyte));
     expectAwaited();
 }
 
 TEST_F(MemoryForPackages, IsAwaitedForBytesThatAreEscaped) {
-    writePackage("x/y", std::string(5 * kMegabyte, '\0'));
+    writePackage("x/y", std::string(5 * megabyte, '\0'));
     expectAwaited();
-    EXPECT_LE(awaited, 18 * 5 * kMegabyte);
+    EXPECT_LE(awaited, 18 * 5 * megabyte);
 }
 
 TEST_F(MemoryForPackages, IsAwaitedForBytesOfWhichTheLastAreEscaped) {
-    writePackage("x/y", std::string(4 * kMegabyte, 'x') + std::string(kMegabyte, '\0'));
+    writePackage("x/y", std::string(4 * megabyte, 'x') + std::string(megabyte, '\0'));
     expectAwaited();
 }
 

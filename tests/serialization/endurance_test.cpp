@@ -23,60 +23,25 @@
 #include <utility>
 #include <vector>
 
+#include "tests/support/process_state.h"
 #include "tests/support/running_bundle.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
 
 using namespace platform::messaging;
-using test::kReadRequests;
-using test::kReadResponses;
-using test::kWriteRequests;
 using test::Message;
+using test::readRequestChannel;
+using test::readResponsePrefix;
 using test::RunningBundle;
+using test::writeRequestChannel;
 
-constexpr bool kUnderSanitizers = UNDER_SANITIZERS;
-
-std::size_t entriesOf(const char* folder) {
-    using Entries = std::filesystem::directory_iterator;
-    return static_cast<std::size_t>(std::distance(Entries(folder), Entries()));
-}
-
-/// The number of threads. The system lists one that has been joined a moment longer, so it is
-/// counted until it is the same for a while.
-std::size_t threads() {
-    std::size_t count = 0;
-    for (int same = 0; same < 20; ++same) {
-        const std::size_t now = entriesOf("/proc/self/task");
-        same = now == count ? same : 0;
-        count = now;
-        std::this_thread::sleep_for(std::chrono::milliseconds(1));
-    }
-    return count;
-}
-
-std::size_t residentBytes() {
-    std::size_t total = 0;
-    std::size_t resident = 0;
-    std::ifstream("/proc/self/statm") >> total >> resident;
-    return resident * static_cast<std::size_t>(::sysconf(_SC_PAGESIZE));
-}
-
-bool isBundleLoaded() {
-    std::ifstream maps("/proc/self/maps");
-    for (std::string line; std::getline(maps, line);) {
-        if (line.find(std::filesystem::path(SERIALIZATION_BUNDLE).filename()) !=
-            std::string::npos) {
-            return true;
-        }
-    }
-    return false;
-}
+constexpr bool underSanitizers = UNDER_SANITIZERS;
 
 TEST(Endurance, StartsAndEndsAThousandTimesWhileRequestsComeIn) {
-    constexpr int kTimes = kUnderSanitizers ? 50 : 1000;
+    constexpr int repetitions = underSanitizers ? 50 : 1000;
     // Two threads that happen to allocate at once, however late, would have glibc make another
-    // heap, a megabyte that is no leak.
+    // heap, a megabyte that is not a leak.
     ::mallopt(M_ARENA_MAX, 1);
     const test::TemporaryDirectory folder;
     test::writeFile(folder / "file", "\xCF\xF0\xE8\xE2\xE5\xF2");
@@ -84,15 +49,16 @@ TEST(Endurance, StartsAndEndsAThousandTimesWhileRequestsComeIn) {
     setTransport([bus](const std::string& name, const auto&) { return bus->connect(name); });
     const auto client = bus->connect("client").get();
     std::atomic<int> answers = 0;
-    const auto subscription =
-        client->subscribe(std::string(kReadResponses) + "1", [&](const JsonMessage&) { ++answers; })
-            .get();
+    const auto subscription = client
+                                  ->subscribe(std::string(readResponsePrefix) + "1",
+                                              [&](const JsonMessage&) { ++answers; })
+                                  .get();
     std::atomic<bool> isDone = false;
     std::thread asking([&] {
         const std::string request =
             RunningBundle::request((folder / "file").string(), "text/plain", "1");
         while (!isDone) {
-            client->publish(kReadRequests, platform::DataBuffer::copyOf(request)).get();
+            client->publish(readRequestChannel, platform::DataBuffer::copyOf(request)).get();
             bus->waitUntilQueuedAtMost(2, 10'000);
         }
     });
@@ -100,7 +66,7 @@ TEST(Endurance, StartsAndEndsAThousandTimesWhileRequestsComeIn) {
     std::size_t descriptors = 0;
     std::size_t threadCount = 0;
     std::size_t resident = 0;
-    for (int i = 0; i < kTimes; ++i) {
+    for (int i = 0; i < repetitions; ++i) {
         const int answersBefore = answers;
         {
             const framework::BundleRunner bundle(SERIALIZATION_BUNDLE);
@@ -110,21 +76,21 @@ TEST(Endurance, StartsAndEndsAThousandTimesWhileRequestsComeIn) {
                 }
             }
         }
-        if (i == kTimes / 4) {
-            descriptors = entriesOf("/proc/self/fd");
-            threadCount = threads();
-            resident = residentBytes();
+        if (i == repetitions / 4) {
+            descriptors = test::openDescriptors();
+            threadCount = test::settledThreads();
+            resident = test::memoryOf("self", "VmRSS");
         }
     }
-    EXPECT_EQ(entriesOf("/proc/self/fd"), descriptors);
-    EXPECT_EQ(threads(), threadCount);
-    if (!kUnderSanitizers) {
-        EXPECT_LE(residentBytes(), resident + resident / 20);
+    EXPECT_EQ(test::openDescriptors(), descriptors);
+    EXPECT_TRUE(test::comesToThreads(threadCount));
+    if (!underSanitizers) {
+        EXPECT_LE(test::memoryOf("self", "VmRSS"), resident + resident / 20);
     }
     isDone = true;
     asking.join();
     setTransport({});
-    EXPECT_EQ(isBundleLoaded(), !BUNDLES_ARE_UNLOADED);
+    EXPECT_EQ(test::isLoaded(SERIALIZATION_BUNDLE), !BUNDLES_ARE_UNLOADED);
 }
 
 // Requests of every kind, whose answers are known from their first time.
@@ -152,20 +118,20 @@ protected:
             addRead(name, "text/plain");
             addRead(name, "text/xml");
         }
-        requests.push_back({kReadRequests, "no JSON at all"});
-        requests.push_back({kWriteRequests, R"({"rtcId":1})"});
+        requests.push_back({readRequestChannel, "no JSON at all"});
+        requests.push_back({writeRequestChannel, R"({"rtcId":1})"});
     }
 
     void addRead(const std::string& name, const std::string& type) {
         requests.push_back(
-            {kReadRequests, RunningBundle::request((folder / name).string(), type, "1")});
+            {readRequestChannel, RunningBundle::request((folder / name).string(), type, "1")});
     }
 
     void addWrite(const std::string& name, const std::string& type, const std::string& content) {
-        requests.push_back({kWriteRequests, R"({"rtcId":"1","encoding":"UTF-8","contentType":")" +
-                                                type + R"(","filePath":")" +
-                                                (folder / name).string() + R"(","content":)" +
-                                                content + "}"});
+        requests.push_back(
+            {writeRequestChannel, R"({"rtcId":"1","encoding":"UTF-8","contentType":")" + type +
+                                      R"(","filePath":")" + (folder / name).string() +
+                                      R"(","content":)" + content + "}"});
     }
 
     test::TemporaryDirectory folder;
@@ -173,10 +139,10 @@ protected:
 };
 
 TEST_F(LongRun, TakesNoMoreMemoryOrDescriptorsAtItsEndAndAnswersAsAtItsStart) {
-    constexpr long kWarmUp = kUnderSanitizers ? 500 : 10'000;
+    constexpr long warmUp = underSanitizers ? 500 : 10'000;
     const char* const asked = std::getenv("ENDURANCE_REQUESTS");
-    const long count = asked != nullptr ? std::atol(asked) : 2 * kWarmUp;
-    ASSERT_GT(count, kWarmUp);
+    const long count = asked != nullptr ? std::atol(asked) : 2 * warmUp;
+    ASSERT_GT(count, warmUp);
     RunningBundle bundle;
     // The failures are meant, and what is kept of them would be taken for a leak.
     spdlog::get("messaging")->set_level(spdlog::level::off);
@@ -192,19 +158,19 @@ TEST_F(LongRun, TakesNoMoreMemoryOrDescriptorsAtItsEndAndAnswersAsAtItsStart) {
             ASSERT_EQ(answers, expected[kind]) << "request " << i;
         }
         expected[kind] = std::move(answers);
-        if (i + 1 == kWarmUp) {
-            descriptors = entriesOf("/proc/self/fd");
-            resident = residentBytes();
+        if (i + 1 == warmUp) {
+            descriptors = test::openDescriptors();
+            resident = test::memoryOf("self", "VmRSS");
         }
     }
-    EXPECT_EQ(entriesOf("/proc/self/fd"), descriptors);
-    if (!kUnderSanitizers) {
-        EXPECT_LE(residentBytes(), resident + resident / 20);
+    EXPECT_EQ(test::openDescriptors(), descriptors);
+    if (!underSanitizers) {
+        EXPECT_LE(test::memoryOf("self", "VmRSS"), resident + resident / 20);
     }
     spdlog::get("messaging")->set_level(spdlog::level::info);
     RecordProperty("requests", std::to_string(count));
     RecordProperty("kilobytes_after_warm_up", std::to_string(resident / 1024));
-    RecordProperty("kilobytes_at_the_end", std::to_string(residentBytes() / 1024));
+    RecordProperty("kilobytes_at_the_end", std::to_string(test::memoryOf("self", "VmRSS") / 1024));
 }
 
 }  // namespace

@@ -14,11 +14,11 @@
 namespace {
 
 using test::failAllocationsOf;
-using test::kReadRequests;
-using test::kWriteRequests;
 using test::Message;
+using test::readRequestChannel;
 using test::RunningBundle;
 using test::takeBusLog;
+using test::writeRequestChannel;
 using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::IsEmpty;
@@ -33,7 +33,7 @@ protected:
                              {"filePath", path},
                              {"content", text},
                              {"encoding", "UTF-8"}};
-        return bundle.send(kWriteRequests, json::serialize(std::move(request)));
+        return bundle.send(writeRequestChannel, json::serialize(std::move(request)));
     }
 
     test::TemporaryDirectory folder;
@@ -76,13 +76,14 @@ TEST_F(OutOfMemory, ForTheResponseOfAWriteMeansANotificationWithoutAnswer) {
     takeBusLog();
     {
         const auto armed = bundle.bus().observe([](std::string_view, const auto& message) {
-            if (message.channel() == test::kNotifications) {
+            if (message.channel() == test::notificationChannel) {
                 failAllocationsOf(std::string_view("true").size());
             }
         });
-        EXPECT_THAT(writeText(path, "text"),
-                    ElementsAre(Message{test::kNotifications, R"({"filePath":")" + path +
-                                                                  R"(","isExistingFile":false})"}));
+        EXPECT_THAT(
+            writeText(path, "text"),
+            ElementsAre(Message{test::notificationChannel,
+                                R"({"filePath":")" + path + R"(","isExistingFile":false})"}));
     }
     EXPECT_THAT(takeBusLog(), ElementsAre(HasSubstr("Out of memory!")));
 }
@@ -96,7 +97,7 @@ TEST_F(OutOfMemory, ForTheBase64OfAnImageIsTheAnswerToARead) {
                           {"relationships", json::Array()}};
     json::Object request{{"rtcId", "1"}, {"contentType", "text/xml"}, {"filePath", path}};
     request["content"] = std::move(document);
-    ASSERT_EQ(bundle.send(kWriteRequests, json::serialize(std::move(request))).size(), 2u);
+    ASSERT_EQ(bundle.send(writeRequestChannel, json::serialize(std::move(request))).size(), 2u);
 
     // The first allocation of that size is the part itself, the next the buffer.
     failAllocationsOf(image.size(), 1);

@@ -22,7 +22,7 @@ namespace {
 using platform::i18n::to_ustring;
 using testing::HasSubstr;
 
-constexpr std::size_t kLongestPath = PATH_MAX - 1;  // and a zero behind it
+constexpr std::size_t longestPath = PATH_MAX - 1;  // and a zero after it
 
 class PathLimits : public testing::Test {
 protected:
@@ -50,14 +50,14 @@ protected:
 };
 
 TEST_F(PathLimits, TextsAtTheLongestPathAreWrittenAndRead) {
-    const std::u16string path = pathOf(kLongestPath);
-    ASSERT_EQ(path.size(), kLongestPath);
+    const std::u16string path = pathOf(longestPath);
+    ASSERT_EQ(path.size(), longestPath);
     EXPECT_TRUE(service.writeTextDocument(path, "text", "UTF-8"));
     EXPECT_EQ(textOf(service.readTextDocument(path)), R"({"data":"text","status":true})");
 }
 
 TEST_F(PathLimits, PackagesAtTheLongestPathAreWrittenAndRead) {
-    const std::u16string path = pathOf(kLongestPath);
+    const std::u16string path = pathOf(longestPath);
     for (int i = 0; i < 2; ++i) {  // a new one, and one that is replaced
         EXPECT_TRUE(service.writePackageDocument(path, emptyPackage()));
         EXPECT_EQ(textOf(service.readPackageDocument(path)),
@@ -66,8 +66,8 @@ TEST_F(PathLimits, PackagesAtTheLongestPathAreWrittenAndRead) {
 }
 
 TEST_F(PathLimits, NothingIsAtALongerPath) {
-    for (const std::size_t length : {kLongestPath + 1, std::size_t{1'000'000}}) {
-        std::u16string path = pathOf(kLongestPath);
+    for (const std::size_t length : {longestPath + 1, std::size_t{1'000'000}}) {
+        std::u16string path = pathOf(longestPath);
         path.resize(length, u'f');
         EXPECT_FALSE(service.writeTextDocument(path, "text", "UTF-8"));
         EXPECT_FALSE(service.writePackageDocument(path, emptyPackage()));

@@ -8,14 +8,15 @@
 #include <string>
 #include <vector>
 
+#include "json/parser.h"
 #include "tests/support/running_bundle.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
 
-using test::kReadRequests;
-using test::kReadResponses;
 using test::Message;
+using test::readRequestChannel;
+using test::readResponsePrefix;
 using test::RunningBundle;
 using test::takeBusLog;
 using test::writeFile;
@@ -31,10 +32,10 @@ protected:
     /// Whether a request is answered as it should be, whatever came before it.
     bool stillAnswers() {
         return bundle.read(textPath(), "text/plain") ==
-               std::vector<Message>{{std::string(kReadResponses) + "1", kTextAnswer}};
+               std::vector<Message>{{std::string(readResponsePrefix) + "1", textAnswer}};
     }
 
-    static constexpr const char* kTextAnswer = R"({"data":"some text","status":true})";
+    static constexpr const char* textAnswer = R"({"data":"some text","status":true})";
 
     test::TemporaryDirectory folder;
     RunningBundle bundle;
@@ -42,18 +43,18 @@ protected:
 
 TEST_F(ReadRequests, AreAnsweredOnTheChannelOfTheirRtcId) {
     EXPECT_THAT(bundle.read(textPath(), "text/plain", "42"),
-                ElementsAre(Message{"/zpr/service/readResponse/42", kTextAnswer}));
+                ElementsAre(Message{"/zpr/service/readResponse/42", textAnswer}));
 }
 
 TEST_F(ReadRequests, WithAnEmptyRtcIdAreAnsweredOnTheBarePrefix) {
     EXPECT_THAT(bundle.read(textPath(), "text/plain", ""),
-                ElementsAre(Message{"/zpr/service/readResponse/", kTextAnswer}));
+                ElementsAre(Message{"/zpr/service/readResponse/", textAnswer}));
 }
 
 TEST_F(ReadRequests, WithAnyRtcIdAreAnsweredWithTheIdAsItCame) {
     for (const std::string rtcId : {"a/b", " ", "\xC3\xA9", "..", "*", "\xFF"}) {
         EXPECT_THAT(bundle.read(textPath(), "text/plain", rtcId),
-                    ElementsAre(Message{kReadResponses + rtcId, kTextAnswer}));
+                    ElementsAre(Message{readResponsePrefix + rtcId, textAnswer}));
     }
 }
 
@@ -62,7 +63,7 @@ TEST_F(ReadRequests, ForEveryContentTypeButThePackageTypeGoToTheTextReader) {
          {"", "text/plain", "TEXT/XML", "Text/xml", "text/xml; charset=utf-8", " text/xml",
           "text/xml ", "text/xm", "application/xml"}) {
         EXPECT_THAT(bundle.read(textPath(), type),
-                    ElementsAre(Message{"/zpr/service/readResponse/1", kTextAnswer}))
+                    ElementsAre(Message{"/zpr/service/readResponse/1", textAnswer}))
             << type;
     }
 }
@@ -112,7 +113,7 @@ TEST_F(ReadRequests, WithAMissingKeyGetNoAnswer) {
     for (const std::string request : {R"({"contentType":"text/plain","filePath":"/etc/hostname"})",
                                       R"({"rtcId":"1","filePath":"/etc/hostname"})",
                                       R"({"rtcId":"1","contentType":"text/plain"})", R"({})"}) {
-        EXPECT_THAT(bundle.send(kReadRequests, request), IsEmpty()) << request;
+        EXPECT_THAT(bundle.send(readRequestChannel, request), IsEmpty()) << request;
     }
     EXPECT_TRUE(stillAnswers());
 }
@@ -129,17 +130,17 @@ TEST_F(ReadRequests, WithAKeyOfTheWrongKindGetNoAnswer) {
             const std::string member = "\"" + key + "\":";
             text.replace(text.find(member + json::serialize(request[key])) + member.size(),
                          json::serialize(request[key]).size(), wrong);
-            EXPECT_THAT(bundle.send(kReadRequests, text), IsEmpty()) << text;
+            EXPECT_THAT(bundle.send(readRequestChannel, text), IsEmpty()) << text;
         }
     }
     EXPECT_TRUE(stillAnswers());
 }
 
 TEST_F(ReadRequests, WithOtherKeysAreAnsweredAllTheSame) {
-    EXPECT_THAT(
-        bundle.send(kReadRequests, R"({"rtcId":"1","extra":[{}],"contentType":"","filePath":")" +
-                                       textPath() + R"(","content":null})"),
-        ElementsAre(Message{"/zpr/service/readResponse/1", kTextAnswer}));
+    EXPECT_THAT(bundle.send(readRequestChannel,
+                            R"({"rtcId":"1","extra":[{}],"contentType":"","filePath":")" +
+                                textPath() + R"(","content":null})"),
+                ElementsAre(Message{"/zpr/service/readResponse/1", textAnswer}));
 }
 
 TEST_F(ReadRequests, WhosePathIsNotUtf8GetNoAnswer) {
@@ -151,7 +152,7 @@ TEST_F(ReadRequests, ThatAreNotJsonGetNoAnswer) {
     for (const std::string request :
          {"", "{", "null", "[]", "\"text\"", " {}", "{\"rtcId\":\"1\",}", "\xFF\xFE",
           "/* comment */{\"rtcId\":\"1\",\"contentType\":\"\",\"filePath\":\"/etc/hostname\"}"}) {
-        EXPECT_THAT(bundle.send(kReadRequests, request), IsEmpty()) << request;
+        EXPECT_THAT(bundle.send(readRequestChannel, request), IsEmpty()) << request;
     }
     EXPECT_TRUE(stillAnswers());
 }
@@ -164,13 +165,13 @@ TEST_F(ReadRequests, OfRandomBytesDoNotStopTheBundle) {
         for (unsigned changes = random() % 4 + 1; changes > 0; --changes) {
             damaged[random() % damaged.size()] = static_cast<char>(random());
         }
-        bundle.send(kReadRequests, damaged);
+        bundle.send(readRequestChannel, damaged);
     }
     EXPECT_TRUE(stillAnswers());
 }
 
 TEST_F(ReadRequests, NestedTenMillionDeepDoNotStopTheBundle) {
-    EXPECT_THAT(bundle.send(kReadRequests, "{\"rtcId\":" + std::string(10'000'000, '[')),
+    EXPECT_THAT(bundle.send(readRequestChannel, "{\"rtcId\":" + std::string(10'000'000, '[')),
                 IsEmpty());
     EXPECT_TRUE(stillAnswers());
 }
@@ -178,7 +179,7 @@ TEST_F(ReadRequests, NestedTenMillionDeepDoNotStopTheBundle) {
 TEST_F(ReadRequests, ReadTheirKeysInOrder) {
     const auto failureOf = [this](const std::string& request) {
         takeBusLog();
-        EXPECT_THAT(bundle.send(kReadRequests, request), IsEmpty());
+        EXPECT_THAT(bundle.send(readRequestChannel, request), IsEmpty());
         const std::vector<std::string> log = takeBusLog();
         return log.empty() ? "no failure" : log.back();
     };

@@ -158,7 +158,7 @@ TEST_F(SerializationTest, CleaningThrowsOnTextThatIsNotUtf8) {
     EXPECT_THROW(service.cleanTextToUtf8("a\xFFz"), std::runtime_error);
 }
 
-/// Notes the order in which the service object lets go of what it was given.
+/// Notes the order in which the service object releases what it was given.
 class ReleaseRecorder : public platform::messaging::MessageService {
 public:
     struct Handle : platform::messaging::Subscription {

@@ -16,6 +16,7 @@
 #include <thread>
 #include <vector>
 
+#include "json/parser.h"
 #include "tests/serialization/documents.h"
 #include "tests/support/running_bundle.h"
 #include "tests/support/temporary_directory.h"
@@ -23,21 +24,21 @@
 namespace {
 
 using namespace platform::messaging;
-using test::kNotifications;
-using test::kReadRequests;
-using test::kReadResponses;
-using test::kWriteRequests;
-using test::kWriteResponses;
 using test::Message;
+using test::notificationChannel;
 using test::packageAnswer;
 using test::packageDocument;
+using test::readRequestChannel;
+using test::readResponsePrefix;
 using test::RunningBundle;
 using test::textAnswer;
+using test::writeRequestChannel;
+using test::writeResponsePrefix;
 
-constexpr int kClients = 5;
-constexpr int kRounds = 150;
+constexpr int clientCount = 5;
+constexpr int roundCount = 150;
 
-/// A text that tells its version, long enough that a reader may meet it half-written.
+/// A text that contains its version, long enough that a reader may meet it half-written.
 std::string sharedText(unsigned version) {
     return "version " + std::to_string(version) +
            std::string(20'000, static_cast<char>('a' + version % 26));
@@ -49,13 +50,13 @@ public:
     Client(InProcessBus& bus, int number)
         : rtcId_("client-" + std::to_string(number)),
           service_(bus.connect(rtcId_).get()),
-          reads_(service_->subscribe(kReadResponses + rtcId_, receiver("read")).get()),
-          writes_(service_->subscribe(kWriteResponses + rtcId_, receiver("write")).get()) {}
+          reads_(service_->subscribe(readResponsePrefix + rtcId_, receiver("read")).get()),
+          writes_(service_->subscribe(writeResponsePrefix + rtcId_, receiver("write")).get()) {}
 
     const std::string& rtcId() const { return rtcId_; }
 
     void read(const std::string& path, const std::string& contentType) {
-        publish(kReadRequests, RunningBundle::request(path, contentType, rtcId_));
+        publish(readRequestChannel, RunningBundle::request(path, contentType, rtcId_));
     }
 
     void write(const std::string& path, const std::string& contentType, json::Value content) {
@@ -65,7 +66,7 @@ public:
         request["filePath"] = path;
         request["content"] = std::move(content);
         request["encoding"] = "UTF-8";
-        publish(kWriteRequests, json::serialize(std::move(request)));
+        publish(writeRequestChannel, json::serialize(std::move(request)));
     }
 
     /// The next answer to a read or a write, in the order in which they came; "no answer" when none
@@ -116,7 +117,7 @@ protected:
         std::mt19937 random(seed);
         const std::string ownText = (folder / (client.rtcId() + ".txt")).string();
         const std::string ownPackage = (folder / (client.rtcId() + ".docx")).string();
-        for (int round = 0; round < kRounds; ++round) {
+        for (int round = 0; round < roundCount; ++round) {
             const std::string text = client.rtcId() + " round " + std::to_string(round);
             client.write(ownText, "text/plain", text);
             ASSERT_EQ(client.next("write"), "true");
@@ -130,10 +131,10 @@ protected:
 
             // Several at once, answered in the order of asking on each channel.
             const unsigned version = static_cast<unsigned>(random());
-            client.write(sharedTextPath(), "text/plain", sharedText(version % kVersions));
+            client.write(sharedTextPath(), "text/plain", sharedText(version % versionCount));
             client.write((folder / "missing/file.txt").string(), "text/plain", "never");
             client.write(sharedPackagePath(), "text/xml",
-                         packageDocument(sharedText(version % kVersions)));
+                         packageDocument(sharedText(version % versionCount)));
             client.read(sharedTextPath(), "text/plain");
             client.read((folder / "no-such-file").string(), "text/plain");
             client.read(sharedPackagePath(), "text/xml");
@@ -154,7 +155,7 @@ protected:
         const json::Object object = json::parse(answer);
         ASSERT_TRUE(object.at("status").get<bool>()) << answer;
         const std::string& data = object.at("data").get<std::string>();
-        for (unsigned version = 0; version < kVersions; ++version) {
+        for (unsigned version = 0; version < versionCount; ++version) {
             if (sharedText(version).starts_with(data)) {
                 return;
             }
@@ -164,7 +165,7 @@ protected:
 
     // Packages are replaced as a whole: a reader never meets anything else.
     static void expectWholeVersion(const std::string& answer) {
-        for (unsigned version = 0; version < kVersions; ++version) {
+        for (unsigned version = 0; version < versionCount; ++version) {
             if (answer == packageAnswer(sharedText(version))) {
                 return;
             }
@@ -172,7 +173,7 @@ protected:
         ADD_FAILURE() << "not any version: " << answer.substr(0, 80);
     }
 
-    static constexpr unsigned kVersions = 7;
+    static constexpr unsigned versionCount = 7;
 
     test::TemporaryDirectory folder;
     RunningBundle bundle;
@@ -181,7 +182,7 @@ protected:
 TEST_F(Soak, EveryRequestIsAnsweredOnceInOrderAndAfterItsNotification) {
     test::writeFile(sharedTextPath(), sharedText(0));
     std::vector<std::unique_ptr<Client>> clients;
-    for (int number = 0; number < kClients; ++number) {
+    for (int number = 0; number < clientCount; ++number) {
         clients.push_back(std::make_unique<Client>(bundle.bus(), number));
     }
     // The first version, so that the shared package is there from the start.
@@ -189,7 +190,7 @@ TEST_F(Soak, EveryRequestIsAnsweredOnceInOrderAndAfterItsNotification) {
     ASSERT_EQ(clients[0]->next("write"), "true");
 
     std::vector<std::thread> threads;
-    for (unsigned number = 0; number < kClients; ++number) {
+    for (unsigned number = 0; number < clientCount; ++number) {
         threads.emplace_back([&, number] { run(*clients[number], number); });
     }
     for (std::thread& thread : threads) {
@@ -204,20 +205,20 @@ TEST_F(Soak, EveryRequestIsAnsweredOnceInOrderAndAfterItsNotification) {
     std::size_t writeAnswers = 0;
     std::size_t readAnswers = 0;
     for (const Message& message : bundle.published()) {
-        if (message.channel == kNotifications) {
+        if (message.channel == notificationChannel) {
             ++notifications;
-        } else if (message.channel.starts_with(kWriteResponses)) {
+        } else if (message.channel.starts_with(writeResponsePrefix)) {
             ++writeAnswers;
             // Writes are handled one at a time, so that each answer comes right after its
             // notification.
             ASSERT_EQ(notifications, writeAnswers);
         } else {
-            ASSERT_THAT(message.channel, testing::StartsWith(kReadResponses));
+            ASSERT_THAT(message.channel, testing::StartsWith(readResponsePrefix));
             ++readAnswers;
         }
     }
-    EXPECT_EQ(writeAnswers, std::size_t{kClients} * kRounds * 5 + 1);
-    EXPECT_EQ(readAnswers, std::size_t{kClients} * kRounds * 5);
+    EXPECT_EQ(writeAnswers, std::size_t{clientCount} * roundCount * 5 + 1);
+    EXPECT_EQ(readAnswers, std::size_t{clientCount} * roundCount * 5);
 }
 
 }  // namespace

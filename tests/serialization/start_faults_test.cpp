@@ -19,6 +19,7 @@
 #include <thread>
 #include <vector>
 
+#include "tests/support/process_state.h"
 #include "tests/support/running_bundle.h"
 #include "tests/support/system_call_supervisor.h"
 #include "tests/support/temporary_directory.h"
@@ -27,25 +28,6 @@ namespace {
 
 using platform::messaging::InProcessBus;
 using platform::messaging::setTransport;
-
-std::size_t openDescriptors() {
-    using Entries = std::filesystem::directory_iterator;
-    return static_cast<std::size_t>(std::distance(Entries("/proc/self/fd"), Entries()));
-}
-
-std::size_t threads() {
-    using Entries = std::filesystem::directory_iterator;
-    return static_cast<std::size_t>(std::distance(Entries("/proc/self/task"), Entries()));
-}
-
-/// Whether there are as many threads. The system lists a thread that has been joined a moment
-/// longer.
-bool areThreads(std::size_t count) {
-    for (int i = 0; i < 1000 && threads() != count; ++i) {
-        std::this_thread::sleep_for(std::chrono::milliseconds(1));
-    }
-    return threads() == count;
-}
 
 class StartFaults : public testing::Test {
 protected:
@@ -83,13 +65,13 @@ TEST_F(StartFaults, OfAnyCallEndTheStartWithAReasonOrLeaveItDone) {
     startAndEnd(failure)();  // what is done only once in a process is done now
     ASSERT_EQ(failure, std::nullopt);
     const std::vector<int> calls = test::callsOf(startAndEnd(failure));
-    const std::size_t threadsBefore = threads();
+    const std::size_t threadsBefore = test::listedThreads();
     int faults = 0;
     int failedStarts = 0;
     for (std::size_t failing = 0; failing < calls.size(); ++failing) {
         for (const int error : {EIO, ENOMEM, EMFILE, EAGAIN}) {
             SCOPED_TRACE("call " + std::to_string(failing) + ", errno " + std::to_string(error));
-            const std::size_t descriptors = openDescriptors();
+            const std::size_t descriptors = test::openDescriptors();
             int failed = 0;
             test::supervise(startAndEnd(failure), [&](int call, int index) {
                 // glibc ends a process in which a thread cannot be registered.
@@ -104,9 +86,9 @@ TEST_F(StartFaults, OfAnyCallEndTheStartWithAReasonOrLeaveItDone) {
             EXPECT_NE(failure, "");
             // A close that fails here is not made; the system's own frees the descriptor.
             if (failed != SYS_close) {
-                EXPECT_EQ(openDescriptors(), descriptors);
+                EXPECT_EQ(test::openDescriptors(), descriptors);
             }
-            EXPECT_TRUE(areThreads(threadsBefore));
+            EXPECT_TRUE(test::comesToThreads(threadsBefore));
             ASSERT_FALSE(HasFailure());
         }
     }

@@ -24,6 +24,7 @@
 #include "platform/messaging/in_process_bus.h"
 #include "platform/messaging/transport.h"
 #include "serialization/serialization.h"
+#include "tests/support/process_state.h"
 #include "tests/support/system_call_supervisor.h"
 #include "tests/support/temporary_directory.h"
 
@@ -36,12 +37,7 @@ using test::readFile;
 using testing::AnyOf;
 using testing::ElementsAre;
 
-constexpr std::array kErrors = {EIO, ENOSPC, EACCES, ENOMEM, EMFILE, EINTR};
-
-std::size_t openDescriptors() {
-    using Entries = std::filesystem::directory_iterator;
-    return static_cast<std::size_t>(std::distance(Entries("/proc/self/fd"), Entries()));
-}
+constexpr std::array triedErrors = {EIO, ENOSPC, EACCES, ENOMEM, EMFILE, EINTR};
 
 class SystemCallFaults : public testing::Test {
 protected:
@@ -95,11 +91,11 @@ protected:
         handle(handler, text);  // what is done only once in a process is done now
         prepare();
         const std::vector<int> calls = test::callsOf([&] { handle(handler, text); });
-        const std::size_t descriptors = openDescriptors();
+        const std::size_t descriptors = test::openDescriptors();
         ASSERT_GT(calls.size(), 3u);
         int faults = 0;
         for (int failing = 0; failing < static_cast<int>(calls.size()); ++failing) {
-            for (const int error : kErrors) {
+            for (const int error : triedErrors) {
                 SCOPED_TRACE("call " + std::to_string(failing) + ", system call " +
                              std::to_string(calls[static_cast<std::size_t>(failing)]) + ", errno " +
                              std::to_string(error));
@@ -116,7 +112,7 @@ protected:
         // A close that fails here is not made; the system's own frees the descriptor all the same.
         const auto closes =
             static_cast<std::size_t>(std::count(calls.begin(), calls.end(), SYS_close));
-        EXPECT_EQ(openDescriptors(), descriptors + closes * kErrors.size());
+        EXPECT_EQ(test::openDescriptors(), descriptors + closes * triedErrors.size());
         RecordProperty("faults", std::to_string(faults));
     }
 

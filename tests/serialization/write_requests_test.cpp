@@ -8,17 +8,18 @@
 #include <string>
 #include <vector>
 
+#include "json/parser.h"
 #include "tests/support/running_bundle.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
 
-using test::kNotifications;
-using test::kWriteRequests;
 using test::Message;
+using test::notificationChannel;
 using test::readFile;
 using test::takeBusLog;
 using test::writeFile;
+using test::writeRequestChannel;
 using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::IsEmpty;
@@ -46,12 +47,12 @@ protected:
     }
 
     std::vector<Message> send(const json::Object& request) {
-        return bundle.send(kWriteRequests, json::serialize(json::Value(request)));
+        return bundle.send(writeRequestChannel, json::serialize(json::Value(request)));
     }
 
     static Message notification(const std::string& path, bool existed) {
-        return {kNotifications, R"({"filePath":)" + json::serialize(json::Value(path)) +
-                                    R"(,"isExistingFile":)" + (existed ? "true}" : "false}")};
+        return {notificationChannel, R"({"filePath":)" + json::serialize(json::Value(path)) +
+                                         R"(,"isExistingFile":)" + (existed ? "true}" : "false}")};
     }
 
     static Message answer(bool written) {
@@ -134,7 +135,7 @@ TEST_F(WriteRequests, WithAMissingOrWrongKeyWriteAnnounceAndAnswerNothing) {
 
 TEST_F(WriteRequests, ThatAreNotJsonWriteAnnounceAndAnswerNothing) {
     for (const char* request : {"", "{", "[]", "true", " {}"}) {
-        EXPECT_THAT(bundle.send(kWriteRequests, request), IsEmpty()) << request;
+        EXPECT_THAT(bundle.send(writeRequestChannel, request), IsEmpty()) << request;
     }
 }
 

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Three message servers that stand for one another, and three hosts that work for them. The clients
+// Three message servers that replace one another, and three hosts that work for them. The clients
 // and what they do are those of a host's own server.
 import assert from "node:assert/strict";
 import { execFileSync } from "node:child_process";

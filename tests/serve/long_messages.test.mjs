@@ -50,7 +50,7 @@ test("a long text is written and read byte for byte, with progress", async (t) =
   assert.equal(last.bytes, last.total);
 });
 
-test("a long package is written and read as it was, parts that are no text included", async (t) => {
+test("a long package is written and read as it was, parts that are not text included", async (t) => {
   const { folder, client } = await start(t);
   const file = join(folder, "long.docx");
   const part = (partUri, contentType, content) => ({ partUri, contentType, content, relationship: [] });

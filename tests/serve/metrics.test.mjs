@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What a host tells programs that watch it.
+// What a host reports to monitoring programs.
 import assert from "node:assert/strict";
 import { spawnSync } from "node:child_process";
 import { mkdirSync, readFileSync, renameSync, writeFileSync } from "node:fs";
@@ -68,13 +68,13 @@ test("it counts what it is asked, by kind and outcome", async (t) => {
   } else {
     assert.equal(promtool.status, 0, `${promtool.stdout}${promtool.stderr}`);
   }
-  // The alerts are about what is told.
+  // The alerts use reported figures only.
   const file = join(ROOT, "packaging/prometheus/editor-serialization.rules.yml");
   const rules = readFileSync(file, "utf8");
   const names = new Set(rules.match(/\b(editor|process)_[a-z_]+\b/g));
   assert.ok(names.size >= 6);
   if (IS_SANITIZED) {
-    names.delete("editor_memory_limit_bytes"); // Without a limit there is none to tell.
+    names.delete("editor_memory_limit_bytes"); // Without a limit there is none to report.
   }
   for (const name of names) {
     assert.match(metrics, new RegExp(`^${name}[{ ]`, "m"));

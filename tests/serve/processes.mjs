@@ -51,9 +51,9 @@ export function isRunning(id) {
 
 export class Program {
   constructor(test, command, environment = {}) {
-    // A test program among them shall report to people, not to the runner of this one.
+    // A test program among them reports to people, not to the runner of this one.
     const { NODE_TEST_CONTEXT, ...env } = process.env;
-    // Earlier versions shall not be kept among the user's own.
+    // Earlier versions must not be kept among the user's own.
     env.XDG_STATE_HOME = temporaryFolder(test);
     if (IS_SANITIZED) {
       const suppressions = join(ROOT, "tests/serve/thread_sanitizer.supp");

@@ -6,13 +6,23 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <cerrno>
-#include <system_error>
 #include <utility>
+
+#include "platform/posix/system_error.h"
 
 namespace test {
 
-ChildProcess::ChildProcess(std::vector<std::string> command) {
+namespace {
+
+void replace(int stream, int descriptor) {
+    if (descriptor >= 0 && ::dup2(descriptor, stream) < 0) {
+        ::_exit(126);
+    }
+}
+
+}  // namespace
+
+ChildProcess::ChildProcess(std::vector<std::string> command, const StandardStreams& streams) {
     std::vector<char*> arguments;
     for (std::string& argument : command) {
         arguments.push_back(argument.data());
@@ -22,7 +32,7 @@ ChildProcess::ChildProcess(std::vector<std::string> command) {
     const pid_t parent = ::getpid();
     id_ = ::fork();
     if (id_ < 0) {
-        throw std::system_error(errno, std::generic_category(), "no process can be started");
+        platform::throwSystemError("no process can be started");
     }
     if (id_ == 0) {
         // Only what is safe after a fork of a program with threads.
@@ -30,6 +40,11 @@ ChildProcess::ChildProcess(std::vector<std::string> command) {
         if (::getppid() != parent) {
             ::_exit(1);
         }
+        // As a shell would start it, whatever this process does with signals.
+        ::signal(SIGPIPE, SIG_DFL);
+        replace(STDIN_FILENO, streams.input);
+        replace(STDOUT_FILENO, streams.output);
+        replace(STDERR_FILENO, streams.errors);
         ::execvp(arguments.front(), arguments.data());
         ::execv(elsewhere.c_str(), arguments.data());
         ::_exit(127);
@@ -62,9 +77,15 @@ void ChildProcess::signal(int number) const {
 
 int ChildProcess::wait() {
     int status = 0;
-    if (id_ <= 0 || ::waitpid(std::exchange(id_, -1), &status, 0) < 0) {
+    if (id_ <= 0) {
         return -1;
     }
+    while (::waitpid(id_, &status, 0) < 0) {
+        if (errno != EINTR) {
+            platform::throwSystemError("a process cannot be waited for");
+        }
+    }
+    id_ = -1;
     return WIFSIGNALED(status) ? -WTERMSIG(status) : WEXITSTATUS(status);
 }
 

@@ -16,13 +16,13 @@ extern "C" void __libc_free(void* memory);
 
 namespace {
 
-constexpr std::size_t kMostNoted = 100;
+constexpr std::size_t mostNoted = 100;
 
 std::atomic<std::size_t> inUse = 0;
 std::atomic<std::size_t> peak = 0;
 std::atomic<bool> isNoting = false;
 std::atomic<std::size_t> noted = 0;
-std::array<std::atomic<std::size_t>, kMostNoted> notedSizes;
+std::array<std::atomic<std::size_t>, mostNoted> notedSizes;
 std::size_t inUseAtBeginning = 0;
 
 void* taken(void* memory, std::size_t size) {
@@ -33,8 +33,8 @@ void* taken(void* memory, std::size_t size) {
     const std::size_t now = inUse += usable;
     for (std::size_t before = peak; now > before && !peak.compare_exchange_weak(before, now);) {
     }
-    if (size >= test::kLargeAllocation && isNoting) {
-        if (const std::size_t place = noted++; place < kMostNoted) {
+    if (size >= test::largeAllocation && isNoting) {
+        if (const std::size_t place = noted++; place < mostNoted) {
             notedSizes[place] = size;
         }
     }
@@ -99,7 +99,7 @@ Allocations endAccount() {
     isNoting = false;
     Allocations found;
     found.peak = peak - inUseAtBeginning;
-    for (std::size_t i = 0; i < std::min<std::size_t>(noted, kMostNoted); ++i) {
+    for (std::size_t i = 0; i < std::min<std::size_t>(noted, mostNoted); ++i) {
         found.large.push_back(notedSizes[i]);
     }
     return found;

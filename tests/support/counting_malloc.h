@@ -9,11 +9,11 @@
 namespace test {
 
 /// Large enough that only whole documents, and parts of them, are counted one by one.
-inline constexpr std::size_t kLargeAllocation = std::size_t{1} << 20U;
+inline constexpr std::size_t largeAllocation = std::size_t{1} << 20U;
 
 /// What was allocated between two moments.
 struct Allocations {
-    /// The sizes of those of kLargeAllocation bytes and more, in order; of the first 100 at most.
+    /// The sizes of those of largeAllocation bytes and more, in order; of the first 100 at most.
     std::vector<std::size_t> large;
 
     /// The most bytes that were in use at one time, beyond those in use at the beginning.

@@ -7,7 +7,7 @@
 
 namespace {
 
-constexpr long kNever = std::numeric_limits<long>::max();
+constexpr long noAllocation = std::numeric_limits<long>::max();
 
 // The allocations of `failingSize` bytes fail once `allocationsToSpare` of them were made.
 std::atomic<std::size_t> failingSize = 0;
@@ -16,8 +16,8 @@ std::atomic<int> allocationsToSpare = 0;
 // Allocations [firstFailing, lastFailing] fail.
 std::atomic<bool> isCounting = false;
 std::atomic<long> allocations = 0;
-std::atomic<long> firstFailing = kNever;
-std::atomic<long> lastFailing = kNever;
+std::atomic<long> firstFailing = noAllocation;
+std::atomic<long> lastFailing = noAllocation;
 
 thread_local int sparing = 0;
 
@@ -78,7 +78,7 @@ void failAllocationsOf(std::size_t size, int spared) {
 void failAllocation(long index, Failing which) {
     allocations = 0;
     firstFailing = index;
-    lastFailing = which == Failing::one ? index : kNever;
+    lastFailing = which == Failing::one ? index : noAllocation;
     isCounting = true;
 }
 

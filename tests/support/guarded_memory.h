@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Memory in which reading or writing behind the end is found out at once.
+// Memory in which reading or writing past the end is noticed at once.
 #pragma once
 
 #include <sys/mman.h>
@@ -10,7 +10,7 @@
 #include <stdexcept>
 #include <string_view>
 
-namespace tests {
+namespace test {
 
 /// Memory right before a page that cannot be read or written.
 class GuardedMemory {
@@ -41,4 +41,4 @@ public:
     char* end;
 };
 
-}  // namespace tests
+}  // namespace test

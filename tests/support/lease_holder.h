@@ -10,11 +10,12 @@
 
 namespace test {
 
-/// A process that has a write lease of a file: whoever opens the file has to wait until it lets go.
+/// A process that has a write lease of a file: programs that open the file have to wait until the
+/// lease is released.
 class LeaseHolder {
 public:
-    /// Takes the lease of `file`. When another process opens that, it lets go after `delay`; never,
-    /// as long as this object lives, without one.
+    /// Takes the lease of `file`. When another process opens it, the lease is released after
+    /// `delay`; without one, not before this object is destroyed.
     LeaseHolder(const std::filesystem::path& file, std::optional<std::chrono::milliseconds> delay);
     LeaseHolder(const LeaseHolder&) = delete;
     LeaseHolder& operator=(const LeaseHolder&) = delete;

@@ -7,16 +7,16 @@
 #include <utility>
 
 #include "json/serialize.h"
+#include "platform/messaging/channels.h"
 
 namespace test {
 namespace {
 
+using platform::messaging::readRequestChannel;
+using platform::messaging::readResponsePrefix;
+using platform::messaging::writeRequestChannel;
+using platform::messaging::writeResponsePrefix;
 using Clock = std::chrono::steady_clock;
-
-constexpr const char* readRequests = "/zpr/service/readRequest_cpp";
-constexpr const char* writeRequests = "/zpr/service/writeRequest_cpp";
-constexpr const char* readResponses = "/zpr/service/readResponse/";
-constexpr const char* writeResponses = "/zpr/service/writeResponse/";
 
 void check(natsStatus status) {
     if (status != NATS_OK) {
@@ -53,8 +53,8 @@ NatsClient::NatsClient(const std::vector<std::string>& servers, const std::strin
     check(natsOptions_SetReconnectWait(created, 50));
     check(natsOptions_SetSendAsap(created, true));
     check(natsConnection_Connect(&connection_, created));
-    readAnswers_ = subscribe(readResponses + name_ + ".*");
-    writeAnswers_ = subscribe(writeResponses + name_ + ".*");
+    readAnswers_ = subscribe(readResponsePrefix + name_ + ".*");
+    writeAnswers_ = subscribe(writeResponsePrefix + name_ + ".*");
 }
 
 NatsClient::~NatsClient() {
@@ -65,12 +65,13 @@ NatsClient::~NatsClient() {
 
 std::optional<std::string> NatsClient::read(json::Object request,
                                             std::chrono::milliseconds patience) {
-    return ask(readRequests, readResponses, *readAnswers_, std::move(request), patience);
+    return ask(readRequestChannel, readResponsePrefix, *readAnswers_, std::move(request), patience);
 }
 
 std::optional<std::string> NatsClient::write(json::Object request,
                                              std::chrono::milliseconds patience) {
-    return ask(writeRequests, writeResponses, *writeAnswers_, std::move(request), patience);
+    return ask(writeRequestChannel, writeResponsePrefix, *writeAnswers_, std::move(request),
+               patience);
 }
 
 bool NatsClient::publish(const std::string& channel, std::string_view payload) {

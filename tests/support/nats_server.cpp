@@ -5,15 +5,14 @@
 #include <netinet/in.h>
 #include <sys/socket.h>
 
-#include <cerrno>
 #include <chrono>
 #include <fstream>
 #include <iterator>
 #include <stdexcept>
-#include <system_error>
 #include <thread>
 
 #include "platform/posix/file_descriptor.h"
+#include "platform/posix/system_error.h"
 
 namespace test {
 namespace {
@@ -29,7 +28,7 @@ sockaddr_in loopback(int port) {
 platform::FileDescriptor makeSocket() {
     platform::FileDescriptor made(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
     if (made.get() < 0) {
-        throw std::system_error(errno, std::generic_category(), "no socket can be made");
+        platform::throwSystemError("no socket can be made");
     }
     return made;
 }
@@ -48,7 +47,7 @@ int freePort() {
     socklen_t size = sizeof address;
     if (::bind(probe.get(), reinterpret_cast<const sockaddr*>(&address), size) != 0 ||
         ::getsockname(probe.get(), reinterpret_cast<sockaddr*>(&address), &size) != 0) {
-        throw std::system_error(errno, std::generic_category(), "no port is free");
+        platform::throwSystemError("no port is free");
     }
     return ntohs(address.sin_port);
 }

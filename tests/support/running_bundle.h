@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The real bundle, loaded from its library and started on a bus of its own, with a client beside
-// it.
+// The real bundle, loaded from its library and started on a bus of its own; what it publishes and
+// what the bus logs.
 #pragma once
 
 #include <spdlog/logger.h>
@@ -16,31 +16,20 @@
 #include <vector>
 
 #include "framework/bundle_runner.h"
-#include "json/parser.h"
 #include "json/serialize.h"
 #include "json/value.h"
-#include "platform/messaging/in_process_bus.h"
+#include "platform/messaging/channels.h"
 #include "platform/messaging/message_service.h"
-#include "platform/messaging/transport.h"
+#include "tests/support/bundle_on_bus.h"
+#include "tests/support/message.h"
 
 namespace test {
 
-inline constexpr const char* kReadRequests = "/zpr/service/readRequest_cpp";
-inline constexpr const char* kWriteRequests = "/zpr/service/writeRequest_cpp";
-inline constexpr const char* kReadResponses = "/zpr/service/readResponse/";
-inline constexpr const char* kWriteResponses = "/zpr/service/writeResponse/";
-inline constexpr const char* kNotifications = "/zpr/service/notifyFileSystemRequest";
-
-/// A message that the bundle published.
-struct Message {
-    std::string channel;
-    std::string payload;
-    bool operator==(const Message&) const = default;
-};
-
-inline void PrintTo(const Message& message, std::ostream* out) {
-    *out << message.channel << ' ' << message.payload;
-}
+using platform::messaging::notificationChannel;
+using platform::messaging::readRequestChannel;
+using platform::messaging::readResponsePrefix;
+using platform::messaging::writeRequestChannel;
+using platform::messaging::writeResponsePrefix;
 
 /// What the message bus of this process has logged since the last call: one text for each request
 /// whose handler failed.
@@ -49,7 +38,7 @@ inline std::vector<std::string> takeBusLog() {
         auto ring = std::make_shared<spdlog::sinks::ringbuffer_sink_mt>(100'000);
         auto logger = std::make_shared<spdlog::logger>("messaging", ring);
         logger->set_pattern("%v");
-        // The bus takes a logger of this name that is there when it first has something to tell.
+        // The bus takes a logger of this name that exists when it logs for the first time.
         spdlog::register_logger(std::move(logger));
         return ring;
     }();
@@ -60,30 +49,13 @@ inline std::vector<std::string> takeBusLog() {
     return lines;
 }
 
+/// The bundle from its library, which notes what it publishes.
 class RunningBundle {
 public:
-    RunningBundle() {
-        takeBusLog();
-        using namespace platform::messaging;
-        setTransport([bus = bus_](const std::string& clientName, const MessageServiceOptions&) {
-            return bus->connect(clientName);
-        });
-        runner_ = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
-        client_ = bus_->connect("client").get();
-        observation_ = bus_->observe([this](std::string_view from, const JsonMessage& message) {
-            if (from == "EditorSerialization") {
-                const std::lock_guard lock(mutex_);
-                published_.push_back(
-                    {std::string(message.channel()), std::string(message.payload())});
-            }
-        });
-    }
-
     /// Sends `payload` and returns all that the bundle publishes until it has come to rest, in
     /// order.
     std::vector<Message> send(const std::string& channel, std::string_view payload) {
-        client_->publish(channel, platform::DataBuffer::copyOf(payload)).get();
-        bus_->waitUntilIdle();
+        bundle_.sendAndWait(channel, payload);
         return published();
     }
 
@@ -95,7 +67,7 @@ public:
 
     std::vector<Message> read(const std::string& path, const std::string& contentType,
                               const std::string& rtcId = "1") {
-        return send(kReadRequests, request(path, contentType, rtcId));
+        return send(readRequestChannel, request(path, contentType, rtcId));
     }
 
     static std::string request(const std::string& path, const std::string& contentType,
@@ -107,17 +79,19 @@ public:
         return json::serialize(json::Value(std::move(request)));
     }
 
-    platform::messaging::InProcessBus& bus() { return *bus_; }
-    framework::BundleRunner& runner() { return *runner_; }
+    platform::messaging::InProcessBus& bus() { return bundle_.bus(); }
 
 private:
-    std::shared_ptr<platform::messaging::InProcessBus> bus_ =
-        platform::messaging::InProcessBus::create();
+    const std::vector<std::string> oldLog_ = takeBusLog();  // before the bus logs anything
     std::mutex mutex_;
     std::vector<Message> published_;  // guarded by mutex_
-    std::shared_ptr<platform::messaging::MessageService> client_;
-    std::shared_ptr<platform::messaging::Subscription> observation_;
-    std::unique_ptr<framework::BundleRunner> runner_;
+    BundleOnBus<framework::BundleRunner> bundle_{
+        [this](const platform::messaging::JsonMessage& message) {
+            const std::lock_guard lock(mutex_);
+            published_.push_back({std::string(message.channel()), std::string(message.payload())});
+        },
+        {},
+        SERIALIZATION_BUNDLE};
 };
 
 }  // namespace test

@@ -23,22 +23,22 @@ namespace test {
 namespace {
 
 // What allocators, locks and the end of a thread need. Failing those is not about files.
-constexpr std::array kLeftAlone = {SYS_mmap,          SYS_munmap,
-                                   SYS_mremap,        SYS_mprotect,
-                                   SYS_madvise,       SYS_brk,
-                                   SYS_futex,         SYS_rt_sigprocmask,
-                                   SYS_sched_yield,   SYS_exit,
-                                   SYS_exit_group,    SYS_gettid,
-                                   SYS_getpid,        SYS_rt_sigreturn,
-                                   SYS_clock_gettime, SYS_set_robust_list,
-                                   SYS_sigaltstack,   SYS_sched_getaffinity};
+constexpr std::array leftAlone = {SYS_mmap,          SYS_munmap,
+                                  SYS_mremap,        SYS_mprotect,
+                                  SYS_madvise,       SYS_brk,
+                                  SYS_futex,         SYS_rt_sigprocmask,
+                                  SYS_sched_yield,   SYS_exit,
+                                  SYS_exit_group,    SYS_gettid,
+                                  SYS_getpid,        SYS_rt_sigreturn,
+                                  SYS_clock_gettime, SYS_set_robust_list,
+                                  SYS_sigaltstack,   SYS_sched_getaffinity};
 
 // Installs the filter in the calling thread. Returns the descriptor on which its calls are
 // announced.
 int installFilter() {
     std::vector<sock_filter> filter = {
         BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(seccomp_data, nr))};
-    for (const auto call : kLeftAlone) {
+    for (const auto call : leftAlone) {
         filter.push_back(BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, static_cast<unsigned>(call), 0, 1));
         filter.push_back(BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW));
     }

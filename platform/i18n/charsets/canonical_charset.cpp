@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Charsets in which a text has one right spelling, and whose converters take others too.
+// Charsets in which a text has one right spelling, although ICU's converters accept others too.
 #include "platform/i18n/charsets/canonical_charset.h"
 
 #include <algorithm>
@@ -49,12 +49,12 @@ std::unique_ptr<Charset> makeCanonical(std::string name, const char* converter, 
 }  // namespace
 
 std::unique_ptr<Charset> makeBocu1(std::string name, bool strict) {
-    // ICU takes trail bytes for lead bytes at the beginning of a text.
+    // ICU treats trail bytes as lead bytes at the beginning of a text.
     return makeCanonical(std::move(name), "BOCU-1", strict);
 }
 
 std::unique_ptr<Charset> makeGsm0338(std::string name, bool strict) {
-    // ICU takes an escape that begins no character for a space.
+    // ICU reads an escape that does not begin a character as a space.
     return makeCanonical(std::move(name), "gsm-03.38-2009", strict);
 }
 

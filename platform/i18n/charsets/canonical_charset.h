@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Charsets in which a text has one right spelling, and whose converters take others too.
+// Charsets in which a text has one right spelling, although ICU's converters accept others too.
 #pragma once
 
 #include <memory>
@@ -10,7 +10,7 @@
 namespace platform::i18n::detail {
 
 /// Open these charsets so that strict decoding refuses bytes which their text does not encode to;
-/// `name` is what error texts call them.
+/// `name` is used in error texts.
 std::unique_ptr<Charset> makeBocu1(std::string name, bool strict);
 std::unique_ptr<Charset> makeGsm0338(std::string name, bool strict);
 

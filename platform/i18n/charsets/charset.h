@@ -16,17 +16,17 @@ public:
     Charset& operator=(const Charset&) = delete;
     virtual ~Charset() = default;
 
-    /// The text that `bytes` spell. Malformed input throws std::runtime_error when the charset was
-    /// opened strict, else becomes U+FFFD. Strict decoding also refuses what `encode` would then
-    /// refuse.
+    /// The text of `bytes`. Malformed input throws std::runtime_error when the charset was opened
+    /// strict, else becomes U+FFFD. Strict decoding also refuses what `encode` would then refuse.
     virtual std::u16string decode(std::string_view bytes) = 0;
 
     /// The bytes of `text`. What the charset cannot hold throws std::runtime_error when the charset
     /// was opened strict, else becomes the charset's replacement.
     virtual std::string encode(std::u16string_view text) = 0;
 
-    /// Whether `bytes` are known to decode strictly and to be what their text encodes to, without
-    /// converting them, which takes several times as long. False where only converting can tell.
+    /// Whether `bytes` are known to decode strictly and to encode back to the same bytes. Does not
+    /// convert them, which would take several times as long; so false where only converting can
+    /// tell.
     virtual bool roundTrips(std::string_view bytes) {
         static_cast<void>(bytes);
         return false;

@@ -1,12 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
 // Which charset a name means, and what converts it.
 //
-// A name is looked up in the table below, then among ICU's names. What ICU makes of it, one of its
-// converters, is looked up in the table again, so that a row counts for all aliases of that
-// converter. A converter without a row is used as it is.
+// A name is looked up in the table below, then among ICU's names. The converter that ICU finds is
+// looked up in the table again, so that a row applies to all aliases of that converter. A converter
+// without a row is used as it is.
 //
-// One name often has several converters in ICU. IANA's meaning of it is taken, then MIME's, then
-// ICU's.
+// ICU often has several converters for one name. The one that IANA means is taken, else MIME's,
+// else ICU's.
 #include <unicode/ucnv.h>
 
 #include <algorithm>
@@ -29,7 +29,7 @@ namespace platform::i18n::detail {
 
 namespace {
 
-// Opens a charset; `name` is what error texts call it.
+// Opens a charset; `name` is used in error texts.
 using Maker = std::unique_ptr<Charset> (*)(std::string name, bool strict);
 
 struct Row {
@@ -103,18 +103,18 @@ constexpr Row table[] = {
     {"BOCU-1", makeBocu1},
     {"gsm-03.38-2009", makeGsm0338},
 
-    // Tables of ICU's with characters that are decoded and cannot be encoded.
+    // ICU's tables with characters that are decoded and cannot be encoded.
     {"euc-jp-2007", eucJp},
     {"euc-tw-2014", eucTw},
     {"ibm-1250_P100-1995", ibm1250},
 
-    // Names of ours for texts with the other code of characters that have two.
+    // Our own names, for texts with the other code of characters that have two.
     {"x-Shift_JIS-nec", makeShiftJisNec},
     {"x-Shift_JIS-ibm", makeShiftJisIbm},
     {"x-EUC-JP-nec", makeEucJpNec},
     {"x-Big5-eten", makeBig5Eten},
 
-    // Usual names which ICU lacks, or takes for another table than everyone else does.
+    // Usual names which ICU lacks, or maps to another table than everyone else does.
     {"UHC", nullptr, "windows-949-2000"},
     {"cp949", nullptr, "windows-949-2000"},
     {"cp950", nullptr, "windows-950-2000"},
@@ -139,7 +139,7 @@ const Row* rowOf(const char* name) {
     return found == std::end(table) ? nullptr : found;
 }
 
-// Whether `name` could be the name of a charset: short, and visible ASCII without a comma, behind
+// Whether `name` could be the name of a charset: short, and visible ASCII without a comma, after
 // which ICU would look for options.
 bool isPlausibleName(std::string_view name) {
     return !name.empty() && name.size() <= UCNV_MAX_CONVERTER_NAME_LENGTH &&
@@ -148,7 +148,7 @@ bool isPlausibleName(std::string_view name) {
 }
 
 // ICU's converter for the charset `name`; null when it lists none. Only names that it lists are
-// found, so that no name is taken for that of a file.
+// found, so that ICU does not look for a file of that name.
 const char* icuConverter(const char* name) {
     for (const char* standard : {"IANA", "MIME"}) {
         UErrorCode error = U_ZERO_ERROR;
@@ -181,7 +181,8 @@ std::optional<Row> resolve(std::string_view name) {
 
 std::unique_ptr<Charset> openCharset(std::string_view name, bool strict) {
     if (name == "UTF-8") {
-        // Every path, name and key is in it, and looking names up takes longer than most of these.
+        // Every path, name and key is in UTF-8, and looking up the charset takes longer than
+        // converting most of them.
         return makeUtf8("UTF-8", strict);
     }
     std::unique_ptr<Charset> charset;

@@ -13,7 +13,7 @@ namespace platform::i18n::detail {
 /// Throws std::runtime_error: the input ends inside the character that begins at byte `offset`.
 [[noreturn]] void throwTruncated(std::string_view charset, std::size_t offset);
 
-/// Throws std::runtime_error: the character at code unit `offset` has no place in `charset`.
+/// Throws std::runtime_error: `charset` lacks the character at code unit `offset`.
 [[noreturn]] void throwUnmappable(std::string_view charset, char32_t character, std::size_t offset);
 
 /// Throws std::runtime_error: code unit `offset` is a surrogate without its other half.
@@ -22,8 +22,8 @@ namespace platform::i18n::detail {
 /// Whether `text` begins with a surrogate pair.
 bool startsWithPair(std::u16string_view text);
 
-/// Throws what says why the character at code unit `offset` of `text` cannot be encoded: it is an
-/// unpaired surrogate, or has no place in `charset`.
+/// Throws the reason why the character at code unit `offset` of `text` cannot be encoded: it is an
+/// unpaired surrogate, or `charset` lacks it.
 [[noreturn]] void throwCannotEncode(std::string_view charset, std::u16string_view text,
                                     std::size_t offset);
 

@@ -6,7 +6,7 @@
 //     ~~              in ASCII, the character ~
 //     ~ line feed     in ASCII, nothing: the line goes on
 //
-// Our own because ICU's converter drops what is malformed or cut off without a word, and writes a
+// Our own because ICU's converter silently drops what is malformed or cut off, and writes a
 // needless ~} in front of every text.
 #include "platform/i18n/charsets/hz.h"
 
@@ -85,14 +85,14 @@ private:
         if (character) {
             take(*character, 2);
         } else if (nextIs("\n") && !strict_) {
-            // Some writers leave out the shift at the end of a line.
+            // Some programs omit the shift at the end of a line.
             inRows_ = false;
         } else {
             refuse(2);
         }
     }
 
-    // A shift right behind another is refused: encoding would leave both out.
+    // A shift right after another is refused: encoding would leave both out.
     void shift(bool toRows) {
         if (position_ == lastShiftEnd_ && strict_) {
             throwMalformed(name_, position_);
@@ -107,7 +107,7 @@ private:
         position_ += length;
     }
 
-    // What begins here is no character; it would have `length` bytes.
+    // Not a character begins here; it would have `length` bytes.
     void refuse(std::size_t length) {
         if (strict_ && length > bytes_.size() - position_) {
             throwTruncated(name_, position_);

@@ -9,8 +9,8 @@
 
 namespace platform::i18n::detail {
 
-/// Opens HZ-GB-2312 (RFC 1843); `name` is what error texts call it. Strict decoding refuses
-/// whatever encoding would not give back byte for byte: what is malformed or cut off, and also line
+/// Opens HZ-GB-2312 (RFC 1843); `name` is used in error texts. Strict decoding refuses whatever
+/// encoding would not give back byte for byte: what is malformed or cut off, and also line
 /// continuations and shifts that change nothing.
 std::unique_ptr<Charset> makeHz(std::string name, bool strict);
 

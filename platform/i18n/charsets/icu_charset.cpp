@@ -43,9 +43,8 @@ void checkOutOfMemory(UErrorCode error) {
     }
 }
 
-// What the control codes of ASCII stand for in ICU's table, and back. Tables of IBM's tradition
-// exchange 1A, 1C and 7F among themselves, which is right on its mainframes and in no file that
-// anyone has.
+// What the control codes of ASCII stand for in ICU's table, and back. Tables in IBM's tradition
+// permute 1A, 1C and 7F, which is right on its mainframes and not in anyone's files.
 class ControlCodes {
 public:
     explicit ControlCodes(UConverter* converter) {
@@ -71,7 +70,7 @@ public:
 private:
     using Table = std::array<char16_t, asciiDelete + 1>;
 
-    // The character that `byte` stands for; itself when it stands for none.
+    // The character that `byte` stands for; itself when it is none of these.
     static char16_t decodeAlone(UConverter* converter, char byte) {
         char16_t unit = 0;
         UErrorCode error = U_ZERO_ERROR;
@@ -97,7 +96,7 @@ private:
 };
 
 // Whether bytes of ASCII letters, digits and line ends stand for themselves; in EBCDIC they do not,
-// and its control codes are its own.
+// and it has control codes of its own.
 bool isAsciiCompatible(UConverter* converter) {
     constexpr std::string_view sample = "AZaz09\r\n";
     std::array<char16_t, sample.size()> text{};
@@ -112,7 +111,7 @@ bool isAsciiCompatible(UConverter* converter) {
            });
 }
 
-// Whether nothing but a table of codes makes the charset: no sequences of escapes or shifts that
+// Whether the charset is nothing but a table of codes: no sequences of escapes or shifts that
 // change the meaning of bytes, and no arithmetic.
 bool isTable(UConverter* converter) {
     constexpr std::array tables = {UCNV_SBCS, UCNV_DBCS, UCNV_MBCS, UCNV_LATIN_1, UCNV_US_ASCII};
@@ -131,8 +130,8 @@ bool hasFixedCodes(UConverter* converter) {
     return U_SUCCESS(error) && !uset_hasStrings(characters.get());
 }
 
-// Which codes of a converter round-trip; null where they are not fixed. One for all the charsets
-// that the converter is opened for, alive as long as the program.
+// Which codes of a converter round-trip; null where they are not fixed. One object for all uses of
+// the converter, for the life of the program.
 RoundTripCodes* roundTripCodesOf(UConverter* converter) {
     static std::mutex mutex;
     static std::map<std::string, std::unique_ptr<RoundTripCodes>> known;  // guarded by mutex
@@ -146,9 +145,9 @@ RoundTripCodes* roundTripCodesOf(UConverter* converter) {
     return found->second.get();
 }
 
-// Whether any of `characters` is in `text`. To the end in any case, and in units as wide as those
-// of the text, so that the compiler makes it five times faster than find_first_of, which took a
-// fifth of the time of decoding.
+// Whether any of `characters` is in `text`. Always goes to the end, in units as wide as those of
+// the text, so that the compiler makes it five times faster than find_first_of, which took a fifth
+// of the time of decoding.
 bool hasAnyOf(std::u16string_view text, std::u16string_view characters) {
     std::uint16_t found = 0;
     for (const char16_t character : characters) {
@@ -160,8 +159,8 @@ bool hasAnyOf(std::u16string_view text, std::u16string_view characters) {
 }
 
 // Called by ICU for what a converter cannot encode; leaving `error` as it is stops the conversion.
-// ICU's own callbacks drop characters that are usually invisible (U+200B, U+FEFF, U+200E) without a
-// word, and with them what a person meant.
+// ICU's own callbacks silently drop characters that are usually invisible (U+200B, U+FEFF, U+200E),
+// and so change the text.
 void stopEncoding(const void*, UConverterFromUnicodeArgs*, const UChar*, std::int32_t, UChar32,
                   UConverterCallbackReason, UErrorCode*) {}
 
@@ -247,9 +246,9 @@ private:
         return text;
     }
 
-    // Throws when `text`, which is that of `bytes`, would not survive encoding. Of tables it is
-    // known which characters do not. Elsewhere only encoding can tell: converters of several sets
-    // of characters decode sets which they do not encode.
+    // Throws when `text`, which is that of `bytes`, would not survive encoding. For tables, the
+    // characters that do not are known. Elsewhere only encoding can tell: converters of several
+    // sets of characters decode sets which they do not encode.
     void refuseOneWay(std::string_view bytes, std::u16string_view text) {
         if (isTable_) {
             if (hasAnyOf(text, oneWay_)) {
@@ -263,7 +262,8 @@ private:
             throwMalformed(name_, byteOffset(bytes, failure->place));
         }
         if (encoded != bytes && (text.empty() || decodeAll(encoded) != text)) {
-            // Another text, or nothing but shifts and escapes, of which nothing would be left.
+            // It decodes to another text, or is nothing but shifts and escapes, which would all be
+            // lost.
             const auto difference =
                 std::mismatch(bytes.begin(), bytes.end(), encoded.begin(), encoded.end());
             throwMalformed(name_, static_cast<std::size_t>(difference.first - bytes.begin()));
@@ -293,7 +293,7 @@ private:
 
     std::optional<EncodingFailure> encodeAll(std::u16string_view text, std::string& bytes) {
         if (text.empty()) {
-            // Some converters would begin even that with an escape sequence.
+            // Some converters would put an escape sequence even before empty text.
             return std::nullopt;
         }
         bytes.reserve(text.size());

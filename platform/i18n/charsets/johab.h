@@ -9,7 +9,7 @@
 
 namespace platform::i18n::detail {
 
-/// Opens Johab (KS X 1001 annex 3); `name` is what error texts call it.
+/// Opens Johab (KS X 1001 annex 3); `name` is used in error texts.
 std::unique_ptr<Charset> makeJohab(std::string name, bool strict);
 
 }  // namespace platform::i18n::detail

@@ -12,13 +12,13 @@
 namespace platform::i18n::detail {
 
 /// The round-tripping codes of one charset in which every character is one or two bytes whose
-/// meaning does not depend on what is around them; longer codes are taken for ones that do not. The
-/// table starts empty and learns each code from the charset when it first turns up. May be used by
+/// meaning does not depend on what is around them; longer codes count as ones that do not. The
+/// table starts empty and learns each code from the charset when it first occurs. May be used by
 /// several threads.
 class RoundTripCodes {
 public:
-    /// Whether each code in `bytes` round-trips. `charset`, opened strict, is asked about those
-    /// that have not turned up before.
+    /// Whether each code in `bytes` round-trips. `charset`, opened strict, converts those that have
+    /// not occurred before.
     bool holdAll(std::string_view bytes, Charset& charset);
 
 private:

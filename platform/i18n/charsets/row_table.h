@@ -14,13 +14,13 @@ namespace platform::i18n::detail {
 /// once made, so that threads may share it.
 class RowTable {
 public:
-    /// Where a character stands.
+    /// The place of a character.
     struct Place {
         std::uint8_t row;
         std::uint8_t column;
     };
 
-    /// Reads the table off the charset `euc`, in which both bytes of a character have their high
+    /// Reads the table from the charset `euc`, in which both bytes of a character have their high
     /// bit set. Characters for private use and those that do not encode back are left out.
     explicit RowTable(const char* euc);
 

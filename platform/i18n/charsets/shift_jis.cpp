@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Shift_JIS: all that is odd about it; the header tells it.
+// Shift_JIS: everything that is special about it. The header explains it.
 #include "platform/i18n/charsets/shift_jis.h"
 
 #include "platform/i18n/charsets/code_variants.h"
@@ -15,7 +15,7 @@ void replaceFileSeparators(Text& text, const std::string& charset) {
     if (charset != "Shift_JIS") {
         return;
     }
-    // Hardly a text has one, and find() sees that soonest.
+    // Hardly any text has one, which find() establishes fastest.
     for (auto at = text.find(fileSeparator); at != Text::npos;
          at = text.find(fileSeparator, at + 1)) {
         text[at] = endOfFileMark;

@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-// Shift_JIS: all that is odd about it.
+// Shift_JIS: everything that is special about it.
 //
 //  - The name means ICU's ibm-943_P15A-2003, which has the extensions of NEC and IBM.
-//  - Bytes 1A, 1C and 7F: that table exchanges them, as many tables of IBM do. They are exchanged
-//    back, so that each decodes to the control code of its own number (ControlCodes in
+//  - Bytes 1A, 1C and 7F: that table permutes them, as many of IBM's tables do. This is undone,
+//    so that each decodes to the control code of its own number (ControlCodes in
 //    icu_charset.cpp, for every such table). The bytes come back as they were.
 //  - U+001C in a text that is read from a file becomes U+001A, the end-of-file mark of DOS:
 //    restoreEndOfFileMarks, below. So it is 1A when it is written again.
@@ -22,10 +22,10 @@
 namespace platform::i18n {
 
 /// Replaces U+001C by U+001A in the text of a file in `charset` when that is "Shift_JIS", in just
-/// this spelling; leaves all others alone. Linear.
+/// this spelling; does nothing for others. Linear.
 void restoreEndOfFileMarks(std::u16string& text, const std::string& charset);
 
-/// The same on text that is encoded in `charset`. Neither code is a part of any other character.
+/// The same on text that is encoded in `charset`. Neither code is part of any other character.
 void restoreEndOfFileMarks(std::string& bytes, const std::string& charset);
 
 namespace detail {

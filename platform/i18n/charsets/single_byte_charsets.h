@@ -9,7 +9,7 @@
 
 namespace platform::i18n::detail {
 
-/// Open these charsets; `name` is what error texts call them.
+/// Open these charsets; `name` is used in error texts.
 std::unique_ptr<Charset> makeIso8859_16(std::string name, bool strict);
 std::unique_ptr<Charset> makeViscii(std::string name, bool strict);
 std::unique_ptr<Charset> makeKz1048(std::string name, bool strict);

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The encoding forms of Unicode. ICU has them too, but treats byte-order marks in ways of its own,
-// and is slower on the one charset that nearly every file is in.
+// The encoding forms of Unicode. ICU has them too, but handles byte-order marks differently, and is
+// slower on the one charset that nearly every file is in.
 #include "platform/i18n/charsets/unicode_charsets.h"
 
 #include <simdjson.h>
@@ -30,13 +30,21 @@ void appendCodePoint(std::u16string& text, char32_t character) {
     }
 }
 
-// The code point at `position`, which moves behind it; an unpaired surrogate is returned as it is.
-char32_t nextCodePoint(std::u16string_view text, std::size_t& position) {
+// The character at `position`, which moves past it. For an unpaired surrogate, throws if `strict`,
+// naming `charset`, else returns U+FFFD.
+char32_t nextCharacter(std::u16string_view text, std::size_t& position, const std::string& charset,
+                       bool strict) {
     const char16_t unit = text[position++];
+    if (!U_IS_SURROGATE(unit)) {
+        return unit;
+    }
     if (U16_IS_LEAD(unit) && position < text.size() && U16_IS_TRAIL(text[position])) {
         return static_cast<char32_t>(U16_GET_SUPPLEMENTARY(unit, text[position++]));
     }
-    return unit;
+    if (strict) {
+        throwUnpairedSurrogate(charset, position - 1);
+    }
+    return replacementCharacter;
 }
 
 class Utf8 final : public Charset {
@@ -44,8 +52,7 @@ public:
     Utf8(std::string name, bool strict) : name_(std::move(name)), strict_(strict) {}
 
     std::u16string decode(std::string_view bytes) override {
-        // One code unit for each byte is room enough: no sequence makes more units than it has
-        // bytes.
+        // One code unit for each byte is enough: no sequence becomes more units than it has bytes.
         std::u16string text(bytes.size(), u'\0');
         char16_t* out = text.data();
         std::size_t position = 0;
@@ -66,15 +73,7 @@ public:
         bytes.reserve(text.size() + text.size() / 8);
         std::size_t position = 0;
         while (position < text.size()) {
-            const std::size_t start = position;
-            char32_t character = nextCodePoint(text, position);
-            if (U_IS_SURROGATE(character)) {
-                if (strict_) {
-                    throwUnpairedSurrogate(name_, start);
-                }
-                character = replacementCharacter;
-            }
-            appendUtf8(bytes, character);
+            appendUtf8(bytes, nextCharacter(text, position, name_, strict_));
         }
         return bytes;
     }
@@ -282,15 +281,7 @@ public:
         char* out = bytes.data();
         std::size_t position = 0;
         while (position < text.size()) {
-            const std::size_t start = position;
-            char32_t character = nextCodePoint(text, position);
-            if (U_IS_SURROGATE(character)) {
-                if (strict_) {
-                    throwUnpairedSurrogate(name_, start);
-                }
-                character = replacementCharacter;
-            }
-            storeUnit<4>(out, character, order);
+            storeUnit<4>(out, nextCharacter(text, position, name_, strict_), order);
             out += 4;
         }
         bytes.resize(static_cast<std::size_t>(out - bytes.data()));

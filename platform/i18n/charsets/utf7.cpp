@@ -8,7 +8,7 @@
 //
 // The "-" can be left out in front of a direct character that is neither in base64's alphabet nor a
 // "-", and at the end of the text. Our own because ICU's converter drops a + that begins nothing,
-// and lets halves of surrogate pairs through.
+// and accepts halves of surrogate pairs.
 #include "platform/i18n/charsets/utf7.h"
 
 #include <unicode/utf16.h>
@@ -111,7 +111,7 @@ private:
                 bits &= (1U << count) - 1;
             }
         }
-        // What is left fills up the last digit, with zeros.
+        // The remaining bits fill the last digit, padded with zeros.
         if (count >= 6 || bits != 0) {
             refuse(start);
         }

@@ -9,7 +9,7 @@
 
 namespace platform::i18n::detail {
 
-/// Opens UTF-7 (RFC 2152); `name` is what error texts call it. A text has many spellings: encoding
+/// Opens UTF-7 (RFC 2152); `name` is used in error texts. A text has many spellings: encoding
 /// writes as many characters directly as the RFC allows, and ends every run of base64 with a "-"
 /// where that is needed, and at the end of the text.
 std::unique_ptr<Charset> makeUtf7(std::string name, bool strict);

@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-// What each character is to the language models.
+// How the language models see each character.
 //
 // The costs of signs are round figures, not counted ones: what matters is that quotation marks and
 // dashes are common, that a paragraph mark is not, and that text in the wrong charset is full of
-// characters that nobody writes, or not there.
+// characters that nobody writes, or not in such places.
 #include "platform/i18n/detection/character_traits.h"
 
 #include <unicode/uchar.h>
@@ -15,19 +15,21 @@ namespace platform::i18n::detail {
 
 namespace {
 
-// Bits of a character that is no text at all. One of them outweighs two or three odd letters.
+// Bits of a character that is not text at all. One of them outweighs two or three odd letters.
 constexpr int unassignedBits = 30;
 constexpr int controlBits = 24;
 constexpr int privateUseBits = 24;
-// Bits of signs: any sign that is not listed below, and what is added where a sign is out of place.
+// Bits of signs: the cost of signs that are not listed below, and what is added when a sign is out
+// of place.
 constexpr int rareSignBits = 13;
 constexpr int misplacedBits = 6;
-// Bits of a dash or bullet between blanks, and of an ornament behind another of its kind.
+// Bits of a dash or bullet between blanks, and of an ornament after another of its kind.
 constexpr int standingAloneBits = 4;
 constexpr int repeatedBits = 2;
 // Bits of a box drawing character by itself; half of that next to another one.
 constexpr int boxDrawingBits = 11;
-// The currency sign is in many charsets where others have a letter or the euro; nobody uses it.
+// The currency sign, which nobody uses: many charsets have it where others have a letter or the
+// euro.
 constexpr int currencySignBits = 16;
 
 // Where a sign is out of place.
@@ -62,7 +64,7 @@ constexpr CommonSigns commonSigns[] = {
     {currencySignBits, u"\u00A4"},
 };
 
-// Signs are out of place between two letters, but for those listed here.
+// Signs are out of place between two letters, except for those listed here.
 struct SignRules {
     std::uint16_t rules;
     std::u16string_view signs;

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What each character is to the language models: a letter, or a sign with a cost of its own.
+// How the language models see each character: a letter, or a sign with a cost of its own.
 #pragma once
 
 #include <cstdint>
@@ -19,7 +19,7 @@ struct CharacterTraits {
     char16_t lower;  // itself in lower case
     bool isLetter;   // a letter or a mark, a part of words
     LetterCase letterCase;
-    std::uint8_t signBits;    // of what is no letter: what it costs where it belongs
+    std::uint8_t signBits;    // of what is not a letter: what it costs where it belongs
     std::uint16_t signRules;  // and where it does not belong
 };
 
@@ -30,7 +30,7 @@ inline const CharacterTraits& traitsOf(char16_t c) {
     return allTraits()[c];
 }
 
-/// The cost of the non-ASCII character `sign`, which is no letter, between its neighbours; those
+/// The cost of the non-ASCII character `sign`, which is not a letter, between its neighbours; those
 /// are '\0' at the ends of the text.
 Cost signCost(char16_t before, char16_t sign, char16_t after);
 

@@ -2,7 +2,7 @@
 // The charset that a document says it is in.
 #include "platform/i18n/detection/declared_charset.h"
 
-#include <algorithm>
+#include "platform/text/case.h"
 
 namespace platform::i18n::detail {
 
@@ -11,12 +11,8 @@ namespace {
 constexpr std::size_t headSize = 4096;
 constexpr std::size_t longestName = 40;
 
-char lowered(char c) {
-    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
-}
-
 bool isNameCharacter(char c) {
-    const char low = lowered(c);
+    const char low = text::toLowerAscii(c);
     return (low >= 'a' && low <= 'z') || (c >= '0' && c <= '9') || c == '-' || c == '_' ||
            c == '.' || c == ':' || c == '+';
 }
@@ -32,7 +28,7 @@ std::size_t skip(std::string_view text, std::size_t position, bool (*skipped)(ch
     return position;
 }
 
-// The name that follows a keyword which ends at `position`: behind "=" or ":", perhaps in quotes.
+// The name that follows a keyword which ends at `position`: after "=" or ":", perhaps in quotes.
 std::string_view nameAfter(std::string_view text, std::size_t position) {
     position = skip(text, position, [](char c) { return c == ' ' || c == '\t'; });
     if (position == text.size() || (text[position] != '=' && text[position] != ':')) {
@@ -46,8 +42,7 @@ std::string_view nameAfter(std::string_view text, std::size_t position) {
 }  // namespace
 
 std::string declaredCharset(std::string_view bytes) {
-    std::string head(bytes.substr(0, headSize));
-    std::transform(head.begin(), head.end(), head.begin(), lowered);
+    const std::string head = text::toLowerAscii(bytes.substr(0, headSize));
     for (const std::string_view keyword : {"charset", "encoding", "coding"}) {
         for (std::size_t found = head.find(keyword); found != std::string::npos;
              found = head.find(keyword, found + 1)) {

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Charsets that switch between ASCII and other characters by escape sequences. All their bytes are
-// ASCII, so they have to be looked for before a file passes for plain ASCII.
+// ASCII, so this has to be checked before a file counts as plain ASCII.
 #include "platform/i18n/detection/escape_sequences.h"
 
 #include <algorithm>
@@ -20,8 +20,8 @@ constexpr const char* hzCharsets[] = {"HZ-GB-2312"};
 
 enum class Reading { none, sameText, sameBytes };
 
-// What comes back when `bytes` are read in `charset` and saved again. One text can be spelt with
-// different escape sequences, and a converter writes one of these spellings.
+// The bytes that result when `bytes` are read in `charset` and saved again. One text can be spelt
+// with different escape sequences, and a converter writes one of these spellings.
 Reading readingIn(const char* charset, std::string_view bytes) {
     try {
         const std::unique_ptr<Charset> opened = openCharset(charset, true);

@@ -9,20 +9,20 @@ namespace platform::i18n::detail {
 
 namespace {
 
-// Bits of a letter that the language does not have, beyond those of a word that ends there. The
-// letters of Latin-1 turn up in names and borrowed words everywhere; other Latin letters seldom do,
+// Bits of a letter that the language lacks, in addition to those of a word that ends there. The
+// letters of Latin-1 occur in names and borrowed words everywhere; other Latin letters seldom do,
 // other scripts hardly ever, and those do not change within a word.
 constexpr int westernLetterBits = 10;
 constexpr int latinLetterBits = 13;
 constexpr int foreignScriptBits = 15;
 constexpr int scriptChangeBits = 6;
 
-// Bits of a capital that opens a word or follows another capital, and of one behind a small letter.
+// Bits of a capital that opens a word or follows another capital, and of one after a small letter.
 constexpr double firstCapitalBits = 1;
 constexpr double nextCapitalBits = 0.25;
 constexpr double capitalInsideWordBits = 7;
 
-// Charsets lack letters that only names and foreign words have, and are used all the same: this
+// Charsets are used although they lack letters that only occur in names and foreign words: this
 // share of a language's letters may be missing.
 constexpr double acceptableGap = 0.005;
 
@@ -31,7 +31,7 @@ constexpr double acceptableGap = 0.005;
 constexpr int besideAsciiBits = 3;
 constexpr int loneBits = 4;
 constexpr int loneRareBits = 8;
-// Half-width katakana behind another, whichever it is.
+// Half-width katakana after another, whichever it is.
 constexpr int nextHalfWidthBits = 6;
 
 // Bits of characters that the samples of an ideographic language hold never or once.
@@ -88,7 +88,7 @@ BigramModel::BigramModel(const LetterTable& table) : table_(&table) {
             classes_[c] = !isLatinLetter ? foreignScript_ : traits.lower < 0x0100 ? western : latin;
         }
     }
-    // The table knows no foreign letters: there, a word ends before each and another begins after.
+    // The table has no foreign letters: a word ends before each, and another begins after it.
     stride_ = letters + 4;
     costs_.resize(stride_ * stride_);
     for (std::size_t before = 0; before < stride_; ++before) {

@@ -22,12 +22,12 @@ public:
     /// three kinds of other letters.
     using Class = std::uint8_t;
 
-    /// Learns from `table`, which must stay.
+    /// Made from `table`, which must outlive it.
     explicit BigramModel(const LetterTable& table);
 
     Class classOf(char16_t c) const;
 
-    /// The cost of a letter of class `current` behind one of class `before`, in whole; 0 where
+    /// The cost of a letter of class `current` after one of class `before`, in whole; 0 where
     /// neither is a letter.
     Cost cost(Class before, Class current) const { return costs_[before * stride_ + current]; }
 
@@ -48,14 +48,14 @@ private:
     Class foreignScript_;
 };
 
-/// The costs of a language written with thousands of characters: those of single characters, with
-/// something added for odd neighbours.
+/// The costs of a language written with thousands of characters: those of single characters, plus a
+/// penalty for odd neighbours.
 class UnigramModel {
 public:
-    /// Learns from `table`.
+    /// Made from `table`.
     explicit UnigramModel(const CharacterTable& table);
 
-    /// The cost of the letter `current` behind `before`, which is '\0' at the beginning of a word.
+    /// The cost of the letter `current` after `before`, which is '\0' at the beginning of a word.
     Cost cost(char16_t before, char16_t current) const;
 
     /// What is added where `current` has no other such character next to it in its word.
@@ -69,7 +69,7 @@ private:
 const std::vector<BigramModel>& bigramModels();
 const std::vector<UnigramModel>& unigramModels();
 
-/// The cost of words in `model`, or some cost above `limit` when it is above that. `pairs` are the
+/// The cost of words in `model`, or any value above `limit` when it is above that. `pairs` are the
 /// neighbours in them; `classOf` says of which class the character is that a unit stands for.
 template <class ClassOf>
 Cost costOfWords(std::span<const UnitPair> pairs, const BigramModel& model, ClassOf classOf,
@@ -87,12 +87,12 @@ Cost costOfWords(std::span<const UnitPair> pairs, const BigramModel& model, Clas
 /// The same, of a text whose units are characters.
 Cost costOfWords(const TextCounts& counts, const UnigramModel& model, Cost limit);
 
-/// The cost of a capital letter behind another character.
+/// The cost of a capital letter after another character.
 Cost capitalCost(LetterCase before);
 
-/// What any text costs beside the words of a language: its signs, capital letters in odd places and
-/// the ASCII between words; or some cost above `limit` when it is above that. `characters` holds
-/// what each unit of `counts` stands for, `traits` the traits of that.
+/// The cost of any text apart from the words of a language: its signs, capital letters in odd
+/// places and the ASCII between words; or any value above `limit` when it is above that.
+/// `characters` holds what each unit of `counts` stands for, `traits` the traits of that.
 template <class Characters>
 Cost costBesideWords(const TextCounts& counts, const Characters& characters,
                      const CharacterTraits* traits, Cost limit) {

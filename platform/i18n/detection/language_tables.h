@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// How often letters follow each other in each language: what decoded text is measured with.
+// How often letters follow each other in each language: the statistics against which decoded text
+// is measured.
 #pragma once
 
 #include <span>
@@ -7,11 +8,11 @@
 
 namespace platform::i18n::detail {
 
-/// A language with an alphabet, in one spelling. How unexpected a letter is stands there in quarter
-/// bits, each written as the character that many behind '0'. `frequencies` has it for each letter
-/// by itself. `costs` is a square of (letters + 1) rows and columns: row i, column j has it for
-/// letter j - 1 of the alphabet behind letter i - 1. Row and column 0 stand for what is no letter:
-/// where words begin and end.
+/// A language with an alphabet, in one spelling. The tables hold how unexpected a letter is, in
+/// quarter bits, each written as the character that many after '0'. `frequencies` has it for each
+/// letter by itself. `costs` is a square of (letters + 1) rows and columns: row i, column j has it
+/// for letter j - 1 of the alphabet after letter i - 1. Row and column 0 stand for no letter: where
+/// words begin and end.
 struct LetterTable {
     const char* language;
     std::u16string_view alphabet;

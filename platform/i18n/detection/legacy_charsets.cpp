@@ -27,7 +27,7 @@ constexpr CharsetKind ebcdic = CharsetKind::ebcdic;
 
 // The priors are guesses, in bits, that only decide where texts are short: files from Windows and
 // from the web are common (0 to 1), files from DOS and old Macintosh systems are not (2 to 5), and
-// what few people ever used is rarer still.
+// charsets that few people ever used are rarer still.
 constexpr KnownCharset knownCharsets[] = {
     {"Shift_JIS", multiByte, 0},
     {"EUC-JP", multiByte, 0},
@@ -183,7 +183,7 @@ LegacyCharset::Fit LegacyCharset::fit(std::string_view bytes) const {
                 return {true, std::string(name)};
             }
         } catch (const std::runtime_error&) {
-            // A code stands for a character that the charset itself has no code for.
+            // The text has a character that this charset cannot encode.
             continue;
         }
     }

@@ -28,7 +28,7 @@ public:
     const std::string& name() const { return name_; }
     CharsetKind kind() const { return kind_; }
 
-    /// How much rarer files in this charset are than those in the commonest.
+    /// How much rarer files in this charset are than those in the most common one.
     Cost prior() const { return prior_; }
 
     /// The text of `bytes`; nothing when they are malformed.

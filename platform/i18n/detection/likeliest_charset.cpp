@@ -4,12 +4,12 @@
 //     cost(charset) = prior(charset) - hint(charset) + beside words(charset)
 //                   + least over languages: prior(language) + words(charset, language)
 //
-// All are bits: the number in which a reader of the language would write the text down. The charset
-// with the lowest cost is taken. README.md tells where the figures come from.
+// All are numbers of bits: the length of the text in a code made for the language. The charset with
+// the lowest cost is taken. README.md says where the figures come from.
 //
 // Costs only grow as more of a text is looked at, and words are looked at in the order of how
-// common they are, so what cannot win is given up early. Charsets of several bytes come first: they
-// fail at once on other text, and on their own no other charset comes near them.
+// common they are, so candidates that cannot win are dropped early. Charsets of several bytes come
+// first: they fail at once on other text, and on their own no other charset comes near them.
 #include "platform/i18n/detection/likeliest_charset.h"
 
 #include <algorithm>
@@ -25,8 +25,8 @@ namespace platform::i18n::detail {
 
 namespace {
 
-// What a text saves in the charset that it names: as much as ten letters or so say. Declarations
-// are wrong often enough, as documents are converted without them.
+// What a text saves in the charset that it names: about as much evidence as ten letters.
+// Declarations are wrong often enough, as documents are converted without them.
 constexpr Cost hintBits = bits(40);
 
 constexpr Cost infinite = std::numeric_limits<Cost>::max() / 2;
@@ -40,10 +40,10 @@ bool isWordByte(char byte) {
            (byte >= 'A' && byte <= 'Z');
 }
 
-// What the plain ASCII words of a text say about the language of the others.
+// What the plain ASCII words of a text say about the language of its other words.
 class LanguagePriors {
 public:
-    // A word says half of what it would if all words were of one language: there is code, markup
+    // A word counts half of what it would if all words were of one language: there is code, markup
     // and English everywhere. And a few words beyond ASCII outweigh any number of others.
     static constexpr Cost share = 2;
     static constexpr Cost most = bits(12);
@@ -60,7 +60,7 @@ public:
                 least = std::min(least, costs_[&model] = cost / share);
             }
         }
-        // Languages in other scripts suffer by how much of the text is Latin.
+        // Languages in other scripts become less likely with the share of Latin in the text.
         const auto ascii = static_cast<Cost>(words.text.size());
         otherScripts_ = most * ascii / (ascii + 4 * static_cast<Cost>(words.beyondAscii) + 1);
         for (auto& [model, cost] : costs_) {
@@ -136,7 +136,7 @@ public:
     }
 
 private:
-    // A charset of single bytes with one of its languages, on the way through the words.
+    // A charset of single bytes and one of its languages, with its cost so far.
     struct Reading {
         const LegacyCharset* charset;
         const LegacyCharset::Language* language;
@@ -205,7 +205,7 @@ private:
         std::transform(sample_.begin(), sample_.end(), units.begin(),
                        [](char byte) { return static_cast<unsigned char>(byte); });
         const TextCounts counts(units);
-        // The commonest pairs tell which readings are worth while, the rest which is best.
+        // The commonest pairs decide which candidates are worth pursuing, the rest which is best.
         const std::span<const UnitPair> pairs(counts.pairs);
         const std::size_t few = std::min<std::size_t>(pairs.size(), 64);
         std::vector<Reading> readings = readingsOf(counts);
@@ -219,7 +219,7 @@ private:
         }
     }
 
-    // The readings that are not too dear before a word is looked at.
+    // The candidates that are not too expensive before any word is counted.
     std::vector<Reading> readingsOf(const TextCounts& counts) const {
         std::vector<Reading> readings;
         for (const LegacyCharset& charset : legacyCharsets()) {

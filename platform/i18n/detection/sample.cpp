@@ -1,8 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-// A part of a file from which its charset can be told.
+// Takes a sample of a file that is enough to detect its charset.
 //
-// Pieces from all over the file show its language. Then come the words around byte values that
-// these pieces lack: often two charsets differ in a single letter, and that letter may occur once.
+// Pieces from all over the file show its language. Added to them are the words around byte values
+// that these pieces lack: often two charsets differ in a single letter, and that letter may occur
+// once.
 #include "platform/i18n/detection/sample.h"
 
 #include <algorithm>
@@ -16,18 +17,18 @@ namespace {
 constexpr std::size_t wholeFileLimit = std::size_t{6} * 1024;
 constexpr std::size_t pieceCount = 16;
 constexpr std::size_t pieceSize = 256;
-// How far a piece may grow to begin and end where no character is cut: some texts have neither
-// blanks nor ends of lines for pages. A word around a rare byte is shorter.
+// How far a piece may grow so as not to cut a character: some texts have neither blanks nor line
+// ends for pages. A word around a rare byte is shorter.
 constexpr std::size_t boundarySearch = std::size_t{16} * 1024;
 constexpr std::size_t wordSearch = 64;
-// Of each byte value: one may be a slip.
+// Occurrences of each byte value: a single one may be a typing error.
 constexpr int wantedOccurrences = 2;
 
 bool isBeyondAscii(char byte) {
     return static_cast<unsigned char>(byte) >= 0x80;
 }
 
-// Bytes below '0' are in no charset a part of a character of several bytes.
+// In no charset are bytes below '0' part of a character of several bytes.
 bool isBoundary(char byte) {
     return static_cast<unsigned char>(byte) < 0x30;
 }
@@ -51,7 +52,7 @@ public:
             }
             take(position, position + pieceSize, boundarySearch);
         }
-        // Not one boundary in all of it: a text without a space or an end of line.
+        // There is no boundary in all of it: a text without spaces and line ends.
         if (sample_.empty()) {
             return std::string(bytes_.substr(0, boundarySearch));
         }
@@ -69,7 +70,7 @@ private:
         }
     }
 
-    // Adds the bytes from `begin` to `end` and what is around them up to the boundaries, if there
+    // Adds the bytes from `begin` to `end` and their surroundings up to the boundaries, if there
     // are any within `search` bytes.
     void take(std::size_t begin, std::size_t end, std::size_t search) {
         const std::size_t first = boundaryBefore(begin, search);
@@ -109,7 +110,7 @@ private:
     std::string_view bytes_;
     std::string sample_;
     std::array<int, 256> occurrences_{};
-    // Whether the sample wants more of a byte. All those beyond ASCII are rare at first.
+    // Whether the sample needs more of a byte. All bytes beyond ASCII are rare at first.
     std::array<bool, 256> isRare_ = [] {
         std::array<bool, 256> rare{};
         std::fill(rare.begin() + 0x80, rare.end(), true);

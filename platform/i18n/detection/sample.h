@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// A part of a file from which its charset can be told.
+// Takes a sample of a file that is enough to detect its charset.
 #pragma once
 
 #include <cstddef>
@@ -8,7 +8,7 @@
 
 namespace platform::i18n::detail {
 
-/// The bytes at which detection looks: all of a small file, and of a large one pieces from all over
+/// The bytes that detection examines: all of a small file, and of a large one pieces from all over
 /// it that hold bytes beyond ASCII, cut where no character is cut in any charset. Linear in the
 /// size.
 std::string charsetSample(std::string_view bytes);

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// How often which units of a text stand next to each other.
+// How often units of a text stand next to each other.
 #include "platform/i18n/detection/text_counts.h"
 
 #include <algorithm>
@@ -9,9 +9,10 @@ namespace platform::i18n::detail {
 
 namespace {
 
-// What ASCII costs, whichever: about the entropy of letters by themselves, punctuation included.
+// The cost of any ASCII character: about the entropy of letters by themselves, punctuation
+// included.
 constexpr Cost asciiBits = bits(5);
-// A control that no text holds.
+// A control character that texts do not hold.
 constexpr Cost strayControlBits = bits(20);
 
 // Counts keys: a hash table with open addressing.

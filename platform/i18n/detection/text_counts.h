@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// How often which units of a text stand next to each other: all that the language models ask.
+// How often units of a text stand next to each other: all that the language models need.
 #pragma once
 
 #include <cstdint>
@@ -10,14 +10,14 @@
 
 namespace platform::i18n::detail {
 
-/// Two neighbours, and how often they are that.
+/// Two neighbours, and how often they occur.
 struct UnitPair {
     char16_t before;
     char16_t current;
     std::uint32_t count;
 };
 
-/// A unit between its neighbours, and how often that is so.
+/// A unit between its neighbours, and how often they occur.
 struct UnitTriple {
     char16_t before;
     char16_t current;
@@ -26,10 +26,10 @@ struct UnitTriple {
 };
 
 /// Counts over a text. Its units are characters or, for charsets of single bytes, bytes: each of
-/// those charsets then costs only a look at the counts, however long the text is.
+/// those charsets then only costs a pass over the counts, however long the text is.
 ///
-/// Only runs of units that hold something beyond ASCII tell charsets apart: ASCII letters and
-/// units from 0x80 on. Everything else costs the same in every charset.
+/// Only runs of units that hold something beyond ASCII tell charsets apart: ASCII letters and units
+/// from 0x80 on. Everything else costs the same in every charset.
 struct TextCounts {
     enum class Runs { beyondAscii, all };
 

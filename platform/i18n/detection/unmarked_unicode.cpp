@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 // UTF-16 and UTF-32 without a byte-order mark.
 //
-// A text in them is told by what it costs: in the right byte order it is ordinary text, in any
-// other reading it is full of zeros or of characters from everywhere.
+// They are recognised by the text's cost: in the right byte order it is ordinary text, in any other
+// reading it is full of zeros or of characters from everywhere.
 #include "platform/i18n/detection/unmarked_unicode.h"
 
 #include <algorithm>
@@ -18,7 +18,7 @@ namespace platform::i18n::detail {
 
 namespace {
 
-// Enough for any language to show.
+// Enough to recognise any language.
 constexpr std::size_t sampleSize = 2048;
 // Text costs around five bits for a byte of UTF-16, other bytes eight and more.
 constexpr double plausibleBitsPerByte = 7;
@@ -28,8 +28,8 @@ struct Form {
     std::size_t unitSize;
 };
 
-// What the beginning costs in this form, a lot when it is malformed; some cost above `limit` when
-// it is above that.
+// The cost of the beginning in this form, very high when it is malformed; any value above `limit`
+// when it is above that.
 Cost costIn(const Form& form, std::string_view sample, Cost limit) {
     const TextCounts counts(openCharset(form.name, false)->decode(sample));
     const Cost cost = costBesideWords(

@@ -21,11 +21,11 @@ using std::chrono::milliseconds;
 
 constexpr milliseconds pollInterval{10};
 
-// Servers tell each account about its own connections: here about the one with the most to come.
+// Servers report each account's own connections; this asks for the one with the most pending bytes.
 constexpr const char* subject = "$SYS.REQ.ACCOUNT.PING.CONNZ";
 constexpr const char* question = R"({"sort":"pending","limit":1})";
 
-// The bytes that wait for the client for which most do, if the server tells within `timeout`.
+// The pending bytes of the client that has the most, if the server answers within `timeout`.
 std::optional<std::uint64_t> largestBacklog(const nats::Connection& connection,
                                             milliseconds timeout) {
     natsMsg* received = nullptr;

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What a NATS server has still to send to its clients.
+// Waits for what a NATS server still has to send to its clients.
 #pragma once
 
 #include <chrono>

@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "platform/messaging/nats/subject.h"
+#include "platform/text/quoted.h"
 
 namespace platform::messaging::nats {
 namespace {
@@ -21,15 +22,15 @@ constexpr std::int64_t connectTimeout = 5'000;  // these are milliseconds
 // Before the first server is tried again; a cluster's others are tried at once.
 constexpr std::int64_t reconnectWait = 500;
 
-// A server that stops answering without closing the connection is given up after a minute.
+// The connection to a server that stops answering is given up after a minute.
 constexpr std::int64_t pingInterval = 20'000;
 constexpr int unansweredPings = 2;
 
-// One that stops reading: what a large document may take on a slow line.
+// The same for a server that stops reading: the time that a large document may take on a slow line.
 constexpr std::int64_t writeDeadline = 60'000;
 
 // libnats calls back with a bare pointer, from a thread of its own and at times after the
-// connection is gone. So that pointer is a number, which is looked up.
+// connection is gone. So that pointer is in truth a number that is looked up.
 struct Listeners {
     std::mutex mutex;  // guards what follows
     std::unordered_map<std::uintptr_t, std::weak_ptr<ConnectionEvents>> byNumber;
@@ -53,7 +54,7 @@ std::string lastErrorOf(natsConnection* connection) {
     const char* text = nullptr;
     const natsStatus status = natsConnection_GetLastError(connection, &text);
     if (text != nullptr && *text != '\0') {
-        return printable(text);
+        return text::printable(text);
     }
     return status != NATS_OK ? natsStatus_GetText(status) : "the connection was cut";
 }
@@ -81,7 +82,8 @@ void onError(natsConnection* connection, natsSubscription* subscription, natsSta
     if (const auto events = find(number)) {
         const char* text = nats_GetLastError(nullptr);
         events->onError(
-            status, text != nullptr && *text != '\0' ? printable(text) : lastErrorOf(connection),
+            status,
+            text != nullptr && *text != '\0' ? text::printable(text) : lastErrorOf(connection),
             subscription);
     }
 }
@@ -144,7 +146,7 @@ void setBehaviour(natsOptions& made, const NatsOptions& options, const std::stri
     check(natsOptions_SetPingInterval(&made, pingInterval), failure);
     check(natsOptions_SetMaxPingsOut(&made, unansweredPings), failure);
     check(natsOptions_SetWriteDeadline(&made, writeDeadline), failure);
-    // Otherwise a thread of libnats sends what has gathered, a millisecond later.
+    // Otherwise a thread of libnats sends the buffered data a millisecond later.
     check(natsOptions_SetSendAsap(&made, true), failure);
 }
 
@@ -168,15 +170,15 @@ std::string withoutSecrets(std::string_view url) {
     return std::string(url.substr(0, start)) + std::string(url.substr(at + 1));
 }
 
-// Threads of libnats let go of connections, and with them of what they have of OpenSSL, at times of
-// their own: also when the process exits, where OpenSSL would be torn down under them. It is not
-// when its first user asks so, which libnats would be.
+// Threads of libnats release connections, and with them OpenSSL's objects, at any time, even while
+// the process exits, when OpenSSL would be cleaned up before them. It is not when its first user
+// asks so, which libnats would be.
 void keepOpenSslToTheEnd() {
     OPENSSL_init_crypto(OPENSSL_INIT_NO_ATEXIT, nullptr);
 }
 
-// Who has credentials signs what the server gives it. libnats 3.4 shows no signature that begins
-// with a zero byte, as one in 256 does; the next attempt has another to show.
+// A client with credentials signs what the server sends it. libnats 3.4 cannot send a signature
+// that begins with a zero byte, as one in 256 does; the next attempt has another signature.
 natsStatus connect(natsConnection*& connection, natsOptions& made, bool hasCredentials) {
     int attempts = hasCredentials ? 4 : 1;
     natsStatus status = NATS_OK;
@@ -186,7 +188,7 @@ natsStatus connect(natsConnection*& connection, natsOptions& made, bool hasCrede
     return status;
 }
 
-// How long a server may take to show that nothing more of a subscription is under way.
+// How long a server may take to show that nothing of a subscription is on its way any more.
 constexpr std::int64_t releaseTimeout = 1'000;
 
 }  // namespace
@@ -212,9 +214,9 @@ SubscriptionHandle Connection::own(natsSubscription* subscription) {
             }};
 }
 
-// The thread of libnats 3.4 that reads from the server may still have its hands on a subscription
-// that has been unsubscribed. It has not when it has come to the answer to a later ping; where
-// there is none, the subscription is kept until there is, or until that thread has ended.
+// The thread of libnats 3.4 that reads from the server may still be using a subscription that has
+// been unsubscribed. It is not once it has read the answer to a later ping; without an answer, the
+// subscription is kept until one comes, or until that thread has ended.
 void Connection::release(natsSubscription* subscription) {
     natsSubscription_Unsubscribe(subscription);
     std::vector<natsSubscription*> candidates;
@@ -230,7 +232,7 @@ void Connection::release(natsSubscription* subscription) {
         {
             const std::lock_guard lock(mutex_);
             if (std::erase(released_, candidate) == 0) {
-                continue;  // another thread has seen to it
+                continue;  // another thread has done it
             }
         }
         natsSubscription_Destroy(candidate);
@@ -257,13 +259,14 @@ ConnectionHandle openConnection(const NatsOptions& options, const std::string& n
 std::string serverOf(natsConnection* connection) {
     std::array<char, 512> url{};
     natsConnection_GetConnectedUrl(connection, url.data(), url.size());
-    return printable(withoutSecrets(std::string_view(url.data())));
+    return text::printable(withoutSecrets(std::string_view(url.data())));
 }
 
 std::string withoutSecrets(const std::vector<std::string>& urls) {
     std::string result;
     for (const std::string& url : urls) {
-        result += (result.empty() ? "" : ", ") + printable(withoutSecrets(std::string_view(url)));
+        result +=
+            (result.empty() ? "" : ", ") + text::printable(withoutSecrets(std::string_view(url)));
     }
     return result;
 }

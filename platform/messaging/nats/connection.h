@@ -28,8 +28,8 @@ public:
     /// True while a server is connected.
     bool isConnected() const;
 
-    /// The owner of a subscription on this connection, which it keeps open. At its end the
-    /// subscription is unsubscribed.
+    /// Owns a subscription on this connection, which it keeps open, and unsubscribes it when it is
+    /// destroyed.
     std::shared_ptr<natsSubscription> own(natsSubscription* subscription);
 
 private:
@@ -41,11 +41,11 @@ private:
     std::vector<natsSubscription*> released_;
 };
 
-// Shared, since a call that has begun may go on while another thread lets go.
+// Shared, since a call may go on while another thread gives the connection up.
 using ConnectionHandle = std::shared_ptr<Connection>;
 using SubscriptionHandle = std::shared_ptr<natsSubscription>;
 
-/// Is told of what happens to connections, on a thread of libnats. Must not throw.
+/// Called on events of connections, on a thread of libnats. Must not throw.
 class ConnectionEvents {
 public:
     ConnectionEvents() = default;
@@ -60,8 +60,8 @@ public:
     /// The connection is given up for good.
     virtual void onClosed(const std::string& reason) = 0;
 
-    /// A server refused something, or messages are dropped: then `subscription` tells where, which
-    /// may be gone by now and must not be used but for comparison.
+    /// A server refused something, or messages are dropped. Then `subscription` is the one
+    /// affected; it may be gone by now and may only be compared.
     virtual void onError(natsStatus status, const std::string& reason,
                          const natsSubscription* subscription) = 0;
 };
@@ -79,8 +79,8 @@ std::string serverOf(natsConnection* connection);
 /// The URLs without user names, passwords and tokens, for people to read.
 std::string withoutSecrets(const std::vector<std::string>& urls);
 
-/// Registers `events` for the connections that are opened with the number returned, until
-/// `forget`. What a late event of a closed connection concerns may thus be gone.
+/// Registers `events` for the connections that are opened with the number returned, until `forget`.
+/// So a late event of a closed connection does no harm.
 std::uintptr_t listen(const std::weak_ptr<ConnectionEvents>& events);
 void forget(std::uintptr_t listener);
 

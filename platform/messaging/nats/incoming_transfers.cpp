@@ -9,7 +9,7 @@
 namespace platform::messaging::nats {
 namespace {
 
-// How often a client that waits hears that it does.
+// How often a waiting client is told that it is still waiting.
 constexpr std::chrono::seconds reminderInterval{5};
 
 }  // namespace
@@ -73,7 +73,7 @@ IncomingTransfers::Progress IncomingTransfers::piece(const std::string& id, std:
         transfer.moved = now;
     }
     const std::size_t room = std::min(transfer.length, received + bytes.size() + windowSize);
-    // Not for every piece, where they are small.
+    // Not for every piece when pieces are small.
     if (room == transfer.room || (room < transfer.room + pieceSize && room != transfer.length)) {
         return {};
     }
@@ -160,7 +160,7 @@ bool IncomingTransfers::start(Transfer& transfer, Time now) {
     try {
         transfer.payload = std::make_shared<DataBuffer>(transfer.length);
     } catch (const std::exception&) {
-        return false;  // the system has less than was counted on
+        return false;  // the system has less memory than expected
     }
     transfer.reservation = std::move(reservation);
     transfer.room = aheadOf(transfer);

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Requests that come in pieces. A state machine without clock, threads or network: what happens is
-// told by calls, and what it wants sent is their result.
+// Requests that come in pieces. A state machine without clock, threads or network: events come in
+// as calls, and their results are the messages to send.
 //
 //   client                                  worker
 //     offer 9000000          ------------>    there is no memory for it yet: it waits
@@ -54,7 +54,8 @@ public:
         std::size_t mostOffers = 4096;
         std::size_t mostOffersOfAUser = 1024;
 
-        /// What all clients together may be ahead: less than a server holds for a worker.
+        /// How many bytes all clients together may have on the way: less than a server holds for a
+        /// worker.
         std::size_t mostAhead = std::size_t{128} << 20;
     };
 
@@ -62,8 +63,8 @@ public:
     IncomingTransfers(std::string worker, Limits limits, Reserve reserve)
         : worker_(std::move(worker)), limits_(limits), reserve_(std::move(reserve)) {}
 
-    /// A client offers a request of `length` bytes on `channel`. One that is known already is
-    /// told its room again.
+    /// A client offers a request of `length` bytes on `channel`. A client whose offer is known
+    /// already is told its room again.
     Notes offer(const std::string& channel, const ReturnAddress& address, std::uint64_t length,
                 Time now);
 
@@ -81,8 +82,8 @@ public:
     /// There may be memory again.
     Notes admitWaiting(Time now);
 
-    /// To be called about every second: ends what stands still, and tells those who wait that they
-    /// have not been forgotten.
+    /// Must be called about every second: ends transfers that stand still, and reminds waiting
+    /// clients that they still wait.
     Notes tick(Time now);
 
     /// Ends all of them.
@@ -99,7 +100,7 @@ private:
         std::shared_ptr<DataBuffer> payload;  // none while it waits
         Reservation reservation;
         std::size_t room = 0;      // up to where the client may send
-        std::size_t progress = 0;  // what had come when it was last seen to move
+        std::size_t progress = 0;  // the bytes that had come when it last made progress
         Time moved;
         Time told;
     };

@@ -37,7 +37,7 @@ bool isUnreachable(natsStatus status) {
            status == NATS_CONNECTION_CLOSED;
 }
 
-// What is left until `deadline`, and at least a millisecond, as libnats wants it.
+// The time left until `deadline`, and at least a millisecond, as libnats wants it.
 std::int64_t millisecondsUntil(Clock::time_point deadline) {
     return std::max<std::int64_t>(
         1, std::chrono::ceil<std::chrono::milliseconds>(deadline - Clock::now()).count());
@@ -76,7 +76,7 @@ void KeptConnection::connect(const std::string& name) {
     }
 }
 
-// Tries until a server is reached, one refuses, or the time for it is over.
+// Tries until a server is reached, one refuses, or the time is over.
 ConnectionHandle KeptConnection::connectPatiently(const std::string& name) {
     const Clock::time_point deadline = Clock::now() + options_.connectTimeout;
     for (auto delay = std::chrono::milliseconds(0); pause(delay); delay = nextDelay(delay)) {
@@ -134,7 +134,7 @@ void KeptConnection::reconnect(const std::string& name) {
     }
 }
 
-// Puts `made` in the place of the connection that there was, unless the bus has ended meanwhile.
+// Puts `made` in place of the connection that there was, unless the bus has ended meanwhile.
 void KeptConnection::use(ConnectionHandle& made) {
     const std::lock_guard lock(mutex_);
     if (stopping_) {
@@ -151,8 +151,8 @@ ConnectionHandle KeptConnection::connection() {
     return connection_;
 }
 
-// Subscribes on the connection that stands. When it is lost for good just then, that happens on the
-// next one.
+// Subscribes on the present connection. If that is just being lost for good, the next one gets the
+// subscription.
 void KeptConnection::attach(NatsSource& source) {
     try {
         source.attach(connection());
@@ -172,7 +172,7 @@ void KeptConnection::add(const std::shared_ptr<NatsSource>& source) {
         attach(*source);
         sources_.push_back(source);
     }
-    // Not before the server has it can others publish to it. Without a server there is nobody.
+    // Others can publish to it only once the server has it. Without a server there is nobody.
     if (isConnected()) {
         natsConnection_FlushTimeout(connection()->get(), subscribeTimeout);
     }
@@ -181,7 +181,7 @@ void KeptConnection::add(const std::shared_ptr<NatsSource>& source) {
 void KeptConnection::requirePermitted(const std::string& channel) {
     const char* reason = nullptr;
     // The text is the connection's own and is written anew with each error, such as those of a
-    // reconnection: it is looked at for a refusal only.
+    // reconnection: so it is read only after a refusal.
     if (natsConnection_GetLastError(connection()->get(), &reason) != NATS_NOT_PERMITTED) {
         return;
     }
@@ -230,7 +230,7 @@ void KeptConnection::requireSent(natsStatus status, const Connection& connection
         natsConnection_Close(connection.get());
     }
     check(status, "The message could not be sent");
-    // Not asked of libnats, whose lock the threads that send and receive contend for.
+    // Not asked from libnats, whose lock is contended by the threads that send and receive.
     if (disconnected_) {
         unsent_ = true;
     }
@@ -244,7 +244,7 @@ std::size_t KeptConnection::maxPayload() {
     }
     // Asked each time, since the next server, or this one after it was configured anew, may differ.
     const std::int64_t limit = connection ? natsConnection_GetMaxPayload(connection->get()) : 0;
-    // A server that has not said it yet says zero.
+    // Zero until a server has reported it.
     return static_cast<std::size_t>(limit > 0 ? std::min(limit, largestMessage) : largestMessage);
 }
 
@@ -308,7 +308,8 @@ void KeptConnection::onReconnected(const std::string& server) {
 }
 
 void KeptConnection::onClosed(const std::string& reason) {
-    // Having locked, as isStopping does: the keeper saw that it is closed, or waits by now.
+    // With the lock held, as isStopping does: the keeper has seen that it is closed, or is waiting
+    // by now.
     if (!isStopping()) {
         logger().warn("NATS has ended the connection: {}.", reason);
     }

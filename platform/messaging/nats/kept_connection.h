@@ -20,11 +20,11 @@
 
 namespace platform::messaging::nats {
 
-/// What of the exceptions says that a bus has been closed.
+/// The text of exceptions for a bus that has been closed.
 inline constexpr const char* closedText = "The message bus has been closed.";
 
-/// libnats restores a connection that breaks; when a server turns it away, libnats gives it up, and
-/// a thread of this object makes a new one. Any thread may call the operations.
+/// libnats restores a connection that breaks; when a server refuses it, libnats gives up, and a
+/// thread of this object makes a new one. Any thread may call the operations.
 class KeptConnection final : public ConnectionEvents,
                              public std::enable_shared_from_this<KeptConnection> {
 public:
@@ -45,7 +45,7 @@ public:
     void requirePermitted(const std::string& channel);
 
     /// Sends a message without a header. Throws std::runtime_error with the reason when it cannot
-    /// be sent, which holds also for a channel that is no subject.
+    /// be sent, which holds also for a channel that is not a subject.
     void publish(const std::string& channel, std::string_view payload);
 
     /// Sends a message with the header `key`.
@@ -61,7 +61,7 @@ public:
     /// How many times a lost connection has been replaced.
     std::uint64_t reconnects() const noexcept { return reconnects_; }
 
-    /// Makes no connection and takes no sources any more. What stands goes on.
+    /// Makes no more connections and takes no more sources. Those that exist go on.
     void stop();
 
     bool isStopping();
@@ -70,7 +70,7 @@ public:
     std::vector<std::shared_ptr<NatsSource>> sources();
 
     /// Sends what has been published, and closes the connection. Returns false when the server has
-    /// not got all of it by `deadline`.
+    /// not received all of it by `deadline`.
     bool close(std::chrono::steady_clock::time_point deadline);
 
     void onDisconnected(const std::string& reason) override;
@@ -106,7 +106,7 @@ private:
 
     std::mutex mutex_;  // guards what follows
     std::condition_variable changed_;
-    ConnectionHandle connection_;  // none before the first, and when it has been closed
+    ConnectionHandle connection_;  // none before the first and after closing
     bool stopping_ = false;
 };
 

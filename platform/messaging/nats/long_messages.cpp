@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// The transfers are asked under the mutex; what they want sent is sent without it, so that a server
-// that does not read holds up no thread that only has an answer to leave here. Pieces stay in
-// order, because all of them are sent by the one thread that handles what clients say.
+// The transfers are called under the mutex; their messages are sent without it, so that a server
+// that does not read does not block a thread that only leaves an answer here. Pieces stay in order,
+// because all of them are sent by the one thread that handles what clients say.
 #include "platform/messaging/nats/long_messages.h"
 
 #include <spdlog/logger.h>
@@ -73,8 +73,8 @@ public:
         auto owner = std::make_shared<Owner>();
         owner->payload = std::move(request->payload);
         owner->expectation = all_->expectAnswer(request->address);
-        // The reservation ends with the waiting: whoever handles the request has its memory
-        // admitted together with what else that takes.
+        // The reservation ends with the waiting: the handler reserves the request's memory together
+        // with what else it needs.
         return QueuedMessage{JsonMessage(channel_, payload, std::move(owner)),
                              std::move(request->reservation), nullptr};
     }
@@ -298,7 +298,7 @@ std::optional<ReturnAddress> LongMessages::addressOf(const std::string& channel,
     return address;
 }
 
-// Until what is returned is let go, answers on the channel may go in pieces.
+// While the result lives, answers on the channel may go in pieces.
 std::shared_ptr<const void> LongMessages::expectAnswer(const ReturnAddress& address) {
     const std::lock_guard lock(mutex_);
     const auto position = expected_.emplace(address.channel, address);
@@ -318,14 +318,14 @@ void LongMessages::sendAll(const Notes& notes) {
         try {
             send_(note);
         } catch (const std::exception& error) {
-            // The client hears nothing and asks again.
+            // The client gets no answer and asks again.
             logger().warn("A piece of a message was not sent: {}", error.what());
             return;
         }
     }
 }
 
-// Called by whoever gives memory back, with the mutex or without.
+// Called when memory is given back, with or without the mutex held.
 void LongMessages::onRoom() {
     hasRoom_ = true;
     timerWakes_.notify_one();

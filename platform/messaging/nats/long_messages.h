@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The worker's end of messages that travel in pieces: it picks the words of the protocol (pieces.h)
-// out of what comes from the servers and lets the transfers of both directions answer them.
+// The worker's end of messages that travel in pieces: it reads the protocol's messages (pieces.h)
+// from the servers and passes them to the transfers of both directions.
 #pragma once
 
 #include <atomic>
@@ -46,7 +46,7 @@ public:
     /// The subject on which clients speak to this worker alone.
     std::string subject() const { return piecesPrefix + worker_ + ".>"; }
 
-    /// Handles what comes on `subject`. To be called by one thread at a time.
+    /// Handles what comes on `subject`. Must be called by one thread at a time.
     void takeWord(natsMsg* received);
 
     /// Whether requests on `channel` may be long.
@@ -57,11 +57,11 @@ public:
     /// Handles what comes where requests on `channel` are offered.
     void takeOffer(const std::string& channel, natsMsg* received);
 
-    /// Has the answer to a short request on `channel` go in pieces if its client takes them, as
-    /// long as what is returned lives.
+    /// While the result lives, the answer to a short request on `channel` may go in pieces if its
+    /// client takes them.
     std::shared_ptr<const void> takeRequest(const std::string& channel, natsMsg* received);
 
-    /// Where the requests on `channel` that have come whole are to be taken from.
+    /// The source of the complete requests on `channel`.
     std::shared_ptr<MessageSource> wholeRequests(const std::string& channel);
 
     /// How long an answer on `channel` may be; none when no request is being handled whose client
@@ -72,9 +72,9 @@ public:
     /// when there is none, or it is short enough for one piece.
     bool publish(const std::string& channel, DataBuffer& payload);
 
-    /// Takes no more offers, has those that are not filled made again elsewhere, and waits until
-    /// the requests that are whole have been handled and the clients have taken their answers.
-    /// Returns false when `deadline` comes first.
+    /// Takes no more offers, has unfinished ones repeated at other workers, and waits until the
+    /// requests that are whole have been handled and the clients have taken their answers. Returns
+    /// false when `deadline` comes first.
     bool drain(Time deadline);
 
     /// Ends all transfers, and the thread.
@@ -105,7 +105,7 @@ private:
     OutgoingTransfers outgoing_;
     std::map<std::string, std::deque<WholeRequest>> whole_;  // to be handled, by channel
     std::multimap<std::string, ReturnAddress> expected_;     // answers, by channel
-    int sending_ = 0;  // words that have been taken whose replies are not all sent yet
+    int sending_ = 0;  // client messages whose replies are not all sent yet
     bool refusing_ = false;
     bool closed_ = false;
 

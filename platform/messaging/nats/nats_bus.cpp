@@ -25,6 +25,7 @@
 #include "platform/messaging/nats/subject.h"
 #include "platform/messaging/resolved.h"
 #include "platform/messaging/turns.h"
+#include "platform/text/quoted.h"
 
 namespace platform::messaging {
 namespace {
@@ -33,10 +34,11 @@ using Clock = std::chrono::steady_clock;
 using nats::KeptConnection;
 using nats::LongMessages;
 using nats::NatsSource;
-using nats::printable;
 using nats::ReceivedMessage;
+using text::printable;
 
-// What may wait of words about transfers: all that clients may have been told to send, and more.
+// The bound on waiting messages about transfers: all that clients may have been told to send, and
+// more.
 constexpr std::size_t maxPendingWords = 1 << 20;
 constexpr std::size_t maxPendingPieces = std::size_t{512} << 20;
 

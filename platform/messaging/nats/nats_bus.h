@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The message bus past the process: channels are subjects of NATS servers.
+// The message bus across processes: channels are subjects of NATS servers.
 #pragma once
 
 #include <chrono>
@@ -31,7 +31,7 @@ struct LongMessageOptions {
     std::size_t maxOutgoingBytes = std::size_t{2} << 30;
 };
 
-/// The servers of a bus, how it identifies itself to them, and how it delivers.
+/// The servers of a bus, its credentials for them, and how it delivers.
 struct NatsOptions {
     /// URLs, such as "nats://127.0.0.1:4222"; tried in random order. One that begins with "tls://"
     /// turns TLS on. Servers of the same cluster are learned from those that are reached.
@@ -68,13 +68,13 @@ struct NatsOptions {
     std::size_t concurrency = 0;
 
     /// Bounds on the messages and on their payload bytes that wait in the process for the handler
-    /// of one subscription. A message past one of them is dropped and the log tells of it. The
-    /// bound on messages is also one on how long a flood of small ones keeps the others waiting.
+    /// of one subscription. A message beyond one of them is dropped, which is logged. The bound on
+    /// messages also limits how long a flood of small ones delays the others.
     std::size_t maxPendingMessages = 8192;
     std::size_t maxPendingBytes = std::size_t{256} << 20;
 
     /// Bound on the bytes that are published while no server is reached, and sent when one is. The
-    /// message that takes them past it is still taken.
+    /// message that exceeds it is still taken.
     std::size_t maxUnsentBytes = std::size_t{64} << 20;
 
     LongMessageOptions longMessages;
@@ -95,9 +95,9 @@ struct NatsBacklog {
 ///
 /// When the connection is lost, another is made to the same server or the next one, for as long as
 /// it takes, and the subscriptions are made again. A publish future holds an exception when the
-/// channel is no valid subject (white space, empty), when the message is larger than the server
-/// takes and its receiver does not take pieces, and when it cannot be sent; it does not tell
-/// whether anyone got the message.
+/// channel is not a valid subject (white space, empty), when the message is larger than the server
+/// takes and its receiver does not take pieces, and when it cannot be sent; it does not say whether
+/// anyone received the message.
 ///
 /// Losses of the connection, dropped messages, messages that were not published and failures of
 /// handlers are logged to spdlog's logger "messaging", as by InProcessBus.
@@ -117,7 +117,7 @@ public:
     /// reached, or one refuses the connection.
     futures::Future<std::shared_ptr<MessageService>> connect(const std::string& clientName);
 
-    /// True while the connection to a server stands.
+    /// True while connected to a server.
     bool isConnected() const;
 
     /// How many times a lost connection has been replaced since the first `connect`.
@@ -129,8 +129,9 @@ public:
 
     /// Ends the bus in good order: unsubscribes at the server, has the handlers finish the messages
     /// that were taken, sends what they published, and closes the connection. Returns false when
-    /// that took longer than `timeout`, and what was left is given up. From then on every operation
-    /// fails. Also ends a `connect` that is still trying. Must not be called from a handler.
+    /// that takes longer than `timeout`; what is left is then given up. From then on every
+    /// operation fails. Also ends a `connect` that is still trying. Must not be called from a
+    /// handler.
     bool drain(std::chrono::milliseconds timeout);
 
 private:

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The delivery threads take turns: one waits in libnats while the others run the handler or queue
-// up behind it. A message thus wakes one thread, the one that handles it.
+// The delivery threads take turns: one waits in libnats while others run the handler or queue up
+// after it. A message thus wakes one thread, the one that handles it.
 #include "platform/messaging/nats/nats_source.h"
 
 #include <spdlog/logger.h>
@@ -13,6 +13,7 @@
 #include "platform/messaging/log.h"
 #include "platform/messaging/nats/handles.h"
 #include "platform/messaging/nats/subject.h"
+#include "platform/text/quoted.h"
 
 namespace platform::messaging::nats {
 namespace {
@@ -53,7 +54,7 @@ void NatsSource::attach(const ConnectionHandle& connection) {
               ? natsConnection_SubscribeSync(&made, connection->get(), channel_->c_str())
               : natsConnection_QueueSubscribeSync(&made, connection->get(), channel_->c_str(),
                                                   queueGroup_.c_str()),
-          "Cannot subscribe channel \"" + printable(*channel_) + "\"");
+          "Cannot subscribe channel \"" + text::printable(*channel_) + "\"");
     SubscriptionHandle subscription = connection->own(made);
     natsSubscription_SetPendingLimits(made, maxPendingMessages_, maxPendingBytes_);
     {
@@ -107,7 +108,7 @@ void NatsSource::detach(const SubscriptionHandle& subscription) {
 }
 
 void NatsSource::end() {
-    SubscriptionHandle subscription;  // let go without the mutex
+    SubscriptionHandle subscription;  // released without the mutex
     {
         const std::lock_guard lock(mutex_);
         finishing_ = true;
@@ -139,7 +140,7 @@ void NatsSource::drain(bool connected) {
          waiting == 0)) {
         natsSubscription_Unsubscribe(subscription.get());
     } else {
-        // Without a time limit of its own, past which it would drop messages.
+        // Without libnats' own time limit, after which it would drop messages.
         natsSubscription_DrainTimeout(subscription.get(), -1);
     }
 }
@@ -168,7 +169,7 @@ bool NatsSource::reportDropped(const natsSubscription* subscription) {
     if (subscription_.get() != subscription) {
         return false;
     }
-    logDropped(std::chrono::seconds(1));  // a flood of messages shall not be one of lines
+    logDropped(std::chrono::seconds(1));  // a flood of messages must not become one of log lines
     return true;
 }
 
@@ -185,7 +186,7 @@ void NatsSource::logDropped(std::chrono::steady_clock::duration minimalGap) {
     logger().error(
         "Slow consumer: the messages on channel \"{}\" come faster than they are handled, and {} "
         "of them or {} bytes may wait; {} messages have been dropped so far.",
-        printable(*channel_), maxPendingMessages_, maxPendingBytes_, dropped);
+        text::printable(*channel_), maxPendingMessages_, maxPendingBytes_, dropped);
 }
 
 }  // namespace platform::messaging::nats

@@ -21,7 +21,7 @@ namespace platform::messaging::nats {
 
 using ReceivedMessage = std::unique_ptr<natsMsg, Destroy>;
 
-/// Makes a message of what a server has sent; none when it is not one for the handler.
+/// Makes a message of what a server has sent; none when the handler must not get it.
 using Receive = std::function<std::optional<QueuedMessage>(ReceivedMessage)>;
 
 /// A message of all that `received` holds, which also keeps `companion`.
@@ -36,19 +36,19 @@ public:
     NatsSource(const std::string& channel, std::string queueGroup, std::size_t maxPendingMessages,
                std::size_t maxPendingBytes, std::size_t threads, Receive receive);
 
-    /// Subscribes on `connection`, in the place of an earlier one that is closed. Nothing happens
-    /// after `end` or `drain`. Throws NatsError.
+    /// Subscribes on `connection`, in place of an earlier one that is closed. Nothing happens after
+    /// `end` or `drain`. Throws NatsError.
     void attach(const ConnectionHandle& connection);
 
     std::optional<QueuedMessage> next() override;
     void end() override;
 
-    /// Unsubscribes at the server, and has `next` return none once the messages that were taken are
-    /// handed out. Does not wait.
+    /// Unsubscribes at the server; `next` returns none once the messages that were taken are
+    /// delivered. Does not wait.
     void drain(bool connected);
 
-    /// Waits until all threads have been told that there are no more messages, by which they have
-    /// finished those that they had. Returns false when `deadline` comes first.
+    /// Waits until all threads have learned that there are no more messages, and so have handled
+    /// theirs. Returns false when `deadline` comes first.
     bool waitUntilDrained(std::chrono::steady_clock::time_point deadline);
 
     /// What waits of the connection that stands, and was dropped of it.
@@ -73,7 +73,7 @@ private:
 
     std::mutex mutex_;  // guards what follows
     std::condition_variable changed_;
-    SubscriptionHandle subscription_;  // none: between connections, or when there is no more
+    SubscriptionHandle subscription_;  // none between connections and after the end
     bool finishing_ = false;           // no other subscription will come
     std::size_t finishedThreads_ = 0;
     std::int64_t loggedDrops_ = 0;  // of the subscription that stands

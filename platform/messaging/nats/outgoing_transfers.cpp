@@ -103,8 +103,8 @@ Reservation OutgoingTransfers::makeRoom(std::size_t bytes, const std::string& us
     }
 }
 
-// What to give up for `bytes` of `user`: what has stood still for the longest, of those that have
-// for too long or whose users have more waiting than this one would.
+// The transfer to give up for `bytes` of `user`: of those that have stood still for too long, or
+// whose users have more waiting than this one would, the one that has stood still the longest.
 OutgoingTransfers::Position OutgoingTransfers::mostExpendable(std::size_t bytes,
                                                               const std::string& user, Time now) {
     const auto held = bytesOf_.find(user);

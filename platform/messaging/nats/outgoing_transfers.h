@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Answers that leave in pieces. A state machine without clock, threads or network: what happens is
-// told by calls, and what it wants sent is their result.
+// Answers that leave in pieces. A state machine without clock, threads or network: events come in
+// as calls, and their results are the messages to send.
 //
 //   worker                                  client
 //     answer <worker> 9000000 ----------->
@@ -12,8 +12,7 @@
 //     ...
 //     piece 8388608, the rest ----------->    its memory is free again
 //
-// Either may send "stop" at any time. An answer that the client leaves where it is ends with
-// "stop".
+// Either may send "stop" at any time. An answer that the client does not fetch ends with "stop".
 #pragma once
 
 #include <cstddef>
@@ -36,20 +35,20 @@ public:
     OutgoingTransfers(std::string worker, Reserve reserve)
         : worker_(std::move(worker)), reserve_(std::move(reserve)) {}
 
-    /// Keeps `payload` for the client at `address`, who is told of it. When there is no memory for
+    /// Keeps `payload` for the client at `address` and announces it. When there is no memory for
     /// it, others are given up: those that have stood still for too long, and then those of a user
     /// who has more waiting than this one would. When that does not help, this client is told to
     /// ask again. A second answer for the same client's id is dropped.
     Notes answer(const ReturnAddress& address, DataBuffer payload, Time now);
 
-    /// The client `id` has room up to `end`. Released are at most `windowSize` bytes, so that a
-    /// client which claims endless room does not have servers hold a document for it.
+    /// The client `id` has room up to `end`. Sends at most `windowSize` bytes, so that a client
+    /// that claims endless room does not make servers hold a document for it.
     Notes room(const std::string& id, std::uint64_t end, Time now);
 
     /// The client `id` has given up.
     void stop(const std::string& id);
 
-    /// To be called about every second: ends what stands still.
+    /// Must be called about every second: ends transfers that stand still.
     Notes tick(Time now);
 
     /// Ends all of them.
@@ -64,7 +63,7 @@ private:
         std::string_view payload;
         std::shared_ptr<const void> owner;  // of the payload and of its reservation
         std::size_t sent = 0;
-        std::size_t progress = 0;  // what had been sent when it was last seen to move
+        std::size_t progress = 0;  // the bytes that had been sent when it last made progress
         Time moved;
     };
     using Position = std::map<std::string, Transfer>::iterator;

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The words in which a client and a worker speak about a message that travels in pieces, and what
-// both directions of such a transfer share (docs/protocol.md, "Long messages in pieces").
+// The messages of the protocol between a client and a worker for a message that travels in pieces,
+// and what both directions share (docs/protocol.md, "Long messages in pieces").
 //
 //   Zpr-Pieces: <word>[ <argument>]...
 //
@@ -30,7 +30,7 @@ inline constexpr const char* piecesHeader = "Zpr-Pieces";
 /// The longest piece.
 inline constexpr std::size_t pieceSize = std::size_t{1} << 20;
 
-/// How far a sender may be ahead of its receiver: what keeps a fast line busy, and no more than
+/// How far a sender may be ahead of its receiver: enough to keep a fast line busy, and no more than
 /// servers may hold for a receiver that stops.
 inline constexpr std::size_t windowSize = 4 * pieceSize;
 
@@ -42,7 +42,7 @@ struct ClientWord {
     std::uint64_t number = 0;  ///< The length, offset or end; 0 for words without an argument.
 };
 
-/// The word in `header`; none when it is none that a client says, or has other arguments.
+/// The word in `header`; none when clients send no such word, or its arguments are wrong.
 std::optional<ClientWord> parseClientWord(std::string_view header);
 
 /// Where the answer to a request goes: the client's id, and the channel with which it ends.
@@ -50,7 +50,7 @@ struct ReturnAddress {
     std::string id;
     std::string channel;
 
-    /// The user whose request it is: what precedes the first dot of the id.
+    /// The user of the request: what precedes the first dot of the id.
     std::string user() const { return id.substr(0, id.find('.')); }
 };
 
@@ -67,19 +67,20 @@ using Notes = std::vector<Note>;
 /// Tells the client at `address` that a transfer has ended unfinished.
 Note stopNote(const ReturnAddress& address, std::string_view reason);
 
-/// Memory that is counted as taken while this lives.
+/// A count of memory in use, given back when this is destroyed.
 using Reservation = std::shared_ptr<const void>;
 
-/// Counts so many bytes as taken; null when there is no room for them.
+/// Counts the bytes as in use; null when there is no room for them.
 using Reserve = std::function<Reservation(std::size_t bytes)>;
 
 using Time = std::chrono::steady_clock::time_point;
 
-/// What has to be sent for a transfer to count as moving, so that a byte now and then does not keep
-/// memory taken.
+/// The bytes that count as progress of a transfer, so that a byte now and then does not keep its
+/// memory.
 inline constexpr std::size_t leastProgress = std::size_t{64} << 10;
 
-/// How long a transfer may stand still: when nobody waits for its room, and when somebody does.
+/// How long a transfer may make no progress: when nobody waits for its memory, and when somebody
+/// does.
 inline constexpr std::chrono::seconds longestStandstill{30};
 inline constexpr std::chrono::seconds longestStandstillInTheWay{5};
 

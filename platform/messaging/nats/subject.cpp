@@ -7,6 +7,8 @@
 #include <cstddef>
 #include <stdexcept>
 
+#include "platform/text/quoted.h"
+
 namespace platform::messaging::nats {
 namespace {
 
@@ -15,13 +17,11 @@ namespace {
 // the payload's size.
 constexpr std::size_t longestSubject = 4000;
 
-constexpr std::size_t mostPrinted = 200;
-
 bool isBlankOrControl(char c) {
     return static_cast<unsigned char>(c) <= 0x20 || c == 0x7F;
 }
 
-// What keeps `channel` from being a subject; null when nothing does.
+// Why `channel` cannot be a subject; null when it can.
 const char* flawOf(std::string_view channel) {
     if (channel.empty()) {
         return "it is empty";
@@ -53,23 +53,9 @@ const char* flawOf(std::string_view channel) {
 
 void requireSubject(std::string_view channel) {
     if (const char* flaw = flawOf(channel)) {
-        throw std::invalid_argument("Channel \"" + printable(channel) +
+        throw std::invalid_argument("Channel \"" + text::printable(channel) +
                                     "\" is no NATS subject: " + flaw + ".");
     }
-}
-
-std::string printable(std::string_view text) {
-    constexpr char digits[] = "0123456789ABCDEF";
-    std::string result;
-    for (const char c : text.substr(0, mostPrinted)) {
-        const auto byte = static_cast<unsigned char>(c);
-        if (byte >= 0x20 && byte < 0x7F) {
-            result += c;
-        } else {
-            result += {'\\', 'x', digits[byte >> 4U], digits[byte & 0x0FU]};
-        }
-    }
-    return text.size() > mostPrinted ? result + "..." : result;
 }
 
 }  // namespace platform::messaging::nats

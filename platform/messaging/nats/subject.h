@@ -2,7 +2,6 @@
 // Which channels can be NATS subjects.
 #pragma once
 
-#include <string>
 #include <string_view>
 
 namespace platform::messaging::nats {
@@ -11,11 +10,7 @@ namespace platform::messaging::nats {
 /// the protocol as the subject of one message: text in UTF-8, without blanks and controls, of
 /// tokens between dots of which none is empty or a wildcard ("*", ">"), and short enough for a
 /// server's protocol line. A channel that breaks this could reach other subscribers than its own,
-/// or have the server close the connection.
+/// or make the server close the connection.
 void requireSubject(std::string_view channel);
-
-/// The text in printable ASCII, other bytes as \xNN, cut when it is long: for log lines and error
-/// texts, which channels must not be able to break up or forge.
-std::string printable(std::string_view text);
 
 }  // namespace platform::messaging::nats

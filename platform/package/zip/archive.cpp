@@ -19,6 +19,7 @@
 #include "platform/package/zip/limits.h"
 #include "platform/package/zip/little_endian.h"
 #include "platform/package/zip/names.h"
+#include "platform/posix/system_error.h"
 #include "platform/text/quoted.h"
 
 namespace platform::package::zip {
@@ -52,7 +53,7 @@ std::string_view asText(Bytes bytes) {
     return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
 }
 
-// The content of the extra field `id`, or nothing. What does not hold together ends the search.
+// The content of the extra field `id`, or nothing. Malformed data ends the search.
 std::optional<Bytes> extraField(Bytes extra, std::uint16_t id) {
     while (extra.size() >= 4) {
         const std::size_t length = read16(extra, 2);
@@ -107,7 +108,7 @@ void readZip64Numbers(Archive::Entry& entry, Bytes extra) {
     }
 }
 
-// Describes a file in which no archive was found by its first bytes.
+// Describes, by its first bytes, a file in which no archive was found.
 [[noreturn]] void failWithoutEndRecord(Bytes start) {
     constexpr std::array<std::uint8_t, 8> compoundFile = {0xD0, 0xCF, 0x11, 0xE0,
                                                           0xA1, 0xB1, 0x1A, 0xE1};
@@ -195,7 +196,7 @@ Archive::Directory Archive::findZip64Directory(std::uint64_t locatorOffset) cons
     }
     const Directory directory{read64(record, 32), read64(record, 48), read64(record, 40)};
     if (directory.offset > offset || directory.size > offset - directory.offset) {
-        fail("is a damaged zip archive: its directory reaches behind its end record");
+        fail("is a damaged zip archive: its directory reaches past its end record");
     }
     if (read64(record, 24) != directory.entryCount) {
         fail("is a zip archive that is split over several files");
@@ -246,7 +247,7 @@ void Archive::checkLayout(std::uint64_t dataEnd) const {
     for (const Entry& entry : entries_) {
         if (entry.offset > dataEnd || entry.compressedSize > dataEnd ||
             localHeaderSize + entry.compressedSize > dataEnd - entry.offset) {
-            failForEntry(entry.name, "reaches behind the end of the archive's data");
+            failForEntry(entry.name, "reaches past the end of the archive's data");
         }
         byOffset.push_back(&entry);
     }
@@ -306,7 +307,7 @@ void Archive::read(const Entry& entry, std::span<std::uint8_t> out) {
     }
 }
 
-// The name and the extra field of the local header may be other ones than the directory's.
+// The name and the extra field of the local header may differ from the directory's.
 std::uint64_t Archive::dataOffset(const Entry& entry) const {
     std::array<std::uint8_t, localHeaderSize> header{};
     readAt(entry.offset, header);
@@ -318,7 +319,7 @@ std::uint64_t Archive::dataOffset(const Entry& entry) const {
 
 void Archive::expand(const Entry& entry, std::uint64_t offset, std::span<std::uint8_t> out) {
     if (entry.compressedSize == 0 && out.empty()) {
-        return;  // some producers write nothing at all for no content
+        return;  // some producers write no bytes at all for empty content
     }
     const Bytes compressed = readCompressed(entry, offset);
     switch (libdeflate_deflate_decompress(decompressor_.get(), compressed.data(), compressed.size(),
@@ -369,7 +370,7 @@ void Archive::readAt(std::uint64_t offset, std::span<std::uint8_t> out) const {
             continue;
         }
         if (count < 0) {
-            throw std::system_error(errno, std::generic_category(), "cannot be read");
+            platform::throwSystemError("cannot be read");
         }
         if (count == 0) {
             fail("is truncated");

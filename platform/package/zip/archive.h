@@ -2,12 +2,12 @@
 // Reads zip archives: the directory when the archive is opened, and each entry's bytes on demand.
 //
 // The code of this folder is our own because the libraries for zip archives do not do three things
-// that documents need. They take memory before they look whether entries overlap or claim more than
-// their data can expand to; they say that an archive is bad, not what is wrong with which entry;
-// and they give no way to have the same bytes for the same entries, or to take over an entry's
-// deflated bytes only where these are known to be the very content.
+// that documents need. They take memory before they check whether entries overlap or claim more
+// than their data can expand to. They report that an archive is bad, but not what is wrong with
+// which entry. And they cannot write the same bytes for the same entries, or reuse an entry's
+// deflated bytes only where these are known to hold exactly the content.
 //
-// The archive is believed in nothing. Opening it takes time and memory in proportion to its
+// Nothing that the archive says is trusted. Opening it takes time and memory in proportion to its
 // directory, whose size is limited, and refuses archives whose entries overlap. Before entries are
 // read, requireWithinLimits refuses those that claim more than their data can expand to, or than
 // the limits allow (limits.h); what nobody reads may claim anything.
@@ -39,8 +39,8 @@ public:
         std::uint16_t flags = 0;
     };
 
-    /// Opens the archive at the UTF-8 `path` and reads its directory. What is no regular file is
-    /// refused, and not waited for; a lease of another program's is, for `patience`. Throws
+    /// Opens the archive at the UTF-8 `path` and reads its directory. What is not a regular file is
+    /// refused without waiting; a lease of another program is waited for, for `patience`. Throws
     /// std::runtime_error saying what is wrong with the file (without its path) or, about one
     /// entry, with its name.
     explicit Archive(const std::string& path, std::chrono::milliseconds patience = leasePatience);

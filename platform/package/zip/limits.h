@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-// How much of a package is accepted. A package is expanded into memory whole, and a file of a few
-// kilobytes can claim to expand to anything, so all of these are checked against what the archive
-// declares before memory is taken. The writer keeps to them too: what it writes can be read.
+// How much of a package is accepted. A package is expanded into memory as a whole, and a file of a
+// few kilobytes can claim to expand to anything, so all of these are checked against what the
+// archive declares before memory is taken. The writer keeps to them too: what it writes can be
+// read.
 #pragma once
 
 #include <cstddef>
@@ -28,10 +29,10 @@ constexpr std::uint64_t maxTotalBytes = 2048 * mebibyte;
 /// fill memory 1000 and more.
 constexpr std::uint64_t maxExpansionRatio = 256;
 
-/// Expanded bytes that are accepted whatever the ratio.
+/// Expanded bytes that are accepted at any ratio.
 constexpr std::uint64_t harmlessBytes = 64 * mebibyte;
 
-/// What one byte of deflated data can expand to at most: 258 bytes take two bits. A declared size
+/// The most that one byte of deflated data can expand to: 258 bytes take two bits. A declared size
 /// beyond that is wrong.
 constexpr std::uint64_t maxDeflateRatio = 1032;
 

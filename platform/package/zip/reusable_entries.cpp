@@ -15,7 +15,7 @@ ReusableEntries::ReusableEntries(const std::string& path) {
             byName_.try_emplace(entry.name, &entry);
         }
     } catch (const std::exception&) {
-        // There is no such file, or no archive: everything is deflated then.
+        // There is no such file, or it is not an archive: then everything is deflated.
         byName_.clear();
     }
 }

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Deflating is nearly all of what a save takes, and nearly every save changes one part of a
-// document that is on disk already: what is the same is taken over from there as it is.
+// Deflating takes most of the time of a save, and nearly every save changes one part of a document
+// that is on disk already. So the deflated bytes of unchanged entries are copied from there.
 #pragma once
 
 #include <cstddef>
@@ -16,20 +16,20 @@
 
 namespace platform::package::zip {
 
-/// The deflated entries of an archive that is about to be replaced, whoever wrote it. The file may
-/// be anything, and may vanish, be cut short or written to at any time: what cannot be read from
-/// it, for whatever reason, counts as not there.
+/// The deflated entries of an archive that is about to be replaced, whichever program wrote it. The
+/// file may be anything, and may vanish, be cut short or written to at any time: what cannot be
+/// read from it counts as absent.
 class ReusableEntries {
 public:
-    /// Looks at the archive at the UTF-8 `path`, without waiting for a lease of it. Takes time and
-    /// memory in proportion to its directory.
+    /// Reads the directory of the archive at the UTF-8 `path`, without waiting for a lease of it.
+    /// Takes time and memory in proportion to its directory.
     explicit ReusableEntries(const std::string& path);
 
     /// The deflated bytes of the entry `name` if they expand to exactly `content`, of which
-    /// `checksum` is the CRC-32, and are such as the writer would write: smaller, but not so small
-    /// that readers would take them for a bomb. Else nothing. Valid until the next call. All bytes
-    /// are compared: the checksum only spares expanding what has changed. Takes memory for the
-    /// largest content once more.
+    /// `checksum` is the CRC-32, and are as the writer would write them: smaller, but not so small
+    /// that readers would think them a decompression bomb. Else nothing. Valid until the next call.
+    /// All bytes are compared: the checksum only spares expanding what has changed. Takes memory
+    /// for the largest content once more.
     std::span<const std::uint8_t> find(std::string_view name, std::span<const std::uint8_t> content,
                                        std::uint32_t checksum) noexcept;
 

@@ -16,7 +16,7 @@ namespace {
 
 constexpr int compressionLevel = 6;
 constexpr std::uint16_t versionNeeded = 20;
-constexpr std::uint16_t dosDate = 1U << 5U | 1U;  // 1 January 1980, the first that there is
+constexpr std::uint16_t dosDate = 1U << 5U | 1U;  // 1 January 1980, the earliest date
 
 // All offsets fit their fields: content, and names in local headers and in the directory.
 static_assert(maxTotalBytes + 2 * maxDirectoryBytes < notIn32Bits);
@@ -101,8 +101,8 @@ std::span<const std::uint8_t> Writer::deflatedForm(std::string_view name,
     return {deflated_.get(), size};
 }
 
-// Deflates `content` into deflated_. Returns the size, or zero if that exceeds `maxSize`. What of
-// the buffer is not written to takes no memory.
+// Deflates `content` into deflated_. Returns the size, or zero if that exceeds `maxSize`. Parts of
+// the buffer that are not written take no memory.
 std::size_t Writer::deflate(std::span<const std::uint8_t> content, std::size_t maxSize) {
     if (deflatedCapacity_ < maxSize) {
         deflated_.reset();

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Writes zip archives, entry after entry, into a file that is written from front to back.
+// Writes zip archives, entry after entry, into a file that is written sequentially.
 //
 // Entries are written one by one and kept nowhere; only the directory is. Equal entries over equal
 // archives give equal bytes: all of them have one fixed date. The archives stay within limits.h,

@@ -240,7 +240,7 @@ TEST(SharedFutureState, DestroysAValueThatNobodyTakes) {
     EXPECT_TRUE(alive.expired());
 }
 
-// The rules of a state, told once more without threads or memory.
+// A model of a state's rules, without threads or memory.
 struct Model {
     unsigned status = 0;
     int value = 0;
@@ -321,7 +321,7 @@ std::string describe(const std::function<std::string()>& operation) {
     }
 }
 
-// A state that is told what to do by the numbers that the model understands too.
+// A state that is driven by the same numbers as the model.
 class Subject {
 public:
     std::string set(unsigned outcome, int number) {

@@ -106,7 +106,7 @@ TEST_F(RequestAdmission, HandlesSmallRequestsBesideLargeOnesThatWait) {
             return;
         }
         overlapped = overlapped || ++largeAtOnce > 1;
-        smallDone.wait();  // for ever if a large one had the other thread
+        smallDone.wait();  // would wait for ever if a large one had the other thread
         --largeAtOnce;
         ++largeDone;
     });

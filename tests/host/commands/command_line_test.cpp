@@ -8,6 +8,7 @@
 #include <string>
 #include <vector>
 
+#include "platform/messaging/channels.h"
 #include "tests/host/host_program.h"
 #include "tests/support/source_root.h"
 #include "tests/support/temporary_directory.h"
@@ -283,9 +284,9 @@ TEST(LogLevel, SilencesTheHost) {
 
 // A request that is no JSON makes the messaging library log the handler's failure.
 TEST(LogLevel, HoldsForTheMessagingLibrary) {
-    const std::string request = test::framed("/zpr/service/readRequest_cpp", "no JSON");
+    const std::string request = test::framed(platform::messaging::readRequestChannel, "no JSON");
     EXPECT_THAT(test::run(hostCommand({"stdio"}), request).errors,
-                HasSubstr("/zpr/service/readRequest_cpp"));
+                HasSubstr(platform::messaging::readRequestChannel));
     EXPECT_THAT(test::run(hostCommand({"stdio", "--log-level", "off"}), request).errors, IsEmpty());
 }
 

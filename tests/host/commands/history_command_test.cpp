@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "platform/messaging/channels.h"
 #include "tests/host/host_program.h"
 #include "tests/support/temporary_directory.h"
 
@@ -35,7 +36,7 @@ protected:
     Outcome writeByStdio(std::initializer_list<std::string> more) {
         std::vector<std::string> command = hostCommand({"stdio", "--history", state_});
         command.insert(command.end(), more);
-        return run(command, framed("/zpr/service/writeRequest_cpp",
+        return run(command, framed(platform::messaging::writeRequestChannel,
                                    R"({"rtcId":"1","contentType":"text/plain","filePath":")" +
                                        file_ + R"(","content":"x","encoding":"UTF-8"})"));
     }

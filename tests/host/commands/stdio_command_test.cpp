@@ -15,11 +15,18 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/messaging/channels.h"
 #include "tests/host/host_program.h"
+#include "tests/support/process_state.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
 
+using platform::messaging::notificationChannel;
+using platform::messaging::readRequestChannel;
+using platform::messaging::readResponsePrefix;
+using platform::messaging::writeRequestChannel;
+using platform::messaging::writeResponsePrefix;
 using test::framed;
 using test::framedReadRequest;
 using test::hostCommand;
@@ -34,10 +41,8 @@ using ::testing::IsEmpty;
 using ::testing::SizeIs;
 using ::testing::UnorderedElementsAre;
 
-constexpr const char* readRequests = "/zpr/service/readRequest_cpp";
-
 Message success(const std::string& rtcId, const std::string& data) {
-    return {"/zpr/service/readResponse/" + rtcId, "{\"data\":\"" + data + "\",\"status\":true}"};
+    return {readResponsePrefix + rtcId, "{\"data\":\"" + data + "\",\"status\":true}"};
 }
 
 class StdioCommand : public ::testing::Test {
@@ -93,7 +98,7 @@ TEST_F(StdioCommand, GivesRequestsThatAreNoneNoAnswerAndGoesOn) {
           "{\"contentType\":\"text/plain\",\"filePath\":\"" + file_ + "\"}",
           "{\"rtcId\":1,\"contentType\":\"text/plain\",\"filePath\":\"" + file_ + "\"}",
           std::string("{\"rtcId\":\"1\",\"contentType\":\"\",\"filePath\":\"caf\xE9\"}")}) {
-        EXPECT_THAT(answersTo(framed(readRequests, request) + good),
+        EXPECT_THAT(answersTo(framed(readRequestChannel, request) + good),
                     ElementsAre(success("good", "text")))
             << request.substr(0, 100);
     }
@@ -109,7 +114,7 @@ TEST_F(StdioCommand, WritesOutAllThatTheBundlePublishes) {
     const std::string newFile = folder_ / "new";
     const std::string request = "{\"rtcId\":\"7\",\"contentType\":\"text/plain\",\"filePath\":\"" +
                                 newFile + "\",\"content\":\"\xC3\xA9\",\"encoding\":\"UTF-8\"}";
-    EXPECT_THAT(answersTo(framed("/zpr/service/writeRequest_cpp", request)),
+    EXPECT_THAT(answersTo(framed(writeRequestChannel, request)),
                 ElementsAre(Message{"/zpr/service/notifyFileSystemRequest",
                                     "{\"filePath\":\"" + newFile + "\",\"isExistingFile\":false}"},
                             Message{"/zpr/service/writeResponse/7", "true"}));
@@ -148,7 +153,7 @@ TEST_F(StdioCommand, LeavesOutAMessageWhoseChannelWouldBreakTheFraming) {
         "\"contentType\":\"text/plain\",\"filePath\":\"" +
         file_ + "\"}";
     const Outcome outcome =
-        test::run(command_, framed(readRequests, hostile) + framedReadRequest("good", file_));
+        test::run(command_, framed(readRequestChannel, hostile) + framedReadRequest("good", file_));
     EXPECT_EQ(outcome.status, 0);
     EXPECT_THAT(messagesIn(outcome.output), ElementsAre(success("good", "text")));
     EXPECT_THAT(outcome.errors, HasSubstr("a message is left out"));
@@ -157,7 +162,7 @@ TEST_F(StdioCommand, LeavesOutAMessageWhoseChannelWouldBreakTheFraming) {
 TEST_F(StdioCommand, DoesNotFillTheLogWithWhatItDoesNotUnderstand) {
     std::string input;
     for (int i = 0; i < 1000; ++i) {
-        input += framed(readRequests, "no request");
+        input += framed(readRequestChannel, "no request");
     }
     const Outcome outcome = test::run(command_, input + framedReadRequest("good", file_));
     EXPECT_EQ(outcome.status, 0);
@@ -186,7 +191,7 @@ TEST_F(StdioCommand, CarriesLargeMessagesBothWays) {
     writeFile(file_, text);
     const std::string request = "{\"rtcId\":\"1\",\"contentType\":\"text/plain\",\"filePath\":\"" +
                                 file_ + "\",\"other\":\"" + text + "\"}";
-    const std::vector<Message> answers = answersTo(framed(readRequests, request));
+    const std::vector<Message> answers = answersTo(framed(readRequestChannel, request));
     ASSERT_THAT(answers, SizeIs(1));
     EXPECT_TRUE(answers[0] == success("1", text));
 }
@@ -197,7 +202,7 @@ TEST_F(StdioCommand, LosesNoneOfManyRequests) {
     std::vector<std::string> expected;
     for (std::size_t i = 0; i < count; ++i) {
         input += framedReadRequest(std::to_string(i), file_);
-        expected.push_back("/zpr/service/readResponse/" + std::to_string(i));
+        expected.push_back(readResponsePrefix + std::to_string(i));
     }
     std::vector<std::string> channels;
     for (const Message& answer : answersTo(input)) {
@@ -215,27 +220,16 @@ TEST_F(StdioCommand, LosesNoneOfManyLargeMessages) {
     std::vector<Message> expected;
     for (const std::string name : {"0", "1", "2", "3", "4", "5", "6", "7", "8", "9"}) {
         const std::string file = folder_ / name;
-        input += framed("/zpr/service/writeRequest_cpp",
+        input += framed(writeRequestChannel,
                         "{\"rtcId\":\"" + name + "\",\"contentType\":\"\",\"filePath\":\"" + file +
                             "\",\"content\":\"" + text + "\",\"encoding\":\"UTF-8\"}");
-        expected.push_back({"/zpr/service/notifyFileSystemRequest",
-                            "{\"filePath\":\"" + file + "\",\"isExistingFile\":false}"});
-        expected.push_back({"/zpr/service/writeResponse/" + name, "true"});
+        expected.push_back(
+            {notificationChannel, "{\"filePath\":\"" + file + "\",\"isExistingFile\":false}"});
+        expected.push_back({writeResponsePrefix + name, "true"});
     }
     const Outcome outcome = test::run(hostCommand({"stdio", "--max-message", "10MB"}), input);
     EXPECT_EQ(outcome.status, 0) << outcome.errors;
     EXPECT_EQ(messagesIn(outcome.output), expected);
-}
-
-// The largest amount of memory that a process has used, in bytes.
-std::size_t peakMemory(pid_t process) {
-    std::ifstream status("/proc/" + std::to_string(process) + "/status");
-    for (std::string line; std::getline(status, line);) {
-        if (line.starts_with("VmHWM:")) {
-            return std::stoul(line.substr(6)) * 1024;
-        }
-    }
-    return 0;
 }
 
 // A reader that is slower than the bundle slows it down, instead of letting answers pile up.
@@ -261,7 +255,7 @@ TEST_F(StdioCommand, KeepsItsMemoryBoundedWhenRequestsComeFasterThanAnswersAreTa
         ASSERT_FALSE(some.empty());
         taken += some.size();
     }
-    EXPECT_LT(peakMemory(program.id()), 300'000'000U);
+    EXPECT_LT(test::memoryOf(std::to_string(program.id()), "VmHWM"), 300'000'000U);
     EXPECT_EQ(program.finish().status, 0);
     EXPECT_EQ(taken, answersSize);
 }
@@ -302,9 +296,9 @@ TEST_F(StdioCommand, LeavesNoFileBehindWhenItIsAskedToEndDuringSaves) {
                                  R"("relationship":null,"content":")" +
                                  std::string(100'000, 'x') + R"("}],"relationships":[]})";
     const std::string file = folder_ / "document";
-    const std::string request = framed("/zpr/service/writeRequest_cpp",
-                                       R"({"rtcId":"1","contentType":"text/xml","filePath":")" +
-                                           file + R"(","content":)" + document + "}");
+    const std::string request =
+        framed(writeRequestChannel, R"({"rtcId":"1","contentType":"text/xml","filePath":")" + file +
+                                        R"(","content":)" + document + "}");
     for (int run = 0; run < 10; ++run) {
         test::Subprocess program(command_);
         // As many as a pipe does not hold, so that some of them have been taken.
@@ -366,7 +360,7 @@ TEST_F(StdioCommand, SurvivesMutatedRequestsAndAnswersTheNextOne) {
     std::mt19937 random(5);
     std::string input;
     for (int i = 0; i < 2000; ++i) {
-        input += framed(readRequests, mutated(test::readRequest("bad", file_), random));
+        input += framed(readRequestChannel, mutated(test::readRequest("bad", file_), random));
     }
     const std::vector<Message> answers = answersTo(input + framedReadRequest("good", file_));
     EXPECT_EQ(std::count(answers.begin(), answers.end(), success("good", "text")), 1);

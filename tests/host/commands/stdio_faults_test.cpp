@@ -14,7 +14,7 @@
 #include <string>
 #include <vector>
 
-#include "host/commands/exit_status.h"
+#include "host/exit_status.h"
 #include "tests/host/commands/stdio_run.h"
 #include "tests/support/system_call_supervisor.h"
 #include "tests/support/temporary_directory.h"

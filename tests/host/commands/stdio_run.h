@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // The command `stdio`, run within the test's process on one read request and one write request, so
-// that faults can be put in its way.
+// that faults can be injected.
 #pragma once
 
 #include <fcntl.h>
@@ -10,7 +10,6 @@
 #include <unistd.h>
 
 #include <array>
-#include <cerrno>
 #include <cstddef>
 #include <exception>
 #include <filesystem>
@@ -21,35 +20,23 @@
 #include <set>
 #include <string>
 #include <string_view>
-#include <system_error>
 #include <utility>
 #include <vector>
 
-#include "host/commands/exit_status.h"
 #include "host/commands/framing.h"
-#include "host/commands/standard_streams.h"
 #include "host/commands/stdio_command.h"
+#include "host/exit_status.h"
+#include "host/standard_streams.h"
 #include "platform/posix/file_descriptor.h"
+#include "platform/posix/system_error.h"
+#include "tests/support/message.h"
+#include "tests/support/process_state.h"
 #include "tests/support/temporary_directory.h"
 
 namespace test {
 
-inline std::size_t openDescriptors() {
-    using Entries = std::filesystem::directory_iterator;
-    return static_cast<std::size_t>(std::distance(Entries("/proc/self/fd"), Entries()));
-}
-
 class StdioRun : public testing::Test {
 protected:
-    struct Message {
-        std::string channel;
-        std::string payload;
-        bool operator==(const Message&) const = default;
-        friend void PrintTo(const Message& message, std::ostream* out) {
-            *out << message.channel << ' ' << message.payload;
-        }
-    };
-
     /// How a run of the command ended.
     struct Outcome {
         int status = 0;
@@ -169,7 +156,7 @@ private:
     static std::pair<platform::FileDescriptor, platform::FileDescriptor> makePipe() {
         std::array<int, 2> ends{};
         if (::pipe2(ends.data(), O_CLOEXEC) != 0) {
-            throw std::system_error(errno, std::generic_category(), "no pipe");
+            platform::throwSystemError("no pipe");
         }
         return {platform::FileDescriptor(ends[0]), platform::FileDescriptor(ends[1])};
     }

@@ -27,7 +27,9 @@
 #include "host/bus/bundle_host.h"
 #include "host/guard/guard.h"
 #include "host/limits/confinement.h"
+#include "json/parser.h"
 #include "platform/posix/file_descriptor.h"
+#include "tests/host/limits/two_folders.h"
 #include "tests/platform/i18n/detection/corpus.h"
 #include "tests/support/running_bundle.h"
 #include "tests/support/source_root.h"
@@ -43,7 +45,6 @@ using platform::messaging::JsonMessage;
 using test::Message;
 using test::readFile;
 using test::RunningBundle;
-using test::TemporaryDirectory;
 using test::writeFile;
 using testing::AnyOf;
 using testing::ElementsAre;
@@ -74,7 +75,7 @@ public:
     }
 
     std::vector<Message> read(const std::string& path, const std::string& contentType) {
-        return send(test::kReadRequests, RunningBundle::request(path, contentType, "1"));
+        return send(test::readRequestChannel, RunningBundle::request(path, contentType, "1"));
     }
 
 private:
@@ -111,23 +112,22 @@ json::Value minimalPackage() {
     return json::parse(R"({"parts": [], "relationships": []})");
 }
 
-// A folder to grant and one beside it, each with a text and a package. The parameter says whether
-// saves are guarded.
-class ConfinedBundle : public testing::TestWithParam<bool> {
+// Each folder with a text and a package. The parameter says whether saves are guarded.
+class ConfinedBundle : public test::TwoFolders, public testing::WithParamInterface<bool> {
 protected:
     void SetUp() override {
-        if (const auto reason = host::whyConfinementIsUnavailable()) {
-            GTEST_SKIP() << *reason;
+        TwoFolders::SetUp();
+        if (IsSkipped()) {
+            return;
         }
         for (const fs::path& folder : {inside, outside}) {
-            fs::create_directories(folder / "folder");
             writeFile(folder / "text", folder.filename().string());
             fs::copy_file(test::sourceRoot() + "/examples/report.docx", folder / "package");
         }
         host::GuardOptions options(GetParam());
         options.folder = scratch / "state";
         guard = host::makeGuard(options, {inside});
-        bundle = startConfined(Confinement({.readWrite = {inside}, .readOnly = {}}), guard);
+        bundle = startConfined(readWrite(), guard);
     }
 
     std::string read(const fs::path& path, const char* contentType) {
@@ -140,7 +140,7 @@ protected:
                                    json::Value content, const std::string& encoding = "UTF-8") {
         std::vector<std::string> payloads;
         for (Message& message :
-             bundle->send(test::kWriteRequests,
+             bundle->send(test::writeRequestChannel,
                           writeRequest(path, contentType, std::move(content), encoding))) {
             payloads.push_back(std::move(message.payload));
         }
@@ -184,9 +184,6 @@ protected:
         };
     }
 
-    const TemporaryDirectory scratch;
-    const fs::path inside = scratch / "inside";
-    const fs::path outside = scratch / "outside";
     FileDescriptor openFolder{
         (fs::create_directory(outside), ::open(outside.c_str(), O_PATH | O_CLOEXEC))};
     host::Guard guard;
@@ -369,11 +366,10 @@ TEST_P(ConfinedBundle, HandlesEveryCharsetAsItDoesUnconfined) {
     std::vector<fs::path> written;
     // The sanitizers make it slow, and find in some what they would in all.
     constexpr std::size_t step = UNDER_SANITIZERS ? 10 : 1;
-    const auto& corpus = platform::i18n::testing::corpusEntries();
+    const auto& corpus = test::corpusEntries();
     for (std::size_t i = 0; i < corpus.size(); i += step) {
         const auto& entry = corpus[i];
-        const auto bytes = platform::i18n::testing::iconvEncode(
-            entry.iconvName, platform::i18n::testing::corpusText(entry.language));
+        const auto bytes = test::iconvEncode(entry.iconvName, test::corpusText(entry.language));
         if (!bytes) {
             continue;
         }
@@ -388,8 +384,8 @@ TEST_P(ConfinedBundle, HandlesEveryCharsetAsItDoesUnconfined) {
         std::vector<std::string> results;
         for (const std::string& request : requests) {
             const bool isWrite = request.find("\"content\"") != std::string::npos;
-            const auto answers =
-                bundle->send(isWrite ? test::kWriteRequests : test::kReadRequests, request);
+            const auto answers = bundle->send(
+                isWrite ? test::writeRequestChannel : test::readRequestChannel, request);
             results.push_back(answers.empty() ? "no answer" : answers.back().payload);
         }
         for (const fs::path& path : written) {

@@ -22,7 +22,8 @@
 #include <thread>
 #include <vector>
 
-#include "host/commands/standard_streams.h"
+#include "host/standard_streams.h"
+#include "tests/host/limits/two_folders.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
@@ -33,7 +34,6 @@ using host::Confinement;
 using host::Grants;
 using platform::FileDescriptor;
 using test::readFile;
-using test::TemporaryDirectory;
 using test::writeFile;
 using testing::AnyOf;
 
@@ -71,22 +71,18 @@ std::string contentOf(const fs::path& path) {
 
 const std::string refused = "error " + std::to_string(EACCES);
 
-// A folder to grant and one beside it, each with a file and a folder in it.
-class ConfinementTest : public testing::Test {
+// Each folder with a file and a folder in it.
+class ConfinementTest : public test::TwoFolders {
 protected:
     void SetUp() override {
-        if (const auto reason = host::whyConfinementIsUnavailable()) {
-            GTEST_SKIP() << *reason;
+        TwoFolders::SetUp();
+        if (IsSkipped()) {
+            return;
         }
         for (const fs::path& folder : {inside, outside}) {
-            fs::create_directories(folder / "folder");
             writeFile(folder / "file", folder.filename().string());
             writeFile(folder / "folder/file", folder.filename().string());
         }
-    }
-
-    Confinement readWrite(int version = host::confinementVersion()) const {
-        return Confinement({.readWrite = {inside}, .readOnly = {}}, version);
     }
 
     // Each path leads to the file outside, but not on a confined thread.
@@ -108,10 +104,6 @@ protected:
     static std::string fdPath(const FileDescriptor& file) {
         return "/proc/self/fd/" + std::to_string(file.get());
     }
-
-    const TemporaryDirectory scratch;
-    const fs::path inside = scratch / "inside";
-    const fs::path outside = scratch / "outside";
 };
 
 // The same on kernels of several versions, as far as the running one can be like them.

@@ -13,15 +13,20 @@
 #include <vector>
 
 #include "host/limits/memory_limit.h"
+#include "platform/messaging/channels.h"
 #include "tests/host/host_program.h"
+#include "tests/support/process_state.h"
 #include "tests/support/temporary_directory.h"
+#include "tests/support/wait_until.h"
 
 namespace {
 
+using platform::messaging::readRequestChannel;
+using platform::messaging::readResponsePrefix;
 using test::hostCommand;
 using test::Outcome;
 
-constexpr std::uintmax_t kGigabyte = std::uintmax_t{1} << 30;
+constexpr std::uintmax_t gigabyte = std::uintmax_t{1} << 30;
 
 class MemoryLimit : public ::testing::Test {
 protected:
@@ -46,7 +51,7 @@ protected:
 
 TEST_F(MemoryLimit, MakesAFileThatIsLargerAFailedRequest) {
     const Outcome outcome =
-        test::run(hostCommand({"--memory-limit", "500MB", "read", sparse(kGigabyte), small}));
+        test::run(hostCommand({"--memory-limit", "500MB", "read", sparse(gigabyte), small}));
     EXPECT_EQ(outcome.status, 1);
     EXPECT_EQ(outcome.output,
               "{\"exception\":\"std::bad_alloc\",\"status\":false}\n"
@@ -61,12 +66,12 @@ TEST_F(MemoryLimit, IsThereWithoutBeingAskedFor) {
     const std::string text{std::istreambuf_iterator<char>(limits), {}};
     EXPECT_THAT(text, testing::ContainsRegex("Max data size +" +
                                              std::to_string(host::defaultMemoryLimit()) + " "));
-    EXPECT_GT(host::defaultMemoryLimit(), kGigabyte / 4);
+    EXPECT_GT(host::defaultMemoryLimit(), gigabyte / 4);
 }
 
 TEST_F(MemoryLimit, LeavesTheLimitOfTextsToTellOfAFileThatIsTooLargeForOne) {
     const Outcome outcome =
-        test::run(hostCommand({"--memory-limit", "500MB", "read", sparse(kGigabyte + 1), small}));
+        test::run(hostCommand({"--memory-limit", "500MB", "read", sparse(gigabyte + 1), small}));
     EXPECT_EQ(outcome.output,
               "{\"exception\":\"The text is too large: 1073741825 bytes, at most 1073741824 are "
               "accepted\",\"status\":false}\n"
@@ -95,16 +100,14 @@ std::string deepRequest(const std::string& rtcId, const std::string& file, std::
     return request + "\"deep\":" + std::string(levels, '[') + std::string(levels, ']') + "}";
 }
 
-constexpr const char* kReadRequests = "/zpr/service/readRequest_cpp";
-
 test::Message answer(const std::string& rtcId, const std::string& payload) {
-    return {"/zpr/service/readResponse/" + rtcId, payload};
+    return {readResponsePrefix + rtcId, payload};
 }
 
 TEST_F(MemoryLimit, HasARequestRefusedWhoseValuesWouldTakeMoreThanHalfOfIt) {
     const Outcome outcome =
         test::run(hostCommand({"--memory-limit", "200MB", "stdio"}),
-                  test::framed(kReadRequests, deepRequest("1", small, 2'000'000)) +
+                  test::framed(readRequestChannel, deepRequest("1", small, 2'000'000)) +
                       test::framedReadRequest("2", small));
     EXPECT_EQ(outcome.status, 0);
     const std::vector<test::Message> messages = test::messagesIn(outcome.output);
@@ -117,38 +120,26 @@ TEST_F(MemoryLimit, HasARequestRefusedWhoseValuesWouldTakeMoreThanHalfOfIt) {
 }
 
 TEST_F(MemoryLimit, LetsTenMillionLevelsThroughByDefault) {
-    if (host::defaultMemoryLimit() < 4 * kGigabyte) {
+    if (host::defaultMemoryLimit() < 4 * gigabyte) {
         GTEST_SKIP() << "the machine has too little memory";
     }
-    const Outcome outcome = test::run(
-        hostCommand({"stdio"}), test::framed(kReadRequests, deepRequest("1", small, 10'000'000)));
+    const Outcome outcome =
+        test::run(hostCommand({"stdio"}),
+                  test::framed(readRequestChannel, deepRequest("1", small, 10'000'000)));
     EXPECT_THAT(test::messagesIn(outcome.output),
                 testing::ElementsAre(answer("1", R"({"data":"text","status":true})")));
-}
-
-// The memory that a process has now, in bytes.
-std::size_t residentMemory(pid_t process) {
-    std::ifstream status("/proc/" + std::to_string(process) + "/status");
-    for (std::string line; std::getline(status, line);) {
-        if (line.starts_with("VmRSS:")) {
-            return std::stoul(line.substr(6)) * 1024;
-        }
-    }
-    return 0;
 }
 
 TEST_F(MemoryLimit, IsNotUsedUpByARequestThatIsDone) {
     test::Subprocess program(hostCommand({"stdio"}));
     program.write(test::framedReadRequest("1", small));
     EXPECT_NE(program.readSome(), "");
-    const std::size_t before = residentMemory(program.id());
-    program.write(test::framed(kReadRequests, deepRequest("1", small, 3'000'000)));
+    const auto memory = [&] { return test::memoryOf(std::to_string(program.id()), "VmRSS"); };
+    const std::size_t before = memory();
+    program.write(test::framed(readRequestChannel, deepRequest("1", small, 3'000'000)));
     EXPECT_NE(program.readSome(), "");
     // The answer comes before the request's values are given back.
-    for (int i = 0; i < 600 && residentMemory(program.id()) > before + kGigabyte / 20; ++i) {
-        std::this_thread::sleep_for(std::chrono::milliseconds(100));
-    }
-    EXPECT_LE(residentMemory(program.id()), before + kGigabyte / 20);
+    EXPECT_TRUE(test::waitUntil([&] { return memory() <= before + gigabyte / 20; }));
 }
 
 TEST_F(MemoryLimit, OfLessThanTheProgramTakesIsWrongUsage) {

@@ -8,21 +8,17 @@
 #include <filesystem>
 #include <future>
 #include <memory>
-#include <thread>
 
 #include "tests/support/temporary_directory.h"
+#include "tests/support/wait_until.h"
 
 namespace {
 
 using host::HealthCheck;
 using std::chrono::milliseconds;
 
-// Waits until the check says `expected`; returns whether it did.
 bool comesToSay(const HealthCheck& check, bool expected) {
-    for (int count = 0; count < 6000 && check.isHealthy() != expected; ++count) {
-        std::this_thread::sleep_for(milliseconds(10));
-    }
-    return check.isHealthy() == expected;
+    return test::waitUntil([&] { return check.isHealthy() == expected; });
 }
 
 TEST(HealthCheck, SaysWhetherTheFoldersCanBeRead) {

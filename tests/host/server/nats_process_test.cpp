@@ -2,14 +2,14 @@
 #include "host/server/nats_process.h"
 
 #include <gtest/gtest.h>
-#include <stdlib.h>
 #include <sys/stat.h>
 
 #include <chrono>
 #include <filesystem>
-#include <fstream>
 #include <stdexcept>
 #include <string>
+
+#include "tests/support/temporary_directory.h"
 
 namespace {
 
@@ -20,21 +20,18 @@ using std::chrono::milliseconds;
 class NatsProcessPorts : public ::testing::Test {
 protected:
     NatsProcessPorts() {
-        std::string name = (std::filesystem::temp_directory_path() / "process.XXXXXX").string();
-        folder_ = ::mkdtemp(name.data());
         write("server", "#!/bin/sh\nexec sleep 1000\n");
         ::chmod((folder_ / "server").c_str(), S_IRWXU);
     }
-    ~NatsProcessPorts() override { std::filesystem::remove_all(folder_); }
 
     void write(const std::string& name, const std::string& text) {
-        std::ofstream(folder_ / name) << text;
+        test::writeFile(folder_ / name, text);
     }
 
     NatsProcess start() const { return {folder_ / "server", folder_ / "conf", -1}; }
 
 private:
-    std::filesystem::path folder_;
+    const test::TemporaryDirectory folder_;
 };
 
 TEST_F(NatsProcessPorts, AreKnownWhenTheirFileIsWhole) {

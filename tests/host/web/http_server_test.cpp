@@ -22,6 +22,7 @@
 #include <vector>
 
 #include "platform/posix/file_descriptor.h"
+#include "tests/support/wait_until.h"
 
 namespace {
 
@@ -173,12 +174,7 @@ TEST_F(Http, AHeadThatDoesNotComeInTimeEndsTheConnectionHoweverItTrickles) {
     const FileDescriptor silent = connect();
     const FileDescriptor slow = connect();
     send(slow, "GET / HTTP/1.1\r\nX: ");
-    bool isTaken = true;
-    for (int count = 0; count < 6000 && isTaken; ++count) {
-        std::this_thread::sleep_for(milliseconds(10));
-        isTaken = send(slow, "x");
-    }
-    EXPECT_FALSE(isTaken);
+    EXPECT_TRUE(test::waitUntil([&] { return !send(slow, "x"); }));
     EXPECT_EQ(readToEnd(silent), "");
 }
 
@@ -233,10 +229,7 @@ TEST_F(Http, AnAddressHasNoMoreConnectionsThanItMay) {
     two = {};
     // The server learns of the end in its own time.
     std::string answer;
-    for (int count = 0; count < 6000 && answer.empty(); ++count) {
-        std::this_thread::sleep_for(milliseconds(10));
-        answer = ask(request);
-    }
+    EXPECT_TRUE(test::waitUntil([&] { return !(answer = ask(request)).empty(); }));
     EXPECT_THAT(answer, EndsWith("answer"));
 }
 

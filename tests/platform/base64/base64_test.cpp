@@ -54,22 +54,22 @@ std::string plainlyEncoded(std::string_view bytes) {
     return text;
 }
 
-const std::vector<std::pair<std::string, std::string>> kVectors = {{"", ""},
-                                                                   {"f", "Zg=="},
-                                                                   {"fo", "Zm8="},
-                                                                   {"foo", "Zm9v"},
-                                                                   {"foob", "Zm9vYg=="},
-                                                                   {"fooba", "Zm9vYmE="},
-                                                                   {"foobar", "Zm9vYmFy"}};
+const std::vector<std::pair<std::string, std::string>> testVectors = {{"", ""},
+                                                                      {"f", "Zg=="},
+                                                                      {"fo", "Zm8="},
+                                                                      {"foo", "Zm9v"},
+                                                                      {"foob", "Zm9vYg=="},
+                                                                      {"fooba", "Zm9vYmE="},
+                                                                      {"foobar", "Zm9vYmFy"}};
 
 TEST(Base64, EncodesTheStandardsTestVectors) {
-    for (const auto& [bytes, text] : kVectors) {
+    for (const auto& [bytes, text] : testVectors) {
         EXPECT_EQ(encoded(bytes), text);
     }
 }
 
 TEST(Base64, DecodesTheStandardsTestVectors) {
-    for (const auto& [bytes, text] : kVectors) {
+    for (const auto& [bytes, text] : testVectors) {
         EXPECT_EQ(decoded(text), bytes);
     }
 }
@@ -188,7 +188,7 @@ TEST(Base64, RefusesWrongPadding) {
 TEST(Base64, RefusesDataBehindThePadding) {
     for (const char* text : {"Zg==Zg==", "Zg==A", "Zm8=\nZ", "Zg=A", "Zg==*"}) {
         EXPECT_THAT([&] { base64decode(text); },
-                    ThrowsMessage<std::runtime_error>(HasSubstr("data behind the padding")))
+                    ThrowsMessage<std::runtime_error>(HasSubstr("data after the padding")))
             << text;
     }
 }

@@ -41,8 +41,8 @@ protected:
     }
 
     const Kernels& kernels = *GetParam();
-    tests::GuardedMemory source;
-    tests::GuardedMemory target;
+    test::GuardedMemory source;
+    test::GuardedMemory target;
     std::mt19937 random{1};
 };
 

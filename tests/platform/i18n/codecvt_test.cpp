@@ -241,11 +241,11 @@ TEST(Converters, KeepCharactersWholeAcrossAnyInternalPieces) {
                                                        {"zh-Hans", "GB18030", "GB18030"},
                                                        {"ko", "EUC-KR", "CP949"},
                                                        {"ru", "KOI8-R", "KOI8-R"}}) {
-        const std::string utf8 = testing::grownTo(testing::corpusText(language), 700 * 1000);
+        const std::string utf8 = test::grownTo(test::corpusText(language), 700 * 1000);
         for (const char* prefix : {"", "x"}) {
             const std::string shifted = prefix + utf8;
-            const std::string bytes = testing::iconvEncode(iconvName, shifted).value();
-            const std::u16string text = testing::iconvUtf16(shifted);
+            const std::string bytes = test::iconvEncode(iconvName, shifted).value();
+            const std::u16string text = test::iconvUtf16(shifted);
             EXPECT_TRUE(decode(charset, bytes) == text) << charset;
             EXPECT_TRUE(encode(charset, text) == bytes) << charset;
         }
@@ -254,8 +254,7 @@ TEST(Converters, KeepCharactersWholeAcrossAnyInternalPieces) {
 
 TEST(Converters, CountOffsetsAcrossInternalPieces) {
     const std::string good =
-        testing::iconvEncode("CP932", testing::grownTo(testing::corpusText("ja"), 500 * 1000))
-            .value();
+        test::iconvEncode("CP932", test::grownTo(test::corpusText("ja"), 500 * 1000)).value();
     EXPECT_THAT(decodingError("Shift_JIS", good + "\xFF"),
                 EndsWith(" at byte " + std::to_string(good.size())));
     const std::u16string text(200000, u'\u3042');
@@ -423,7 +422,7 @@ TEST(ComesBackUnchanged, IsTrueOfTextInTheUsualCharsets) {
                                                        {"ru", "windows-1251", "CP1251"},
                                                        {"ru", "KOI8-R", "KOI8-R"},
                                                        {"de", "ISO-8859-1", "ISO-8859-1"}}) {
-        const auto bytes = testing::iconvEncode(iconvName, testing::corpusText(language));
+        const auto bytes = test::iconvEncode(iconvName, test::corpusText(language));
         ASSERT_TRUE(bytes) << charset;
         EXPECT_TRUE(comesBackUnchanged(*bytes, charset)) << charset;
     }
@@ -543,15 +542,15 @@ TEST(Johab, HoldsWhatTheCLibrarySaysThatItHolds) {
     for (unsigned lead = 0x84; lead <= 0xF9; ++lead) {
         for (unsigned trail = 0x31; trail <= 0xFE; ++trail) {
             const std::string code{static_cast<char>(lead), static_cast<char>(trail)};
-            const std::optional<std::string> utf8 = testing::iconvDecode("JOHAB", code);
+            const std::optional<std::string> utf8 = test::iconvDecode("JOHAB", code);
             // The letters once more among the symbols, and a sign that was added to them lately.
             const bool skipped = (lead == 0xDA && trail >= 0x91) || code == "\xD9\xE8";
             if (skipped || !utf8) {
                 continue;
             }
             ++characters;
-            ASSERT_EQ(decode("Johab", code), testing::iconvUtf16(*utf8)) << lead << ' ' << trail;
-            ASSERT_EQ(encode("Johab", testing::iconvUtf16(*utf8)), code);
+            ASSERT_EQ(decode("Johab", code), test::iconvUtf16(*utf8)) << lead << ' ' << trail;
+            ASSERT_EQ(encode("Johab", test::iconvUtf16(*utf8)), code);
         }
     }
     EXPECT_GT(characters, 16000);

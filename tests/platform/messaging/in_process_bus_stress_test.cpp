@@ -94,7 +94,7 @@ TEST(InProcessBusStress, NeverCallsAHandlerOrAnObserverAfterItsRelease) {
         publish(*client, "/c", "text");
     });
     for (int round = 0; round < 300; ++round) {
-        // Freed as soon as the handles are: whoever comes later uses freed memory.
+        // Freed as soon as the handles are: later calls would use freed memory.
         auto calls = std::make_unique<std::atomic<std::size_t>>(0);
         const auto count = [state = calls.get()](const JsonMessage& message) {
             *state += message.payload().size();

@@ -78,7 +78,7 @@ std::shared_ptr<MessageService> processClient() {
 bool isWaiting(const std::string& id) {
     std::ifstream file("/proc/self/task/" + id + "/stat");
     const std::string status(std::istreambuf_iterator<char>(file), {});
-    const std::size_t name = status.rfind(") ");  // behind which the state stands
+    const std::size_t name = status.rfind(") ");  // the state follows it
     return name != std::string::npos && status.compare(name + 2, 1, "S") == 0;
 }
 

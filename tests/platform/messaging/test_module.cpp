@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// A library that subscribes while it is loaded, in the place of a bundle.
+// A library that subscribes while it is loaded, in place of a bundle.
 
 #include <memory>
 #include <string>

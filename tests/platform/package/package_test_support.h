@@ -13,7 +13,7 @@
 #include "tests/platform/package/zip_builder.h"
 #include "tests/support/temporary_directory.h"
 
-namespace testing_package {
+namespace test {
 
 using platform::package::QuilletFilePackage;
 using Part = QuilletFilePackage::Part;
@@ -78,10 +78,10 @@ inline ZipEntry usualTypes() {
                      "<Default Extension='png' ContentType='image/png'/>")};
 }
 
-/// An archive of `entries` behind usualTypes().
+/// An archive of `entries` after usualTypes().
 inline std::string usualPackage(std::vector<ZipEntry> entries, const ZipOptions& options = {}) {
     entries.insert(entries.begin(), usualTypes());
     return buildZip(entries, options);
 }
 
-}  // namespace testing_package
+}  // namespace test

@@ -11,7 +11,7 @@
 
 #include "tests/platform/package/package_test_support.h"
 
-namespace testing_package {
+namespace test {
 namespace {
 
 using platform::package::QuilletFileReader;
@@ -495,4 +495,4 @@ TEST(QuilletFilePackage, MakesRelationshipsInternalUnlessTold) {
 }
 
 }  // namespace
-}  // namespace testing_package
+}  // namespace test

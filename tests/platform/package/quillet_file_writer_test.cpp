@@ -27,7 +27,7 @@
 #include "tests/platform/package/package_test_support.h"
 #include "tests/support/source_root.h"
 
-namespace testing_package {
+namespace test {
 namespace {
 
 namespace zip = platform::package::zip;
@@ -617,7 +617,7 @@ TEST_F(QuilletFileWriterTest, WritesWhatAnIndependentReaderFinds) {
         std::istringstream lines(description(pathOf("a.docx")));
         std::ostringstream found;
         for (std::string line; std::getline(lines, line);) {
-            // Relationships parts are told by their content, which follows, and not by their bytes.
+            // Relationships parts are compared by their content, below, and not by their bytes.
             const bool isPackageXml = line.find(".rels ") != std::string::npos ||
                                       line.find("[Content_Types]") != std::string::npos ||
                                       line.find("package.relationships+xml") != std::string::npos;
@@ -846,4 +846,4 @@ TEST_F(QuilletFileWriterTest, LeavesOtherHardLinksAlone) {
 }
 
 }  // namespace
-}  // namespace testing_package
+}  // namespace test

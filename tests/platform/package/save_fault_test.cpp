@@ -24,7 +24,7 @@
 #include "tests/platform/package/package_test_support.h"
 #include "tests/support/system_call_supervisor.h"
 
-namespace testing_package {
+namespace test {
 namespace {
 
 using platform::package::QuilletFileReader;
@@ -334,4 +334,4 @@ TEST(SaveToDisk, RefusesAReadOnlyFileSystem) {
 }
 
 }  // namespace
-}  // namespace testing_package
+}  // namespace test

@@ -6,7 +6,7 @@
 #include <cstddef>
 #include <stdexcept>
 
-namespace testing_package {
+namespace test {
 namespace {
 
 std::string littleEndian(std::uint64_t value, int count) {
@@ -121,4 +121,4 @@ std::string buildZip(const std::vector<ZipEntry>& entries, const ZipOptions& opt
     return archive + bytes16(options.comment.size()) + options.comment + options.suffix;
 }
 
-}  // namespace testing_package
+}  // namespace test

@@ -8,7 +8,7 @@
 #include <utility>
 #include <vector>
 
-namespace testing_package {
+namespace test {
 
 struct ZipEntry {
     ZipEntry(std::string entryName = {}, std::string content = {}, bool isDeflated = false)
@@ -34,7 +34,7 @@ struct ZipEntry {
 struct ZipOptions {
     std::string prefix;   // before the first entry, and counted in the offsets
     std::string comment;  // of the archive
-    std::string suffix;   // behind the end of the archive
+    std::string suffix;   // after the end of the archive
     bool isZip64 = false;
     std::uint16_t disk = 0;
     std::optional<std::uint64_t> entryCount;
@@ -56,4 +56,4 @@ std::string bytes16(std::uint64_t value);
 std::string bytes32(std::uint64_t value);
 std::string bytes64(std::uint64_t value);
 
-}  // namespace testing_package
+}  // namespace test

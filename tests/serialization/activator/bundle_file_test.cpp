@@ -18,14 +18,14 @@
 namespace {
 
 namespace zip = platform::package::zip;
+using test::ElfFile;
+using test::ElfSymbol;
 using testing::Contains;
 using testing::Each;
 using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::Not;
 using testing::UnorderedElementsAre;
-using tests::ElfFile;
-using tests::ElfSymbol;
 
 std::vector<std::string> namesOf(const std::vector<ElfSymbol>& symbols, bool defined) {
     std::vector<std::string> names;

@@ -4,30 +4,28 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include <filesystem>
-#include <fstream>
-#include <sstream>
 #include <stdexcept>
 #include <string>
 #include <vector>
 
 #include "framework/bundle_runner.h"
+#include "platform/messaging/channels.h"
 #include "tests/serialization/activator/watched_messaging.h"
+#include "tests/support/process_state.h"
 
 namespace {
 
 using framework::BundleRunner;
+using test::WatchedMessaging;
 using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::IsEmpty;
-using testing::Not;
-using tests::WatchedMessaging;
 
 class BundleInFrameworkTest : public testing::Test {
 protected:
     std::vector<std::string> answersToRead() {
         return messaging_.publish(
-            "/zpr/service/readRequest_cpp",
+            platform::messaging::readRequestChannel,
             R"({"rtcId":"r","contentType":"text/plain","filePath":"/dev/null"})");
     }
 
@@ -55,18 +53,12 @@ TEST_F(BundleInFrameworkTest, FailsToStartWithTheTextOfTheMessageService) {
 
 #ifdef BUNDLES_ARE_UNLOADED
 TEST_F(BundleInFrameworkTest, LeavesTheProcessInTheEnd) {
-    const auto loadedFiles = [] {
-        std::ostringstream maps;
-        maps << std::ifstream("/proc/self/maps").rdbuf();
-        return maps.str();
-    };
-    const std::string file = std::filesystem::path(BUNDLE).filename().string();
     {
         const BundleRunner runner(BUNDLE);
         answersToRead();
-        ASSERT_THAT(loadedFiles(), HasSubstr(file));
+        ASSERT_TRUE(test::isLoaded(BUNDLE));
     }
-    EXPECT_THAT(loadedFiles(), Not(HasSubstr(file)));
+    EXPECT_FALSE(test::isLoaded(BUNDLE));
 }
 #endif
 

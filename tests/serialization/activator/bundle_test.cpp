@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "futures/future.h"
+#include "platform/messaging/channels.h"
 #include "platform/messaging/message_service.h"
 #include "tests/serialization/activator/loaded_bundle.h"
 #include "tests/serialization/activator/watched_messaging.h"
@@ -29,13 +30,13 @@ using testing::ElementsAre;
 using testing::EndsWith;
 using testing::IsEmpty;
 
-using tests::LoadedBundle;
-using tests::WatchedMessaging;
+using test::LoadedBundle;
+using test::WatchedMessaging;
 using Client = std::shared_ptr<MessageService>;
 using Subscribed = WatchedMessaging::Subscribed;
 
-const std::string readChannel = "/zpr/service/readRequest_cpp";
-const std::string writeChannel = "/zpr/service/writeRequest_cpp";
+const std::string readChannel = platform::messaging::readRequestChannel;
+const std::string writeChannel = platform::messaging::writeRequestChannel;
 
 template <typename T>
 futures::Future<T> failed(const std::string& text) {

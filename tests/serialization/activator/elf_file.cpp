@@ -6,7 +6,7 @@
 #include <sstream>
 #include <stdexcept>
 
-namespace tests {
+namespace test {
 namespace {
 
 template <typename Record>
@@ -68,4 +68,4 @@ std::vector<Elf64_Shdr> ElfFile::sections() const {
         header.e_shoff, std::size_t{header.e_shnum} * sizeof(Elf64_Shdr)));
 }
 
-}  // namespace tests
+}  // namespace test

@@ -10,7 +10,7 @@
 #include <string_view>
 #include <vector>
 
-namespace tests {
+namespace test {
 
 struct ElfSymbol {
     std::string name;
@@ -37,4 +37,4 @@ private:
     std::string bytes_;
 };
 
-}  // namespace tests
+}  // namespace test

@@ -10,7 +10,7 @@
 
 #include "cppmicroservices/BundleActivator.h"
 
-namespace tests {
+namespace test {
 
 /// Loads the library BUNDLE and creates an activator; destroys and unloads them in the end.
 class LoadedBundle {
@@ -50,4 +50,4 @@ private:
     std::unique_ptr<Activator, void (*)(Activator*)> activator_{nullptr, nullptr};
 };
 
-}  // namespace tests
+}  // namespace test

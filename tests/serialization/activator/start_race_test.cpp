@@ -10,6 +10,7 @@
 #include <thread>
 
 #include "futures/future.h"
+#include "platform/messaging/channels.h"
 #include "platform/messaging/in_process_bus.h"
 #include "platform/messaging/transport.h"
 #include "tests/serialization/activator/loaded_bundle.h"
@@ -20,7 +21,7 @@ using platform::messaging::InProcessBus;
 using platform::messaging::JsonMessage;
 using platform::messaging::MessageService;
 using platform::messaging::setTransport;
-using tests::LoadedBundle;
+using test::LoadedBundle;
 using Client = std::shared_ptr<MessageService>;
 
 class StartRace : public testing::Test {
@@ -52,7 +53,7 @@ private:
                 .get();
         while (!isDone_) {
             client
-                ->publish("/zpr/service/readRequest_cpp",
+                ->publish(platform::messaging::readRequestChannel,
                           platform::DataBuffer::copyOf(
                               R"({"rtcId":"1","contentType":"","filePath":"/no such file"})"))
                 .get();

@@ -5,7 +5,7 @@
 #include <mutex>
 #include <string_view>
 
-namespace tests {
+namespace test {
 
 using platform::DataBuffer;
 using platform::messaging::InProcessBus;
@@ -141,4 +141,4 @@ std::vector<std::string> WatchedMessaging::events() const {
     return state_->events;
 }
 
-}  // namespace tests
+}  // namespace test

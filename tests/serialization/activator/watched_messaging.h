@@ -13,7 +13,7 @@
 #include "platform/messaging/in_process_bus.h"
 #include "platform/messaging/transport.h"
 
-namespace tests {
+namespace test {
 
 class WatchedMessaging {
 public:
@@ -28,7 +28,7 @@ public:
     WatchedMessaging& operator=(const WatchedMessaging&) = delete;
     ~WatchedMessaging();
 
-    /// What createMessageService does from now on, in the place of connecting to the bus.
+    /// What createMessageService does from now on, in place of connecting to the bus.
     void createWith(platform::messaging::Transport create);
 
     /// What subscribing `channel` does from now on, given the future of the bus's own subscription.
@@ -53,4 +53,4 @@ private:
     const std::shared_ptr<State> state_;
 };
 
-}  // namespace tests
+}  // namespace test

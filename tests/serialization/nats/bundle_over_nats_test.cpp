@@ -10,6 +10,7 @@
 
 #include "framework/bundle_runner.h"
 #include "json/parser.h"
+#include "platform/messaging/channels.h"
 #include "platform/messaging/nats/nats_bus.h"
 #include "platform/messaging/transport.h"
 #include "tests/serialization/documents.h"
@@ -22,7 +23,7 @@ namespace {
 using namespace test;
 using namespace platform::messaging;
 
-constexpr std::chrono::minutes kPatience{2};
+constexpr std::chrono::minutes longestWait{2};
 
 class BundleOverNats : public testing::Test {
 protected:
@@ -30,8 +31,8 @@ protected:
         NatsOptions options;
         options.servers = {server_.url()};
         options.queueGroup = "workers";
-        options.queueChannels = {"/zpr/service/readRequest_cpp", "/zpr/service/writeRequest_cpp"};
-        options.concurrentChannels = {"/zpr/service/readRequest_cpp"};
+        options.queueChannels = {readRequestChannel, writeRequestChannel};
+        options.concurrentChannels = {readRequestChannel};
         bus_ = NatsBus::create(options);
         service_ = bus_->connect("host").get();
         setTransport([bus = bus_](const std::string& name, const MessageServiceOptions&) {
@@ -45,10 +46,10 @@ protected:
     std::string path(const std::string& name) const { return folder_ / name; }
 
     std::string read(const std::string& file, const std::string& type) {
-        return client_->read(fileRequest(file, type), kPatience).value_or("no answer");
+        return client_->read(fileRequest(file, type), longestWait).value_or("no answer");
     }
     std::string write(json::Object request) {
-        return client_->write(std::move(request), kPatience).value_or("no answer");
+        return client_->write(std::move(request), longestWait).value_or("no answer");
     }
 
     NatsServer server_;
@@ -80,24 +81,22 @@ TEST_F(BundleOverNats, TellsEveryoneOfAWriteBeforeItsAnswer) {
     EXPECT_EQ(write(writeText(path("a.txt"), "x")), "true");
     std::vector<std::string> channels;
     for (int i = 0; i < 3; ++i) {
-        channels.push_back(NatsClient::next(*both, kPatience)->channel);
+        channels.push_back(NatsClient::next(*both, longestWait)->channel);
     }
-    EXPECT_THAT(channels, testing::ElementsAre("/zpr/service/writeRequest_cpp",
-                                               "/zpr/service/notifyFileSystemRequest",
+    EXPECT_THAT(channels, testing::ElementsAre(writeRequestChannel, notificationChannel,
                                                "/zpr/service/writeResponse/anna.1"));
 }
 
 TEST_F(BundleOverNats, ServesOnAfterRequestsThatNameNoSubject) {
     for (const std::string id : {"", "a b", "x\\r\\nPUB y 1", "a..b", ".", ">", "a.>", "\\u0000"}) {
-        client_->publish("/zpr/service/readRequest_cpp",
+        client_->publish(readRequestChannel,
                          R"({"rtcId":")" + id + R"(","contentType":"text/plain","filePath":"x"})");
-        client_->publish("/zpr/service/writeRequest_cpp",
-                         R"({"rtcId":")" + id +
-                             R"(","contentType":"text/plain",)"
-                             R"("filePath":"/nowhere/x",)"
-                             R"("content":"","encoding":"UTF-8"})");
+        client_->publish(writeRequestChannel, R"({"rtcId":")" + id +
+                                                  R"(","contentType":"text/plain",)"
+                                                  R"("filePath":"/nowhere/x",)"
+                                                  R"("content":"","encoding":"UTF-8"})");
     }
-    client_->publish("/zpr/service/readRequest_cpp", "no JSON");
+    client_->publish(readRequestChannel, "no JSON");
     writeFile(path("a.txt"), "x");
     EXPECT_EQ(read(path("a.txt"), "text/plain"), textAnswer("x"));
     EXPECT_TRUE(bus_->isConnected());
@@ -132,15 +131,15 @@ TEST_F(BundleOverNats, FinishesTheRequestsThatItTookWhenItLeaves) {
     const auto answers = client_->subscribe("/zpr/service/readResponse/bob.*");
     constexpr int count = 20;
     for (int i = 0; i < count; ++i) {
-        client_->publish("/zpr/service/readRequest_cpp", R"({"rtcId":"bob.)" + std::to_string(i) +
-                                                             R"(","contentType":"text/plain",)"
-                                                             R"("filePath":")" +
-                                                             path("a.txt") + "\"}");
+        client_->publish(readRequestChannel, R"({"rtcId":"bob.)" + std::to_string(i) +
+                                                 R"(","contentType":"text/plain",)"
+                                                 R"("filePath":")" +
+                                                 path("a.txt") + "\"}");
     }
     client_->flush();  // the server has them all, and the worker's connection gets them in order
     EXPECT_EQ(read(path("none.txt"), "text/plain"),
               R"({"exception":"File does not exist","status":false})");
-    EXPECT_TRUE(bus_->drain(kPatience));
+    EXPECT_TRUE(bus_->drain(longestWait));
     const std::string expected = textAnswer(text);
     for (int i = 0; i < count; ++i) {
         const auto answer = NatsClient::next(*answers, std::chrono::seconds(30));

@@ -32,7 +32,7 @@ using namespace test;
 using namespace std::chrono_literals;
 using Clock = std::chrono::steady_clock;
 
-constexpr auto kPatience = 60s;
+constexpr auto longestWait = 60s;
 
 std::chrono::milliseconds millisecondsSince(Clock::time_point start) {
     return std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - start);
@@ -103,7 +103,7 @@ private:
         ++asked_;
         auto patience = 500ms;
         std::optional<std::string> answer = attempt(patience);
-        while (!answer && Clock::now() < start + kPatience) {
+        while (!answer && Clock::now() < start + longestWait) {
             ++askedAgain_;
             patience *= 2;  // for what takes long on a machine that is busy
             answer = attempt(patience);

@@ -11,6 +11,7 @@
 #include <iostream>
 
 #include "framework/bundle_runner.h"
+#include "platform/messaging/channels.h"
 #include "platform/messaging/nats/nats_bus.h"
 #include "platform/messaging/transport.h"
 
@@ -26,8 +27,8 @@ int main(int argc, char** argv) {
         NatsOptions options;
         options.servers.assign(argv + 2, argv + argc);
         options.queueGroup = "workers";
-        options.queueChannels = {"/zpr/service/readRequest_cpp", "/zpr/service/writeRequest_cpp"};
-        options.concurrentChannels = {"/zpr/service/readRequest_cpp"};
+        options.queueChannels = {readRequestChannel, writeRequestChannel};
+        options.concurrentChannels = {readRequestChannel};
         options.connectTimeout = std::chrono::minutes(1);
         const auto bus = NatsBus::create(options);
         const auto client = bus->connect("worker").get();

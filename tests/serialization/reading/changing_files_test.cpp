@@ -36,7 +36,7 @@ namespace {
 
 using platform::i18n::to_ustring;
 
-constexpr int kReads = 300;
+constexpr int readsPerTest = 300;
 
 class ChangingFiles : public testing::Test {
 protected:
@@ -48,7 +48,7 @@ protected:
                 change();
             }
         });
-        for (int i = 0; i < kReads && !HasFailure(); ++i) {
+        for (int i = 0; i < readsPerTest && !HasFailure(); ++i) {
             read();
         }
         isDone = true;

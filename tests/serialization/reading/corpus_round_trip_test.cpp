@@ -19,9 +19,7 @@ namespace {
 using platform::i18n::codecvt_ustring_to_string;
 using platform::i18n::to_string;
 using platform::i18n::to_ustring;
-using test::readFile;
-using test::writeFile;
-using namespace platform::i18n::testing;
+using namespace test;
 
 class CorpusRoundTrip : public testing::Test {
 protected:

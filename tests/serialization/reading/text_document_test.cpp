@@ -34,7 +34,7 @@ protected:
         return json::serialize(json::Value(service.readTextDocument(std::move(path))));
     }
 
-    static constexpr std::string_view kShiftJis =
+    static constexpr std::string_view shiftJisText =
         "\x82\xB1\x82\xEA\x82\xCD\x93\xFA\x96\x7B\x8C\xEA\x82\xCC\x95\xB6\x8F\xCD\x82\xC5\x82\xB7"
         "\x81\x42\x8A\xBF\x8E\x9A\x82\xC6\x82\xA9\x82\xC8\x82\xAA\x82\xA0\x82\xE8\x82\xDC\x82\xB7"
         "\x81\x42";
@@ -85,20 +85,20 @@ TEST_F(TextDocumentReading, KeepsUtf16InItsByteOrderWithoutTheMark) {
 
 TEST_F(TextDocumentReading, KeepsTheBytesOfTheFilesOwnCharset) {
     std::string charset;
-    const std::u16string text = service.readTextFile(file(kShiftJis), charset);
+    const std::u16string text = service.readTextFile(file(shiftJisText), charset);
     EXPECT_EQ(charset, "Shift_JIS");
     EXPECT_EQ(text.substr(0, 5), u"\u3053\u308C\u306F\u65E5\u672C");
-    EXPECT_EQ(service.readTextFileContent(file(kShiftJis)), kShiftJis);
+    EXPECT_EQ(service.readTextFileContent(file(shiftJisText)), shiftJisText);
 }
 
 TEST_F(TextDocumentReading, TurnsAFileSeparatorOfShiftJisIntoTheEndOfFileMark) {
     std::string charset;
     const std::u16string text =
-        service.readTextFile(file(std::string(kShiftJis) + "\x1C,\x1A"), charset);
+        service.readTextFile(file(std::string(shiftJisText) + "\x1C,\x1A"), charset);
     ASSERT_EQ(charset, "Shift_JIS");
     EXPECT_EQ(text.substr(text.size() - 3), u"\u001A,\u001A");
-    EXPECT_EQ(service.readTextFileContent(file(std::string(kShiftJis) + "\x1C,\x1A")),
-              std::string(kShiftJis) + "\x1A,\x1A");
+    EXPECT_EQ(service.readTextFileContent(file(std::string(shiftJisText) + "\x1C,\x1A")),
+              std::string(shiftJisText) + "\x1A,\x1A");
 }
 
 TEST_F(TextDocumentReading, KeepsAFileSeparatorInEveryOtherCharset) {
@@ -189,7 +189,7 @@ TEST_F(TextDocumentReading, AnswersTextWithoutLineEndsWhole) {
     std::string shiftJis;
     std::string utf16("\xFF\xFE", 2);
     for (std::size_t i = 0; i < count / 10; ++i) {
-        shiftJis += kShiftJis.substr(0, 10);
+        shiftJis += shiftJisText.substr(0, 10);
         utf16.append("a\0\xE9\0\x3D\xD8\x00\xDE", 8);
     }
     for (const std::string& text : {std::string(count, 'x'), shiftJis}) {

@@ -248,7 +248,7 @@ TEST_F(PackageDocumentWriting, DecodesTheDataUrisOfImages) {
 }
 
 TEST_F(PackageDocumentWriting, TakesADataUriWithoutACommaForBase64AsAWhole) {
-    // The colon is no base64, so that only the refusal shows what was taken.
+    // The colon is not base64, so that only the refusal shows what was taken.
     EXPECT_THROW(decoded("data:AAAA", "image/png"), std::runtime_error);
 }
 

@@ -42,15 +42,15 @@ TEST(Hz, HoldsTheCharactersOfGb2312) {
     for (char row = 0x21; row < 0x7E; ++row) {
         for (char column = 0x21; column <= 0x7E; ++column) {
             const std::string euc{static_cast<char>(row | 0x80), static_cast<char>(column | 0x80)};
-            const auto utf8 = testing::iconvDecode("GB2312", euc);
+            const auto utf8 = test::iconvDecode("GB2312", euc);
             // The C library takes two signs for others than the web does.
             if (!utf8 || euc == "\xA1\xA4" || euc == "\xA1\xAA") {
                 continue;
             }
             ++characters;
             const std::string bytes = std::string("~{") + row + column + "~}";
-            ASSERT_EQ(decode(bytes), testing::iconvUtf16(*utf8)) << bytes;
-            ASSERT_EQ(encode(testing::iconvUtf16(*utf8)), bytes);
+            ASSERT_EQ(decode(bytes), test::iconvUtf16(*utf8)) << bytes;
+            ASSERT_EQ(encode(test::iconvUtf16(*utf8)), bytes);
         }
     }
     EXPECT_EQ(characters, 7445u - 2u);

@@ -54,8 +54,7 @@ TEST(CodeVariants, AreEncodedByTheVariantThatPrefersThem) {
     EXPECT_THROW(encode("x-Big5-eten", u"\u2550\u0E01"), std::runtime_error);
     for (const char* charset : {"Shift_JIS", "EUC-JP", "Big5"}) {
         const std::string variant = charset == "Big5"sv ? "x-Big5-eten" : "x-"s + charset + "-nec";
-        const std::string bytes =
-            testing::iconvEncode(charset, "\xE3\x80\x81 \xE4\xB8\x80").value();
+        const std::string bytes = test::iconvEncode(charset, "\xE3\x80\x81 \xE4\xB8\x80").value();
         EXPECT_EQ(decode(variant, bytes), decode(charset, bytes));
     }
 }

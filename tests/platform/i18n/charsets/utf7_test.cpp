@@ -41,10 +41,10 @@ TEST(Utf7, ReadsTheExamplesOfItsStandard) {
 
 TEST(Utf7, WritesWhatTheCLibraryReads) {
     for (const char* language : {"de", "ru", "ja", "ko"}) {
-        const std::string& utf8 = testing::corpusText(language);
-        const std::u16string text = testing::iconvUtf16(utf8);
-        EXPECT_EQ(testing::iconvDecode("UTF-7", encode(text)), utf8) << language;
-        EXPECT_EQ(decode(testing::iconvEncode("UTF-7", utf8).value()), text) << language;
+        const std::string& utf8 = test::corpusText(language);
+        const std::u16string text = test::iconvUtf16(utf8);
+        EXPECT_EQ(test::iconvDecode("UTF-7", encode(text)), utf8) << language;
+        EXPECT_EQ(decode(test::iconvEncode("UTF-7", utf8).value()), text) << language;
     }
 }
 

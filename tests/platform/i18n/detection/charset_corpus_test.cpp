@@ -10,8 +10,10 @@
 #include "platform/i18n/detect_charset.h"
 #include "tests/platform/i18n/detection/corpus.h"
 
-namespace platform::i18n::testing {
+namespace test {
 namespace {
+
+using namespace platform::i18n;
 
 constexpr int minimumPerMille = 970;
 
@@ -141,4 +143,4 @@ TEST(ShortLines, AreMostlyRead) {
 }
 
 }  // namespace
-}  // namespace platform::i18n::testing
+}  // namespace test

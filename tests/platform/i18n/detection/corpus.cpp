@@ -10,7 +10,7 @@
 #include <stdexcept>
 #include "tests/support/source_root.h"
 
-namespace platform::i18n::testing {
+namespace test {
 
 namespace {
 
@@ -284,4 +284,4 @@ std::string asSubtitles(std::string_view text) {
     return subtitles;
 }
 
-}  // namespace platform::i18n::testing
+}  // namespace test

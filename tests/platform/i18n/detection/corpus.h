@@ -7,7 +7,7 @@
 #include <string_view>
 #include <vector>
 
-namespace platform::i18n::testing {
+namespace test {
 
 /// A language and a charset that its texts are found in.
 struct CorpusEntry {
@@ -50,4 +50,4 @@ std::string asCsv(std::string_view text);
 std::string asSource(std::string_view text);
 std::string asSubtitles(std::string_view text);
 
-}  // namespace platform::i18n::testing
+}  // namespace test

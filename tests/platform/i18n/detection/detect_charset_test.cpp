@@ -40,7 +40,7 @@ std::string roundTrip(const std::string& charset, std::string_view bytes) {
 }
 
 std::string encoded(const std::string& language, const std::string& iconvName) {
-    return testing::iconvEncode(iconvName, testing::corpusText(language)).value();
+    return test::iconvEncode(iconvName, test::corpusText(language)).value();
 }
 
 TEST(DetectCharset, TakesEmptyAsciiAndValidUtf8ForUtf8) {
@@ -75,11 +75,11 @@ TEST(DetectCharset, TakesAMarkForTextWhereTheRestContradictsIt) {
 
 TEST(DetectCharset, ReadsUtf16AndUtf32WithoutAMark) {
     for (const char* charset : {"UTF-16LE", "UTF-16BE", "UTF-32LE", "UTF-32BE"}) {
-        EXPECT_EQ(detect(testing::iconvEncode(charset, "Hello, world").value()), charset);
+        EXPECT_EQ(detect(test::iconvEncode(charset, "Hello, world").value()), charset);
         for (const char* language :
              {"en", "ru", "el", "he", "ar", "th", "ja", "zh-Hans", "zh-Hant", "ko"}) {
-            for (const std::string& line : testing::linesOf(testing::corpusText(language))) {
-                const std::string bytes = testing::iconvEncode(charset, line).value();
+            for (const std::string& line : test::linesOf(test::corpusText(language))) {
+                const std::string bytes = test::iconvEncode(charset, line).value();
                 // A handful of ideographs can pass for something else.
                 if (bytes.size() >= 24) {
                     EXPECT_EQ(detect(bytes), charset) << line;
@@ -134,10 +134,9 @@ TEST(DetectCharset, PrefersTheCharsetThatHoldsMoreOfThoseThatAgree) {
     // They differ in some letters of Polish, and in none of Romanian.
     EXPECT_EQ(detect(encoded("pl", "ISO-8859-2")), "ISO-8859-2");
     EXPECT_EQ(detect(encoded("ro", "ISO-8859-2")), "windows-1250");
-    // A larger charset that is hardly ever used is no better.
-    EXPECT_EQ(
-        detect(testing::iconvEncode("CP1251", "\u043F\u0440\u0438\u0432\u0435\u0442").value()),
-        "windows-1251");
+    // A larger charset that is hardly ever used is not better.
+    EXPECT_EQ(detect(test::iconvEncode("CP1251", "\u043F\u0440\u0438\u0432\u0435\u0442").value()),
+              "windows-1251");
 }
 
 TEST(DetectCharset, KeepsTheCharsetThatADocumentNamesWhereALargerOneAgrees) {
@@ -151,8 +150,8 @@ TEST(DetectCharset, ReadsKazakhInBothOfItsCharsets) {
         "\u0445\u0430\u043B\u049B\u044B\u043D\u044B\u04A3 \u0430\u043D\u0430 "
         "\u0442\u0456\u043B\u0456 \u0431\u043E\u043B\u044B\u043F "
         "\u0442\u0430\u0431\u044B\u043B\u0430\u0434\u044B.";
-    EXPECT_EQ(detect(testing::iconvEncode("RK1048", kazakh).value()), "KZ-1048");
-    EXPECT_EQ(detect(testing::iconvEncode("PT154", kazakh).value()), "PTCP154");
+    EXPECT_EQ(detect(test::iconvEncode("RK1048", kazakh).value()), "KZ-1048");
+    EXPECT_EQ(detect(test::iconvEncode("PT154", kazakh).value()), "PTCP154");
 }
 
 TEST(DetectCharset, ReadsEbcdic) {
@@ -166,15 +165,15 @@ TEST(DetectCharset, ReadsEbcdic) {
 TEST(DetectCharset, ReadsAPageInManyLanguages) {
     std::string page;
     for (const char* language : {"fr", "de", "es", "pt", "it", "nl", "sv", "da", "fi", "is"}) {
-        page += testing::linesOf(testing::corpusText(language)).front() + '\n';
+        page += test::linesOf(test::corpusText(language)).front() + '\n';
     }
-    EXPECT_EQ(detect(testing::iconvEncode("CP1252", page).value()), "windows-1252");
+    EXPECT_EQ(detect(test::iconvEncode("CP1252", page).value()), "windows-1252");
 }
 
 TEST(DetectCharset, PrefersCharactersToControls) {
     // 80 to 9F are controls in the charsets of ISO 8859, and syllables or dashes in others.
     EXPECT_EQ(
-        detect(testing::iconvEncode("CP949", "\uBDC1\uD6A8 \uB625 \uC4F0\uB2E4 \uAC00\uB294 \uC0D8")
+        detect(test::iconvEncode("CP949", "\uBDC1\uD6A8 \uB625 \uC4F0\uB2E4 \uAC00\uB294 \uC0D8")
                    .value()),
         "EUC-KR");
     EXPECT_EQ(detect("\x93quoted\x94 \x96 and so on"), "windows-1252");
@@ -218,13 +217,13 @@ TEST(DetectCharset, DoesNotBelieveADocumentWhoseTextContradictsIt) {
 
 TEST(DetectCharset, FindsTheOneLetterThatTellsCharsetsApartInALargeFile) {
     // The euro sign and the z with caron tell ISO-8859-15 from ISO-8859-1.
-    std::string utf8 = testing::grownTo(testing::corpusText("fi"), 300 * 1000);
+    std::string utf8 = test::grownTo(test::corpusText("fi"), 300 * 1000);
     utf8.insert(utf8.find('\n', 151234) + 1,
                 "D\xC5\xBEonkki maksoi 20 \xE2\x82\xAC ja \xC5\xA1"
                 "akki 5 \xE2\x82\xAC.\n");
-    const std::string bytes = testing::iconvEncode("ISO-8859-15", utf8).value();
+    const std::string bytes = test::iconvEncode("ISO-8859-15", utf8).value();
     codecvt_string_to_ustring decoder(detect(bytes), true);
-    EXPECT_TRUE(to_ustring(bytes, decoder) == testing::iconvUtf16(utf8));
+    EXPECT_TRUE(to_ustring(bytes, decoder) == test::iconvUtf16(utf8));
 }
 
 TEST(DetectCharset, FindsTheFewLettersOfALargeFileThatIsAsciiAlmostThroughout) {
@@ -233,9 +232,9 @@ TEST(DetectCharset, FindsTheFewLettersOfALargeFileThatIsAsciiAlmostThroughout) {
         bytes[i] = '\n';
     }
     bytes.insert(2 * 1000 * 1000, " " +
-                                      testing::iconvEncode("CP1251",
-                                                           "\xD0\xBF\xD1\x80\xD0\xB8\xD0\xB2\xD0"
-                                                           "\xB5\xD1\x82 \xD0\xBC\xD0\xB8\xD1\x80")
+                                      test::iconvEncode("CP1251",
+                                                        "\xD0\xBF\xD1\x80\xD0\xB8\xD0\xB2\xD0"
+                                                        "\xB5\xD1\x82 \xD0\xBC\xD0\xB8\xD1\x80")
                                           .value() +
                                       " ");
     EXPECT_EQ(detect(bytes), "windows-1251");
@@ -245,7 +244,7 @@ TEST(DetectCharset, ReadsLargeTextWithoutASpaceOrAnEndOfLine) {
     for (const auto& [language, iconvName, charset] :
          {std::tuple{"zh-Hans", "GB18030", "GB18030"}, {"ja", "EUC-JP", "EUC-JP"}}) {
         std::string solid;
-        for (const std::string& line : testing::linesOf(testing::corpusText(language))) {
+        for (const std::string& line : test::linesOf(test::corpusText(language))) {
             for (const char c : line) {
                 solid += static_cast<unsigned char>(c) < 0x80 ? ""s : std::string(1, c);
             }
@@ -254,14 +253,14 @@ TEST(DetectCharset, ReadsLargeTextWithoutASpaceOrAnEndOfLine) {
             solid += solid;
         }
         for (const std::string& prefix : {""s, "x"s}) {
-            EXPECT_EQ(detect(testing::iconvEncode(iconvName, prefix + solid).value()), charset);
+            EXPECT_EQ(detect(test::iconvEncode(iconvName, prefix + solid).value()), charset);
         }
     }
 }
 
 TEST(DetectCharset, KeepsTheBytesOfDamagedUtf8) {
     for (const char* language : {"fr", "ru", "ja"}) {
-        std::string bytes = testing::corpusText(language);
+        std::string bytes = test::corpusText(language);
         bytes.erase(bytes.size() - 40, 1);
         bytes[100] = '\xFF';
         EXPECT_EQ(detect(bytes), "ISO-8859-1");
@@ -337,7 +336,7 @@ TEST(DetectCharset, KeepsTheBytesWhereBothCodesOfACharacterOccur) {
 }
 
 TEST(DetectCharset, SurvivesCodesOfCharactersThatTheCharsetDoesNotEncode) {
-    // In EUC-JP, two bytes behind the single shift stand for characters that it has no code for.
+    // In EUC-JP, two bytes after the single shift stand for characters that it has no code for.
     for (int byte = 0x80; byte <= 0xFF; ++byte) {
         const std::string bytes = "?J\x8E" + std::string(1, static_cast<char>(byte));
         EXPECT_EQ(roundTrip(detect(bytes), bytes), bytes) << byte;
@@ -357,7 +356,7 @@ TEST(DetectCharset, MayBeCalledFromManyThreads) {
 }
 
 TEST(DetectCharset, RefusesTextThatIsTooLargeBeforeItLooksAtIt) {
-    // Nobody may read these bytes: there are none behind the first.
+    // Nobody may read these bytes: there are none after the first.
     const char first = 'a';
     std::ostringstream diagnostics;
     EXPECT_THAT([&] { detect_charset(&first, maxTextLength + 1, diagnostics, u"text"); },

@@ -24,11 +24,12 @@
 #include "platform/messaging/nats/nats_bus.h"
 #include "tests/platform/messaging/bus_test_support.h"
 #include "tests/support/nats_server.h"
+#include "tests/support/wait_until.h"
 
 namespace platform::messaging {
 
-// How long a test waits for what should happen at once.
-inline constexpr std::chrono::seconds kPatience{60};
+using test::longestWait;
+using test::waitUntil;
 
 /// A list that one thread fills while another waits for what is to come.
 template <typename T>
@@ -43,7 +44,7 @@ public:
     }
 
     /// Waits until there are `count`; returns all that there are, fewer when it takes too long.
-    std::vector<T> waitFor(std::size_t count, std::chrono::milliseconds patience = kPatience) {
+    std::vector<T> waitFor(std::size_t count, std::chrono::milliseconds patience = longestWait) {
         std::unique_lock lock(mutex_);
         changed_.wait_for(lock, patience, [&] { return items_.size() >= count; });
         return items_;
@@ -52,8 +53,9 @@ public:
     /// Waits until one satisfies `condition`; returns whether one does.
     bool waitUntilAny(const std::function<bool(const T&)>& condition) {
         std::unique_lock lock(mutex_);
-        return changed_.wait_for(
-            lock, kPatience, [&] { return std::any_of(items_.begin(), items_.end(), condition); });
+        return changed_.wait_for(lock, longestWait, [&] {
+            return std::any_of(items_.begin(), items_.end(), condition);
+        });
     }
 
     std::vector<T> items() {
@@ -113,8 +115,7 @@ private:
 
     BusLog() {
         auto logger = std::make_shared<spdlog::logger>("messaging", std::make_shared<Sink>(lines_));
-        // The library takes a logger of this name that is there when it first has something to
-        // tell.
+        // The library takes a logger of this name that exists when it logs for the first time.
         spdlog::register_logger(std::move(logger));
     }
 
@@ -122,7 +123,7 @@ private:
 };
 
 // From the beginning, since the first line that is logged decides for good where all go.
-inline const BusLog& kBusLog = BusLog::start();
+inline const BusLog& busLog = BusLog::start();
 
 inline NatsOptions optionsFor(const test::NatsServer& server) {
     NatsOptions options;
@@ -158,17 +159,6 @@ inline std::string failureOf(const std::function<void()>& operation) {
         return error.what();
     }
     return "";
-}
-
-inline bool waitUntil(const std::function<bool()>& condition) {
-    const auto deadline = std::chrono::steady_clock::now() + kPatience;
-    while (!condition()) {
-        if (std::chrono::steady_clock::now() > deadline) {
-            return false;
-        }
-        std::this_thread::sleep_for(std::chrono::milliseconds(2));
-    }
-    return true;
 }
 
 }  // namespace platform::messaging

@@ -165,7 +165,7 @@ TEST(NatsConnectionLoss, WaitsForAServerThatIsNotThereYet) {
     test::NatsServer server;
     server.kill();
     NatsOptions options = optionsFor(server);
-    options.connectTimeout = kPatience;
+    options.connectTimeout = longestWait;
     const auto bus = NatsBus::create(options);
     std::future<std::shared_ptr<MessageService>> client =
         std::async(std::launch::async, [&] { return bus->connect("client").get(); });

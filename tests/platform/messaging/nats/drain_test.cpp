@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// How a worker leaves: it finishes what it took, and nothing new comes to it.
+// How a worker leaves: it finishes the messages that it took and gets no new ones.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -60,7 +60,7 @@ TEST_P(NatsDrain, FinishesWhatWasTakenAndLeavesTheRestToOthers) {
     started.wait();
     client.publish("requests", "waiting");
     client.publish("requests", "waiting too");
-    // These two have reached the worker when one that came behind them has.
+    // These two have reached the worker when one that came after them has.
     Inbox<std::string> marks;
     const auto mark = worker.collect("mark", marks);
     client.publish("mark", "x");
@@ -103,7 +103,7 @@ TEST(NatsDrainEnd, HasTheServerHaveWhatWasPublished) {
         BusAtServer worker(server);
         worker.publish("x", std::string(20'000'000, 'x'));
         worker.publish("x", "y");
-        EXPECT_TRUE(worker.bus->drain(kPatience));
+        EXPECT_TRUE(worker.bus->drain(longestWait));
     }
     EXPECT_THAT(sizes.waitFor(2), ElementsAre(20'000'000U, 1U));
 }
@@ -149,10 +149,10 @@ TEST(NatsClientBacklog, IsWaitedFor) {
     const SilentClient client(server.port());
     BusAtServer worker(server);
     worker.publish("x", std::string(20'000'000, 'x'));
-    EXPECT_TRUE(worker.bus->drain(kPatience));
+    EXPECT_TRUE(worker.bus->drain(longestWait));
     EXPECT_FALSE(waitForClientBacklog(optionsFor(server), std::chrono::milliseconds(100)));
     std::future<bool> sent = std::async(
-        std::launch::async, [&] { return waitForClientBacklog(optionsFor(server), kPatience); });
+        std::launch::async, [&] { return waitForClientBacklog(optionsFor(server), longestWait); });
     client.read(20'000'000);
     EXPECT_TRUE(sent.get());
 }
@@ -170,7 +170,7 @@ TEST(NatsClientBacklog, OfAServerThatDoesNotAnswerIsWaitedForNoLongerThanAllowed
 TEST(NatsClientBacklog, OfAServerThatIsGoneIsAFailure) {
     test::NatsServer server;
     server.kill();
-    EXPECT_THAT(failureOf([&] { waitForClientBacklog(optionsFor(server), kPatience); }),
+    EXPECT_THAT(failureOf([&] { waitForClientBacklog(optionsFor(server), longestWait); }),
                 HasSubstr("No server available"));
 }
 
@@ -178,13 +178,13 @@ TEST(NatsDrainEnd, AfterwardsEveryOperationFails) {
     BusLog& log = BusLog::start();
     const test::NatsServer server;
     BusAtServer bus(server);
-    EXPECT_TRUE(bus.bus->drain(kPatience));
+    EXPECT_TRUE(bus.bus->drain(longestWait));
     EXPECT_FALSE(bus.bus->isConnected());
     EXPECT_THAT(failureOf([&] { bus.publish("x", "1"); }), HasSubstr("has been closed"));
     EXPECT_THAT(failureOf([&] { bus.subscribe("x", [](const JsonMessage&) {}); }),
                 HasSubstr("has been closed"));
     EXPECT_THAT(failureOf([&] { bus.bus->connect("client").get(); }), HasSubstr("has been closed"));
-    EXPECT_TRUE(bus.bus->drain(kPatience)) << "a second time has nothing to do";
+    EXPECT_TRUE(bus.bus->drain(longestWait)) << "a second time has nothing to do";
     EXPECT_EQ(log.count("lost"), 0) << "it was not lost";
 }
 
@@ -224,7 +224,7 @@ TEST(NatsDrainEnd, EndsAConnectThatIsStillTrying) {
     std::future<std::string> failure = std::async(
         std::launch::async, [&] { return failureOf([&] { bus->connect("client").get(); }); });
     EXPECT_TRUE(log.waitFor("Trying again"));
-    EXPECT_TRUE(bus->drain(kPatience));
+    EXPECT_TRUE(bus->drain(longestWait));
     EXPECT_THAT(failure.get(), HasSubstr("has been closed"));
 }
 

@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "platform/messaging/channels.h"
 #include "tests/platform/messaging/nats/bus_at_server.h"
 
 namespace platform::messaging {
@@ -89,12 +90,11 @@ TEST(NatsPublish, LetsNoChannelSmuggleProtocolLinesIn) {
     BusAtServer victim(server);
     Inbox<std::string> stolen;
     const auto subscription = victim.collect("victim", stolen);
-    const std::string prefix = "/zpr/service/readResponse/";
     for (const std::string id :
          {"x 0\r\n\r\nPUB victim 6\r\nforged\r\n", "x\nPUB victim 6\r\nforged\r\n",
           "x\rPUB victim 6", "x victim 6", "x\tvictim", "x 6\r\nforged\r\nSUB > 1\r\n",
           "x\r\n-ERR 'gone'\r\n", "\r\nPING\r\n"}) {
-        EXPECT_THAT(failureOf([&] { bus.publish(prefix + id, "forged"); }),
+        EXPECT_THAT(failureOf([&] { bus.publish(readResponsePrefix + id, "forged"); }),
                     HasSubstr("blank or a control character"))
             << id;
     }
@@ -173,7 +173,7 @@ TEST_P(PendingBound, DropsAndLogsWhatIsTooMuchForASlowHandler) {
                     std::to_string(GetParam().messages) + " of them or " +
                     std::to_string(GetParam().bytes) + " bytes may wait"));
     publisher.publish("/slow", "x");
-    // That has reached the slow handler's connection when one that came behind it has.
+    // That has reached the slow handler's connection when one that came after it has.
     Inbox<std::string> marks;
     const auto mark = bus.collect("mark", marks);
     publisher.publish("mark", "x");
@@ -183,7 +183,7 @@ TEST_P(PendingBound, DropsAndLogsWhatIsTooMuchForASlowHandler) {
     EXPECT_EQ(backlog.bytes, 1000U);
     EXPECT_EQ(backlog.dropped, 6U);
     release.count_down();
-    // Five of 200 bytes had room, and nothing that came behind them.
+    // Five of 200 bytes had room, and nothing that came after them.
     EXPECT_THAT(texts.waitFor(6), testing::SizeIs(6));
     publisher.publish("/slow", "again");
     EXPECT_EQ(texts.waitFor(7).back(), "again");

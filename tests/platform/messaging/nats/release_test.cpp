@@ -4,44 +4,31 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
-#include <filesystem>
-#include <iterator>
+#include <cstddef>
 #include <memory>
 #include <string>
 #include <thread>
 #include <vector>
 
 #include "tests/platform/messaging/nats/bus_at_server.h"
+#include "tests/support/process_state.h"
 
 namespace platform::messaging {
 namespace {
 
-long entriesOf(const char* folder) {
-    return std::distance(std::filesystem::directory_iterator(folder),
-                         std::filesystem::directory_iterator());
-}
-
-long threads() {
-    return entriesOf("/proc/self/task");
-}
-
-long openFiles() {
-    return entriesOf("/proc/self/fd");
-}
-
 TEST(NatsRelease, AThousandSubscriptionsLeaveNoThread) {
     const test::NatsServer server;
     BusAtServer bus(server);
-    const long before = threads();
+    const std::size_t before = test::listedThreads();
     for (int round = 0; round < 10; ++round) {
         std::vector<std::shared_ptr<Subscription>> subscriptions;
         for (int i = 0; i < 100; ++i) {
             subscriptions.push_back(bus.subscribe("x", [](const JsonMessage&) {}));
         }
-        EXPECT_EQ(threads(), before + 100) << "one for each";
+        EXPECT_EQ(test::listedThreads(), before + 100) << "one for each";
         bus.publish("x", "1");
     }
-    EXPECT_TRUE(waitUntil([&] { return threads() == before; }));
+    EXPECT_TRUE(test::comesToThreads(before));
 }
 
 TEST(NatsRelease, AThousandBusesLeaveNoThreadAndNoSocket) {
@@ -54,13 +41,13 @@ TEST(NatsRelease, AThousandBusesLeaveNoThreadAndNoSocket) {
         texts.waitFor(1);
     };
     use();  // has libnats start the threads that it keeps
-    const long threadsBefore = threads();
-    const long filesBefore = openFiles();
+    const std::size_t threadsBefore = test::listedThreads();
+    const std::size_t descriptorsBefore = test::openDescriptors();
     for (int i = 0; i < 1000; ++i) {
         use();
     }
-    EXPECT_TRUE(waitUntil([&] { return threads() == threadsBefore; }));
-    EXPECT_TRUE(waitUntil([&] { return openFiles() == filesBefore; }));
+    EXPECT_TRUE(test::comesToThreads(threadsBefore));
+    EXPECT_TRUE(waitUntil([&] { return test::openDescriptors() == descriptorsBefore; }));
 }
 
 TEST(NatsRelease, SubscriptionsComeAndGoWhileMessagesArriveAndTheServerDoesNot) {

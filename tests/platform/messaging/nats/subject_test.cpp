@@ -69,11 +69,5 @@ TEST(Subject, HasALengthThatAServerTakes) {
     EXPECT_THAT(flawOf(std::string(4001, 'x')), HasSubstr("it is longer than 4000 bytes"));
 }
 
-TEST(Subject, IsPrintedInPlainCharactersAndNotAtAnyLength) {
-    EXPECT_EQ(printable("a\n\x1B\xC3\xA9 \"z"), "a\\x0A\\x1B\\xC3\\xA9 \"z");
-    EXPECT_EQ(printable(std::string(200, 'x')), std::string(200, 'x'));
-    EXPECT_EQ(printable(std::string(201, 'x')), std::string(200, 'x') + "...");
-}
-
 }  // namespace
 }  // namespace platform::messaging::nats

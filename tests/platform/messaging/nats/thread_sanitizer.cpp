@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What the thread sanitizer shall not report in the tests that this file is linked into.
+// What the thread sanitizer must not report in the tests that this file is linked into.
 //
 // libnats 3.4 reads from a TLS connection on one thread while it writes on another, without a lock
 // between them. The sanitizer sees OpenSSL touch the same memory from both when a server breaks a

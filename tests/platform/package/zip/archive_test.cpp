@@ -17,7 +17,7 @@
 #include "platform/package/zip/limits.h"
 #include "tests/platform/package/package_test_support.h"
 
-namespace testing_package {
+namespace test {
 namespace {
 
 using testing::HasSubstr;
@@ -271,13 +271,13 @@ TEST_F(ZipArchiveTest, RefusesAnEntryWhoseHeaderIsNotWhereItShouldBe) {
 TEST_F(ZipArchiveTest, RefusesEntriesThatReachBehindTheData) {
     ZipEntry entry{"a", "text"};
     entry.offset = 10'000;
-    expectRefusedAtOpening(buildZip({entry}), "\"a\" reaches behind the end");
+    expectRefusedAtOpening(buildZip({entry}), "\"a\" reaches past the end");
     entry.offset.reset();
     entry.compressedSize = 100;
-    expectRefusedAtOpening(buildZip({entry}), "\"a\" reaches behind the end");
+    expectRefusedAtOpening(buildZip({entry}), "\"a\" reaches past the end");
     entry.isZip64 = true;
     entry.compressedSize = ~std::uint64_t{0} - 10;
-    expectRefusedAtOpening(buildZip({entry}), "\"a\" reaches behind the end");
+    expectRefusedAtOpening(buildZip({entry}), "\"a\" reaches past the end");
 }
 
 TEST_F(ZipArchiveTest, RefusesOverlappingEntries) {
@@ -319,10 +319,10 @@ TEST_F(ZipArchiveTest, RefusesBrokenZip64Records) {
     }
     options.zip64EndOffset.reset();
     options.directoryOffset = ~std::uint64_t{0} - 5;
-    expectRefusedAtOpening(buildZip({{"a", "x"}}, options), "reaches behind its end record");
+    expectRefusedAtOpening(buildZip({{"a", "x"}}, options), "reaches past its end record");
     options.directoryOffset.reset();
     options.directorySize = ~std::uint64_t{0} - 5;
-    expectRefusedAtOpening(buildZip({{"a", "x"}}, options), "reaches behind its end record");
+    expectRefusedAtOpening(buildZip({{"a", "x"}}, options), "reaches past its end record");
 }
 
 TEST_F(ZipArchiveTest, RefusesArchivesInSeveralFiles) {
@@ -431,4 +431,4 @@ TEST_F(ZipArchiveTest, RefusesPipesAndDevicesWithoutWaiting) {
 }
 
 }  // namespace
-}  // namespace testing_package
+}  // namespace test

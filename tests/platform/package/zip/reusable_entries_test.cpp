@@ -16,7 +16,7 @@
 #include "tests/support/lease_holder.h"
 #include "tests/support/temporary_directory.h"
 
-namespace testing_package {
+namespace test {
 namespace {
 
 namespace zip = platform::package::zip;
@@ -209,4 +209,4 @@ TEST_F(ReusableEntriesTest, ExpandToTheContentWhateverIsWrittenIntoTheFileMeanwh
 }
 
 }  // namespace
-}  // namespace testing_package
+}  // namespace test

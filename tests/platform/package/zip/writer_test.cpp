@@ -13,7 +13,7 @@
 #include "platform/package/zip/limits.h"
 #include "tests/platform/package/package_test_support.h"
 
-namespace testing_package {
+namespace test {
 namespace {
 
 namespace zip = platform::package::zip;
@@ -93,4 +93,4 @@ TEST(ZipWriter, RefusesAPartThatIsTooLarge) {
 }
 
 }  // namespace
-}  // namespace testing_package
+}  // namespace test

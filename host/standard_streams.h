@@ -2,7 +2,7 @@
 // The program's standard input and output, read and written without a buffer between.
 //
 // Results leave through the standard output that the program was started with, and nothing else
-// does: the process's own standard output is pointed at standard error, so that no library's print
+// does: the process's own standard output is pointed at standard error, so that no library's output
 // gets between the results.
 #pragma once
 
@@ -15,7 +15,7 @@
 
 namespace host {
 
-/// Nobody reads any more what is written to the standard output.
+/// The reader of the standard output is gone.
 class ReaderGone : public std::system_error {
     using std::system_error::system_error;
 };
@@ -27,7 +27,7 @@ void openMissingStandardStreams();
 /// Points descriptor 1 at standard error and returns what it was. Throws std::system_error.
 platform::FileDescriptor divertStandardOutput();
 
-/// Writes all `pieces`, one after the other, waiting where `fd` takes nothing more for now. Throws
+/// Writes all `pieces`, one after the other, waiting while `fd` takes nothing more. Throws
 /// std::system_error when it cannot, ReaderGone when that is for good; part of the bytes may have
 /// been written by then.
 void writeAll(int fd, std::initializer_list<std::string_view> pieces);

@@ -5,11 +5,13 @@
 #include <sys/types.h>
 
 #include <future>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
 #include "platform/posix/file_descriptor.h"
+#include "tests/support/child_process.h"
 
 namespace test {
 
@@ -20,7 +22,8 @@ struct Outcome {
     std::string errors;
 };
 
-/// Runs a program with pipes on its standard streams. Errors of the system calls are exceptions.
+/// Runs a program with pipes on its standard streams. Kills it when it has not been waited for.
+/// Errors of the system calls are exceptions.
 class Subprocess {
 public:
     /// Starts `command`: the path of a program and its arguments.
@@ -29,10 +32,7 @@ public:
     Subprocess(const Subprocess&) = delete;
     Subprocess& operator=(const Subprocess&) = delete;
 
-    /// Kills and collects the program when it has not been waited for.
-    ~Subprocess();
-
-    pid_t id() const noexcept { return id_; }
+    pid_t id() const noexcept { return process_->id(); }
 
     void write(std::string_view input);
     void closeInput() { input_ = {}; }
@@ -50,8 +50,8 @@ public:
 private:
     platform::FileDescriptor input_;
     platform::FileDescriptor output_;
-    pid_t id_ = -1;
-    std::future<std::string> errors_;
+    std::future<std::string> errors_;  // Waits for the end of what the program writes.
+    std::optional<ChildProcess> process_;
 };
 
 /// Runs `command` with `input` on its standard input until it ends.

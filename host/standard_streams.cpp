@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "host/commands/standard_streams.h"
+#include "host/standard_streams.h"
 
 #include <fcntl.h>
 #include <poll.h>
@@ -10,13 +10,13 @@
 #include <system_error>
 #include <vector>
 
+#include "platform/posix/system_error.h"
+
 namespace host {
 
 namespace {
 
-[[noreturn]] void throwSystemError(const char* what) {
-    throw std::system_error(errno, std::generic_category(), what);
-}
+using platform::throwSystemError;
 
 void waitUntilReady(int fd, short events) {
     pollfd waited{fd, events, 0};
@@ -25,21 +25,21 @@ void waitUntilReady(int fd, short events) {
     }
 }
 
-// True when the call that just failed is to be made again, after the wait that it needs.
+// True when the call that just failed should be repeated; waits first if need be.
 bool shallRetry(int fd, short events) {
     if (errno == EINTR) {
         return true;
     }
     if (errno == EAGAIN || errno == EWOULDBLOCK) {
-        // Whoever started the program shares the stream and has made it non-blocking.
+        // The program's parent shares the stream and has made it non-blocking.
         waitUntilReady(fd, events);
         return true;
     }
     return false;
 }
 
-// Takes the first `count` bytes off `pieces`, of which those before `first` are used up; returns
-// the first piece that is not.
+// Drops the first `count` bytes of `pieces` from `first` on; returns the first piece that has bytes
+// left.
 std::size_t skipWritten(std::vector<iovec>& pieces, std::size_t first, std::size_t count) {
     while (first < pieces.size() && count >= pieces[first].iov_len) {
         count -= pieces[first].iov_len;
@@ -59,9 +59,9 @@ void openMissingStandardStreams() {
         if (::fcntl(fd, F_GETFD) >= 0) {
             continue;
         }
-        // The lowest free number is given out, which is `fd`: those below it are open. It is open
-        // for the other direction, so that who uses the stream learns that there is none: an input
-        // that nobody gave is no empty document, and an answer that nobody gets is not given.
+        // The system gives out the lowest free number, which is `fd`: those below it are open. It
+        // is opened for the other direction, so that using the stream is an error: a missing input
+        // is not an empty document, and an answer without a reader is not delivered.
         if (::open("/dev/null", fd == STDIN_FILENO ? O_WRONLY : O_RDONLY) < 0) {
             throwSystemError("cannot open /dev/null");
         }

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What the program's exit status tells whoever ran it.
+// The program's exit statuses.
 #pragma once
 
 namespace host {
