@@ -54,8 +54,7 @@ void Serialization::publishReadResult(const std::string& channel, json::Value re
                                       std::size_t longestAnswer) const {
     const std::optional<std::string> text = json::serialize(result, longestAnswer);
     if (!text) {
-        publish(channel,
-                json::Object{{exceptionKey, tooLarge(longestAnswer)}, {statusKey, false}});
+        publish(channel, json::Object{{exceptionKey, tooLarge(longestAnswer)}, {statusKey, false}});
         return;
     }
     // A large document must not be held three times.

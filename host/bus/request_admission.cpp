@@ -33,8 +33,8 @@ using platform::messaging::MessageHandler;
 using platform::messaging::MessageService;
 using platform::messaging::Subscription;
 
-// What each thread may take without asking, of a budget of that size: hundreds of times the values of
-// a read request, but of all threads together a small share.
+// What each thread may take without asking, of a budget of that size: hundreds of times the values
+// of a read request, but of all threads together a small share.
 std::size_t smallWork(const MemoryBudget& budget) {
     constexpr std::size_t usual = std::size_t{4} << 20U;
     constexpr std::size_t share = 64;

@@ -21,9 +21,9 @@ struct WriteRequest {
 };
 
 /// The request that `payload` holds, or nothing where it is none that the bundle would answer: it
-/// is not an object, or lacks a member or has one of another kind. The content of a package is passed
-/// over without a look at what is between its brackets. The result lasts no longer than `payload`.
-/// Linear in the size of `payload`.
+/// is not an object, or lacks a member or has one of another kind. The content of a package is
+/// passed over without a look at what is between its brackets. The result lasts no longer than
+/// `payload`. Linear in the size of `payload`.
 std::optional<WriteRequest> readWriteRequest(std::string_view payload);
 
 /// `payload`, which is an object with members, with a member "filePath" put in front of the others.

@@ -145,7 +145,7 @@ TEST(CommandLine, RefusesAnAddressOfNoServer) {
                                 "nats://foo:port", "nats://one,foo"}) {
         const Outcome outcome = test::run(hostCommand({"serve", "--nats", address}));
         EXPECT_EQ(outcome.status, 2) << address;
-        EXPECT_THAT(outcome.errors, HasSubstr("no address of a server such as nats://"));
+        EXPECT_THAT(outcome.errors, HasSubstr("not the address of a server, such as nats://"));
     }
 }
 

@@ -94,7 +94,7 @@ TEST(ServeCommand, TellsOfAGroupThatNoServerWouldTake) {
     for (const char* group : {"", "two words", "tab\t", "caf\xc3\xa9"}) {
         const Outcome outcome = serve({"--nats", "nats://127.0.0.1:9", "--group", group});
         EXPECT_EQ(outcome.status, 1);
-        EXPECT_THAT(outcome.errors, HasSubstr("no name for --group"));
+        EXPECT_THAT(outcome.errors, HasSubstr("not a name for --group"));
     }
 }
 

@@ -97,7 +97,7 @@ TEST_F(WriteCommand, RefusesToMakeAPackageOfSomethingElse) {
         write(folder_ / "file.docx", "plain text", {"--content-type", "text/xml"});
     EXPECT_EQ(outcome.status, 1);
     EXPECT_THAT(outcome.output, IsEmpty());
-    EXPECT_THAT(outcome.errors, HasSubstr("no document package"));
+    EXPECT_THAT(outcome.errors, HasSubstr("not a document package"));
     EXPECT_FALSE(std::filesystem::exists(folder_ / "file.docx"));
 }
 

@@ -78,7 +78,7 @@ TEST_F(Manual, PageNamesValuesArgumentsAndExitStatuses) {
     EXPECT_THAT(page, AllOf(HasSubstr("\n\\fB\\-\\-timeout\\fR \\fISECONDS\\fR\n"),
                             HasSubstr("\n.SS read [OPTION...] FILE...\n"),
                             HasSubstr("\n.SS history [OPTION...] FILE\n"),
-                            HasSubstr("\n.SH EXIT STATUS\n0 when all was done")));
+                            HasSubstr("\n.SH EXIT STATUS\n0 when all is done")));
 }
 
 TEST_F(Manual, PageHasTextsAsTheyStand) {
