@@ -23,7 +23,8 @@ END
 diff <(printf 'Suppe\n' | serialization_host write --text soup.txt) <(echo true)
 diff <(cat soup.txt) <(echo Suppe)
 
-timeout --preserve-status --signal=TERM 2 serialization_host serve --root /tmp --no-web >addresses
+timeout --preserve-status --signal=TERM 2 serialization_host serve --root /tmp --listen 127.0.0.1:0 >addresses
+grep '^page: http://' addresses
 grep '^nats: nats://' addresses
 
 apt-get purge -y editor-serialization libeditor-messaging0 nats-server
