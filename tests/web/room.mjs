@@ -25,6 +25,7 @@ export async function room(...files) {
     write: false,
     target: "es2022",
     loader: { ".css": "empty", ".bin": "binary" },
+    nodePaths: [join(WEB, "node_modules")],
   });
   // From a file, since an exception out of a data URL repeats all of it.
   const folder = mkdtempSync(join(tmpdir(), "room-"));

@@ -79,6 +79,7 @@ export function* piecesOf(doc: Text, { usual, exceptions }: LineEnds): Generator
   let collected: string[] = [];
   let size = 0;
   let position = 0;
+  let isBehindReturn = false;
   for (const part of doc.iter()) {
     let piece = part;
     if (part === "\n") {
@@ -87,7 +88,11 @@ export function* piecesOf(doc: Text, { usual, exceptions }: LineEnds): Generator
         piece = exception.value.lineEnd;
         exception.next();
       }
+      if (isBehindReturn && piece === "\n") {
+        piece = "\n\n"; // or else the two would be read as one
+      }
     }
+    isBehindReturn = piece === "\r";
     position += part.length;
     collected.push(piece);
     size += piece.length;

@@ -37,6 +37,7 @@ export class TextView implements DocumentView {
   #draft: TextDraft | undefined; // that has not been applied yet
   #isClosed = false;
   #wantsFocus = false;
+  #isSettling = false; // what changes then is part of the save that is under way
 
   constructor(
     private charsets: Charsets,
@@ -211,7 +212,9 @@ export class TextView implements DocumentView {
       this.#changes = this.#changes.compose(update.changes);
     }
     if (update.docChanged || fileFormOf(update.startState) !== fileFormOf(update.state)) {
-      this.page.changed();
+      if (!this.#isSettling) {
+        this.page.changed();
+      }
       this.#status.show(update.state);
     } else if (update.selectionSet) {
       this.#status.show(update.state);
@@ -267,7 +270,7 @@ export class TextView implements DocumentView {
       ],
     });
     if (chosen === "yes") {
-      await this.#saveIn("UTF-8");
+      this.#settle({ charset: (await this.charsets.open("UTF-8"))! });
     }
     return chosen === "yes";
   }
@@ -289,9 +292,9 @@ export class TextView implements DocumentView {
       ],
     });
     if (chosen === "utf8") {
-      await this.#saveIn("UTF-8");
+      this.#settle({ charset: (await this.charsets.open("UTF-8"))! });
     } else if (chosen === "replace") {
-      this.#replaceHalves();
+      this.#settle({}, this.#halvesReplaced());
     } else if (chosen === "show") {
       this.#view!.dispatch({ selection: EditorSelection.cursor(lacking.first), scrollIntoView: true });
       this.#view!.focus();
@@ -299,7 +302,7 @@ export class TextView implements DocumentView {
     return chosen === settlement;
   }
 
-  #replaceHalves(): void {
+  #halvesReplaced(): { from: number; to: number; insert: string }[] {
     const changes = [];
     let position = 0;
     for (const part of this.#view!.state.doc.iter()) {
@@ -308,7 +311,14 @@ export class TextView implements DocumentView {
       }
       position += part.length;
     }
-    this.#view!.dispatch({ changes });
+    return changes;
+  }
+
+  #settle(form: Partial<FileForm>, changes: { from: number; to: number; insert: string }[] = []): void {
+    const view = this.#view!;
+    this.#isSettling = true;
+    view.dispatch({ changes, effects: setFileForm.of({ ...fileFormOf(view.state), ...form }) });
+    this.#isSettling = false;
   }
 
   async #comparisonWith(theirs: LoadedDocument): Promise<TextComparison | undefined> {
