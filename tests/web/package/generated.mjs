@@ -30,7 +30,14 @@ function generateElement(next, depth) {
   let content = "";
   for (let count = next(depth > 6 ? 1 : 5); count > 0; --count) {
     const kind = next(isMixed ? 4 : 2);
-    content += kind === 0 && !isMixed ? OTHERS[next(2)] : kind < 2 ? generateElement(next, depth + 1) : kind === 2 ? TEXTS[next(TEXTS.length)] : OTHERS[next(3)];
+    content +=
+      kind === 0 && !isMixed
+        ? OTHERS[next(2)]
+        : kind < 2
+          ? generateElement(next, depth + 1)
+          : kind === 2
+            ? TEXTS[next(TEXTS.length)]
+            : OTHERS[next(3)];
   }
   return `<${name}${attributes}>${content}</${name}${["", " "][next(2)]}>`;
 }

@@ -4,12 +4,8 @@ import { test } from "node:test";
 
 import { room } from "../room.mjs";
 
-const { PackageModel, combine, findDifferences, kindOf, partBytes, propertyEdit, readProperties, sizeOf, withImage } = await room(
-  "package/comparison.ts",
-  "package/package_model.ts",
-  "package/part_kinds.ts",
-  "package/properties.ts",
-);
+const { PackageModel, combine, findDifferences, kindOf, partBytes, propertyEdit, readProperties, sizeOf, withImage } =
+  await room("package/comparison.ts", "package/package_model.ts", "package/part_kinds.ts", "package/properties.ts");
 
 const part = (partUri, content, contentType = "application/xml", relationship = []) => ({
   ...{ partUri, contentType, content, relationship },
@@ -30,8 +26,16 @@ test("what is not edited is sent as it came", () => {
 test("edits are undone and done again, in order", () => {
   const model = new PackageModel(read());
   model.edit(setting("/a.xml", "1"));
-  model.edit({ parts: new Map([["/a.xml", null], ["/c.xml", part("/c.xml", "new")]]) });
-  assert.deepEqual([...model.parts].map(({ partUri }) => partUri), ["/b.bin", "/c.xml"]);
+  model.edit({
+    parts: new Map([
+      ["/a.xml", null],
+      ["/c.xml", part("/c.xml", "new")],
+    ]),
+  });
+  assert.deepEqual(
+    [...model.parts].map(({ partUri }) => partUri),
+    ["/b.bin", "/c.xml"],
+  );
   model.undo();
   assert.deepEqual([model.part("/a.xml").content, model.part("/c.xml")], ["1", undefined]);
   model.undo();
@@ -88,22 +92,53 @@ test("a draft of an earlier edition keeps what others have changed, and tells wh
   theirs.parts[0].content = "theirs";
   theirs.parts[1].content = "also theirs";
   const restored = new PackageModel(theirs, model.draft());
-  assert.deepEqual([...restored.parts].map(({ content }) => content), ["mine", "also theirs"]);
-  assert.deepEqual(findDifferences(restored, theirs).map(({ uri, changedBy }) => [uri, changedBy]), [["/a.xml", "both"]]);
+  assert.deepEqual(
+    [...restored.parts].map(({ content }) => content),
+    ["mine", "also theirs"],
+  );
+  assert.deepEqual(
+    findDifferences(restored, theirs).map(({ uri, changedBy }) => [uri, changedBy]),
+    [["/a.xml", "both"]],
+  );
 });
 
 test("parts that differ are told, with who has changed them", () => {
   const model = new PackageModel({ parts: ["/a", "/b", "/c", "/d"].map((uri) => part(uri, "0")), relationships: [] });
-  model.edit({ parts: new Map([["/a", part("/a", "1")], ["/b", part("/b", "1")], ["/c", null]]) });
-  const theirs = { parts: [part("/a", "0"), part("/b", "2"), part("/c", "0"), part("/d", "2"), part("/e", "new")], relationships: [] };
+  model.edit({
+    parts: new Map([
+      ["/a", part("/a", "1")],
+      ["/b", part("/b", "1")],
+      ["/c", null],
+    ]),
+  });
+  const theirs = {
+    parts: [part("/a", "0"), part("/b", "2"), part("/c", "0"), part("/d", "2"), part("/e", "new")],
+    relationships: [],
+  };
   assert.deepEqual(
     findDifferences(model, theirs).map(({ uri, changedBy }) => [uri, changedBy]),
-    [["/a", "mine"], ["/b", "both"], ["/c", "mine"], ["/d", "theirs"], ["/e", "theirs"]],
+    [
+      ["/a", "mine"],
+      ["/b", "both"],
+      ["/c", "mine"],
+      ["/d", "theirs"],
+      ["/e", "theirs"],
+    ],
   );
-  const chosen = new Map([["/a", model.part("/a")], ["/c", null], ["/e", theirs.parts[4]]]);
+  const chosen = new Map([
+    ["/a", model.part("/a")],
+    ["/c", null],
+    ["/e", theirs.parts[4]],
+  ]);
   const combined = combine(theirs, chosen, []);
-  assert.deepEqual([...combined.parts].map(({ partUri, content }) => partUri + content), ["/a1", "/b2", "/d2", "/enew"]);
-  assert.deepEqual(["/a", "/b", "/c", "/e"].map((uri) => combined.isChanged(uri)), [true, false, true, false]);
+  assert.deepEqual(
+    [...combined.parts].map(({ partUri, content }) => partUri + content),
+    ["/a1", "/b2", "/d2", "/enew"],
+  );
+  assert.deepEqual(
+    ["/a", "/b", "/c", "/e"].map((uri) => combined.isChanged(uri)),
+    [true, false, true, false],
+  );
 });
 
 test("listeners hear of the parts that change, and of who changed them", () => {
@@ -168,19 +203,27 @@ test("empty elements and an empty root take properties", () => {
   const model = withCore(`<coreProperties xmlns="${CORE}"/>`);
   model.edit(propertyEdit(model, "title", "T"));
   assert.deepEqual(readProperties(model), { title: "T" });
-  const other = withCore(`<coreProperties xmlns="${CORE}"><title xmlns="http://purl.org/dc/elements/1.1/" /></coreProperties>`);
+  const other = withCore(
+    `<coreProperties xmlns="${CORE}"><title xmlns="http://purl.org/dc/elements/1.1/" /></coreProperties>`,
+  );
   other.edit(propertyEdit(other, "title", "T"));
   assert.deepEqual(readProperties(other), { title: "T" });
 });
 
 test("a document without properties gets a part and a relationship for them, which undo takes away", () => {
-  const model = new PackageModel({ parts: [part("/docProps/core.xml", "taken")], relationships: [{ relationshipId: "rId1" }] });
+  const model = new PackageModel({
+    parts: [part("/docProps/core.xml", "taken")],
+    relationships: [{ relationshipId: "rId1" }],
+  });
   assert.deepEqual(readProperties(model), {});
   model.edit(propertyEdit(model, "creator", "Ada"));
   assert.deepEqual(readProperties(model), { creator: "Ada" });
   assert.deepEqual(
     model.relationships.map(({ relationshipId, target }) => [relationshipId, target]),
-    [["rId1", undefined], ["rId2", "docProps/core1.xml"]],
+    [
+      ["rId1", undefined],
+      ["rId2", "docProps/core1.xml"],
+    ],
   );
   model.edit(propertyEdit(model, "creator", "Ada L."));
   model.undo();

@@ -45,7 +45,11 @@ test("the charset follows the declaration as it is edited", () => {
 });
 
 test("what would not come back is no text", () => {
-  for (const content of ["\xff\xff\xff", bytes(`<?xml version="1.0" encoding="Shift_JIS"?><a>\x83\x65</a>`, "latin1"), "\xc0\x80"]) {
+  for (const content of [
+    "\xff\xff\xff",
+    bytes(`<?xml version="1.0" encoding="Shift_JIS"?><a>\x83\x65</a>`, "latin1"),
+    "\xc0\x80",
+  ]) {
     assert.equal(decodePart(content), undefined);
   }
 });

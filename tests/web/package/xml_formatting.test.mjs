@@ -5,12 +5,13 @@ import { test } from "node:test";
 import { room } from "../room.mjs";
 import { generateXml, generator } from "./generated.mjs";
 
-const { EditorState, copiedLayout, findXmlError, formatXml, history, keepLayout, layout, redo, undo, withoutLayout } = await room(
-  "package/xml_formatting.ts",
-  "package/xml_scanner.ts",
-  "npm:@codemirror/state",
-  "npm:@codemirror/commands",
-);
+const { EditorState, copiedLayout, findXmlError, formatXml, history, keepLayout, layout, redo, undo, withoutLayout } =
+  await room(
+    "package/xml_formatting.ts",
+    "package/xml_scanner.ts",
+    "npm:@codemirror/state",
+    "npm:@codemirror/commands",
+  );
 
 class Editor {
   constructor(xml) {
@@ -114,7 +115,7 @@ test("any edits, undone and done again, save what was edited", () => {
     const next = generator(seed);
     const editor = new Editor(generateXml(next));
     const { gaps } = formatXml(editor.saved);
-    const inGap = (index) => gaps.findLastIndex?.((at) => at <= index) % 2 === 0;
+    const inGap = (index) => gaps.findLastIndex((at) => at <= index) % 2 === 0;
     let characters = Array.from({ length: editor.shown.length }, (_, index) => [editor.shown[index], inGap(index)]);
     const states = [];
     const saved = () => characters.map(([character, isLayout]) => (isLayout ? "" : character)).join("");
@@ -126,7 +127,11 @@ test("any edits, undone and done again, save what was edited", () => {
         continue;
       }
       states.push(characters);
-      characters = [...characters.slice(0, from), ...Array.from(insert, (one) => [one, false]), ...characters.slice(to)];
+      characters = [
+        ...characters.slice(0, from),
+        ...Array.from(insert, (one) => [one, false]),
+        ...characters.slice(to),
+      ];
       editor.change({ from, to, insert });
       assert.equal(editor.saved, saved(), `seed ${seed}, edit ${count}`);
     }

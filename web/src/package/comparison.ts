@@ -41,14 +41,23 @@ export function findDifferences(mine: PackageModel, theirs: Document): Differenc
 }
 
 /** The edition of theirs with the parts of `chosen` in it: what is null is taken out. */
-export function combine(theirs: Document, chosen: Map<string, Part | null>, relationships: Relationship[]): PackageModel {
+export function combine(
+  theirs: Document,
+  chosen: Map<string, Part | null>,
+  relationships: Relationship[],
+): PackageModel {
   const model = new PackageModel(theirs);
   model.edit({ parts: chosen, relationships });
   return model;
 }
 
 /** Shows the differences; `use` gets what is chosen, as changes of theirs. */
-export function compareDocuments(mine: PackageModel, theirs: Document, page: Page, use: (model: PackageModel) => void): Comparison {
+export function compareDocuments(
+  mine: PackageModel,
+  theirs: Document,
+  page: Page,
+  use: (model: PackageModel) => void,
+): Comparison {
   return new PackageComparison(mine, theirs, page, use);
 }
 
@@ -65,8 +74,14 @@ class PackageComparison implements Comparison {
     private page: Page,
     private use: (model: PackageModel) => void,
   ) {
-    this.#rows = findDifferences(mine, theirs).map((difference) => new ComparedPart(difference, page, (row) => this.#show(row)));
-    const list = element("ul", { "aria-label": page.text("package.differences") }, ...this.#rows.map((row) => row.element));
+    this.#rows = findDifferences(mine, theirs).map(
+      (difference) => new ComparedPart(difference, page, (row) => this.#show(row)),
+    );
+    const list = element(
+      "ul",
+      { "aria-label": page.text("package.differences") },
+      ...this.#rows.map((row) => row.element),
+    );
     if (!areSame(mine.relationships, theirs.relationships)) {
       list.append(this.#relationships());
     }
@@ -183,7 +198,10 @@ class ComparedPart {
     });
     this.#merge = { view, decoded: my, part: mine };
     const titles = element("div", { className: "package-sides" });
-    titles.append(element("h3", {}, this.page.text("package.theirs")), element("h3", {}, this.page.text("package.mine")));
+    titles.append(
+      element("h3", {}, this.page.text("package.theirs")),
+      element("h3", {}, this.page.text("package.mine")),
+    );
     return element("div", {}, titles, element("p", {}, this.page.text("package.differences.hint")), view.dom);
   }
 
@@ -213,7 +231,9 @@ class ComparedPart {
     }
     shown.append(element("p", {}, `${textOf(part.contentType)}, ${bytesText(sizeOf(part))}`));
     if (kindOf(part) === "image") {
-      const url = URL.createObjectURL(new Blob([partBytes(part) as Uint8Array<ArrayBuffer>], { type: part.contentType }));
+      const url = URL.createObjectURL(
+        new Blob([partBytes(part) as Uint8Array<ArrayBuffer>], { type: part.contentType }),
+      );
       const image = element("img", { alt: `${textOf(this.uri)}: ${page.text(`package.${side}`)}`, src: url });
       image.addEventListener("load", () => URL.revokeObjectURL(url));
       image.addEventListener("error", () => URL.revokeObjectURL(url));

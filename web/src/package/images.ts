@@ -33,5 +33,7 @@ const EXCHANGEABLE = ["image/png", "image/jpeg", "image/jpg", "image/gif", "imag
 
 /** Whether an image of the type `replacement` is shown in the place of one of the type `present`. */
 export function mayReplace(present: string, replacement: string): boolean {
-  return present === replacement || (EXCHANGEABLE.includes(present.toLowerCase()) && EXCHANGEABLE.includes(replacement));
+  return (
+    present === replacement || (EXCHANGEABLE.includes(present.toLowerCase()) && EXCHANGEABLE.includes(replacement))
+  );
 }

@@ -42,7 +42,8 @@ export function inertNodes(): { make: (wanted: Wanted | Node | string) => Node; 
       return fragment;
     }
     const name = REFUSED.test(tagName) ? "span" : tagName;
-    const contents = name === "style" ? children.map((child) => (typeof child === "string" ? harmless(child) : child)) : children;
+    const contents =
+      name === "style" ? children.map((child) => (typeof child === "string" ? harmless(child) : child)) : children;
     const made = (ns ? owner.createElementNS(ns, name) : owner.createElement(name)) as HTMLElement;
     if (className) {
       made.setAttribute("class", className);

@@ -52,7 +52,9 @@ export class PackageView implements DocumentView {
   ) {
     this.#undo = this.#command("package.undo", () => this.#model.undo());
     this.#redo = this.#command("package.redo", () => this.#model.redo());
-    this.#previewSwitch = button(page.text("package.preview"), () => this.#togglePreview(), { "aria-pressed": "false" });
+    this.#previewSwitch = button(page.text("package.preview"), () => this.#togglePreview(), {
+      "aria-pressed": "false",
+    });
     this.element.append(this.#bar(), this.#stage);
     this.element.addEventListener("keydown", (event) => this.#undoByKey(event));
     this.#use(new PackageModel(documentOf(loaded), draft));
@@ -131,6 +133,7 @@ export class PackageView implements DocumentView {
     }
     this.#preview?.close();
     this.#preview = undefined;
+    this.#previewSwitch.setAttribute("aria-pressed", "false");
   }
 
   #commit(): void {
@@ -166,7 +169,11 @@ export class PackageView implements DocumentView {
 
   #bar(): HTMLElement {
     const { page } = this;
-    const tabs = element("div", { role: "tablist", "aria-label": page.text("package.views"), className: "package-tabs" });
+    const tabs = element("div", {
+      role: "tablist",
+      "aria-label": page.text("package.views"),
+      className: "package-tabs",
+    });
     for (const name of PANELS) {
       const tab = button(page.text(`package.${name}`), () => this.#show(name), {
         role: "tab",
@@ -219,7 +226,9 @@ export class PackageView implements DocumentView {
   }
 
   #brokenParts(): string[] {
-    const changed = [...this.#model.parts].filter((part) => kindOf(part) === "xml" && this.#model.isChanged(part.partUri));
+    const changed = [...this.#model.parts].filter(
+      (part) => kindOf(part) === "xml" && this.#model.isChanged(part.partUri),
+    );
     const isBroken = (content: string) => {
       const decoded = decodePart(content);
       return !decoded || findXmlError(decoded.text) !== undefined;

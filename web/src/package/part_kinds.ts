@@ -28,7 +28,10 @@ function tellKind({ content, contentType }: Part): PartKind {
   }
   const isText =
     type.startsWith("text/") ||
-    (content !== "" && content.length < LONGEST_GUESSED && !/[\0-\x08]/.test(content.slice(0, 1000)) && isPlainText(content));
+    (content !== "" &&
+      content.length < LONGEST_GUESSED &&
+      !/[\0-\x08]/.test(content.slice(0, 1000)) &&
+      isPlainText(content));
   return isText ? "text" : "binary";
 }
 

@@ -39,7 +39,9 @@ export class PartTree {
     }
     this.#items.clear();
     const root = this.#item(PACKAGE, this.page.text("package.parts.package"), 1);
-    const groups = [...folders].sort(([one], [other]) => byName(one, other)).map(([name, uris]) => this.#folder(name, uris));
+    const groups = [...folders]
+      .sort(([one], [other]) => byName(one, other))
+      .map(([name, uris]) => this.#folder(name, uris));
     this.element.replaceChildren(root, ...groups);
     this.select(this.#items.has(this.#selected) ? this.#selected : PACKAGE);
     if (hadFocus) {
@@ -79,7 +81,12 @@ export class PartTree {
       return group;
     }
     const label = element("span", { className: "package-folder" }, textOf(name));
-    const folder = element("li", { role: "treeitem", "aria-expanded": "true", "aria-label": textOf(name), tabIndex: -1 });
+    const folder = element("li", {
+      role: "treeitem",
+      "aria-expanded": "true",
+      "aria-label": textOf(name),
+      tabIndex: -1,
+    });
     folder.append(label, element("ul", { role: "group" }, ...items));
     return folder;
   }
@@ -128,7 +135,9 @@ export class PartTree {
   }
 
   #moveByKey(event: KeyboardEvent): void {
-    const items = [...this.element.querySelectorAll<HTMLElement>("[role=treeitem]")].filter((item) => !item.closest("ul[hidden]"));
+    const items = [...this.element.querySelectorAll<HTMLElement>("[role=treeitem]")].filter(
+      (item) => !item.closest("ul[hidden]"),
+    );
     const current = document.activeElement as HTMLElement;
     const index = items.indexOf(current);
     if (index < 0 || event.ctrlKey || event.metaKey || event.altKey) {

@@ -47,7 +47,9 @@ function partFile(part: Part): ArchiveFile {
 
 function contentTypes(parts: Part[]): string {
   // docx-preview compares names without the slash that begins them.
-  const types = parts.map((part) => `<Override${attributes({ PartName: part.partUri.slice(1), ContentType: part.contentType })}/>`);
+  const types = parts.map(
+    (part) => `<Override${attributes({ PartName: part.partUri.slice(1), ContentType: part.contentType })}/>`,
+  );
   return `<Types xmlns="http://schemas.openxmlformats.org/package/2006/content-types">${types.join("")}</Types>`;
 }
 

@@ -118,7 +118,11 @@ export class PartsPanel implements Panel {
       );
       return;
     }
-    const commands = element("div", { className: "package-commands" }, button(page.text("package.export"), () => this.#export()));
+    const commands = element(
+      "div",
+      { className: "package-commands" },
+      button(page.text("package.export"), () => this.#export()),
+    );
     const head = element(
       "header",
       {},
@@ -149,7 +153,9 @@ export class PartsPanel implements Panel {
     this.#editor = { view, decoded, key: `editor ${++editors}`, isDirty: false };
     if (isXml && view.view.state.doc.length !== decoded.text.length) {
       commands.append(
-        button(this.page.text("package.layout.keep"), () => view.keepLayout(), { title: this.page.text("package.layout.hint") }),
+        button(this.page.text("package.layout.keep"), () => view.keepLayout(), {
+          title: this.page.text("package.layout.hint"),
+        }),
       );
     }
     view.view.dom.addEventListener("focusout", () => this.commit());
@@ -189,7 +195,10 @@ export class PartsPanel implements Panel {
     const picker = element("input", { type: "file", accept: "image/*", hidden: true });
     picker.setAttribute("aria-label", page.text("package.image.replace"));
     picker.addEventListener("change", () => void this.#replaceImage(part.partUri, picker.files?.[0]));
-    commands.append(button(page.text("package.image.replace"), () => picker.click()), picker);
+    commands.append(
+      button(page.text("package.image.replace"), () => picker.click()),
+      picker,
+    );
     this.#pane.ondragover = (event) => event.preventDefault();
     this.#pane.ondrop = (event) => {
       event.preventDefault();
@@ -234,13 +243,25 @@ export class PartsPanel implements Panel {
         {},
         element("td", {}, textOf(relationshipId)),
         element("td", { title: textOf(relationshipType) }, textOf(relationshipType).replace(/^.*\//, "")),
-        element("td", {}, this.model.part(uri) ? button(name, () => this.#show(uri), { className: "package-link" }) : name),
+        element(
+          "td",
+          {},
+          this.model.part(uri) ? button(name, () => this.#show(uri), { className: "package-link" }) : name,
+        ),
       );
     });
-    const head = ["id", "type", "target"].map((key) => element("th", { scope: "col" }, page.text(`package.relationships.${key}`)));
+    const head = ["id", "type", "target"].map((key) =>
+      element("th", { scope: "col" }, page.text(`package.relationships.${key}`)),
+    );
     const count = page.text("package.relationships", { count: relationships.length });
-    const details = element("details", { open: isOpen, hidden: relationships.length === 0 }, element("summary", {}, count));
-    details.append(element("table", {}, element("thead", {}, element("tr", {}, ...head)), element("tbody", {}, ...rows)));
+    const details = element(
+      "details",
+      { open: isOpen, hidden: relationships.length === 0 },
+      element("summary", {}, count),
+    );
+    details.append(
+      element("table", {}, element("thead", {}, element("tr", {}, ...head)), element("tbody", {}, ...rows)),
+    );
     return details;
   }
 }

@@ -9,8 +9,7 @@ import { decodeReferences, encodeText, XmlScanner } from "./xml_scanner.js";
 const CORE = "http://schemas.openxmlformats.org/package/2006/metadata/core-properties";
 const DUBLIN_CORE = "http://purl.org/dc/elements/1.1/";
 const CONTENT_TYPE = "application/vnd.openxmlformats-package.core-properties+xml";
-const RELATIONSHIP_TYPE =
-  "http://schemas.openxmlformats.org/package/2006/relationships/metadata/core-properties";
+const RELATIONSHIP_TYPE = "http://schemas.openxmlformats.org/package/2006/relationships/metadata/core-properties";
 const STRICT_RELATIONSHIP_TYPE = "http://purl.oclc.org/ooxml/officeDocument/relationships/metadata/core-properties";
 
 /** The properties that can be edited: local names, and the namespaces they are in. */

@@ -50,7 +50,8 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.relationships.type": "Type",
     "package.relationships.target": "Target",
     "package.layout.keep": "Save with line breaks",
-    "package.layout.hint": "Line breaks and indentation are shown for reading, and not saved unless you ask for it here.",
+    "package.layout.hint":
+      "Line breaks and indentation are shown for reading, and not saved unless you ask for it here.",
     "package.xml.problem": "Line {line} is not well-formed: {reason}.",
     "package.xml.goto": "Go there",
     "package.xml.syntax": "this is no XML",
@@ -65,7 +66,8 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.image.unknown": "Browsers do not show images of this type. It can be exported and replaced.",
     "package.image.refused": "{name} cannot take the place of an image of type {type}.",
     "package.image.replaced": "The image has been replaced with {name}.",
-    "package.properties.problem": "The part with the properties is not well-formed XML. It can be edited among the parts.",
+    "package.properties.problem":
+      "The part with the properties is not well-formed XML. It can be edited among the parts.",
     "package.properties.title": "Title",
     "package.properties.creator": "Creator",
     "package.properties.subject": "Subject",
@@ -102,7 +104,8 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.export": "Exportieren",
     "package.binary": "Dieser Teil ist weder Text noch Bild. Er wird gespeichert, wie er ist.",
     "package.broken.title": "Fehlerhaftes XML speichern?",
-    "package.broken.message": "Office-Programme werden das Dokument nicht öffnen, denn dies ist kein wohlgeformtes XML: {parts}",
+    "package.broken.message":
+      "Office-Programme werden das Dokument nicht öffnen, denn dies ist kein wohlgeformtes XML: {parts}",
     "package.broken.save": "Trotzdem speichern",
     "package.broken.cancel": "Weiter bearbeiten",
     "package.text.find": "Suchen",
@@ -139,7 +142,8 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.relationships.type": "Art",
     "package.relationships.target": "Ziel",
     "package.layout.keep": "Mit Zeilenumbrüchen speichern",
-    "package.layout.hint": "Zeilenumbrüche und Einrückungen dienen dem Lesen und werden nur gespeichert, wenn es hier verlangt wird.",
+    "package.layout.hint":
+      "Zeilenumbrüche und Einrückungen dienen dem Lesen und werden nur gespeichert, wenn es hier verlangt wird.",
     "package.xml.problem": "Zeile {line} ist nicht wohlgeformt: {reason}.",
     "package.xml.goto": "Dorthin",
     "package.xml.syntax": "das ist kein XML",
@@ -154,7 +158,8 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.image.unknown": "Browser zeigen Bilder dieser Art nicht. Es kann exportiert und ersetzt werden.",
     "package.image.refused": "{name} kann ein Bild der Art {type} nicht ersetzen.",
     "package.image.replaced": "Das Bild wurde durch {name} ersetzt.",
-    "package.properties.problem": "Der Teil mit den Eigenschaften ist kein wohlgeformtes XML. Er kann bei den Teilen bearbeitet werden.",
+    "package.properties.problem":
+      "Der Teil mit den Eigenschaften ist kein wohlgeformtes XML. Er kann bei den Teilen bearbeitet werden.",
     "package.properties.title": "Titel",
     "package.properties.creator": "Verfasser",
     "package.properties.subject": "Thema",
@@ -177,6 +182,7 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.differences.absent": "Es gibt diesen Teil nicht.",
     "package.differences.relationships": "Beziehungen des Pakets",
     "package.differences.take": "Diese Änderung aus dem anderen übernehmen",
-    "package.differences.hint": "Meines kann hier bearbeitet werden; die Pfeile holen Änderungen aus dem anderen herüber.",
+    "package.differences.hint":
+      "Meines kann hier bearbeitet werden; die Pfeile holen Änderungen aus dem anderen herüber.",
   },
 };

@@ -68,7 +68,10 @@ export class PartEditor {
           keymap.of([...searchKeymap, ...historyKeymap, ...defaultKeymap, indentWithTab]),
           EditorView.contentAttributes.of({ "aria-label": label }),
           EditorView.updateListener.of((update) => {
-            if (update.docChanged || update.transactions.some(({ effects }) => effects.some((one) => one.is(keepLayout)))) {
+            if (
+              update.docChanged ||
+              update.transactions.some(({ effects }) => effects.some((one) => one.is(keepLayout)))
+            ) {
               changed();
             }
           }),
