@@ -241,7 +241,8 @@ export class Client {
     const subscription = this.nats.subscribe(NOTIFICATION, {
       callback: (error, message) => {
         if (!error) {
-          changed(JSON.parse(new TextDecoder().decode(message.data)));
+          const change: Change = JSON.parse(new TextDecoder().decode(message.data));
+          queueMicrotask(() => changed(change)); // what it throws would end the connection here
         }
       },
     });

@@ -63,8 +63,9 @@ export class FileTree {
   /** A file may have been written. */
   changed(path: string): void {
     const folder = this.#model.markChanged(path);
-    if (path === this.#shownPath) {
-      this.#model.find(path)!.isChanged = false;
+    const known = this.#model.find(path);
+    if (known && path === this.#shownPath) {
+      known.isChanged = false;
     }
     if (folder && folder.state !== "unread" && !this.#toRefresh.has(folder)) {
       const refresh = () => {

@@ -1,0 +1,240 @@
+// SPDX-License-Identifier: Apache-2.0
+// Saving: what is on disk afterwards, what becomes of what somebody else saved, and what outlives a reload, a
+// crash or a host that is killed.
+import assert from "node:assert/strict";
+import { chmodSync, unlinkSync } from "node:fs";
+
+import { waitFor } from "../../serve/processes.mjs";
+import { clientOf } from "./client.mjs";
+import { browserTest, Session } from "./harness.mjs";
+
+const RACES = Number(process.env.EDITOR_RACES ?? 10);
+
+const row = (page, name) => page.locator(".tree .row", { has: page.getByText(name, { exact: true }) });
+const tab = (page, name) => page.getByRole("tab", { name });
+const text = (page) => page.locator(".panel:not([hidden]) .cm-content");
+const dialog = (page) => page.getByRole("dialog");
+const shownText = (page) => text(page).innerText();
+
+async function open(page, name) {
+  await row(page, name).click();
+  await text(page).waitFor();
+}
+
+// Types at the beginning of the text.
+async function type(page, typed) {
+  await text(page).click();
+  await page.keyboard.press("Control+Home");
+  await page.keyboard.type(typed);
+}
+
+const isUnsaved = (page, name) => tab(page, name).locator(".mark.unsaved").waitFor();
+const isSaved = (page, name) => tab(page, name).locator(".mark.unsaved").waitFor({ state: "detached" });
+
+browserTest("what is unsaved is seen in tab and title, and Ctrl+S saves it", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page } = session;
+  await open(page, "a.txt");
+  await type(page, "zero ");
+  await isUnsaved(page, "a.txt");
+  assert.equal(await page.title(), "\u25cf a.txt - Documents");
+  await page.keyboard.press("Control+s");
+  await isSaved(page, "a.txt");
+  await page.getByText(/Saved at/).waitFor();
+  assert.equal(await page.title(), "a.txt - Documents");
+  assert.equal(session.read("a.txt").toString(), "zero one\n");
+});
+
+browserTest("what somebody else saves is shown at once where nothing is unsaved", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page } = session;
+  await open(page, "a.txt");
+  const other = await clientOf(t, session);
+  await other.write(session.path("a.txt"), "theirs\n");
+  await page.getByText(/saved by somebody else/).waitFor();
+  assert.match(await shownText(page), /theirs/);
+  await type(page, "and mine, ");
+  await page.keyboard.press("Control+s");
+  await isSaved(page, "a.txt");
+  assert.equal(session.read("a.txt").toString(), "and mine, theirs\n");
+});
+
+// Two pages change one document; the first has saved when the second one asks to.
+async function conflict(t) {
+  const session = await Session.start(t, { "a.txt": "one\ntwo\nthree\n" });
+  const { page: mine } = session;
+  const theirs = await session.newPage();
+  await open(mine, "a.txt");
+  await open(theirs, "a.txt");
+  await type(mine, "mine ");
+  await isUnsaved(mine, "a.txt");
+  await text(theirs).click();
+  await theirs.keyboard.press("Control+End");
+  await theirs.keyboard.type("theirs");
+  await theirs.keyboard.press("Control+s");
+  await isSaved(theirs, "a.txt");
+  await tab(mine, "a.txt").locator(".mark.theirs").waitFor();
+  await mine.keyboard.press("Control+s");
+  await dialog(mine).getByText("somebody else has saved").waitFor();
+  assert.equal(session.read("a.txt").toString(), "one\ntwo\nthree\ntheirs");
+  return { session, mine, theirs };
+}
+
+browserTest("of two pages, the second to save can keep its own", async (t) => {
+  const { session, mine, theirs } = await conflict(t);
+  await dialog(mine).getByRole("button", { name: "Keep mine" }).click();
+  await isSaved(mine, "a.txt");
+  assert.equal(session.read("a.txt").toString(), "mine one\ntwo\nthree\n");
+  await theirs.getByText(/saved by somebody else/).waitFor();
+  assert.match(await shownText(theirs), /^mine one/);
+});
+
+browserTest("of two pages, the second to save can take the other's", async (t) => {
+  const { session, mine } = await conflict(t);
+  await dialog(mine).getByRole("button", { name: "Take theirs" }).click();
+  await isSaved(mine, "a.txt");
+  assert.match(await shownText(mine), /^one\ntwo\nthree\ntheirs/);
+  assert.equal(session.read("a.txt").toString(), "one\ntwo\nthree\ntheirs");
+});
+
+browserTest("of two pages, the second to save can put both together", async (t) => {
+  const { session, mine } = await conflict(t);
+  await dialog(mine).getByRole("button", { name: "Compare" }).click();
+  const editors = dialog(mine).locator(".cm-content");
+  await editors.first().waitFor();
+  const editable = dialog(mine).locator('.cm-content[contenteditable="true"]').last();
+  await editable.click();
+  await mine.keyboard.press("Control+End");
+  await mine.keyboard.type("and theirs\n");
+  await dialog(mine).getByRole("button", { name: "Save put together" }).click();
+  await isSaved(mine, "a.txt");
+  assert.equal(session.read("a.txt").toString(), "mine one\ntwo\nthree\nand theirs\n");
+});
+
+browserTest("a person can decide later, and nothing is lost", async (t) => {
+  const { session, mine } = await conflict(t);
+  await mine.keyboard.press("Escape");
+  await dialog(mine).waitFor({ state: "detached" });
+  await isUnsaved(mine, "a.txt");
+  assert.match(await shownText(mine), /^mine one/);
+  assert.equal(session.read("a.txt").toString(), "one\ntwo\nthree\ntheirs");
+});
+
+browserTest("two pages that save at once overwrite nothing unseen", async (t) => {
+  const session = await Session.start(t, { "a.txt": "start\n" });
+  const pages = [session.page, await session.newPage()];
+  for (const page of pages) {
+    await open(page, "a.txt");
+  }
+  for (let race = 0; race < RACES; ++race) {
+    for (const [index, page] of pages.entries()) {
+      await type(page, `p${index}r${race} `);
+    }
+    await Promise.all(pages.map((page) => page.keyboard.press("Control+s")));
+    // One is saved; the other one is asked, and puts its own in the place of what it has seen.
+    const asked = await waitFor("who is asked", async () => {
+      for (const page of pages) {
+        if (await dialog(page).isVisible()) {
+          return page;
+        }
+      }
+      return undefined;
+    });
+    const winner = pages[1 - pages.indexOf(asked)];
+    await isSaved(winner, "a.txt");
+    assert.ok(session.read("a.txt").toString().startsWith(`p${pages.indexOf(winner)}r${race} `), `race ${race}`);
+    await dialog(asked).getByRole("button", { name: race % 2 ? "Keep mine" : "Take theirs" }).click();
+    await isSaved(asked, "a.txt");
+    const saved = session.read("a.txt").toString();
+    assert.ok(saved.startsWith(`p${pages.indexOf(race % 2 ? asked : winner)}r${race} `), `race ${race}: ${saved}`);
+    await waitFor("the same text in both", async () => {
+      const texts = await Promise.all(pages.map(shownText));
+      return texts.every((one) => one.trim() === saved.trim());
+    });
+  }
+});
+
+browserTest("a reload keeps what is unsaved, and what it is based on", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n", "b.txt": "two\n" });
+  const { page } = session;
+  await open(page, "b.txt");
+  await open(page, "a.txt");
+  await type(page, "unsaved ");
+  await isUnsaved(page, "a.txt");
+  await page.waitForTimeout(600);
+  await page.reload();
+  await session.waitUntilConnected(page);
+  await page.getByText(/have been restored/).waitFor();
+  await isUnsaved(page, "a.txt");
+  assert.equal(await page.getByRole("tab").count(), 2);
+  assert.match(await shownText(page), /^unsaved one/);
+  await page.keyboard.press("Control+s");
+  await isSaved(page, "a.txt");
+  assert.equal(session.read("a.txt").toString(), "unsaved one\n");
+  await page.reload();
+  await session.waitUntilConnected(page);
+  await text(page).waitFor();
+  assert.equal(await page.locator(".mark").count(), 0);
+});
+
+browserTest("what is unsaved outlives a page that crashes, and knows what others saved meanwhile", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const crashing = await session.newPage();
+  await open(crashing, "a.txt");
+  await type(crashing, "unsaved ");
+  await isUnsaved(crashing, "a.txt");
+  await crashing.waitForTimeout(600);
+  await crashing.goto("chrome://crash").catch(() => {});
+  await crashing.close();
+  const other = await clientOf(t, session);
+  await other.write(session.path("a.txt"), "theirs\n");
+  const page = await session.newPage();
+  await page.getByText(/somebody else has saved it/).waitFor();
+  assert.match(await shownText(page), /^unsaved one/);
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByText("somebody else has saved").waitFor();
+  assert.equal(session.read("a.txt").toString(), "theirs\n");
+});
+
+browserTest("a save of a file that was removed asks first", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page } = session;
+  await open(page, "a.txt");
+  await type(page, "still ");
+  unlinkSync(session.path("a.txt"));
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByText("has been removed").waitFor();
+  await dialog(page).getByRole("button", { name: "Save as new" }).click();
+  await isSaved(page, "a.txt");
+  assert.equal(session.read("a.txt").toString(), "still one\n");
+});
+
+browserTest("a save that cannot be made says what may be the matter, and keeps the text", { skip: process.getuid() === 0 && "root may write everywhere" }, async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page } = session;
+  await open(page, "a.txt");
+  await type(page, "mine ");
+  chmodSync(session.path("a.txt"), 0o444);
+  chmodSync(session.folder, 0o555);
+  t.after(() => chmodSync(session.folder, 0o755));
+  await page.keyboard.press("Control+s");
+  await page.getByText(/write-protected/).waitFor();
+  await isUnsaved(page, "a.txt");
+});
+
+browserTest("a host that is killed while it saves loses nothing, and the page saves when there is one again", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" }, { expectedProblems: [/WebSocket|ERR_CONNECTION/] });
+  const { page, host } = session;
+  await open(page, "a.txt");
+  await type(page, "unsaved ");
+  host.signal("SIGSTOP"); // it takes the save, and does not get to it
+  await page.keyboard.press("Control+s");
+  await page.getByText(/Saving/).waitFor();
+  host.signal("SIGKILL");
+  await page.getByText(/server cannot be reached/).first().waitFor();
+  assert.match(await shownText(page), /^unsaved one/);
+  await isUnsaved(page, "a.txt");
+  const draft = page.waitForTimeout(600);
+  await draft;
+  assert.equal(session.read("a.txt").toString(), "one\n");
+});
