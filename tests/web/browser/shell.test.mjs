@@ -1,0 +1,185 @@
+// SPDX-License-Identifier: Apache-2.0
+// The page around the documents: connection, tabs, links, languages, colours, small windows, screen readers.
+import assert from "node:assert/strict";
+import { readFileSync } from "node:fs";
+import { createRequire } from "node:module";
+import { join } from "node:path";
+
+import { ROOT } from "../../serve/processes.mjs";
+import { browserTest, Session } from "./harness.mjs";
+
+const AXE = readFileSync(createRequire(join(ROOT, "web/package.json")).resolve("axe-core/axe.min.js"), "utf8");
+
+const row = (page, name) => page.locator(".tree .row", { has: page.getByText(name, { exact: true }) });
+const tab = (page, name) => page.getByRole("tab", { name });
+
+async function open(page, name) {
+  await row(page, name).click();
+  await page.locator(".panel:not([hidden]) .cm-content").waitFor();
+}
+
+// What axe finds fault with on the page as it is.
+async function faults(page) {
+  await page.evaluate(AXE);
+  const { violations } = await page.evaluate(() => window.axe.run());
+  return violations.map(({ id, nodes }) => `${id}: ${nodes.map((node) => node.html).join(" ")}`);
+}
+
+// The address of the page with another word in its fragment.
+function withSetting(address, key, value) {
+  const url = new URL(address);
+  const settings = new URLSearchParams(url.hash.slice(1));
+  settings.set(key, value);
+  url.hash = settings;
+  return url.href;
+}
+
+browserTest("a wrong password is told of, and another can be typed", async (t) => {
+  const session = await Session.start(t, {}, { expectedProblems: [/WebSocket/] });
+  const page = await session.context.newPage();
+  await page.goto(withSetting(session.host.page, "password", "wrong"));
+  await page.getByRole("alert").getByText(/does not accept this user or password/).waitFor();
+  assert.deepEqual(await faults(page), []);
+  const password = new URLSearchParams(new URL(session.host.page).hash.slice(1)).get("password");
+  await page.getByLabel("Password").fill(password);
+  await page.keyboard.press("Enter");
+  await session.waitUntilConnected(page);
+});
+
+browserTest("a server that cannot be reached is told of", async (t) => {
+  const session = await Session.start(t, {}, { expectedProblems: [/WebSocket/] });
+  const page = await session.context.newPage();
+  await page.goto(withSetting(session.host.page, "server", "ws://127.0.0.1:9"));
+  await page.getByText(/ws:\/\/127\.0\.0\.1:9 cannot be reached/).waitFor();
+});
+
+browserTest("a host that does not answer is told of, and the reading can be cancelled", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page, host } = session;
+  await row(page, "a.txt").waitFor();
+  host.signal("SIGSTOP");
+  await row(page, "a.txt").click();
+  await page.getByText(/There is no answer yet/).waitFor();
+  await page.getByRole("main").getByRole("button", { name: "Cancel" }).click();
+  await page.getByText("Reading was cancelled.").waitFor();
+  host.signal("SIGCONT");
+  await page.getByRole("button", { name: "Try again" }).click();
+  await page.locator(".cm-content").waitFor();
+});
+
+browserTest("tabs are gone through, and closed, by the keyboard", async (t) => {
+  const { page } = await Session.start(t, { "a.txt": "one\n", "b.txt": "two\n", "c.txt": "three\n" });
+  for (const name of ["a.txt", "b.txt", "c.txt"]) {
+    await open(page, name);
+  }
+  await tab(page, "c.txt").focus();
+  await page.keyboard.press("ArrowRight");
+  assert.equal(await page.title(), "a.txt - Documents");
+  await page.keyboard.press("End");
+  await page.keyboard.press("ArrowLeft");
+  assert.equal(await tab(page, "b.txt").getAttribute("aria-selected"), "true");
+  await page.keyboard.press("Delete");
+  await tab(page, "b.txt").waitFor({ state: "detached" });
+  assert.equal(await page.getByRole("tab").count(), 2);
+  assert.equal(await page.getByRole("tabpanel").count(), 1);
+});
+
+browserTest("a document with unsaved changes is closed only after asking", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page } = session;
+  await open(page, "a.txt");
+  await page.locator(".cm-content").click();
+  await page.keyboard.type("x");
+  await tab(page, "a.txt").locator(".mark.unsaved").waitFor();
+  await tab(page, "a.txt").focus();
+  await page.keyboard.press("Delete");
+  await page.getByRole("dialog").waitFor();
+  await page.keyboard.press("Escape");
+  assert.equal(await tab(page, "a.txt").count(), 1);
+  await tab(page, "a.txt").focus();
+  await page.keyboard.press("Delete");
+  await page.getByRole("dialog").getByRole("button", { name: "Discard changes" }).click();
+  await tab(page, "a.txt").waitFor({ state: "detached" });
+  assert.equal(session.read("a.txt").toString(), "one\n");
+  await open(page, "a.txt");
+  assert.equal((await page.locator(".cm-content").innerText()).trim(), "one");
+});
+
+browserTest("a link leads to its document, and does not hold the password", async (t) => {
+  const session = await Session.start(t, { "caf\u00e9 +&#.txt": "one\n" });
+  const { page } = session;
+  await open(page, "caf\u00e9 +&#.txt");
+  const address = await page.evaluate(() => location.href);
+  assert.doesNotMatch(address, /password/);
+  const other = await session.context.newPage();
+  await other.goto(address);
+  // A window of its own is asked for the password, and for nothing else.
+  const password = new URLSearchParams(new URL(session.host.page).hash.slice(1)).get("password");
+  await other.getByLabel("Password").fill(password);
+  await other.keyboard.press("Enter");
+  await tab(other, "caf\u00e9 +&#.txt").waitFor();
+});
+
+browserTest("the page speaks the browser's language, or the one that is chosen", async (t) => {
+  const { page } = await Session.start(t, { "a.txt": "one\n" }, { locale: "de-AT" });
+  await page.getByRole("button", { name: "Speichern" }).waitFor();
+  assert.equal(await page.locator("html").getAttribute("lang"), "de");
+  await page.getByLabel("Sprache").selectOption("en");
+  await page.getByRole("button", { name: "Save" }).waitFor();
+  assert.equal(await page.locator("html").getAttribute("lang"), "en");
+});
+
+browserTest("the colours are the system's, or those that are chosen", async (t) => {
+  const { page } = await Session.start(t, {}, { colorScheme: "dark" });
+  const theme = () => page.locator("html").getAttribute("data-theme");
+  assert.equal(await theme(), "dark");
+  await page.emulateMedia({ colorScheme: "light" });
+  assert.equal(await theme(), "light");
+  await page.getByLabel("Colours").selectOption("dark");
+  assert.equal(await theme(), "dark");
+  await page.reload();
+  assert.equal(await theme(), "dark");
+});
+
+browserTest("at a width of 360 pixels everything is in reach", async (t) => {
+  const { page } = await Session.start(t, { "a.txt": "one\n" }, { viewport: { width: 360, height: 640 } });
+  await page.getByRole("button", { name: "Show or hide the files" }).click();
+  await open(page, "a.txt");
+  assert.equal(await page.locator(".files").isVisible(), false);
+  for (const name of ["Save", "Versions", "Copy link"]) {
+    const box = await page.getByRole("button", { name, exact: true }).boundingBox();
+    assert.ok(box.x >= 0 && box.x + box.width <= 360, `${name}: ${JSON.stringify(box)}`);
+  }
+  assert.equal(await page.evaluate(() => document.documentElement.scrollWidth), 360);
+});
+
+for (const colorScheme of ["light", "dark"]) {
+  browserTest(`axe finds nothing in the ${colorScheme} page`, async (t) => {
+    const { page } = await Session.start(t, { "a.txt": "one\n", "b/c.txt": "" }, { colorScheme });
+    await row(page, "a.txt").waitFor();
+    assert.deepEqual(await faults(page), []);
+    await open(page, "a.txt");
+    await page.locator(".cm-content").click();
+    await page.keyboard.type("x");
+    await tab(page, "a.txt").locator(".mark.unsaved").waitFor();
+    assert.deepEqual(await faults(page), []);
+    await tab(page, "a.txt").focus();
+    await page.keyboard.press("Delete");
+    await page.getByRole("dialog").waitFor();
+    assert.deepEqual(await faults(page), []);
+    await page.keyboard.press("Escape");
+    await page.getByRole("button", { name: "Versions" }).click();
+    await page.getByRole("dialog").waitFor();
+    assert.deepEqual(await faults(page), []);
+  });
+}
+
+browserTest("the first view comes soon", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const page = await session.context.newPage();
+  await page.goto(session.host.page);
+  await row(page, "a.txt").waitFor();
+  const paint = await page.evaluate(() => performance.getEntriesByName("first-contentful-paint")[0].startTime);
+  t.diagnostic(`first contentful paint after ${paint.toFixed(0)} ms`);
+  assert.ok(paint > 0);
+});
