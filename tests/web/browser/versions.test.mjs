@@ -1,0 +1,58 @@
+// SPDX-License-Identifier: Apache-2.0
+// Earlier versions of a document.
+import assert from "node:assert/strict";
+
+import { waitFor } from "../../serve/processes.mjs";
+import { clientOf } from "./client.mjs";
+import { browserTest, Session } from "./harness.mjs";
+
+const text = (page) => page.locator(".panel:not([hidden]) .cm-content");
+const dialog = (page) => page.getByRole("dialog");
+
+// A text that was saved twice, open in a page that shows its versions.
+async function start(t) {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const client = await clientOf(t, session);
+  const file = session.path("a.txt");
+  for (const content of ["two\n", "three\n"]) {
+    assert.equal(await client.write(file, content), true);
+  }
+  await waitFor("the copies", async () => (await client.versions(file)).length === 2);
+  const { page } = session;
+  await page.locator(".tree .row", { hasText: "a.txt" }).click();
+  await text(page).waitFor();
+  await page.getByRole("button", { name: "Versions" }).click();
+  await dialog(page).getByRole("radio").first().waitFor();
+  return { session, page };
+}
+
+browserTest("earlier versions are listed, the newest first, and one is restored", async (t) => {
+  const { session, page } = await start(t);
+  assert.equal(await dialog(page).getByRole("radio").count(), 2);
+  await dialog(page).getByRole("radio").last().check();
+  await dialog(page).getByRole("button", { name: "Restore" }).click();
+  await waitFor("the text", async () => (await text(page).innerText()).trim() === "one");
+  assert.equal(session.read("a.txt").toString(), "one\n");
+  assert.equal(await page.locator(".mark").count(), 0);
+});
+
+browserTest("an earlier version is compared with what is there, and nothing changes by that", async (t) => {
+  const { session, page } = await start(t);
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  await dialog(page).locator(".cm-content").first().waitFor();
+  const shown = (await dialog(page).locator(".cm-content").allInnerTexts()).join("\n");
+  assert.match(shown, /two/);
+  assert.match(shown, /three/);
+  await dialog(page).getByRole("button", { name: "Back" }).click();
+  await dialog(page).getByRole("button", { name: "Close" }).click();
+  assert.equal((await text(page).innerText()).trim(), "three");
+  assert.equal(session.read("a.txt").toString(), "three\n");
+});
+
+browserTest("a document without earlier versions says so", async (t) => {
+  const { page } = await Session.start(t, { "a.txt": "one\n" });
+  await page.locator(".tree .row", { hasText: "a.txt" }).click();
+  await text(page).waitFor();
+  await page.getByRole("button", { name: "Versions" }).click();
+  await dialog(page).getByText("There are none.").waitFor();
+});
