@@ -35,7 +35,7 @@ inline std::vector<std::string> namesOf(const CLI::Option& option) {
 }
 
 inline bool takesValue(const CLI::Option& option) {
-    return option.get_type_size() != 0;
+    return !option.get_type_name().empty();
 }
 
 inline bool takesFolder(const CLI::Option& option) {
