@@ -21,8 +21,8 @@ public:
 
     /// Wakes all that wait for the event.
     void set() const noexcept {
-        // An interrupted call would leave them waiting.
-        while (::eventfd_write(descriptor_.get(), 1) != 0 && errno == EINTR) {
+        // Whatever made the call fail, they would otherwise wait for ever.
+        while (::eventfd_write(descriptor_.get(), 1) != 0) {
         }
     }
 
