@@ -17,7 +17,6 @@
 #include <string>
 #include <utility>
 
-#include "benchmarks/scratch_folder.h"
 #include "host/bus/bundle_host.h"
 #include "host/guard/guard.h"
 #include "host/limits/freed_memory.h"
@@ -25,6 +24,7 @@
 #include "json/value.h"
 #include "platform/messaging/channels.h"
 #include "platform/posix/file_descriptor.h"
+#include "tests/support/temporary_directory.h"
 
 namespace benchmarks {
 namespace {
@@ -32,8 +32,8 @@ namespace {
 using platform::DataBuffer;
 using Clock = std::chrono::steady_clock;
 
-const ScratchFolder& scratch() {
-    static const ScratchFolder folder;
+const test::TemporaryDirectory& scratch() {
+    static const test::TemporaryDirectory folder(test::folderInMemory());
     return folder;
 }
 
