@@ -105,3 +105,23 @@ test("requests that would take more than all may are refused", { skip: IS_SANITI
     assert.match(answer, /\{"exception":"The request is too large: /);
   }
 });
+
+// Documents take memory too: a package of two kilobytes becomes six megabytes of JSON.
+test("documents that expand take nobody's memory", async (t) => {
+  const { host, folder, file } = await start(t, 400);
+  const client = await Client.connect(host.webSocket);
+  t.after(() => client.close());
+  const content = "\0".repeat(1_000_000);
+  const part = { partUri: "/a.bin", contentType: "x/y", content, relationship: [] };
+  const path = join(folder, "zeros.docx");
+  const document = { parts: [part], relationships: [] };
+  assert.equal(await client.write(path, document, { contentType: "text/xml" }), true);
+  let left = 4 * CLIENTS;
+  const reads = Array.from({ length: left }, async () => {
+    const answer = await client.read(path, "text/xml");
+    --left;
+    return answer.parts[0].content === content;
+  });
+  await readMeanwhile(t, host, file, () => left === 0);
+  assert.deepEqual(new Set(await Promise.all(reads)), new Set([true]));
+});
