@@ -206,6 +206,16 @@ browserTest("the outline is used with the keyboard alone", async (t) => {
   await page.getByRole("img", { name: "/word/media/image1.png" }).waitFor();
 });
 
+browserTest("pages that are wider than the preview are shown smaller", async (t) => {
+  const wide = '<w:p><w:pPr><w:sectPr><w:pgSz w:w="16838" w:h="11906"/></w:sectPr></w:pPr></w:p>';
+  const { page } = await open(t, "wide.docx", wordFiles(wide), { viewport: { width: 1200, height: 700 } });
+  const frame = await page.locator("iframe[title=Preview]").boundingBox();
+  const sheet = page.frameLocator("iframe[title=Preview]").locator("section").first();
+  await sheet.waitFor();
+  const { x, width } = await sheet.boundingBox();
+  assert.ok(width > frame.width / 2 && x >= frame.x && x + width <= frame.x + frame.width, `${x}, ${width}`);
+});
+
 browserTest("the preview shows the document and follows what is edited", async (t) => {
   const { page } = await open(t, "report.docx", wordFiles(), { viewport: { width: 1000, height: 700 } });
   await page.getByRole("button", { name: "Preview" }).click();

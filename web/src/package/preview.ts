@@ -12,6 +12,7 @@ import type { PackageModel } from "./package_model.js";
 const FRAME = `<!doctype html><meta charset="utf-8">
 <meta http-equiv="Content-Security-Policy" content="default-src 'none'; img-src data: blob:; style-src 'unsafe-inline'">
 <style>body { margin: 0; background: #8a8f98; } .docx-wrapper { background: none !important; padding: 16px !important; }</style>`;
+const MARGIN = 16; // pixels beside the pages, as above
 const PAUSE = 400; // milliseconds without an edit, before it is followed
 
 export class Preview {
@@ -31,7 +32,10 @@ export class Preview {
   ) {
     this.#frame = element("iframe", { title: page.text("package.preview"), srcdoc: FRAME });
     this.#frame.setAttribute("sandbox", "allow-same-origin");
-    this.#frame.addEventListener("load", () => void this.#render());
+    this.#frame.addEventListener("load", () => {
+      this.#frame.contentWindow?.addEventListener("resize", () => this.#fit());
+      void this.#render();
+    });
     this.#state.textContent = page.text("package.preview.reading");
     this.element = element("section", { className: "package-preview", "aria-label": page.text("package.preview") });
     this.element.append(this.#state, this.#frame);
@@ -65,6 +69,7 @@ export class Preview {
       const root = shown.documentElement;
       const { scrollTop, scrollLeft } = root;
       shown.body.replaceChildren(...nodes.map((node) => shown.adoptNode(node)));
+      this.#fit();
       root.scrollTo(scrollLeft, scrollTop);
       this.#letGo();
       this.#urls = urls;
@@ -77,6 +82,17 @@ export class Preview {
       }
     }
     this.#lastTook = performance.now() - start;
+  }
+
+  // Pages that are wider than the frame are shown smaller: in the middle of it, their left would be out of reach.
+  #fit(): void {
+    const body = this.#frame.contentDocument?.body;
+    if (body) {
+      body.style.zoom = "1";
+      const pages = [...body.querySelectorAll<HTMLElement>(".docx-wrapper > section")];
+      const widest = Math.max(0, ...pages.map((shown) => shown.offsetWidth)) + 2 * MARGIN;
+      body.style.zoom = String(Math.min(1, body.clientWidth / widest));
+    }
   }
 
   #letGo(): void {
