@@ -34,7 +34,7 @@ const size = { viewport: { width: 1200, height: 720 } };
 for (const colorScheme of ["light", "dark"]) {
   browserTest(`the ${colorScheme} page has its picture`, async (t) => {
     const { page } = await Session.start(t, files, { ...size, colorScheme });
-    await row(page, "library-notice.shift_jis.txt").click();
+    await row(page, "letter-home.windows-1251.txt").click();
     await page.locator(".cm-content").waitFor();
     await take(page, folderFor(t), `text-${colorScheme}`);
     await row(page, "report.docx").click();

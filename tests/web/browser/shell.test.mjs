@@ -131,14 +131,14 @@ browserTest("the page speaks the browser's language, or the one that is chosen",
 
 browserTest("the colours are the system's, or those that are chosen", async (t) => {
   const { page } = await Session.start(t, {}, { colorScheme: "dark" });
-  const theme = () => page.locator("html").getAttribute("data-theme");
-  assert.equal(await theme(), "dark");
+  const shown = (theme) => page.locator(`html[data-theme="${theme}"]`).waitFor({ state: "attached" });
+  await shown("dark");
   await page.emulateMedia({ colorScheme: "light" });
-  assert.equal(await theme(), "light");
+  await shown("light");
   await page.getByLabel("Colours").selectOption("dark");
-  assert.equal(await theme(), "dark");
+  await shown("dark");
   await page.reload();
-  assert.equal(await theme(), "dark");
+  await shown("dark");
 });
 
 browserTest("at a width of 360 pixels everything is in reach", async (t) => {
