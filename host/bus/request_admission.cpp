@@ -167,7 +167,7 @@ private:
             return;
         }
         metrics_->refuse(*kind_);
-        if (kind_ == RequestKind::read) {
+        if (*kind_ == RequestKind::read) {
             answerFailedRead(*client_, message.payload(), reason);
         } else {
             if (const auto rtcId = json::findString(message.payload(), "rtcId")) {

@@ -8,7 +8,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <exception>
-#include <filesystem>
 #include <iostream>
 #include <stdexcept>
 #include <string>
@@ -78,14 +77,6 @@ std::string cleaned(std::string bytes, const std::string& charset) {
     return bytes;
 }
 
-/// The bytes of the regular file at `path`; 0 where there is none.
-std::uintmax_t sizeOf(const std::u16string& path) {
-    std::error_code error;
-    const std::uintmax_t size =
-        std::filesystem::file_size(make_native_access_form_with_cleanup(path), error);
-    return error ? 0 : size;
-}
-
 /// Opens `path` if there is a regular file; returns nothing when there is none or it cannot be
 /// opened, which reads as empty. But some errors say nothing about the file: there was no memory,
 /// or another program did not give up its lease. The file may then hold a text and must not read as
@@ -96,6 +87,13 @@ OpenedFile openText(const std::string& path) {
         throw std::system_error(opened.error, std::generic_category(), "The file cannot be opened");
     }
     return opened;
+}
+
+/// The length in bytes of the text at `path`; 0 for what cannot be opened, whose size is nobody's
+/// business.
+std::size_t lengthOf(const std::u16string& path) {
+    const OpenedFile opened = openText(make_native_access_form_with_cleanup(path));
+    return opened.descriptor ? static_cast<std::size_t>(opened.status.st_size) : 0;
 }
 
 /// Everything that `file` still holds, which is probably `expectedSize` bytes.
@@ -136,9 +134,9 @@ json::Object Serialization::readTextDocument(std::u16string path, std::size_t lo
             result[statusKey] = true;
             // What stays of a text is hardly shorter than its file: a byte-order mark goes, and
             // escape sequences that a charset can do without.
-            const std::uintmax_t size = sizeOf(path);
-            requireTextLength(size);
-            awaitMemory(size, 0, longestAnswer);
+            const std::size_t length = lengthOf(path);
+            requireTextLength(length);
+            awaitMemory(length, 0, longestAnswer);
             result[dataKey] = readTextFileContent(std::move(path));
         } else {
             result[statusKey] = false;

@@ -8,6 +8,7 @@ import {
   readdirSync,
   statSync,
   symlinkSync,
+  truncateSync,
   unlinkSync,
   writeFileSync,
 } from "node:fs";
@@ -237,12 +238,16 @@ test("clients get to no file outside of its roots", async (t) => {
     writeFileSync(join(name, "file.txt"), "text\n");
   }
   symlinkSync(outside, join(inside, "link"));
+  // Too large to be answered, which would tell its size.
+  writeFileSync(join(outside, "large.txt"), "");
+  truncateSync(join(outside, "large.txt"), 100_000_000);
   const host = await Host.start(t, ["--root", inside]);
   const client = await connected(t, host);
   assert.equal((await client.read(join(inside, "file.txt"))).data, "text\n");
   assert.equal(await client.write(join(inside, "new.txt"), "new\n"), true);
   const paths = [
     join(outside, "file.txt"),
+    join(outside, "large.txt"),
     `${inside}/../outside/file.txt`,
     `${inside}/link/file.txt`,
     `/proc/self/root${outside}/file.txt`,
