@@ -178,10 +178,34 @@ void History::post(std::function<void()> task) {
     changed_.notify_all();
 }
 
+// What `work` returns when the thread does it. Throws std::runtime_error with the text of what it
+// throws: the exception itself would be shared by both threads, and so would the promise if it lay
+// on the stack of the one that waits.
+template <typename Work>
+auto History::done(Work work) {
+    struct Outcome {
+        std::optional<decltype(work())> result;
+        std::string error;
+    };
+    const auto promise = std::make_shared<std::promise<Outcome>>();
+    post([promise, work] {
+        Outcome outcome;
+        try {
+            outcome.result = work();
+        } catch (const std::exception& error) {
+            outcome.error = error.what();
+        }
+        promise->set_value(std::move(outcome));
+    });
+    Outcome outcome = promise->get_future().get();
+    if (!outcome.result) {
+        throw std::runtime_error(outcome.error);
+    }
+    return std::move(*outcome.result);
+}
+
 void History::waitUntilIdle() {
-    std::promise<void> done;
-    post([&done] { done.set_value(); });
-    done.get_future().wait();
+    done([] { return true; });
 }
 
 void History::keep(FileDescriptor old, std::string document) {
@@ -202,41 +226,27 @@ void History::keepNow(const FileDescriptor& old, const std::string& document) {
 }
 
 std::vector<EarlierVersion> History::versionsOf(const std::string& document) {
-    std::promise<std::vector<EarlierVersion>> promise;
-    post([&] {
-        try {
-            std::vector<EarlierVersion> versions;
-            for (const File& file : filesOf(document)) {
-                versions.push_back(file.version);
-            }
-            promise.set_value(std::move(versions));
-        } catch (...) {
-            promise.set_exception(std::current_exception());
+    return done([&] {
+        std::vector<EarlierVersion> versions;
+        for (const File& file : filesOf(document)) {
+            versions.push_back(file.version);
         }
+        return versions;
     });
-    return promise.get_future().get();
 }
 
 FileDescriptor History::open(const std::string& document, std::int64_t time) {
-    std::promise<FileDescriptor> promise;
-    post([&] {
-        try {
-            for (const File& file : filesOf(document)) {
-                FileDescriptor opened;
-                if (file.version.time == time) {
-                    opened = FileDescriptor(::open(file.path.c_str(), O_RDONLY | O_CLOEXEC));
-                }
+    return done([&] {
+        for (const File& file : filesOf(document)) {
+            if (file.version.time == time) {
+                FileDescriptor opened(::open(file.path.c_str(), O_RDONLY | O_CLOEXEC));
                 if (opened) {
-                    promise.set_value(std::move(opened));
-                    return;
+                    return opened;
                 }
             }
-            throw std::runtime_error("There is no such earlier version");
-        } catch (...) {
-            promise.set_exception(std::current_exception());
         }
+        throw std::runtime_error("There is no such earlier version");
     });
-    return promise.get_future().get();
 }
 
 // The root that holds `document`; the root of the file system where all documents have versions.

@@ -94,6 +94,8 @@ private:
 
     void run();
     void post(std::function<void()> task);
+    template <typename Work>
+    auto done(Work work);
     std::filesystem::path rootOf(const std::string& document) const;
     std::vector<std::filesystem::path> foldersOf(const std::string& document) const;
     std::vector<File> filesOf(const std::string& document) const;
