@@ -23,23 +23,28 @@ browserTest("the keyboard goes through the tree, opens folders and files", async
   const { page } = await Session.start(t, { "a.txt": "one", "inner/c.txt": "three" });
   await row(page, "a.txt").waitFor();
   await page.locator(".tree").focus();
-  const active = () =>
-    page.evaluate(() => document.getElementById(document.querySelector(".tree").getAttribute("aria-activedescendant"))?.title);
+  // The tree is drawn anew after a key, with the next frame.
+  const becomesActive = (end) =>
+    page.waitForFunction((end) => {
+      const id = document.querySelector(".tree").getAttribute("aria-activedescendant");
+      return document.getElementById(id)?.title.endsWith(end);
+    }, end);
+  const isExpanded = (name, value) => row(page, name).and(page.locator(`[aria-expanded="${value}"]`)).waitFor();
   await page.keyboard.press("Home");
   await page.keyboard.press("ArrowDown");
-  assert.match(await active(), /\/inner$/);
-  assert.equal(await row(page, "inner").getAttribute("aria-expanded"), "false");
+  await becomesActive("/inner");
+  await isExpanded("inner", "false");
   await page.keyboard.press("ArrowRight");
   await row(page, "c.txt").waitFor();
-  assert.equal(await row(page, "inner").getAttribute("aria-expanded"), "true");
+  await isExpanded("inner", "true");
   await page.keyboard.press("ArrowRight");
-  assert.match(await active(), /\/inner\/c\.txt$/);
+  await becomesActive("/inner/c.txt");
   assert.equal(await row(page, "c.txt").getAttribute("aria-level"), "3");
   await page.keyboard.press("ArrowLeft");
   await page.keyboard.press("ArrowLeft");
-  assert.equal(await row(page, "inner").getAttribute("aria-expanded"), "false");
+  await isExpanded("inner", "false");
   await page.keyboard.press("a");
-  assert.match(await active(), /\/a\.txt$/);
+  await becomesActive("/a.txt");
   await page.keyboard.press("Enter");
   await page.getByRole("tab", { name: "a.txt" }).waitFor();
 });
