@@ -86,7 +86,8 @@ private:
     std::size_t answers_ = 0;
 
     test::BundleOnBus<framework::BundleRunner> bundle_{
-        [this](const platform::messaging::JsonMessage& message) { published(message); }, options(),
+        [this](const platform::messaging::JsonMessage& message) { published(message); },
+        {.bus = options()},
         SERIALIZATION_BUNDLE};
 };
 

@@ -21,8 +21,8 @@
 #include "json/value.h"
 #include "platform/data_buffer.h"
 #include "platform/messaging/channels.h"
-#include "platform/messaging/in_process_bus.h"
-#include "platform/messaging/transport.h"
+#include "platform/messaging/message_service.h"
+#include "tests/support/bundle_on_bus.h"
 #include "tests/support/counting_malloc.h"
 #include "tests/support/temporary_directory.h"
 
@@ -86,20 +86,6 @@ private:
 class DocumentCopies : public testing::Test {
 protected:
     DocumentCopies() {
-        using namespace platform::messaging;
-        setTransport([this](const std::string& clientName, const MessageServiceOptions&) {
-            futures::Promise<std::shared_ptr<MessageService>> limited;
-            limited.setValue(std::make_shared<LimitedClient>(bus->connect(clientName).get(),
-                                                             maxPayload, awaited));
-            return limited.getFuture();
-        });
-        runner = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
-        client = bus->connect("client").get();
-        observation = bus->observe([this](std::string_view, const JsonMessage& message) {
-            const std::lock_guard lock(mutex);
-            answer = message.payload().substr(0, 100);
-            answerSize = message.payload().size();
-        });
         // What is made once and stays is none of a document's copies.
         read("text/plain", writeTextFile("\x82\xA0\x82\xA2 Shift_JIS"));
         write(textRequest("x", "Shift_JIS"));
@@ -116,17 +102,15 @@ protected:
             json::Object{{"rtcId", "1"}, {"contentType", contentType}, {"filePath", path}})));
         awaited = 0;
         test::beginAccount();
-        client->publish(platform::messaging::readRequestChannel, std::move(request)).get();
-        bus->waitUntilIdle();
+        bundle.send(platform::messaging::readRequestChannel, std::move(request));
+        bundle.bus().waitUntilIdle();
         return test::endAccount();
     }
 
     /// What a write of the document in `request` allocates, the request itself among it.
     Allocations write(const std::string& request) {
         test::beginAccount();
-        client->publish(platform::messaging::writeRequestChannel, DataBuffer::copyOf(request))
-            .get();
-        bus->waitUntilIdle();
+        bundle.sendAndWait(platform::messaging::writeRequestChannel, request);
         return test::endAccount();
     }
 
@@ -186,16 +170,22 @@ protected:
     }
 
     test::TemporaryDirectory folder;
-    std::shared_ptr<platform::messaging::InProcessBus> bus =
-        platform::messaging::InProcessBus::create();
     std::size_t maxPayload = std::numeric_limits<std::size_t>::max();
     std::size_t awaited = 0;
     std::mutex mutex;
     std::string answer;
     std::size_t answerSize = 0;
-    std::shared_ptr<platform::messaging::MessageService> client;
-    std::shared_ptr<platform::messaging::Subscription> observation;
-    std::unique_ptr<framework::BundleRunner> runner;
+    test::BundleOnBus<framework::BundleRunner> bundle{
+        [this](const JsonMessage& message) {
+            const std::lock_guard lock(mutex);
+            answer = message.payload().substr(0, 100);
+            answerSize = message.payload().size();
+        },
+        {.wrapClient =
+             [this](std::shared_ptr<platform::messaging::MessageService> client) {
+                 return std::make_shared<LimitedClient>(std::move(client), maxPayload, awaited);
+             }},
+        SERIALIZATION_BUNDLE};
 };
 
 // The file's bytes, the text of the answer, and the message.

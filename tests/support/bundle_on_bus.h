@@ -9,6 +9,7 @@
 #include <string_view>
 #include <utility>
 
+#include "futures/future.h"
 #include "platform/data_buffer.h"
 #include "platform/messaging/in_process_bus.h"
 #include "platform/messaging/message_service.h"
@@ -24,11 +25,18 @@ public:
     /// Called for each message that the bundle publishes, on the thread that publishes it.
     using Published = std::function<void(const platform::messaging::JsonMessage&)>;
 
-    /// Starts `Bundle(arguments...)` on a bus with `options`.
+    struct Setup {
+        platform::messaging::InProcessBusOptions bus = {};
+        /// Makes the client that the bundle gets from the one of the bus; empty: it gets that one.
+        std::function<std::shared_ptr<platform::messaging::MessageService>(
+            std::shared_ptr<platform::messaging::MessageService>)>
+            wrapClient = {};
+    };
+
+    /// Starts `Bundle(arguments...)`.
     template <class... Arguments>
-    explicit BundleOnBus(Published published, platform::messaging::InProcessBusOptions options = {},
-                         Arguments&&... arguments)
-        : bus_(platform::messaging::InProcessBus::create(std::move(options))),
+    explicit BundleOnBus(Published published, Setup setup = {}, Arguments&&... arguments)
+        : bus_(platform::messaging::InProcessBus::create(std::move(setup.bus))),
           client_(bus_->connect("client").get()),
           observation_(bus_->observe(
               [published = std::move(published)](std::string_view sender,
@@ -38,11 +46,15 @@ public:
                   }
               })) {
         platform::messaging::setTransport(
-            [bus = bus_](const std::string& name,
-                         const platform::messaging::MessageServiceOptions&) {
-                return bus->connect(name);
+            [bus = bus_, wrap = std::move(setup.wrapClient)](
+                const std::string& name, const platform::messaging::MessageServiceOptions&) {
+                auto client = bus->connect(name).get();
+                futures::Promise<decltype(client)> promise;
+                promise.setValue(wrap ? wrap(std::move(client)) : std::move(client));
+                return promise.getFuture();
             });
         bundle_ = std::make_unique<Bundle>(std::forward<Arguments>(arguments)...);
+        platform::messaging::setTransport({});  // it is asked once, while the bundle starts
     }
 
     /// Sends `request` without waiting for what the bundle does.

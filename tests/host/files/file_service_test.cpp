@@ -15,6 +15,7 @@
 #include <filesystem>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <string>
 #include <thread>
 #include <utility>
@@ -28,15 +29,14 @@
 #include "json/serialize.h"
 #include "json/value.h"
 #include "platform/messaging/channels.h"
-#include "platform/messaging/in_process_bus.h"
-#include "platform/messaging/transport.h"
+#include "platform/messaging/message_service.h"
+#include "tests/support/bundle_on_bus.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
 
 namespace fs = std::filesystem;
 
-using platform::messaging::InProcessBus;
 using platform::messaging::JsonMessage;
 using test::readFile;
 using test::writeFile;
@@ -53,39 +53,33 @@ protected:
         guard_ = host::makeGuard(options, {root_});
         // What is loaded later would not be found.
         ASSERT_NE(::dlopen(SERIALIZATION_BUNDLE, RTLD_NOW | RTLD_LOCAL), nullptr);
-        client_ = bus_->connect("client").get();
-        observation_ = bus_->observe([this](std::string_view, const JsonMessage& message) {
+        std::thread([this] { start(); }).join();
+        observation_ = bundle_->bus().observe([this](std::string_view, const JsonMessage& message) {
             const std::lock_guard lock(mutex_);
             published_.emplace_back(message.channel(), message.payload());
         });
-        std::thread([this] { start(); }).join();
     }
-
-    void TearDown() override { platform::messaging::setTransport({}); }
 
     void start() {
         if (!host::whyConfinementIsUnavailable()) {
             host::Confinement({{root_}, {SERIALIZATION_BUNDLE}}).confineThisThread();
         }
-        platform::messaging::setTransport(
-            [this](const std::string& name, const platform::messaging::MessageServiceOptions&) {
-                futures::Promise<std::shared_ptr<platform::messaging::MessageService>> promise;
-                promise.setValue(host::savingSafely(bus_->connect(name).get(), guard_));
-                return promise.getFuture();
-            });
-        bundle_ = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
-        service_ = std::make_unique<host::FileService>(bus_->connect("files").get(), guard_,
-                                                       std::vector<fs::path>{root_, outside_});
+        bundle_.emplace(
+            [](const JsonMessage&) {},  // the file service's messages are wanted as well
+            test::BundleOnBus<framework::BundleRunner>::Setup{
+                .wrapClient =
+                    [this](std::shared_ptr<platform::messaging::MessageService> client) {
+                        return host::savingSafely(std::move(client), guard_);
+                    }},
+            SERIALIZATION_BUNDLE);
+        service_ = std::make_unique<host::FileService>(
+            bundle_->bus().connect("files").get(), guard_, std::vector<fs::path>{root_, outside_});
     }
 
     // The payload of the last message on a channel that begins like this, after a request.
     std::string send(const char* channel, json::Object request, std::string_view answers) {
         request.try_emplace("rtcId", "1");
-        client_
-            ->publish(channel, platform::DataBuffer::copyOf(
-                                   json::serialize(json::Value(std::move(request)))))
-            .get();
-        bus_->waitUntilIdle();
+        bundle_->sendAndWait(channel, json::serialize(json::Value(std::move(request))));
         const std::lock_guard lock(mutex_);
         std::string answer = "none";
         for (const auto& [on, payload] : std::exchange(published_, {})) {
@@ -122,10 +116,8 @@ protected:
     host::Guard guard_;
     std::mutex mutex_;
     std::vector<std::pair<std::string, std::string>> published_;  // guarded by mutex_
-    std::shared_ptr<InProcessBus> bus_ = InProcessBus::create();
-    std::shared_ptr<platform::messaging::MessageService> client_;
+    std::optional<test::BundleOnBus<framework::BundleRunner>> bundle_;
     std::shared_ptr<platform::messaging::Subscription> observation_;
-    std::unique_ptr<framework::BundleRunner> bundle_;
     std::unique_ptr<host::FileService> service_;
 };
 
