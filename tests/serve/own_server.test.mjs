@@ -204,10 +204,10 @@ test("a second signal ends it at once", async (t) => {
   const client = await connected(t, host, { reconnect: false });
   client.connection.publish(READ_REQUEST, encode("stuck"));
   await client.connection.flush();
-  await sleep(100);
+  await waitFor("the request", () => host.errors.includes("stuck in a request"));
   host.signal("SIGTERM");
   await waitFor("the first signal", () => host.errors.includes("asked to by signal 15"));
-  await sleep(200);
+  await sleep(200); // time for an end that one signal brings
   assert.ok(!host.hasEnded);
   host.signal("SIGTERM");
   assert.equal(await host.end, 1);

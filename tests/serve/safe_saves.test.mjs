@@ -42,13 +42,11 @@ async function setUp(t) {
   );
   const path = `${process.env.PATH}:/usr/sbin`;
   const server = new Program(t, ["nats-server", "-c", configuration], { PATH: path });
-  let ports;
-  while (!ports) {
-    const file = readdirSync(folder).find((name) => name.endsWith(".ports"));
-    ports = file && JSON.parse(readFileSync(join(folder, file), "utf8") || "null");
+  const ports = await waitFor("the server's ports", () => {
     assert(!server.hasEnded, server.errors);
-    await sleep(10);
-  }
+    const file = readdirSync(folder).find((name) => name.endsWith(".ports"));
+    return file && JSON.parse(readFileSync(join(folder, file), "utf8") || "null");
+  });
   const client = await Client.connect(ports.websocket[0].replace("ws://", "ws://ada:x@"));
   t.after(() => client.close());
   const startWorkers = async (count) => {

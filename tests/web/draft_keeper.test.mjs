@@ -3,6 +3,7 @@ import assert from "node:assert/strict";
 import { test } from "node:test";
 import { setTimeout as sleep } from "node:timers/promises";
 
+import { waitFor } from "../serve/processes.mjs";
 import { room } from "./room.mjs";
 
 const { DraftKeeper } = await room("save/draft_keeper.ts");
@@ -29,7 +30,8 @@ test("an edit is stored soon, and many edits at once are stored once", async () 
     made.changed();
   }
   assert.equal(made.isPending, true);
-  await sleep(400);
+  await waitFor("the draft", () => log.length > 0);
+  await sleep(400); // time for another one
   assert.deepEqual([log, made.isPending], [["stored"], false]);
 });
 
@@ -50,7 +52,7 @@ test("what is removed is not stored afterwards", async () => {
   await stored;
   made.changed();
   await made.clear();
-  await sleep(400);
+  await sleep(400); // time for another draft
   assert.deepEqual(log, ["stored", "removed", "removed"]);
 });
 
@@ -59,9 +61,9 @@ test("a draft that takes long is stored more rarely", async () => {
   made.changed();
   await made.flush();
   made.changed();
-  await sleep(600);
+  await sleep(600); // after which a draft that is stored fast would be there
   assert.deepEqual(log, ["stored"]);
-  await sleep(900);
+  await waitFor("the second draft", () => log.length > 1);
   assert.deepEqual(log, ["stored", "stored"]);
 });
 

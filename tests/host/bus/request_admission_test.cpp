@@ -246,7 +246,7 @@ TEST_F(RequestAdmission, HasDocumentsWaitForEachOther) {
     handleReadsWith([&](const JsonMessage&) {
         client_->awaitMemory(document);
         overlapped = overlapped || ++atOnce > 1;
-        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));  // time to overlap
         --atOnce;
         ++handled;
     });

@@ -190,7 +190,7 @@ TEST_F(Http, AnAnswerThatIsNotReadInTimeEndsTheConnection) {
     ssize_t count = 0;
     while ((count = ::read(slow.get(), chunk.data(), chunk.size())) > 0) {
         total += static_cast<std::size_t>(count);
-        std::this_thread::sleep_for(milliseconds(1));
+        std::this_thread::sleep_for(milliseconds(1));  // a reader slower than the time limit
     }
     EXPECT_LT(total, size);
 }

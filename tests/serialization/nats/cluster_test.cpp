@@ -13,7 +13,6 @@
 #include <filesystem>
 #include <iostream>
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <random>
 #include <string>
@@ -25,14 +24,13 @@
 #include "tests/support/nats_client.h"
 #include "tests/support/nats_server.h"
 #include "tests/support/temporary_directory.h"
+#include "tests/support/wait_until.h"
 
 namespace {
 
 using namespace test;
 using namespace std::chrono_literals;
 using Clock = std::chrono::steady_clock;
-
-constexpr auto longestWait = 60s;
 
 std::chrono::milliseconds millisecondsSince(Clock::time_point start) {
     return std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - start);
@@ -93,14 +91,14 @@ public:
 
     /// The longest that it took until a request was answered.
     std::chrono::milliseconds longest() const { return longest_; }
-    int asked() const { return asked_; }
+    /// How many requests have been answered. May be called from any thread.
+    int answered() const { return answered_; }
     int askedAgain() const { return askedAgain_; }
 
 private:
     template <typename Try>
     std::string ask(Try&& attempt) {
         const Clock::time_point start = Clock::now();
-        ++asked_;
         auto patience = 500ms;
         std::optional<std::string> answer = attempt(patience);
         while (!answer && Clock::now() < start + longestWait) {
@@ -109,12 +107,13 @@ private:
             answer = attempt(patience);
         }
         longest_ = std::max(longest_, millisecondsSince(start));
+        answered_ += answer ? 1 : 0;
         return answer.value_or("no answer");
     }
 
     NatsClient client_;
     std::chrono::milliseconds longest_{0};
-    int asked_ = 0;
+    std::atomic<int> answered_ = 0;
     int askedAgain_ = 0;
 };
 
@@ -137,6 +136,19 @@ void workAsUser(PatientClient& client, const std::string& folder, int number,
     }
 }
 
+/// Waits until `clients` together have had `count` more answers; returns whether they got them.
+bool getAnswers(const std::deque<PatientClient>& clients, int count) {
+    const auto answered = [&] {
+        int sum = 0;
+        for (const PatientClient& client : clients) {
+            sum += client.answered();
+        }
+        return sum;
+    };
+    const int before = answered();
+    return waitUntil([&] { return answered() >= before + count; });
+}
+
 TEST(NatsCluster, AnswersEveryRequestWhileServersAndWorkersAreKilled) {
     Cluster cluster;
     const TemporaryDirectory folder;
@@ -156,29 +168,29 @@ TEST(NatsCluster, AnswersEveryRequestWhileServersAndWorkersAreKilled) {
     const int rounds = UNDER_SANITIZERS ? 3 : 6;
     for (int round = 0; round < rounds; ++round) {
         const std::size_t victim = static_cast<std::size_t>(round) % Cluster::size;
-        std::this_thread::sleep_for(300ms);
+        EXPECT_TRUE(getAnswers(clients, 60));
         workers[victim].kill();
-        std::this_thread::sleep_for(200ms);
+        EXPECT_TRUE(getAnswers(clients, 40));
         cluster[victim].kill();
-        std::this_thread::sleep_for(300ms);
+        EXPECT_TRUE(getAnswers(clients, 60));
         workers[victim] = startWorker(cluster.urls());
         cluster[victim].start();
     }
-    std::this_thread::sleep_for(300ms);
+    EXPECT_TRUE(getAnswers(clients, 60));
     stop = true;
     for (std::thread& user : users) {
         user.join();
     }
-    int asked = 0;
+    int answered = 0;
     int again = 0;
     std::chrono::milliseconds longest{0};
     for (const PatientClient& client : clients) {
-        EXPECT_GT(client.asked(), 0);
-        asked += client.asked();
+        EXPECT_GT(client.answered(), 0);
+        answered += client.answered();
         again += client.askedAgain();
         longest = std::max(longest, client.longest());
     }
-    std::cout << asked << " requests answered, " << again << " repeated, the longest after "
+    std::cout << answered << " requests answered, " << again << " repeated, the longest after "
               << longest.count() << " ms (clients ask again after 500 ms)\n";
     // No packages but whole ones; what a killed worker was writing stands beside them at most.
     PatientClient reader(cluster.urls(), "reader");
@@ -205,9 +217,9 @@ TEST(NatsCluster, AWorkerThatIsKilledWhileItSavesLeavesTheOldDocumentOrTheNewOne
     ChildProcess worker = startWorker({server.url()});
     ASSERT_EQ(client.write(writePackage(document, versions[0])), "true");
     auto usual = std::chrono::microseconds::max();
-    for (int i = 0; i < 3; ++i) {
+    for (const std::size_t next : {1U, 0U, 1U, 0U}) {
         const Clock::time_point start = Clock::now();
-        ASSERT_EQ(client.write(writePackage(document, versions[0])), "true");
+        ASSERT_EQ(client.write(writePackage(document, versions[next])), "true");
         usual = std::min(
             usual, std::chrono::duration_cast<std::chrono::microseconds>(Clock::now() - start));
     }
@@ -216,6 +228,7 @@ TEST(NatsCluster, AWorkerThatIsKilledWhileItSavesLeavesTheOldDocumentOrTheNewOne
     const int rounds = UNDER_SANITIZERS ? 4 : 8;
     for (int round = 0; round < rounds; ++round) {
         std::thread killer([&] {
+            // From early in the save to after its usual end.
             std::this_thread::sleep_for(usual * 3 * (round + 1) / (2 * rounds));
             worker.kill();
         });

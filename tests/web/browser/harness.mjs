@@ -6,7 +6,7 @@ import { createRequire } from "node:module";
 import { dirname, join } from "node:path";
 import { after, test } from "node:test";
 
-import { Host, ROOT, temporaryFolder } from "../../serve/processes.mjs";
+import { Host, ROOT, temporaryFolder, waitFor } from "../../serve/processes.mjs";
 
 const { chromium } = createRequire(join(ROOT, "web/package.json"))("playwright-core");
 
@@ -38,6 +38,20 @@ if (IS_THERE) {
 export function browserTest(name, ...rest) {
   const body = rest.pop();
   return test(name, { skip: !IS_THERE && "there is no Chromium", ...rest[0] }, body);
+}
+
+// What the page of the browser has stored as drafts, as JSON; runs there.
+function storedDrafts() {
+  const result = (request) =>
+    new Promise((resolve, reject) => {
+      request.onsuccess = () => resolve(request.result);
+      request.onerror = () => reject(request.error);
+    });
+  return result(indexedDB.open("editor")).then(async (database) => {
+    const drafts = await result(database.transaction("drafts").objectStore("drafts").getAll());
+    database.close();
+    return JSON.stringify(drafts);
+  });
 }
 
 const IS_LOCAL = /^(http|ws):\/\/127\.0\.0\.1:|^(blob|data|about):/;
@@ -97,6 +111,13 @@ export class Session {
 
   waitUntilConnected(page = this.page) {
     return page.locator('[data-state="connected"]').first().waitFor({ state: "attached" });
+  }
+
+  /** Waits until the browser has stored a draft with `typed` in it. */
+  async waitForDraft(page, typed) {
+    await waitFor("a draft", async () =>
+      (await page.evaluate(storedDrafts)).includes(JSON.stringify(typed).slice(1, -1)),
+    );
   }
 
   #note(problem) {

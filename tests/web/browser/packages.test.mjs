@@ -269,7 +269,7 @@ browserTest("a hostile document does nothing", async (t) => {
   await openPart(page, "evil.html");
   await tab(page, "Parts").click();
   await page.getByRole("treeitem", { name: /onerror/ }).click();
-  await page.waitForTimeout(500);
+  await page.waitForTimeout(500); // time for an attack
   assert.equal(await page.evaluate(() => globalThis.attacked), undefined);
   assert.equal(await page.locator("img[onerror], script:not([src])").count(), 0);
   for (const frame of page.frames()) {

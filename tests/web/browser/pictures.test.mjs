@@ -39,7 +39,7 @@ for (const colorScheme of ["light", "dark"]) {
     await take(page, folderFor(t), `text-${colorScheme}`);
     await row(page, "report.docx").click();
     await page.locator(".panel:not([hidden]) .waiting").waitFor({ state: "detached" });
-    await page.waitForTimeout(500); // the preview follows
+    await page.frameLocator("iframe[title=Preview]").locator("section").first().waitFor();
     await take(page, folderFor(t), `package-${colorScheme}`);
   });
 }

@@ -148,7 +148,7 @@ browserTest("what is unsaved survives a reload, with charset and line ends", asy
   const { page } = session;
   await open(session, "german.txt");
   await typeAtTheEnd(page, "\u00fc\n");
-  await page.waitForTimeout(1500); // drafts are stored a moment after an edit
+  await session.waitForDraft(page, "\u00fc");
   await page.reload();
   await editor(page).waitFor();
   await page.locator(".tab.active .unsaved").waitFor();

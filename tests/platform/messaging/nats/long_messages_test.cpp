@@ -246,7 +246,7 @@ TEST(NatsLongMessages, AreHandledOneAtATimeWithTheShortOnes) {
     Inbox<std::string> requests;
     const auto subscription = bus.subscribe("/ask", [&](const JsonMessage& request) {
         overlap = overlap || ++running != 1;
-        std::this_thread::sleep_for(std::chrono::milliseconds(2));
+        std::this_thread::sleep_for(std::chrono::milliseconds(2));  // time to overlap
         --running;
         requests.add(textOf(request).substr(0, 5));
         if (request.payload().size() > 5) {
@@ -291,7 +291,7 @@ TEST(NatsLongMessages, AreTakenBeforeTheBusEnds) {
     const auto announced = client.hear().value();
     std::atomic<bool> drained = false;
     std::jthread drain([&] { drained = worker.bus->drain(longestWait); });
-    std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    std::this_thread::sleep_for(std::chrono::milliseconds(50));  // time for a drain that does not wait
     EXPECT_FALSE(drained);
     EXPECT_TRUE(client.take(announced) == worker.answer);
     drain.join();

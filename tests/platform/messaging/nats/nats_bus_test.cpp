@@ -164,6 +164,7 @@ TEST(NatsBus, ReleaseWaitsForTheHandlerThatRuns) {
     std::atomic<bool> ended = false;
     auto subscription = bus.subscribe("x", [&](const JsonMessage&) {
         running.count_down();
+        // Time for a release that does not wait to come back.
         std::this_thread::sleep_for(std::chrono::milliseconds(50));
         ended = true;
     });
