@@ -4,9 +4,10 @@
 //  - The name means ICU's ibm-943_P15A-2003, which has the extensions of NEC and IBM.
 //  - Bytes 1A, 1C and 7F: that table permutes them, as many of IBM's tables do. This is undone,
 //    so that each decodes to the control code of its own number (ControlCodes in
-//    icu_charset.cpp, for every such table). The bytes come back as they were.
-//  - U+001C in a text that is read from a file becomes U+001A, the end-of-file mark of DOS:
-//    restoreEndOfFileMarks, below. So it is 1A when it is written again.
+//    icu_charset.cpp, for every such table), and is encoded as it was.
+//  - When a file is read, U+001C becomes U+001A, the end-of-file mark of DOS:
+//    restoreEndOfFileMarks, below. So a 1C is read as 1A, and saved as 1A. A 1C that a request
+//    holds is written as it is.
 //  - Some hundred characters have two or three codes. Encoding takes that of JIS, or else NEC's for
 //    what is in its row 13 and IBM's for the rest. Texts with the others are saved in variants, the
 //    names of which are ours:
