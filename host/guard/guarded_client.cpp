@@ -115,8 +115,13 @@ private:
             return;
         }
         const AskBundle askBundle = [&](const std::string& otherPath) {
+            if (otherPath.empty()) {
+                return ask(bundle, message);
+            }
+            // The request is this client's alone: the bundle is the one subscriber of the channel.
+            const PathOverwrite overwrite(request->filePathText, otherPath);
             return ask(bundle,
-                       otherPath.empty()
+                       overwrite.isDone()
                            ? message
                            : withPayload(message, withFilePath(message.payload(), otherPath)));
         };

@@ -125,6 +125,7 @@ std::optional<WriteRequest> readWriteRequest(std::string_view payload) {
         !readString(*members, "filePath", request.filePath) || !isPath(request.filePath)) {
         return std::nullopt;
     }
+    request.filePathText = textOf(*members, "filePath");
     request.isPackage = contentType == packageContentType;
     const std::string_view content = textOf(*members, "content");
     if (!content.starts_with(request.isPackage ? '{' : '"')) {
@@ -150,6 +151,21 @@ std::string withFilePath(std::string_view payload, const std::string& filePath) 
     result.reserve(result.size() + payload.size());
     result.append(payload.substr(1));
     return result;  // not what append() returns: that would copy it once more
+}
+
+PathOverwrite::PathOverwrite(std::string_view filePathText, const std::string& filePath)
+    : place_(const_cast<char*>(filePathText.data())), own_(filePathText) {
+    const std::string text = json::serialize(json::Value(filePath));
+    isDone_ = text.size() <= own_.size();
+    if (isDone_) {
+        std::fill(std::copy(text.begin(), text.end(), place_), place_ + own_.size(), ' ');
+    }
+}
+
+PathOverwrite::~PathOverwrite() {
+    if (isDone_) {
+        std::copy(own_.begin(), own_.end(), place_);
+    }
 }
 
 }  // namespace host

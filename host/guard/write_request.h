@@ -14,6 +14,7 @@ namespace host {
 struct WriteRequest {
     std::string rtcId;
     std::string filePath;
+    std::string_view filePathText;  // as it stands in the request
     bool isPackage = false;
     std::string_view text;    // a text as it stands in the request: JSON, of the charset `encoding`
     std::string encoding;     // of a text
@@ -29,5 +30,25 @@ std::optional<WriteRequest> readWriteRequest(std::string_view payload);
 /// `payload`, which is an object with members, with a member "filePath" put in front of the others.
 /// Of two members of one name the first counts.
 std::string withFilePath(std::string_view payload, const std::string& filePath);
+
+/// Another path in the text of a request, in place of its own: a large request is not copied for
+/// it, which would take as much memory again. The bytes of the request are overwritten, and
+/// restored by the destructor; nothing else may read them in between.
+class PathOverwrite {
+public:
+    /// Writes `filePath` over `filePathText` of a request, where there is room for it.
+    PathOverwrite(std::string_view filePathText, const std::string& filePath);
+    PathOverwrite(const PathOverwrite&) = delete;
+    PathOverwrite& operator=(const PathOverwrite&) = delete;
+    ~PathOverwrite();
+
+    /// Whether there was room. The request is unchanged otherwise.
+    bool isDone() const noexcept { return isDone_; }
+
+private:
+    char* const place_;
+    const std::string own_;
+    bool isDone_;
+};
 
 }  // namespace host

@@ -227,6 +227,16 @@ TEST_F(GuardedBundle, AnswersAsTheBundleDoesWhereThereCanBeNoDocument) {
     EXPECT_THAT(names(), ElementsAre("folder"));
 }
 
+// Too short to make room for that of the new file.
+TEST_F(GuardedBundle, SavesUnderAShortPath) {
+    const fs::path before = fs::current_path();
+    fs::current_path(folder_.path());
+    EXPECT_EQ(write("a", "new"), outcome("a", false, true));
+    fs::current_path(before);
+    EXPECT_EQ(readFile(at("a")), "new");
+    EXPECT_THAT(names(), ElementsAre("a"));
+}
+
 TEST_F(GuardedBundle, SavesUnderTheLongestPathThatThereIs) {
     const std::string name(255, 'n');
     EXPECT_EQ(write(at(name), "x").back(), "true");

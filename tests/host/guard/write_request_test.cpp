@@ -7,11 +7,13 @@
 
 #include <cstddef>
 #include <string>
+#include <string_view>
 
 #include "json/parser.h"
 
 namespace {
 
+using host::PathOverwrite;
 using host::readWriteRequest;
 using host::withFilePath;
 
@@ -92,6 +94,36 @@ TEST(WriteRequest, GetsAnotherPathInFrontOfItsOwn) {
     const std::string request = withFilePath(R"({"filePath":"/a","rtcId":"1"})", "/b\"c");
     EXPECT_EQ(json::parse(request)["filePath"], json::Value("/b\"c"));
     EXPECT_EQ(json::parse(request)["rtcId"], json::Value("1"));
+}
+
+TEST(WriteRequest, HasAnotherPathWrittenOverItsOwnForAWhile) {
+    std::string own =
+        R"({"rtcId":"1","filePath":"/\u00E9\"","filePath":"/b","contentType":"a","content":"",)"
+        R"("encoding":""})";
+    const std::string_view path = readWriteRequest(own)->filePathText;
+    ASSERT_EQ(path, R"("/\u00E9\"")");
+    for (const char* const other : {"", "/b\"", "/12345678"}) {
+        json::Object expected = json::parse(own);
+        {
+            const PathOverwrite overwrite(path, other);
+            EXPECT_TRUE(overwrite.isDone());
+            expected["filePath"] = json::Value(other);
+            EXPECT_EQ(json::Value(json::parse(own)), json::Value(expected));
+        }
+        EXPECT_EQ(json::parse(own)["filePath"], json::Value("/é\""));
+        EXPECT_EQ(path, R"("/\u00E9\"")");
+    }
+}
+
+TEST(WriteRequest, KeepsItsPathWhereThereIsNoRoomForAnother) {
+    std::string own =
+        R"({"filePath":"/abc","rtcId":"1","contentType":"a","content":"","encoding":""})";
+    const std::string before = own;
+    for (const char* const other : {"/abcd", "/ab\""}) {
+        const PathOverwrite overwrite(readWriteRequest(own)->filePathText, other);
+        EXPECT_FALSE(overwrite.isDone());
+        EXPECT_EQ(own, before);
+    }
 }
 
 }  // namespace
