@@ -117,10 +117,10 @@ public:
                 throw std::runtime_error("\"baseVersion\" is not a string");
             }
             const bool isSaved = request_.isPackage ? savePackage() : saveText();
-            return {isSaved, existed_, isSaved ? version_ : std::string()};
+            return {isSaved, existed_, isSaved ? version_ : std::string(), std::move(replaced_)};
         } catch (const std::exception& error) {
             spdlog::error("{}: {}", request_.filePath, error.what());
-            return {false, existed_, {}};
+            return {false, existed_, {}, {}};
         }
     }
 
@@ -286,6 +286,8 @@ private:
     void keep(FileDescriptor old) {
         if (history_ != nullptr && old) {
             history_->keep(std::move(old), document_);
+        } else {
+            replaced_ = std::move(old);
         }
     }
 
@@ -296,6 +298,7 @@ private:
     const std::string document_;
     bool existed_ = false;
     std::string version_;
+    FileDescriptor replaced_;
 };
 
 }  // namespace
@@ -304,7 +307,7 @@ Saves::Saves(const std::filesystem::path& lockFile, std::shared_ptr<History> his
     : locks_(lockFile), history_(std::move(history)) {}
 
 SaveResult Saves::save(const WriteRequest& request, const AskBundle& askBundle) {
-    const SaveResult result = Save(request, askBundle, locks_, history_.get()).make();
+    SaveResult result = Save(request, askBundle, locks_, history_.get()).make();
     leftovers_.removeBeside(request.filePath);
     return result;
 }

@@ -20,6 +20,7 @@
 #include "host/guard/leftovers.h"
 #include "host/guard/save_locks.h"
 #include "host/guard/write_request.h"
+#include "platform/posix/file_descriptor.h"
 
 namespace host {
 
@@ -43,6 +44,10 @@ struct SaveResult {
     bool isSaved = false;
     bool existed = false;
     std::string version;  // that was made, where the request names the one it is based on
+
+    /// What was replaced, unless the history has it. Closing it deletes it, which takes some
+    /// milliseconds for a large file; so it is closed after the answer.
+    platform::FileDescriptor replaced;
 };
 
 /// Saves documents, several at once if need be.
