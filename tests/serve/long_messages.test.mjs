@@ -5,11 +5,13 @@ import { randomBytes } from "node:crypto";
 import { readFileSync, writeFileSync } from "node:fs";
 import { join } from "node:path";
 import { test } from "node:test";
+import { setTimeout as sleep } from "node:timers/promises";
 
 import WebSocket from "../../web/node_modules/ws/wrapper.mjs";
 import { headers } from "../../web/client/node_modules/@nats-io/nats-core/lib/mod.js";
 import { AskAgain, connect, utf8 } from "../../web/client/dist/index.js";
 import { parseUrl } from "./client.mjs";
+import { MessageServer } from "./message_server.mjs";
 import { Host, IS_SANITIZED, temporaryFolder, waitFor } from "./processes.mjs";
 
 globalThis.WebSocket = WebSocket; // Node.js before version 22 has none
@@ -121,6 +123,54 @@ test("clients that take nothing of their answers hold up no other", async (t) =>
     assert.equal((await client.read(small, "text/plain")).data, "small");
   }
   assert.equal((await client.read(file, "text/plain")).data.length, 5_000_000);
+});
+
+// A worker that sends an answer of so many MiB as it is given room, each piece after a pause. Returns the rooms, in
+// MiB, that its client has given by the end.
+async function roomsFor(t, mebibytes, pause) {
+  const server = await MessageServer.start(t, temporaryFolder(t));
+  const { nats } = await server.connect("worker");
+  const say = (subject, word, payload) => {
+    const header = headers();
+    header.set("Zpr-Pieces", word);
+    nats.publish(subject, payload, { headers: header });
+  };
+  const piece = new Uint8Array(2 ** 20);
+  const rooms = [];
+  let sent = 0;
+  let isSending = false;
+  const send = async (subject) => {
+    for (isSending = true; sent < rooms.at(-1); ++sent) {
+      await sleep(pause);
+      say(subject, `piece ${sent * 2 ** 20}`, piece);
+    }
+    isSending = false;
+  };
+  let answers;
+  nats.subscribe("/zpr/service/piece.w1.>", {
+    callback: (_, { headers: said }) => {
+      rooms.push(Number(said.get("Zpr-Pieces").split(" ")[1]) / 2 ** 20);
+      isSending || send(answers);
+    },
+  });
+  nats.subscribe("/zpr/service/readRequest_cpp", {
+    callback: (_, { reply }) => say((answers = reply), `answer w1 ${mebibytes * 2 ** 20}`),
+  });
+  await nats.flush();
+  const client = await server.connect("ada");
+  const answer = await client.readBytes("/any", "text/plain", { tries: 1 });
+  assert.equal(answer.length, mebibytes * 2 ** 20);
+  return rooms;
+}
+
+test("a client on a fast line gives room once in a few pieces", async (t) => {
+  const rooms = await roomsFor(t, 60, 0);
+  assert.ok(rooms.length <= 40, `${rooms}`);
+  assert.equal(rooms.at(-1), 60);
+});
+
+test("a client on a slow line gives room with every piece, which its worker takes for progress", async (t) => {
+  assert.deepEqual((await roomsFor(t, 12, 1100)).slice(0, 4), [8, 9, 10, 11]);
 });
 
 test("nobody speaks in another's name about pieces", async (t) => {

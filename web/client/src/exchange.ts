@@ -10,7 +10,9 @@ import { headers, type Msg, type NatsConnection, type Subscription } from "@nats
 
 const HEADER = "Zpr-Pieces";
 const PIECE = 2 ** 20;
-const WINDOW = 4 * PIECE;
+const WINDOW = 8 * PIECE;
+const GRANT = 2 * PIECE;
+const GRANT_INTERVAL = 1_000; // ms
 const STANDSTILL = 40_000; // ms; longer than a worker gives up after
 const PROBE = 5_000; // ms
 
@@ -67,6 +69,7 @@ class Transfer {
   #answer: Uint8Array | null = null;
   #received = 0;
   #room = 0;
+  #granted = 0;
 
   constructor(
     private nats: NatsConnection,
@@ -175,10 +178,15 @@ class Transfer {
     this.#giveRoom();
   }
 
+  // Not with every piece of a fast line: each word wakes the server and the worker. With every one of a slow
+  // line, since the worker takes words for progress.
   #giveRoom() {
-    const room = Math.min(this.#received + WINDOW, this.#answer!.length);
-    if (room > this.#room) {
+    const { length } = this.#answer!;
+    const room = Math.min(this.#received + WINDOW, length);
+    const isDue = room >= this.#room + GRANT || room === length || Date.now() >= this.#granted + GRANT_INTERVAL;
+    if (room > this.#room && isDue) {
       this.#room = room;
+      this.#granted = Date.now();
       this.#tell(this.#channelOf(this.#worker!), `room ${room}`);
     }
     this.#wait(STANDSTILL);
