@@ -8,6 +8,7 @@ import assert from "node:assert/strict";
 import { randomBytes } from "node:crypto";
 import { readFileSync, rmSync } from "node:fs";
 import { join } from "node:path";
+import { setTimeout as sleep } from "node:timers/promises";
 
 import WebSocket from "../../web/node_modules/ws/wrapper.mjs";
 import { connect } from "../../web/client/dist/index.js";
@@ -17,8 +18,7 @@ globalThis.WebSocket = WebSocket; // Node.js before version 22 has none
 const [url, folder, name, count, megabytes] = process.argv.slice(2);
 const text = randomBytes((megabytes * 750_000) | 0).toString("base64");
 
-async function save(index) {
-  const client = await connect({ servers: url, user: "ada", pass: "secret", reconnect: false });
+async function save(client, index) {
   const file = join(folder, `${name}-${index}.txt`);
   // A client that gets no processor for five seconds is sent away, and asks again.
   assert.equal(await client.write(file, text, { timeout: 300_000, tries: 20 }), true);
@@ -27,4 +27,13 @@ async function save(index) {
   await client.close();
 }
 
-await Promise.all(Array.from({ length: Number(count) }, (_, index) => save(index)));
+// All connect first: beside others that turn their texts into bytes, a client is too slow for the server to wait for.
+const connecting = Array.from({ length: Number(count) }, () =>
+  connect({ servers: url, user: "ada", pass: "secret", reconnect: false }),
+);
+const saves = [];
+for (const client of await Promise.all(connecting)) {
+  saves.push(save(client, saves.length));
+  await sleep(0); // for the others to answer the server's pings
+}
+await Promise.all(saves);
