@@ -35,10 +35,10 @@ export function memoryOf(program) {
 
 export class MessageServer {
   // Its files are in `folder`. Users are "ada" and "ben".
-  static async start(test, folder, maxPayload = "8MB") {
+  static async start(test, folder, maxPayload = "8MB", environment = {}) {
     const [port, webSocketPort, monitoringPort] = await freePorts(3);
     const server = new MessageServer();
-    Object.assign(server, { test, folder, port, webSocketPort, monitoringPort });
+    Object.assign(server, { test, folder, port, webSocketPort, monitoringPort, environment });
     server.configuration = join(folder, "nats.conf");
     writeFileSync(
       server.configuration,
@@ -59,7 +59,7 @@ export class MessageServer {
   // Starts it, again if it has been killed.
   async run() {
     const path = `${process.env.PATH}:/usr/sbin`;
-    this.program = new Program(this.test, ["nats-server", "-c", this.configuration], { PATH: path });
+    this.program = new Program(this.test, ["nats-server", "-c", this.configuration], { PATH: path, ...this.environment });
     await waitFor("the message server", () => {
       if (this.program.hasEnded) {
         throw new Error(this.program.errors);

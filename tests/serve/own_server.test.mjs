@@ -13,6 +13,7 @@ import {
   writeFileSync,
 } from "node:fs";
 import { createServer } from "node:net";
+import { totalmem } from "node:os";
 import { dirname, join } from "node:path";
 import { test } from "node:test";
 import { setTimeout as sleep } from "node:timers/promises";
@@ -55,6 +56,14 @@ test("it serves what any server with workers does", async (t) => {
     ...(IS_SANITIZED ? ["--connections", "200"] : []),
   ]);
   assert.equal(await suite.end, 0, `${suite.output}\n${suite.errors}\n${host.errors}`);
+});
+
+test("its message server collects garbage seldom, but below a bound of its memory", async (t) => {
+  const host = await Host.start(t, []);
+  const environment = readFileSync(`/proc/${host.serverId()}/environ`, "latin1").split("\0");
+  assert.ok(environment.includes("GOGC=400"));
+  const bound = Number(environment.find((one) => one.startsWith("GOMEMLIMIT="))?.split("=")[1]);
+  assert.ok(bound > 0 && bound < totalmem(), `${bound}`);
 });
 
 test("its password is in nobody's sight", async (t) => {
