@@ -115,6 +115,33 @@ test("a page of an allowed origin connects, and of no other", async (t) => {
   }
 });
 
+// Its threads, those of the page included, take a part of that for their stacks.
+test("it serves with the least memory that it may have", { skip: IS_SANITIZED }, async (t) => {
+  const folder = temporaryFolder(t);
+  writeFileSync(join(folder, "a.txt"), "text");
+  const least = ["--memory-limit", "64MB", "--root", folder, "--listen", "127.0.0.1:0"];
+  const host = await Host.start(t, least);
+  const client = await connected(t, host);
+  const pages = Array.from({ length: 20 }, () => fetch(host.page));
+  const reads = Array.from({ length: 20 }, () => client.read(join(folder, "a.txt")));
+  for (const answer of await Promise.all(reads)) {
+    assert.deepEqual(answer, { data: "text", status: true });
+  }
+  await Promise.all(pages);
+  assert.ok(!host.hasEnded, host.errors);
+});
+
+test("its message server is held to a limit of its own", { skip: IS_SANITIZED }, async (t) => {
+  const host = await Host.start(t, ["--memory-limit", "64MB"]);
+  const limitOf = (id) => readFileSync(`/proc/${id}/limits`, "utf8").match(/Max data size.*/)[0];
+  assert.match(limitOf(host.id), / 67108864 /);
+  assert.equal(limitOf(host.serverId()), limitOf("self"));
+  const environment = readFileSync(`/proc/${host.serverId()}/environ`, "utf8").split("\0");
+  const [limit, ...others] = environment.filter((entry) => entry.startsWith("GOMEMLIMIT="));
+  assert.match(limit, /^GOMEMLIMIT=[1-9]\d{7,}$/);
+  assert.deepEqual(others, []);
+});
+
 test("a message server that is killed is started again, and clients go on", async (t) => {
   const host = await Host.start(t, []);
   const client = await connected(t, host, { maxReconnectAttempts: -1, reconnectTimeWait: 50 });

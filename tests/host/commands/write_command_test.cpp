@@ -334,6 +334,17 @@ TEST_F(WriteCommand, WritesLargeTexts) {
     EXPECT_TRUE(readFile(folder_ / "file") == text);
 }
 
+// The program on a terminal, by the program `script`.
+TEST_F(WriteCommand, ShowsOnATerminalThatItIsAtWork) {
+    const std::string file = folder_ / "file";
+    const auto shown = [&](const std::string& input) {
+        const std::string command = "(" + input + ") | " SERIALIZATION_HOST " write " + file;
+        return test::run({"/usr/bin/script", "-qec", command, "/dev/null"}).output;
+    };
+    EXPECT_THAT(shown("printf x; sleep 2"), HasSubstr("reading the input, 0 MB, 1 s"));
+    EXPECT_EQ(shown("printf x"), "true\r\n");
+}
+
 TEST_F(WriteCommand, NeedsOneFile) {
     EXPECT_EQ(test::run(hostCommand({"write"})).status, 2);
     EXPECT_EQ(test::run(hostCommand({"write", "one", "two"})).status, 2);

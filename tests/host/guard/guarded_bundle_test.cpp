@@ -338,4 +338,14 @@ TEST_F(GuardedBundle, RemovesWhatKilledSavesLeftADayAgo) {
                 ElementsAre(".~saving-0123456789abcdee.tmp", ".~saving-notes.tmp", "a.txt"));
 }
 
+// A large folder takes long to list, so not every save in it does.
+TEST_F(GuardedBundle, LooksForWhatKilledSavesLeftNotWithEverySave) {
+    write(at("a.txt"), "x");
+    const std::string old = at(".~saving-0123456789abcdef.tmp");
+    writeFile(old, "x");
+    fs::last_write_time(old, fs::file_time_type::clock::now() - std::chrono::hours(25));
+    write(at("a.txt"), "y");
+    EXPECT_THAT(names(), ElementsAre(".~saving-0123456789abcdef.tmp", "a.txt"));
+}
+
 }  // namespace
