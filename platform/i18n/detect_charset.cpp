@@ -135,6 +135,21 @@ std::string legacyCharset(std::string_view bytes) {
     return otherwise;
 }
 
+// The EBCDIC charset of a text that is ASCII by its bytes, as letters of Hebrew are there; empty
+// when it costs less as ASCII. Those who have lists of e-mail addresses need not fear: most small
+// letters and all digits of ASCII are no characters in it, or controls.
+std::string asciiLookingEbcdic(std::string_view bytes) {
+    constexpr std::size_t headSize = 4096;
+    if (!detail::looksLikeEbcdic(bytes.substr(0, headSize))) {
+        return {};
+    }
+    const auto likely = detail::likeliestCharset(detail::charsetSample(bytes), bytes, {});
+    return likely && likely->charset->kind() == detail::CharsetKind::ebcdic &&
+                   likely->charset->fit(bytes).decodes
+               ? likely->charset->name()
+               : std::string();
+}
+
 std::string findCharset(std::string_view bytes) {
     if (std::string marked = markedCharset(bytes); !marked.empty()) {
         return marked;
@@ -142,10 +157,13 @@ std::string findCharset(std::string_view bytes) {
     if (!simdjson::validate_utf8(bytes.data(), bytes.size())) {
         return legacyCharset(bytes);
     }
-    // Valid UTF-8, but so are the bytes of escape sequences, and some of UTF-16.
+    // Valid UTF-8, but so are the bytes of escape sequences, and some of EBCDIC and UTF-16.
     if (isAscii(bytes)) {
         if (std::string escaped = detail::escapedCharset(bytes); !escaped.empty()) {
             return escaped;
+        }
+        if (std::string ebcdic = asciiLookingEbcdic(bytes); !ebcdic.empty()) {
+            return ebcdic;
         }
     }
     if (bytes.find('\0') != std::string_view::npos || isBinary(bytes)) {

@@ -143,13 +143,6 @@ private:
         Cost cost;
     };
 
-    // In EBCDIC the blank is 40, and 20 is a control.
-    static bool looksLikeEbcdic(std::string_view sample) {
-        const auto blanks = std::count(sample.begin(), sample.end(), '\x40');
-        return blanks > std::count(sample.begin(), sample.end(), '\x20') &&
-               static_cast<std::size_t>(blanks) > sample.size() / 20;
-    }
-
     bool isExcluded(const LegacyCharset& charset) const {
         return std::find(excluded_.begin(), excluded_.end(), &charset) != excluded_.end();
     }
@@ -193,10 +186,9 @@ private:
             return;
         }
         for (const auto& [model, classes] : charset.languages()) {
+            // No prior of the language: what looks like ASCII words here are other letters.
             const auto classOf = [&model = *model](char16_t c) { return model.classOf(c); };
-            const Cost before = cost + priors_.of(*model);
-            consider(charset,
-                     before + costOfWords(counts.pairs, *model, classOf, best_.cost - before));
+            consider(charset, cost + costOfWords(counts.pairs, *model, classOf, best_.cost - cost));
         }
     }
 
@@ -260,6 +252,12 @@ private:
 };
 
 }  // namespace
+
+bool looksLikeEbcdic(std::string_view sample) {
+    const auto blanks = std::count(sample.begin(), sample.end(), '\x40');
+    return blanks > std::count(sample.begin(), sample.end(), '\x20') &&
+           static_cast<std::size_t>(blanks) > sample.size() / 20;
+}
 
 std::optional<LikelyCharset> likeliestCharset(std::string_view sample, std::string_view bytes,
                                               const std::vector<const LegacyCharset*>& excluded) {

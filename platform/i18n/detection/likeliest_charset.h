@@ -16,6 +16,10 @@ struct LikelyCharset {
     Cost cost;
 };
 
+/// Whether `sample` has the blanks of EBCDIC, where they are 40 and 20 is a control. Linear in its
+/// length.
+bool looksLikeEbcdic(std::string_view sample);
+
 /// The charset in which `sample` costs least, of those that can decode it and, as far as its byte
 /// values tell, the whole file `bytes` that it is of; nothing when there is none but those in
 /// `excluded`. Linear in the length of the sample.

@@ -162,6 +162,42 @@ TEST(DetectCharset, ReadsEbcdic) {
     }
 }
 
+// There, Hebrew letters and blanks have codes that are letters and @ in ASCII.
+TEST(DetectCharset, ReadsHebrewInEbcdicThatIsAsciiByItsBytes) {
+    int asciiLines = 0;
+    for (const std::string& line : test::linesOf(test::corpusText("he"))) {
+        const std::string bytes = test::iconvEncode("IBM424", line).value();
+        if (bytes.size() < 60) {
+            continue;  // EBCDIC is so rare that a few words are no proof of it
+        }
+        EXPECT_EQ(detect(bytes), "IBM424") << line;
+        EXPECT_EQ(roundTrip("IBM424", bytes), bytes);
+        const bool isAscii = std::all_of(bytes.begin(), bytes.end(), [](char c) {
+            return static_cast<unsigned char>(c) < 0x80;
+        });
+        asciiLines += isAscii ? 1 : 0;
+    }
+    EXPECT_GT(asciiLines, 0);
+}
+
+TEST(DetectCharset, TakesAsciiForItselfHoweverManyItsAtSigns) {
+    for (const char* text :
+         {"@", "@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@", "ABC@DEF@GHI",
+          "ada@example.org\nben@example.org\neve@example.com\n", "@media\n@import\n@page\n",
+          "@BEEF@DEAD@FACE@FEED@CAFE@BABE@FADE@BEAD@DEED@FEEB@ACED@BADE\n",
+          "@@@@@@@@\n@@@  @@@\n@@@@@@@@\n", "@property\n@staticmethod\n@dataclass\n"}) {
+        EXPECT_EQ(detect(text), "UTF-8") << text;
+    }
+    std::mt19937 random(3);
+    for (int round = 0; round < 3000; ++round) {
+        std::string text(random() % 300, '@');
+        for (char& c : text) {
+            c = random() % 6 == 0 ? '@' : static_cast<char>(0x20 + random() % 0x5F);
+        }
+        EXPECT_EQ(detect(text), "UTF-8") << text;
+    }
+}
+
 TEST(DetectCharset, ReadsAPageInManyLanguages) {
     std::string page;
     for (const char* language : {"fr", "de", "es", "pt", "it", "nl", "sv", "da", "fi", "is"}) {
