@@ -8,7 +8,7 @@ import { test } from "node:test";
 
 import { room } from "./room.mjs";
 
-const { ByteSink, Charsets } = await room("text/charsets/index.ts");
+const { ByteSink, Charsets, ESCAPED } = await room("text/charsets/index.ts");
 
 const load = (file) => readFile(join(process.env.CHARSET_TABLES, file));
 const charsets = new Charsets(load);
@@ -148,14 +148,67 @@ test("damaged Unicode is told of, and U+FFFD that a file does hold is no damage"
   }
 });
 
-test("Japanese texts with escape sequences are shown, and not encoded", async () => {
-  const charset = await charsets.open("ISO-2022-JP");
-  assert.equal(charset.canEncode, false);
-  assert.equal(charset.decode(Buffer.from("\x1b$B$\"\x1b(B!", "latin1")).text, "\u3042!");
+const CODES = bytesFrom(0x20, 0x7e).map((code) => [code]);
+const PAIRS = bytesFrom(0x21, 0x7e).flatMap((first) => bytesFrom(0x21, 0x7e).map((second) => [first, second]));
+
+// Of each charset with escapes: what stands around the codes of one of its sets.
+for (const [name, before, codes, after] of [
+  ["ISO-2022-JP", "\x1b$B", PAIRS, "\x1b(B"],
+  ["ISO-2022-JP", "\x1b$@", PAIRS, "\x1b(B"],
+  ["ISO-2022-JP", "\x1b(J", CODES, "\x1b(B"],
+  ["ISO-2022-JP-1", "\x1b$(D", PAIRS, "\x1b(B"],
+  ["ISO-2022-JP-2", "\x1b$A", PAIRS, "\x1b(B"],
+  ["ISO-2022-JP-2", "\x1b$(C", PAIRS, "\x1b(B"],
+  ["ISO-2022-JP-2", "\x1b.A\x1bN", CODES, ""],
+  ["ISO-2022-JP-2", "\x1b.F\x1bN", CODES, ""],
+  ["ISO-2022-KR", "\x1b$)C\x0e", PAIRS, "\x0f"],
+  ["ISO-2022-CN", "\x1b$)A\x0e", PAIRS, "\x0f"],
+  ["ISO-2022-CN", "\x1b$)G\x0e", PAIRS, "\x0f"],
+  ["ISO-2022-CN", "\x1b$*H\x1bN", PAIRS, ""],
+  ["ISO-2022-CN-EXT", "\x1b$)E\x0e", PAIRS, "\x0f"],
+  ["HZ-GB-2312", "~{", PAIRS, "~}"],
+  ["UTF-7", "", CODES, ""],
+  ["UTF-7", "+", PAIRS, "-"],
+  ["UTF-7", "+TgBO", PAIRS, "-"],
+]) {
+  test(`${name}: every code behind ${JSON.stringify(before)} is decoded as the host decodes it`, async () => {
+    const texts = codes.map((code) => [...Buffer.from(before, "latin1"), ...code, ...Buffer.from(after, "latin1")]);
+    compareDecoding(await charsets.open(name), texts);
+  });
+}
+
+const ESCAPED_TEXTS = [
+  ["ISO-2022-JP", "abc \x1b$B$\"$$\x1b(Bd\n\x1b(J\\~\x1b(B\r\n", "abc \u3042\u3044d\n\u00a5\u203e\r\n"],
+  ["ISO-2022-JP", "\x1b(I1\n2\x1b$B$\"\n$", "\uff71\n2\u3042\n$"], // a line ends what the one before has designated
+  ["ISO-2022-KR", "\x1b$)Ca\x0e0!\x0fb\n\x0e0\"\x0f\n", "a\uac00b\n\uac01\n"],
+  ["ISO-2022-CN", "a\x1b$)A\x0e0!\x0fb\x1b$)G\x0eD!\x0f\n\x1b$)A\x0e0!\x0f", "a\u554ab\u4e00\n\u554a"],
+  ["HZ-GB-2312", "a~~b ~{0!~}c~\nd ~{0!\ne", "a~b \u554acd \u554a\ne"],
+  ["UTF-7", "a+-b +AOQ-c +2D3eAA.", "a+b \u00e4c \u{1f600}."],
+];
+
+test("texts with escapes are shown, through all their shifts", async () => {
+  for (const [name, bytes, text] of ESCAPED_TEXTS) {
+    assert.deepEqual((await charsets.open(name)).decode(Buffer.from(bytes, "latin1")), { text, isDamaged: false }, name);
+  }
+});
+
+test("damaged texts with escapes are told of", async () => {
+  const damaged = { "ISO-2022-JP": "\x1b$C", "ISO-2022-KR": "\x0e0!", "ISO-2022-CN": "\x1b$)A\x0e0", "HZ-GB-2312": "~a", "UTF-7": "+2D0-" };
+  for (const [name, bytes] of Object.entries(damaged)) {
+    assert.equal((await charsets.open(name)).decode(Buffer.from(bytes, "latin1")).isDamaged, true, name);
+    assert.equal((await charsets.open(name)).decode(Uint8Array.of(0x61, 0xe4)).isDamaged, true, name);
+  }
+});
+
+test("texts with escapes are not encoded", async () => {
+  for (const name of ESCAPED) {
+    assert.equal((await charsets.open(name)).canEncode, false, name);
+    assert.ok(!names.includes(name), name);
+  }
 });
 
 test("a charset that is not known is none, and one whose table could not be loaded is tried again", async () => {
-  assert.equal(await charsets.open("UTF-7"), undefined);
+  assert.equal(await charsets.open("EBCDIC-XYZ"), undefined);
   let fails = true;
   const flaky = new Charsets((file) => (fails ? Promise.reject(new Error("no network")) : load(file)));
   await assert.rejects(flaky.open("KOI8-R"), /no network/);

@@ -6,7 +6,7 @@
 //
 // A charset gets a table when its characters have fixed codes of one to four bytes: no escapes, no
 // shifts. The encoding forms of Unicode get none, as they are arithmetic. charsets.json names the
-// file of each charset.
+// file of each charset. The sets of characters that escapes and shifts choose from get one each.
 //
 // A file is a sequence of numbers, each in bytes of seven bits, the low ones first, with the high
 // bit set in all but the last byte:
@@ -275,6 +275,57 @@ private:
     std::string bytes_;
 };
 
+// A set of characters that texts with escapes or shifts choose from.
+struct GraphicSet {
+    const char* file;
+    const char* charset;  // one that has it
+    const char* before;   // what a text has in front of a code of the set
+    const char* after;
+    std::size_t length;  // of its codes
+};
+
+constexpr GraphicSet graphicSets[] = {
+    {"set-jis-x-0208.bin", "ISO-2022-JP", "\x1B$B", "\x1B(B", 2},
+    {"set-jis-x-0212.bin", "ISO-2022-JP-1", "\x1B$(D", "\x1B(B", 2},
+    {"set-latin-1.bin", "ISO-2022-JP-2", "\x1B.A\x1BN", "", 1},
+    {"set-greek.bin", "ISO-2022-JP-2", "\x1B.F\x1BN", "", 1},
+    {"set-ks-x-1001.bin", "ISO-2022-KR", "\x1B$)C\x0E", "\x0F", 2},
+    {"set-ks-c-5601.bin", "ISO-2022-JP-2", "\x1B$(C", "\x1B(B", 2},
+    {"set-gb-2312.bin", "ISO-2022-CN", "\x1B$)A\x0E", "\x0F", 2},
+    {"set-iso-ir-165.bin", "ISO-2022-CN-EXT", "\x1B$)E\x0E", "\x0F", 2},
+    {"set-cns-1.bin", "ISO-2022-CN", "\x1B$)G\x0E", "\x0F", 2},
+    {"set-cns-2.bin", "ISO-2022-CN", "\x1B$*H\x1BN", "", 2},
+    {"set-hz.bin", "HZ", "~{", "~}", 2},
+};
+
+// The codes of a set, in order.
+std::vector<Code> codesOf(const GraphicSet& set) {
+    const std::unique_ptr<Charset> charset = openCharset(set.charset, true);
+    std::vector<Code> codes;
+    const auto add = [&](const std::string& code) {
+        try {
+            const auto character = characterOf(charset->decode(set.before + code + set.after));
+            if (character) {
+                codes.push_back({code, *character, true});
+            }
+        } catch (const std::runtime_error&) {
+            return;  // no code of the set
+        }
+    };
+    for (char first = ' '; first <= '~'; ++first) {
+        for (char second = '!'; second <= '~' && set.length == 2; ++second) {
+            add({first, second});
+        }
+        if (set.length == 1) {
+            add({first});
+        }
+    }
+    if (codes.empty()) {
+        throw std::runtime_error(std::string(set.file) + ": no text has characters of this set");
+    }
+    return codes;
+}
+
 bool isArithmetic(const std::string& name) {
     constexpr const char* forms[] = {"UTF-8",  "UTF-16",   "UTF-16LE", "UTF-16BE",
                                      "UTF-32", "UTF-32LE", "UTF-32BE"};
@@ -392,6 +443,9 @@ int main(int argc, char** argv) {
             writeFile(folder / fileNameOf(name), table.bytes());
             index += (index.empty() ? "{\n" : ",\n");
             index += "  \"" + name + "\": \"" + fileNameOf(name) + "\"";
+        }
+        for (const GraphicSet& set : graphicSets) {
+            writeFile(folder / set.file, TableFile(codesOf(set)).bytes());
         }
         writeFile(folder / "charsets.json", index + "\n}\n");
     } catch (const std::exception& error) {

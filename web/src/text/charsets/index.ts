@@ -1,40 +1,16 @@
 // SPDX-License-Identifier: Apache-2.0
 // The charsets that the page knows, under the host's names for them. Their tables are loaded when they are
 // needed.
-import type { Charset, Decoded } from "./charset.js";
+import type { Charset } from "./charset.js";
+import { ESCAPED, openEscaped } from "./escaped.js";
 import { TableCharset } from "./table.js";
 import { UNICODE_FORMS } from "./unicode.js";
 
 export * from "./charset.js";
+export { ESCAPED };
 
 /** Loads a file of the folder of tables. Rejects when there is none. */
 export type TableLoader = (file: string) => Promise<Uint8Array>;
-
-// Charsets of escape sequences, which are only shown: their texts can be spelt in several ways.
-const ESCAPED: Record<string, string> = {
-  "ISO-2022-JP": "iso-2022-jp",
-  "ISO-2022-JP-1": "iso-2022-jp",
-  "ISO-2022-JP-2": "iso-2022-jp",
-};
-
-class ShownCharset implements Charset {
-  readonly isUnicode = false;
-  readonly canEncode = false;
-
-  constructor(
-    readonly name: string,
-    private label: string,
-  ) {}
-
-  decode(bytes: Uint8Array): Decoded {
-    const text = new TextDecoder(this.label).decode(bytes);
-    return { text, isDamaged: text.includes("\ufffd") };
-  }
-
-  encode(): never {
-    throw new Error(`texts are not encoded in ${this.name}`);
-  }
-}
 
 export class Charsets {
   #index: Promise<Record<string, string>> | undefined;
@@ -42,7 +18,7 @@ export class Charsets {
 
   constructor(private load: TableLoader) {}
 
-  /** The names of all charsets that texts can be saved in. */
+  /** The names of all charsets that texts can be saved in. Those of ESCAPED can only be read. */
   async names(): Promise<string[]> {
     return [...UNICODE_FORMS.map(({ name }) => name), ...Object.keys(await this.#files())];
   }
@@ -53,16 +29,16 @@ export class Charsets {
     if (form) {
       return form;
     }
-    if (name in ESCAPED) {
-      return new ShownCharset(name, ESCAPED[name]!);
-    }
-    const file = (await this.#files())[name];
-    if (file === undefined) {
-      return undefined;
-    }
     let opened = this.#opened.get(name);
     if (!opened) {
-      opened = this.load(file).then((table) => new TableCharset(name, table));
+      const file = (await this.#files())[name];
+      if (ESCAPED.includes(name)) {
+        opened = openEscaped(name, async (file) => new TableCharset(file, await this.load(file)));
+      } else if (file !== undefined) {
+        opened = this.load(file).then((table) => new TableCharset(name, table));
+      } else {
+        return undefined;
+      }
       opened.catch(() => this.#opened.delete(name)); // to be tried again
       this.#opened.set(name, opened);
     }
