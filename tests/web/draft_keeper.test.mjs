@@ -12,11 +12,11 @@ function keeper({ takes = 0, fails = false } = {}) {
   const log = [];
   const made = new DraftKeeper({
     store: async () => {
-      await sleep(takes);
       if (fails) {
         throw new Error("full");
       }
       log.push("stored");
+      await sleep(takes);
     },
     remove: async () => void log.push("removed"),
     failed: (reason) => log.push(reason.message),
@@ -54,6 +54,14 @@ test("what is removed is not stored afterwards", async () => {
   await made.clear();
   await sleep(400); // time for another draft
   assert.deepEqual(log, ["stored", "removed", "removed"]);
+});
+
+test("a draft is removed at once, even while it is being stored", () => {
+  const { log, made } = keeper({ takes: 1000 });
+  made.changed();
+  void made.flush();
+  void made.clear();
+  assert.deepEqual(log, ["stored", "removed"]);
 });
 
 test("a draft that takes long is stored more rarely", async () => {

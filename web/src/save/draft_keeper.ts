@@ -5,6 +5,7 @@ const SOONEST = 250; // ms after an edit
 const LATEST = 10_000;
 const SHARE = 20; // a draft may take up to so small a part of the time
 
+/** What `store` and `remove` do takes effect in the order in which they are called, also before they are done. */
 export interface Keeping {
   /** Stores what is unsaved. */
   store(): Promise<void>;
@@ -35,7 +36,7 @@ export class DraftKeeper {
   flush(): Promise<void> {
     if (this.#timer !== undefined) {
       this.#stop();
-      this.#then(async () => {
+      this.#start(async () => {
         const begin = performance.now();
         await this.keeping.store();
         this.#taken = performance.now() - begin;
@@ -47,7 +48,7 @@ export class DraftKeeper {
   /** Removes the draft: nothing is unsaved. */
   clear(): Promise<void> {
     this.#stop();
-    this.#then(() => this.keeping.remove());
+    this.#start(() => this.keeping.remove());
     return this.#last;
   }
 
@@ -56,9 +57,9 @@ export class DraftKeeper {
     this.#timer = undefined;
   }
 
-  // In the order asked for, so that no draft is stored after it was removed.
-  #then(action: () => Promise<void>): void {
-    this.#last = this.#last.then(action).then(
+  // At once, since the page may be left before an earlier one is done, and its draft must not outlive a save.
+  #start(action: () => Promise<void>): void {
+    this.#last = Promise.all([this.#last, action()]).then(
       () => void (this.#hasFailed = false),
       (reason: unknown) => {
         if (!this.#hasFailed) {
