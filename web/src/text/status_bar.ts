@@ -17,7 +17,7 @@ export interface StatusBarActions {
 }
 
 export class StatusBar {
-  readonly element = element("div", { className: "text-status" });
+  readonly element = element("div", { className: "status-line text-status" });
   #position = element("span", { className: "position" });
   #charset = element("select");
   #lineEnd = element("select");

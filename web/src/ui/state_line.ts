@@ -25,7 +25,7 @@ export class StateLine {
       (theme) => useTheme(theme as Theme),
     );
     const language = select(text("page.language"), LANGUAGES, currentLanguage(), (chosen) => void this.#speak(chosen));
-    this.element = element("footer", { className: "state" }, this.#connection, this.#document, this.#cancel, language, this.#theme);
+    this.element = element("footer", { className: "status-line state" }, this.#connection, this.#document, this.#cancel, language, this.#theme);
   }
 
   connection(state: ConnectionState): void {
