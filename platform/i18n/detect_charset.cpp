@@ -136,8 +136,8 @@ std::string legacyCharset(std::string_view bytes) {
 }
 
 // The EBCDIC charset of a text that is ASCII by its bytes, as letters of Hebrew are there; empty
-// when it costs less as ASCII. Those who have lists of e-mail addresses need not fear: most small
-// letters and all digits of ASCII are no characters in it, or controls.
+// when it costs less as ASCII. Lists of e-mail addresses do: most small letters of ASCII, and all its
+// digits, are controls in EBCDIC, or nothing.
 std::string asciiLookingEbcdic(std::string_view bytes) {
     constexpr std::size_t headSize = 4096;
     if (!detail::looksLikeEbcdic(bytes.substr(0, headSize))) {
