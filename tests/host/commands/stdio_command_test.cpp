@@ -5,7 +5,6 @@
 
 #include <algorithm>
 #include <cstddef>
-#include <filesystem>
 #include <fstream>
 #include <future>
 #include <optional>
@@ -17,6 +16,7 @@
 
 #include "platform/messaging/channels.h"
 #include "tests/host/host_program.h"
+#include "tests/support/names_in.h"
 #include "tests/support/process_state.h"
 #include "tests/support/temporary_directory.h"
 
@@ -312,11 +312,7 @@ TEST_F(StdioCommand, LeavesNoFileBehindWhenItIsAskedToEndDuringSaves) {
         EXPECT_GE(messagesIn(outcome.output).size(), 2U);
         EXPECT_EQ(messagesIn(outcome.output).size() % 2, 0U);
     }
-    std::vector<std::string> names;
-    for (const auto& entry : std::filesystem::directory_iterator(folder_.path())) {
-        names.push_back(entry.path().filename());
-    }
-    EXPECT_THAT(names, UnorderedElementsAre("file", "document"));
+    EXPECT_THAT(test::namesIn(folder_.path()), ElementsAre("document", "file"));
 }
 
 TEST_F(StdioCommand, SurvivesRandomBytes) {

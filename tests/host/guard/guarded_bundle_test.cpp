@@ -8,11 +8,11 @@
 #include <sys/xattr.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <chrono>
 #include <filesystem>
 #include <memory>
 #include <mutex>
+#include <set>
 #include <string>
 #include <utility>
 #include <vector>
@@ -25,6 +25,7 @@
 #include "json/value.h"
 #include "platform/posix/file_descriptor.h"
 #include "tests/support/lease_holder.h"
+#include "tests/support/names_in.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
@@ -78,14 +79,7 @@ protected:
         EXPECT_EQ(messages, expected);
     }
 
-    std::vector<std::string> names() const {
-        std::vector<std::string> names;
-        for (const auto& entry : fs::directory_iterator(folder_.path())) {
-            names.push_back(entry.path().filename());
-        }
-        std::sort(names.begin(), names.end());
-        return names;
-    }
+    std::set<std::string> names() const { return test::namesIn(folder_.path()); }
 
     std::string at(const std::string& name) const { return folder_ / name; }
 

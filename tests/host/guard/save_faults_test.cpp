@@ -20,6 +20,7 @@
 #include <filesystem>
 #include <functional>
 #include <memory>
+#include <set>
 #include <string>
 #include <utility>
 #include <vector>
@@ -33,6 +34,7 @@
 #include "platform/messaging/channels.h"
 #include "platform/messaging/message_service.h"
 #include "platform/messaging/transport.h"
+#include "tests/support/names_in.h"
 #include "tests/support/system_call_supervisor.h"
 #include "tests/support/temporary_directory.h"
 
@@ -184,19 +186,12 @@ protected:
         }
     }
 
-    std::vector<std::string> names() const {
-        std::vector<std::string> names;
-        for (const auto& entry : fs::directory_iterator(folder_.path())) {
-            names.push_back(entry.path().filename());
-        }
-        std::sort(names.begin(), names.end());
-        return names;
-    }
+    std::set<std::string> names() const { return test::namesIn(folder_.path()); }
 
     // Makes `save`, of a document that `place` puts there, fail at each of its calls. No other
     // files than `files` may be left.
     void failEachCall(const std::function<void()>& place, const std::function<void()>& save,
-                      const std::vector<std::string>& files = {"a.txt"}) {
+                      const std::set<std::string>& files = {"a.txt"}) {
         place();
         const std::string old = readFile(at("a.txt"));
         const std::vector<int> calls = test::callsOf(save);

@@ -10,11 +10,14 @@
 #include <utility>
 #include <vector>
 
+#include "tests/platform/base64/plain_encoder.h"
+
 namespace {
 
 using platform::base64decode;
 using platform::base64encode;
 using platform::DataBuffer;
+using platform::base64::plainlyEncoded;
 using testing::HasSubstr;
 using testing::ThrowsMessage;
 
@@ -32,26 +35,6 @@ std::string randomBytes(std::size_t length, std::mt19937& random) {
         byte = static_cast<char>(random());
     }
     return bytes;
-}
-
-// An encoder with nothing in common with the one under test.
-std::string plainlyEncoded(std::string_view bytes) {
-    static constexpr std::string_view alphabet =
-        "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
-    std::string text;
-    unsigned bits = 0;
-    int count = 0;
-    for (const char byte : bytes) {
-        bits = (bits << 8) | static_cast<unsigned char>(byte);
-        for (count += 8; count >= 6; count -= 6) {
-            text += alphabet[(bits >> (count - 6)) & 63];
-        }
-    }
-    if (count > 0) {
-        text += alphabet[(bits << (6 - count)) & 63];
-    }
-    text.append((4 - text.size() % 4) % 4, '=');
-    return text;
 }
 
 const std::vector<std::pair<std::string, std::string>> testVectors = {{"", ""},

@@ -9,26 +9,11 @@
 #include <string>
 #include <string_view>
 
+#include "tests/platform/base64/plain_encoder.h"
 #include "tests/support/guarded_memory.h"
 
 namespace platform::base64 {
 namespace {
-
-constexpr std::string_view alphabet =
-    "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
-
-std::string plainlyEncoded(std::string_view bytes) {
-    std::string text;
-    unsigned bits = 0;
-    int count = 0;
-    for (const char byte : bytes) {
-        bits = (bits << 8) | static_cast<unsigned char>(byte);
-        for (count += 8; count >= 6; count -= 6) {
-            text += alphabet[(bits >> (count - 6)) & 63];
-        }
-    }
-    return text;
-}
 
 class Base64KernelsTest : public testing::TestWithParam<const Kernels*> {
 protected:

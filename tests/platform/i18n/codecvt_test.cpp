@@ -13,6 +13,7 @@
 #include <vector>
 
 #include "platform/text/ascii.h"
+#include "tests/platform/i18n/conversions.h"
 #include "tests/platform/i18n/detection/corpus.h"
 
 namespace platform::i18n {
@@ -27,16 +28,6 @@ using ::testing::EndsWith;
 using ::testing::HasSubstr;
 using ::testing::SizeIs;
 using ::testing::ThrowsMessage;
-
-std::u16string decode(const std::string& charset, std::string_view bytes, bool strict = true) {
-    codecvt_string_to_ustring converter(charset, strict);
-    return converter.do_convert(bytes.data(), bytes.size());
-}
-
-std::string encode(const std::string& charset, std::u16string_view text, bool strict = true) {
-    codecvt_ustring_to_string converter(charset, strict);
-    return converter.do_convert(text.data(), text.size());
-}
 
 std::string decodingError(const std::string& charset, std::string_view bytes) {
     try {

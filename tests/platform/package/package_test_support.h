@@ -2,15 +2,16 @@
 // What the package tests share: a folder of their own, files, and small packages.
 #pragma once
 
-#include <algorithm>
 #include <cstdint>
 #include <filesystem>
+#include <set>
 #include <string>
 #include <vector>
 
 #include "platform/i18n/codecvt.h"
 #include "platform/package/quillet_file_package.h"
 #include "tests/platform/package/zip_builder.h"
+#include "tests/support/names_in.h"
 #include "tests/support/temporary_directory.h"
 
 namespace test {
@@ -37,14 +38,7 @@ public:
     std::string bytesOf(const std::string& name) const { return test::readFile(directory_ / name); }
 
     /// The names of all files in the folder, sorted.
-    std::vector<std::string> names() const {
-        std::vector<std::string> result;
-        for (const auto& entry : std::filesystem::directory_iterator(path())) {
-            result.push_back(entry.path().filename().string());
-        }
-        std::sort(result.begin(), result.end());
-        return result;
-    }
+    std::set<std::string> names() const { return test::namesIn(path()); }
 
 private:
     test::TemporaryDirectory directory_;

@@ -126,7 +126,7 @@ protected:
     }
 
     void expectRefusedTarget(const std::string& name, const std::string& message) {
-        const std::vector<std::string> before = folder_.names();
+        const std::set<std::string> before = folder_.names();
         EXPECT_THAT([&] { save(folder_.at(name), packageOf({part(u"/a.txt")})); },
                     ThrowsMessage<std::runtime_error>(HasSubstr(message)));
         EXPECT_EQ(folder_.names(), before);

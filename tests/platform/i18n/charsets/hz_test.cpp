@@ -8,27 +8,18 @@
 #include <string>
 #include <string_view>
 
-#include "platform/i18n/codecvt.h"
+#include "tests/platform/i18n/conversions.h"
 #include "tests/platform/i18n/detection/corpus.h"
 
 namespace platform::i18n {
 namespace {
 
-using ::testing::EndsWith;
-using ::testing::ThrowsMessage;
-
 std::u16string decode(std::string_view bytes, bool strict = true) {
-    codecvt_string_to_ustring converter("HZ-GB-2312", strict);
-    return converter.do_convert(bytes.data(), bytes.size());
+    return i18n::decode("HZ-GB-2312", bytes, strict);
 }
 
 std::string encode(std::u16string_view text, bool strict = true) {
-    codecvt_ustring_to_string converter("HZ-GB-2312", strict);
-    return converter.do_convert(text.data(), text.size());
-}
-
-auto failsWith(const std::string& end) {
-    return ThrowsMessage<std::runtime_error>(EndsWith(end));
+    return i18n::encode("HZ-GB-2312", text, strict);
 }
 
 TEST(Hz, ShiftsBetweenAsciiAndRows) {

@@ -8,7 +8,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/i18n/codecvt.h"
+#include "tests/platform/i18n/conversions.h"
 #include "tests/platform/i18n/detection/corpus.h"
 
 namespace platform::i18n {
@@ -16,16 +16,6 @@ namespace {
 
 using std::string_view_literals::operator""sv;
 using std::string_literals::operator""s;
-
-std::u16string decode(const std::string& charset, std::string_view bytes, bool strict = true) {
-    codecvt_string_to_ustring converter(charset, strict);
-    return converter.do_convert(bytes.data(), bytes.size());
-}
-
-std::string encode(const std::string& charset, std::u16string_view text, bool strict = true) {
-    codecvt_ustring_to_string converter(charset, strict);
-    return converter.do_convert(text.data(), text.size());
-}
 
 TEST(ShiftJis, DecodesTheBytesThatItsTableExchangesToThemselves) {
     EXPECT_EQ(decode("Shift_JIS", "\x1A\x1C\x7F"), u"\x1A\x1C\x7F");

@@ -7,28 +7,12 @@
 #include <string>
 #include <string_view>
 
-#include "platform/i18n/codecvt.h"
+#include "tests/platform/i18n/conversions.h"
 
 namespace platform::i18n {
 namespace {
 
-using ::testing::EndsWith;
-using ::testing::ThrowsMessage;
 using std::string_view_literals::operator""sv;
-
-std::u16string decode(const std::string& charset, std::string_view bytes, bool strict = true) {
-    codecvt_string_to_ustring converter(charset, strict);
-    return converter.do_convert(bytes.data(), bytes.size());
-}
-
-std::string encode(const std::string& charset, std::u16string_view text, bool strict = true) {
-    codecvt_ustring_to_string converter(charset, strict);
-    return converter.do_convert(text.data(), text.size());
-}
-
-auto failsWith(const std::string& end) {
-    return ThrowsMessage<std::runtime_error>(EndsWith(end));
-}
 
 constexpr const char16_t* invisible[] = {u"\u200B", u"\uFEFF", u"\u200E",
                                          u"\uFE0F", u"\u2060", u"\U000E0001"};
