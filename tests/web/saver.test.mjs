@@ -184,7 +184,7 @@ test("a save that is refused though nobody else has saved is an error", async ()
   assert.equal(desk.saver.isUnsaved, true);
 });
 
-test("a document that was removed is saved anew when the person says so", async () => {
+test("a document that was removed is saved again when the person says so", async () => {
   const desk = new Desk().open();
   desk.decide = () => "mine";
   desk.type("two");

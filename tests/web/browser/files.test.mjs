@@ -23,7 +23,7 @@ browserTest("the keyboard goes through the tree, opens folders and files", async
   const { page } = await Session.start(t, { "a.txt": "one", "inner/c.txt": "three" });
   await row(page, "a.txt").waitFor();
   await page.locator(".tree").focus();
-  // The tree is drawn anew after a key, with the next frame.
+  // The tree is drawn again after a key, with the next frame.
   const becomesActive = (end) =>
     page.waitForFunction((end) => {
       const id = document.querySelector(".tree").getAttribute("aria-activedescendant");

@@ -14,7 +14,7 @@ const CHROMIUM = process.env.CHROMIUM || "/usr/bin/chromium";
 const IS_THERE = existsSync(CHROMIUM);
 
 const FLAGS = [
-  // Chromium refuses its sandbox to root, as whom tests run in containers.
+  // Chromium has no sandbox for root, the user of tests in containers.
   ...(process.getuid() === 0 ? ["--no-sandbox"] : []),
   ...["--disable-gpu", "--disable-quic", "--no-first-run", "--no-proxy-server"],
   ...["--disable-background-networking", "--disable-component-update", "--disable-sync"],
