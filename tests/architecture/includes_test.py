@@ -18,7 +18,11 @@ LIBRARIES = {
     'microhttpd.h': 'libmicrohttpd', 'nats': 'libnats', 'openssl': 'OpenSSL', 'simdjson.h': 'simdjson',
     'spdlog': 'spdlog', 'unicode': 'ICU',
 }
-SYSTEM = ('sys', 'linux', 'netinet', 'arpa')
+# What the system has: folders, and single headers. Those of C++ have no ending.
+SYSTEM = {
+    'sys', 'linux', 'netinet', 'arm_neon.h', 'dirent.h', 'dlfcn.h', 'emmintrin.h', 'fcntl.h', 'immintrin.h',
+    'limits.h', 'locale.h', 'malloc.h', 'netdb.h', 'poll.h', 'pthread.h', 'signal.h', 'stdlib.h', 'unistd.h',
+}
 UNRESTRICTED = ('tests/', 'benchmarks/', 'fuzz/', 'examples/')
 INCLUDE = re.compile(r'^\s*#\s*include\s+([<"])([^>"]+)[>"]', re.MULTILINE)
 
@@ -43,7 +47,7 @@ def arrow(names, kind, header):
         return max((name for name in names if header.startswith(name)), key=len, default=header)
     if first in LIBRARIES:
         return LIBRARIES[first]
-    is_open_to_all = first in SYSTEM or (first == header and not header.endswith('.hpp'))
+    is_open_to_all = first in SYSTEM or (first == header and '.' not in header)
     return None if is_open_to_all else header
 
 
