@@ -212,8 +212,8 @@ public:
         return client_->maxPayload(channel);
     }
 
-    // Nothing is held meanwhile for which others may wait here. So what is beyond the budget waits
-    // for all of it and goes on: the memory that was asked for is the most that may be needed.
+    // A thread that waits here holds nothing that others wait for. So one that asks for more than
+    // the budget gets all of it and goes on: what was asked for is only the most that may be used.
     void awaitMemory(std::size_t bytes) override {
         MemoryBudget& budget = *budgets_.documents;
         if (documentOfThread != nullptr) {

@@ -12,8 +12,8 @@
 
 namespace host {
 
-/// The memory that is shared out. A document waits for some while its request has some, so each has
-/// a budget of its own: nobody who has memory of the second waits for memory of the first.
+/// The memory that is shared out. A document waits for memory while its request holds some, so each
+/// has a budget of its own: nothing that holds memory for documents waits for memory for requests.
 struct RequestBudgets {
     RequestBudgets(std::size_t requestBytes, std::size_t documentBytes);
 

@@ -93,8 +93,8 @@ std::optional<std::uint64_t> bytesOf(const std::string& text) {
     return fits ? std::optional(number << shift) : std::nullopt;
 }
 
-// An option `name` for a number of bytes. `fault` says what is wrong with a number; nothing if
-// nothing is.
+// An option `name` for a number of bytes. `fault` says what is wrong with a number; it is empty
+// for a good one.
 void declareSize(CLI::App& command, const std::string& name, std::uint64_t& bytes,
                  const std::string& description,
                  const std::function<std::string(std::uint64_t)>& fault) {

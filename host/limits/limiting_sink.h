@@ -20,8 +20,8 @@ namespace host {
 /// escapes that terminals obey) and bytes that are no UTF-8 are written as \xNN.
 std::string asLine(std::string_view text);
 
-/// Passes log lines on to another sink, but of those of one logger and one level no more than so
-/// many in a period of time; the lines beyond are left out and counted. Their number is logged, as
+/// Passes log lines on to another sink, but only so many in a period of time from one logger at one
+/// level; the lines beyond are left out and counted. Their number is logged, as
 /// one more line of that logger and level, with the first line of any kind after the period, or by
 /// a flush. So a flood of one kind does not hide lines of another.
 ///

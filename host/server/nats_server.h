@@ -66,7 +66,7 @@ private:
     std::filesystem::path program_;
     const PrivateFolder& folder_;
     NatsConfiguration configuration_;  // The ports change until the server is first ready.
-    platform::Event stop_;             // The server is to be stopped.
+    platform::Event stop_;             // Set when the server has to stop.
     std::thread supervisor_;
 };
 

@@ -82,7 +82,7 @@ private:
     ListenAddress address_;
     HttpLimits limits_;
     platform::FileDescriptor socket_;
-    platform::Event stop_;  // The thread is to end.
+    platform::Event stop_;  // Set when the thread has to end.
     std::thread thread_;
 };
 

@@ -68,7 +68,7 @@ std::size_t decode(const char* text, std::size_t groups, char* bytes) {
         };
         const uint8x16x4_t values = {
             {valueOf(in.val[0]), valueOf(in.val[1]), valueOf(in.val[2]), valueOf(in.val[3])}};
-        // Of characters beyond ASCII, both tables know nothing.
+        // Characters beyond ASCII are in neither table.
         const uint8x16_t faults =
             vorrq_u8(vorrq_u8(vorrq_u8(values.val[0], values.val[1]),
                               vorrq_u8(values.val[2], values.val[3])),

@@ -139,7 +139,7 @@ private:
         return *item;
     }
 
-    // Of null nothing.
+    // A null item has none.
     static std::vector<const zip::Archive::Entry*> entriesOf(
         std::initializer_list<const Item*> items) {
         std::vector<const zip::Archive::Entry*> entries;
@@ -235,7 +235,7 @@ QuilletFileReader::QuilletFileReader(std::u16string path) : path_(std::move(path
 
 QuilletFileReader::~QuilletFileReader() = default;
 
-// What `work` gives of the package's file, which is opened if need be.
+// The result of `work` on the package's file, which is opened first unless it is open.
 template <class Work>
 auto QuilletFileReader::withFile(Work work) {
     const std::string path = filesystem::make_native_access_form_with_cleanup(path_);

@@ -89,8 +89,8 @@ OpenedFile openText(const std::string& path) {
     return opened;
 }
 
-/// The length in bytes of the text at `path`; 0 for what cannot be opened, whose size is nobody's
-/// business.
+/// The length in bytes of the text at `path`; 0 for what cannot be opened, so that its size is not
+/// given away.
 std::size_t lengthOf(const std::u16string& path) {
     const OpenedFile opened = openText(make_native_access_form_with_cleanup(path));
     return opened.descriptor ? static_cast<std::size_t>(opened.status.st_size) : 0;

@@ -155,7 +155,7 @@ std::vector<std::uint8_t> Serialization::decodePartContent(std::string content,
         // Without a comma the sum is 0, and all of it is taken for base64.
         const std::size_t body = content.find(',') + 1;
         const DataBuffer decoded = platform::base64decode(std::string_view(content).substr(body));
-        std::string().swap(content);  // an image shall not be held three times
+        std::string().swap(content);  // so that the image is not held three times
         return toBytes(decoded.view());
     }
     return toBytes(content);

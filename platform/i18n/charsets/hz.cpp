@@ -107,7 +107,7 @@ private:
         position_ += length;
     }
 
-    // Not a character begins here; it would have `length` bytes.
+    // No character begins here; one would have `length` bytes.
     void refuse(std::size_t length) {
         if (strict_ && length > bytes_.size() - position_) {
             throwTruncated(name_, position_);

@@ -45,7 +45,7 @@ public:
     }
 
 private:
-    // Where the place of `key` stands, or is to stand.
+    // The slot that holds the place of `key`, or the free one for it.
     std::uint32_t& placeOf(std::uint64_t key) {
         std::size_t slot = (key * 0x9E3779B97F4A7C15U >> 32U) & (places_.size() - 1);
         while (places_[slot] != 0 && entries_[places_[slot] - 1].key != key) {
