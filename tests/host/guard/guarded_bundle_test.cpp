@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <sys/xattr.h>
 #include <unistd.h>
 
@@ -14,11 +15,13 @@
 #include <mutex>
 #include <set>
 #include <string>
+#include <thread>
 #include <utility>
 #include <vector>
 
 #include "host/bus/bundle_host.h"
 #include "host/guard/document_version.h"
+#include "host/guard/guard.h"
 #include "host/guard/history.h"
 #include "host/guard/saves.h"
 #include "json/serialize.h"
@@ -42,6 +45,18 @@ using testing::UnorderedElementsAre;
 
 class GuardedBundle : public testing::Test {
 protected:
+    void SetUp() override { start(); }
+
+    void start() {
+        host_ = std::make_unique<host::BundleHost>(
+            SERIALIZATION_BUNDLE, std::size_t{1} << 28,
+            [this](const JsonMessage& message) {
+                const std::lock_guard lock(mutex_);
+                published_.emplace_back(message.payload());
+            },
+            host::Guard{history_, std::make_shared<host::Saves>(state_ / "locks", history_)});
+    }
+
     // What is published for a request with these members beside the usual ones.
     std::vector<std::string> write(const std::string& path, json::Value content,
                                    json::Object more = {}) {
@@ -55,9 +70,9 @@ protected:
     }
 
     std::vector<std::string> send(const std::string& request) {
-        host_.publish(platform::messaging::writeRequestChannel,
-                      platform::DataBuffer::copyOf(request));
-        host_.waitUntilIdle();
+        host_->publish(platform::messaging::writeRequestChannel,
+                       platform::DataBuffer::copyOf(request));
+        host_->waitUntilIdle();
         const std::lock_guard lock(mutex_);
         return std::exchange(published_, {});
     }
@@ -93,13 +108,39 @@ protected:
         host::HistoryOptions{state_ / "versions", {folder_.path()}});
     std::mutex mutex_;
     std::vector<std::string> published_;  // guarded by mutex_
-    host::BundleHost host_{SERIALIZATION_BUNDLE,
-                           std::size_t{1} << 28,
-                           [this](const JsonMessage& message) {
-                               const std::lock_guard lock(mutex_);
-                               published_.emplace_back(message.payload());
-                           },
-                           {history_, std::make_shared<host::Saves>(state_ / "locks", history_)}};
+    std::unique_ptr<host::BundleHost> host_;
+};
+
+// The bundle saves with the rights of a user who owns none of the files.
+class GuardedBundleOfAnotherUser : public GuardedBundle {
+protected:
+    void SetUp() override {
+        if (::geteuid() != 0) {
+            GTEST_SKIP() << "this user cannot become another one";
+        }
+        bool isOther = false;
+        // Threads inherit the rights of the one that starts them. These system calls change the
+        // calling thread's rights, the functions of the C library those of all threads.
+        std::thread([this, &isOther] {
+            isOther = ::syscall(SYS_setgroups, 0, nullptr) == 0 &&
+                      ::syscall(SYS_setresgid, nobody, nobody, nobody) == 0 &&
+                      ::syscall(SYS_setresuid, nobody, nobody, nobody) == 0;
+            start();
+        }).join();
+        ASSERT_TRUE(isOther);
+        writeFile(at("a.txt"), "old");
+        fs::permissions(at("a.txt"), fs::perms::all);
+    }
+
+    // Sets what this user may do in the folder.
+    void allow(mode_t mode) { ASSERT_EQ(::chmod(folder_.path().c_str(), mode), 0); }
+
+    static ino_t inodeOf(const std::string& path) {
+        struct stat status {};
+        return ::stat(path.c_str(), &status) == 0 ? status.st_ino : 0;
+    }
+
+    static constexpr uid_t nobody = 65534;
 };
 
 TEST_F(GuardedBundle, SavesANewTextAndTellsThatThereWasNone) {
@@ -208,6 +249,35 @@ TEST_F(GuardedBundle, WritesInPlaceWhereAFileIsAMountPoint) {
     EXPECT_EQ(readFile(at("mounted.txt")), "new");
     EXPECT_EQ(::umount2(at("a.txt").c_str(), MNT_DETACH), 0);
     EXPECT_EQ(readFile(at("a.txt")), "old");
+}
+
+TEST_F(GuardedBundleOfAnotherUser, WritesInPlaceWhereTheFolderTakesNoNewFile) {
+    allow(0755);
+    const ino_t before = inodeOf(at("a.txt"));
+    EXPECT_EQ(write(at("a.txt"), "new"), outcome(at("a.txt"), true, true));
+    EXPECT_EQ(readFile(at("a.txt")), "new");
+    EXPECT_EQ(inodeOf(at("a.txt")), before);
+    EXPECT_EQ(write(at("a.txt"), "\xFF"), outcome(at("a.txt"), true, false));
+    EXPECT_EQ(readFile(at("a.txt")), "new");
+}
+
+TEST_F(GuardedBundleOfAnotherUser, WritesInPlaceWhereTheOwnerCannotBeKept) {
+    allow(0777);
+    EXPECT_EQ(write(at("a.txt"), "new"), outcome(at("a.txt"), true, true));
+    EXPECT_EQ(readFile(at("a.txt")), "new");
+    struct stat status {};
+    ASSERT_EQ(::stat(at("a.txt").c_str(), &status), 0);
+    EXPECT_EQ(status.st_uid, 0U);
+    EXPECT_EQ(status.st_mode & 07777U, 0777U);
+    EXPECT_THAT(names(), ElementsAre("a.txt"));
+}
+
+TEST_F(GuardedBundleOfAnotherUser, SavesNothingThatMayNotBeWritten) {
+    allow(0777);
+    ASSERT_EQ(::chmod(at("a.txt").c_str(), 0644), 0);
+    EXPECT_EQ(write(at("a.txt"), "new"), outcome(at("a.txt"), true, false));
+    EXPECT_EQ(readFile(at("a.txt")), "old");
+    EXPECT_THAT(names(), ElementsAre("a.txt"));
 }
 
 TEST_F(GuardedBundle, AnswersAsTheBundleDoesWhereThereCanBeNoDocument) {
