@@ -140,7 +140,9 @@ std::string legacyCharset(std::string_view bytes) {
 // digits, are controls in EBCDIC, or nothing.
 std::string asciiLookingEbcdic(std::string_view bytes) {
     constexpr std::size_t headSize = 4096;
-    if (!detail::looksLikeEbcdic(bytes.substr(0, headSize))) {
+    // Nearly all text in ASCII has a blank near its beginning, and so costs next to nothing here.
+    const std::string_view head = bytes.substr(0, headSize);
+    if (head.find(' ') != std::string_view::npos || !detail::looksLikeEbcdic(head)) {
         return {};
     }
     const auto likely = detail::likeliestCharset(detail::charsetSample(bytes), bytes, {});
