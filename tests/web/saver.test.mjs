@@ -14,6 +14,7 @@ class Desk {
   view = "one";
   writes = [];
   conflicts = [];
+  saved = []; // as the view is told
   decide = () => undefined;
   write = async (content, base) => this.store(content, base);
 
@@ -35,6 +36,7 @@ class Desk {
       {
         content: async () => ({ kind: "text", content: this.view, encoding: "UTF-8" }),
         write: (content, base) => this.write(content, base),
+        saved: (content) => this.saved.push(content.content),
         load: async () => this.disk === undefined ? undefined : { path: "/t", version: this.versionOf(this.disk), answer: { status: true, data: this.disk } },
         replace: (theirs) => (this.view = theirs.answer.data),
         resolve: async (theirs) => {
@@ -74,6 +76,7 @@ test("what is typed during a save stays unsaved", async () => {
   await desk.saver.save();
   assert.equal(desk.disk, "two");
   assert.equal(desk.saver.isUnsaved, true);
+  assert.deepEqual(desk.saved, ["two"]);
 });
 
 test("one save is under way at a time, and of those wanted meanwhile the latest is made", async () => {

@@ -39,8 +39,11 @@ export interface DocumentView {
   /** Shows `loaded` instead, which somebody else saved; what is unsaved is given up. */
   replace(loaded: LoadedDocument): void;
 
-  /** Both sides beside each other, for a person to put together. */
-  compare(theirs: LoadedDocument): Comparison;
+  /** `content` is on disk now: what differs from it is unsaved. For views that tell what was changed. */
+  saved?(content: DocumentContent): void;
+
+  /** Both sides beside each other, for a person to put together. Rejects, saying why, where they cannot be shown. */
+  compare(theirs: LoadedDocument): Promise<Comparison>;
 
   focus(): void;
 
@@ -50,8 +53,10 @@ export interface DocumentView {
 
 export interface Comparison {
   readonly element: HTMLElement;
-  /** The view's content becomes what the comparison shows as the result. */
+  /** The view's content becomes what the comparison shows as the result. Throws where it has changed meanwhile. */
   apply(): void;
+  /** Lets go of what the comparison holds, applied or not. */
+  close(): void;
 }
 
 export interface Choice {

@@ -4,10 +4,9 @@ import assert from "node:assert/strict";
 import { writeFileSync } from "node:fs";
 import { join } from "node:path";
 
-import { temporaryFolder, waitFor } from "../../serve/processes.mjs";
-import { browserTest, Session } from "./harness.mjs";
+import { temporaryFolder } from "../../serve/processes.mjs";
+import { browserTest } from "./harness.mjs";
 import {
-  archive,
   BINARY,
   png,
   presentationFiles,
@@ -17,28 +16,7 @@ import {
   wordFiles,
   workbookFiles,
 } from "./office_files.mjs";
-
-async function open(t, name, files, options) {
-  const session = await Session.start(t, { [name]: archive(files) }, options);
-  session.page = await session.newPage(`&file=${encodeURIComponent(session.path(name))}`);
-  await session.page.locator(".package").waitFor();
-  return session;
-}
-
-// Saves, and waits until the file on disk is another one.
-async function save(session, name) {
-  const before = session.read(name);
-  await session.page.keyboard.press("Control+s");
-  await waitFor("the save", () => !session.read(name).equals(before));
-  return session.read(name);
-}
-
-const tab = (page, name) => page.getByRole("tab", { name, exact: true });
-
-async function openPart(page, name) {
-  await tab(page, "Parts").click();
-  await page.getByRole("treeitem", { name: new RegExp(`^${name}`) }).click();
-}
+import { open, openPart, save, tab } from "./package_page.mjs";
 
 // The targets, kinds and modes of a relationships file, in any order.
 function relationshipsIn(bytes) {

@@ -143,6 +143,33 @@ browserTest("a Japanese text with escape sequences is shown, and saved in UTF-8 
   assert.equal(session.read("mail.txt").toString(), `${text}\n!`);
 });
 
+browserTest("other texts with escapes are shown, and saved in UTF-8 after asking", async (t) => {
+  const files = { // as the host finds them, but for UTF-7, which is ASCII to all who are not told
+    "HZ-GB-2312": ["~{VPND~} hz\n~{VPNDND1>~}\n", "\u4e2d\u6587 hz"],
+    "ISO-2022-KR": ["\x1b$)C\x0eGQ19>n\x0f kr\n", "\ud55c\uad6d\uc5b4 kr"],
+    "ISO-2022-CN": ["\x1b$)A\x0eVPND\x0f cn\n", "\u4e2d\u6587 cn"],
+    "UTF-7": ["+Ti1lhw- utf7\n", "\u4e2d\u6587 utf7"],
+  };
+  const session = await Session.start(t, Object.fromEntries(Object.entries(files).map(([name, [bytes]]) => [`${name}.txt`, bytes])));
+  const { page } = session;
+  for (const [name, [, line]] of Object.entries(files)) {
+    await open(session, `${name}.txt`);
+    if (name === "UTF-7") {
+      await charset(page).selectOption(name);
+      assert.equal(await page.getByRole("dialog").getByRole("button", { name: "Save in" }).count(), 0);
+      await choose(page, `Read as ${name}`);
+    }
+    await charset(page).locator(`option:checked[value="${name}"]`).waitFor({ state: "attached" });
+    assert.equal(await editor(page).locator(".cm-line").first().textContent(), line);
+    await typeAtTheEnd(page, "\u00e4!");
+    await page.keyboard.press("Control+s");
+    await choose(page, "Save in UTF-8");
+    await page.locator(".tab.active .unsaved").waitFor({ state: "detached" });
+    const saved = session.read(`${name}.txt`).toString();
+    assert.ok(saved.startsWith(`${line}\n`) && saved.endsWith("\u00e4!"), saved);
+  }
+});
+
 browserTest("what is unsaved survives a reload, with charset and line ends", async (t) => {
   const session = await Session.start(t, { "german.txt": Buffer.concat([GERMAN, Buffer.from("a\r\nb\rc\n")]) });
   const { page } = session;

@@ -141,6 +141,27 @@ test("parts that differ are told, with who has changed them", () => {
   );
 });
 
+test("what was saved is what both have from then on", () => {
+  const model = new PackageModel({ parts: ["/a", "/b"].map((uri) => part(uri, "0")), relationships: [] });
+  model.edit(setting("/a", "1"));
+  const saved = model.document();
+  model.edit(setting("/b", "1")); // while the save is under way
+  model.saved(saved);
+  assert.deepEqual(model.changedParts(), ["/b"]);
+  assert.deepEqual(Object.keys(model.draft().parts), ["/b"]);
+  const theirs = { parts: [part("/a", "2"), part("/b", "0")], relationships: [] };
+  assert.deepEqual(
+    findDifferences(model, theirs).map(({ uri, changedBy }) => [uri, changedBy]),
+    [
+      ["/a", "theirs"],
+      ["/b", "mine"],
+    ],
+  );
+  model.undo();
+  model.undo();
+  assert.deepEqual(model.changedParts(), ["/a"]);
+});
+
 test("listeners hear of the parts that change, and of who changed them", () => {
   const model = new PackageModel(read());
   const heard = [];

@@ -98,6 +98,12 @@ class PackageComparison implements Comparison {
     this.use(combine(this.theirs, chosen, relationships));
   }
 
+  close(): void {
+    for (const row of this.#rows) {
+      row.close();
+    }
+  }
+
   #show(row: ComparedPart): void {
     for (const other of this.#rows) {
       other.element.classList.toggle("active", other === row);
@@ -149,6 +155,10 @@ class ComparedPart {
   /** Both editions of it, made when it is first looked at. */
   get detail(): HTMLElement {
     return (this.#detail ??= this.#isText() ? this.#texts() : this.#sides());
+  }
+
+  close(): void {
+    this.#merge?.view.destroy();
   }
 
   #isText(): boolean {

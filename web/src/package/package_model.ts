@@ -64,7 +64,7 @@ export class PackageModel {
     return this.#parts.get(uri);
   }
 
-  /** The part as it was before the first edit. */
+  /** The part as it was read or saved last. */
   originalPart(uri: string): Part | undefined {
     return this.#original.get(uri);
   }
@@ -78,9 +78,20 @@ export class PackageModel {
     return { parts: [...this.#parts.values()], relationships: this.#relationships };
   }
 
-  draft(): PackageDraft {
+  /** The names of the parts that are unsaved. */
+  changedParts(): string[] {
     const uris = [...new Set([...this.#parts.keys(), ...this.#original.keys()])];
-    const changed = uris.filter((uri) => this.isChanged(uri));
+    return uris.filter((uri) => this.isChanged(uri));
+  }
+
+  /** `document` is on disk now: what differs from it is unsaved. */
+  saved({ parts, relationships }: Document): void {
+    this.#original = new Map(parts.map((part) => [part.partUri, part]));
+    this.#originalRelationships = relationships;
+  }
+
+  draft(): PackageDraft {
+    const changed = this.changedParts();
     return {
       kind: "package",
       parts: Object.fromEntries(

@@ -25,7 +25,13 @@ export interface Panel {
   close(): void;
 }
 
-type PanelName = "text" | "parts" | "properties";
+interface Panels {
+  text: TextPanel;
+  parts: PartsPanel;
+  properties: PropertiesPanel;
+}
+
+type PanelName = keyof Panels;
 const PANELS: PanelName[] = ["text", "parts", "properties"];
 let views = 0;
 
@@ -34,7 +40,7 @@ export class PackageView implements DocumentView {
 
   #id = ++views;
   #model!: PackageModel;
-  #panels!: Record<PanelName, Panel>;
+  #panels!: Panels;
   #shown!: PanelName;
   #preview: Preview | undefined;
   #isClosed = false;
@@ -69,18 +75,34 @@ export class PackageView implements DocumentView {
     return { kind: "package", content: this.#model.document() };
   }
 
+  saved(content: DocumentContent): void {
+    if (content.kind === "package") {
+      const changed = this.#model.changedParts();
+      this.#model.saved(content.content);
+      this.#panels.parts.refresh(changed);
+    }
+  }
+
   draft(): PackageDraft {
     this.#commit();
     return this.#model.draft();
   }
 
   replace(loaded: LoadedDocument): void {
+    const hadFocus = this.element.contains(document.activeElement);
     this.#use(new PackageModel(documentOf(loaded)));
+    if (hadFocus) {
+      this.focus();
+    }
   }
 
-  compare(theirs: LoadedDocument): Comparison {
+  async compare(theirs: LoadedDocument): Promise<Comparison> {
     this.#commit();
-    return compareDocuments(this.#model, documentOf(theirs), this.page, (model) => {
+    const mine = this.#model;
+    return compareDocuments(mine, documentOf(theirs), this.page, (model) => {
+      if (this.#model !== mine) {
+        throw new Error(this.page.text("package.differences.meanwhile"));
+      }
       this.#use(model);
       this.page.changed();
     });
@@ -128,7 +150,7 @@ export class PackageView implements DocumentView {
   }
 
   #closePanels(): void {
-    for (const panel of Object.values(this.#panels)) {
+    for (const panel of Object.values(this.#panels) as Panel[]) {
       panel.close();
     }
     this.#preview?.close();

@@ -68,6 +68,13 @@ export class PartsPanel implements Panel {
     this.#stopListening();
   }
 
+  /** Shows anew in the outline what is said of `parts`. */
+  refresh(parts: Iterable<string>): void {
+    for (const uri of parts) {
+      this.#tree.refresh(uri);
+    }
+  }
+
   #mainPart(): string {
     const main = this.model.relationships.find(({ relationshipType }) => relationshipType.endsWith("/officeDocument"));
     const uri = main ? `/${main.target.replace(/^\//, "")}` : PACKAGE;
@@ -75,9 +82,7 @@ export class PartsPanel implements Panel {
   }
 
   #follow(parts: ReadonlySet<string>, editor: unknown): void {
-    for (const uri of parts) {
-      this.#tree.refresh(uri);
-    }
+    this.refresh(parts);
     if ([...parts].some((uri) => !this.model.part(uri))) {
       this.#tree.fill();
     }

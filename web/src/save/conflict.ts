@@ -3,6 +3,7 @@
 import type { DocumentView, LoadedDocument } from "../document_view.js";
 import { ask } from "../ui/dialog.js";
 import { text } from "../ui/text.js";
+import { askComparing } from "./comparing.js";
 
 /**
  * Asks whose version stays. "mine": what the view holds, in which both may have been put together; it is to be
@@ -35,22 +36,16 @@ export async function resolveConflict(
 }
 
 async function compare(name: string, view: DocumentView, theirs: LoadedDocument): Promise<"mine" | "theirs" | "back"> {
-  const comparison = view.compare(theirs);
-  const choice = await ask({
+  const choice = await askComparing(view, theirs, {
     title: text("conflict.title", { name }),
     message: text("conflict.compare.message"),
-    body: comparison.element,
     choices: [
-      { value: "back", label: text("action.back") },
+      { value: "", label: text("action.back") },
       theirsChoice(),
-      { value: "together", label: text("conflict.together"), isDefault: true },
+      { value: "apply", label: text("conflict.together"), isDefault: true },
     ],
   });
-  if (choice === "together") {
-    comparison.apply();
-    return "mine";
-  }
-  return choice === "theirs" ? "theirs" : "back";
+  return choice === "apply" ? "mine" : choice === "theirs" ? "theirs" : "back";
 }
 
 const later = () => ({ value: "", label: text("conflict.later") });

@@ -16,6 +16,8 @@ export interface SaveTarget {
   content(): Promise<DocumentContent | undefined>;
   /** Has it saved if the document still has the version `base`. Throws when no answer came. */
   write(content: DocumentContent, base: string): Promise<SaveResult>;
+  /** `content` is on disk now. */
+  saved(content: DocumentContent): void;
   /** What is saved now; nothing where there is no such file any more. */
   load(): Promise<LoadedDocument | undefined>;
   /** Shows what somebody else saved instead of what is unsaved. */
@@ -142,6 +144,7 @@ export class Saver {
 
   async #saved(edits: number, content: DocumentContent, { version }: SaveResult): Promise<void> {
     this.#savedEdits = edits;
+    this.target.saved(content);
     this.target.update();
     if (version !== undefined) {
       this.#basedOn(version);

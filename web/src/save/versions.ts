@@ -7,6 +7,7 @@ import { nameOf } from "../files/paths.js";
 import { ask } from "../ui/dialog.js";
 import { element } from "../ui/dom.js";
 import { bytesText, currentLanguage, text } from "../ui/text.js";
+import { askComparing } from "./comparing.js";
 
 /**
  * Lets a person look through the earlier versions of `present`, which `view` shows, and take one over into the
@@ -49,19 +50,14 @@ async function compare(
   view: DocumentView,
   version: EarlierVersion,
 ): Promise<boolean> {
-  const comparison = view.compare(await loadEarlier(client, present, version.time));
-  const choice = await ask({
+  const choice = await askComparing(view, await loadEarlier(client, present, version.time), {
     title: text("versions.compare.title", { name: nameOf(present.path), time: timeText(version.time) }),
     message: text("versions.compare.message"),
-    body: comparison.element,
     choices: [
       { value: "", label: text("action.back"), isDefault: true },
       { value: "apply", label: text("versions.apply") },
     ],
   });
-  if (choice === "apply") {
-    comparison.apply();
-  }
   return choice === "apply";
 }
 

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // The charsets by the writing that people know them for; what stands in no group is "other".
 export const CHARSET_GROUPS: Record<string, readonly string[]> = {
-  unicode: ["UTF-8", "UTF-16LE", "UTF-16BE", "UTF-32LE", "UTF-32BE"],
+  unicode: ["UTF-8", "UTF-16LE", "UTF-16BE", "UTF-32LE", "UTF-32BE", "UTF-7"],
   western: ["windows-1252", "ISO-8859-1", "ISO-8859-15", "IBM850", "IBM00858", "IBM437", "macintosh", "US-ASCII"],
   centralEuropean: ["windows-1250", "ISO-8859-2", "ISO-8859-16", "IBM852", "x-mac-centraleurroman"],
   cyrillic: ["windows-1251", "KOI8-R", "KOI8-U", "ISO-8859-5", "IBM866", "IBM855", "x-mac-cyrillic", "KZ-1048", "PTCP154"],
@@ -13,9 +13,15 @@ export const CHARSET_GROUPS: Record<string, readonly string[]> = {
   arabic: ["windows-1256", "ISO-8859-6"],
   vietnamese: ["windows-1258", "VISCII"],
   thai: ["windows-874"],
-  japanese: ["Shift_JIS", "x-Shift_JIS-nec", "x-Shift_JIS-ibm", "EUC-JP", "x-EUC-JP-nec"],
-  chinese: ["GB18030", "GBK", "Big5", "x-Big5-eten", "Big5-HKSCS", "EUC-TW"],
-  korean: ["EUC-KR", "Johab"],
+  japanese: [
+    ...["Shift_JIS", "x-Shift_JIS-nec", "x-Shift_JIS-ibm", "EUC-JP", "x-EUC-JP-nec"],
+    ...["ISO-2022-JP", "ISO-2022-JP-1", "ISO-2022-JP-2"],
+  ],
+  chinese: [
+    ...["GB18030", "GBK", "Big5", "x-Big5-eten", "Big5-HKSCS", "EUC-TW"],
+    ...["HZ-GB-2312", "ISO-2022-CN", "ISO-2022-CN-EXT"],
+  ],
+  korean: ["EUC-KR", "Johab", "ISO-2022-KR"],
 };
 
 /** Each group with those of `names` that are in it, and "other" with the rest. */

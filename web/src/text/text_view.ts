@@ -1,13 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 // A text in its tab: the editor and the status bar below it. Decoding needs the table of the charset, so
 // the editor appears when that is loaded.
-import { ChangeSet, Compartment, EditorSelection, EditorState } from "@codemirror/state";
+import { ChangeSet, Compartment, EditorSelection, EditorState, type StateEffect, type Text } from "@codemirror/state";
 import { EditorView, type ViewUpdate } from "@codemirror/view";
 import { bytesOf, stringOf } from "../../client/src/index.js";
 import type { Comparison, DocumentContent, DocumentView, LoadedDocument, Page } from "../document_view.js";
 import { nameOf } from "../files/paths.js";
 import { element } from "../ui/dom.js";
-import { ByteSink, type Charset, type Charsets, type Decoded } from "./charsets/index.js";
+import { ByteSink, type Charset, type Charsets, type Decoded, ESCAPED } from "./charsets/index.js";
 import { TextComparison } from "./comparison.js";
 import { type TextDraft, makeDraft } from "./draft.js";
 import { textEditor } from "./editor.js";
@@ -23,6 +23,14 @@ interface Source {
   charset: Charset;
   decoded: Decoded;
   byteOrderMark: boolean;
+}
+
+/** Where somebody is in a text. */
+interface Place {
+  line: number;
+  column: number;
+  scroll: StateEffect<unknown>;
+  hasFocus: boolean;
 }
 
 export class TextView implements DocumentView {
@@ -87,24 +95,28 @@ export class TextView implements DocumentView {
     this.#ready = this.#show(loaded);
   }
 
-  compare(theirs: LoadedDocument): Comparison {
-    const place = element("div");
-    let comparison: TextComparison | undefined;
-    const start = this.#view?.state.doc;
-    void this.#comparisonWith(theirs).then((made) => {
-      comparison = made;
-      place.replaceChildren(made?.element ?? "");
-    });
+  async compare(theirs: LoadedDocument): Promise<Comparison> {
+    await this.#ready;
+    const charset = theirs.readAs ?? theirs.charset ?? "UTF-8";
+    const source = await this.#sourceOf(theirs);
+    if (!source) {
+      throw new Error(this.page.text("text.unknownCharset", { charset }));
+    }
+    const view = this.#view;
+    if (!view) {
+      throw new Error(this.page.text("text.notShown"));
+    }
+    const start = view.state.doc;
+    const comparison = this.#comparisonOf(source, view.state);
     return {
-      element: place,
+      element: comparison.element,
       apply: () => {
-        if (!comparison || !this.#view || this.#view.state.doc !== start) {
-          throw new Error(this.page.text("text.loading"));
+        if (this.#view !== view || view.state.doc !== start) {
+          throw new Error(this.page.text("text.changedMeanwhile"));
         }
-        const effects = setFileForm.of(fileFormOf(comparison.result));
-        this.#view.dispatch({ changes: comparison.changes, effects });
-        comparison.close();
+        view.dispatch({ changes: comparison.changes, effects: setFileForm.of(fileFormOf(comparison.result)) });
       },
+      close: () => comparison.close(),
     };
   }
 
@@ -119,29 +131,32 @@ export class TextView implements DocumentView {
   }
 
   async #show(loaded: LoadedDocument): Promise<void> {
+    const place = this.#view && placeIn(this.#view);
     this.element.replaceChildren(element("p", { className: "waiting", role: "status" }, this.page.text("text.loading")));
     try {
-      const source = this.#draft ? await this.#sourceOfDraft(this.#draft) : await this.#source(loaded);
+      const source = this.#draft ? await this.#sourceOfDraft(this.#draft) : await this.#sourceOf(loaded);
       if (this.#isClosed || loaded !== this.loaded) {
         return;
       }
-      if (source) {
-        this.#edit(source);
-        await this.#applyDraft();
-        this.#status.offer(await this.charsets.names(), this.#view!.state);
+      if (!source) {
+        const charset = this.#draft?.baseCharset ?? loaded.readAs ?? loaded.charset ?? "UTF-8";
+        this.#refuse(this.page.text("text.unknownCharset", { charset }));
+        return;
       }
+      this.#edit(source, place);
+      await this.#applyDraft();
+      this.#status.offer([...(await this.charsets.names()), ...ESCAPED], this.#view!.state);
     } catch (error) {
       this.#refuse(this.page.text("text.failed", { reason: error instanceof Error ? error.message : String(error) }));
     }
   }
 
-  // Nothing when the charset is not known, which is told.
-  async #source(loaded: LoadedDocument): Promise<Source | undefined> {
+  // Nothing when the charset is not known.
+  async #sourceOf(loaded: LoadedDocument): Promise<Source | undefined> {
     const found = loaded.charset ?? "UTF-8";
     const name = loaded.readAs ?? found;
     const charset = await this.charsets.open(name);
     if (!charset) {
-      this.#refuse(this.page.text("text.unknownCharset", { charset: name }));
       return undefined;
     }
     let bytes = bytesOf(loaded.answer.data ?? "") as Uint8Array<ArrayBuffer>;
@@ -165,7 +180,8 @@ export class TextView implements DocumentView {
     return charset && { bytes, charset, decoded: charset.decode(bytes), byteOrderMark: draft.byteOrderMark };
   }
 
-  #edit({ bytes, charset, decoded, byteOrderMark }: Source): void {
+  // At `place`, where the text takes the place of another one.
+  #edit({ bytes, charset, decoded, byteOrderMark }: Source, place?: Place): void {
     const { doc, lineEnds } = splitLines(decoded.text);
     this.#base = new Blob([bytes]);
     this.#baseCharset = charset.name;
@@ -175,6 +191,7 @@ export class TextView implements DocumentView {
     this.#view = new EditorView({
       state: EditorState.create({
         doc,
+        ...(place && { selection: cursorAt(doc, place) }),
         extensions: [
           textEditor({ charset, byteOrderMark, lineEnds }, this.page, label),
           this.#wrapping.of([]),
@@ -182,6 +199,7 @@ export class TextView implements DocumentView {
           EditorView.updateListener.of((update) => this.#updated(update)),
         ],
       }),
+      ...(place && { scrollTo: place.scroll }),
     });
     const warning = this.page.text("text.damaged", { charset: charset.name });
     this.element.replaceChildren(
@@ -190,7 +208,7 @@ export class TextView implements DocumentView {
       this.#status.element,
     );
     this.#status.show(this.#view.state);
-    if (this.#wantsFocus) {
+    if (place?.hasFocus ?? this.#wantsFocus) {
       this.#view.focus();
     }
   }
@@ -237,12 +255,13 @@ export class TextView implements DocumentView {
   async #chooseCharset(name: string): Promise<void> {
     const view = this.#view!;
     const choices = [{ value: "reopen", label: this.page.text("text.choose.reopen", { charset: name }), isDefault: true }];
-    if (!view.state.readOnly) {
+    const isSaved = !view.state.readOnly && !ESCAPED.includes(name);
+    if (isSaved) {
       choices.push({ value: "save", label: this.page.text("text.choose.save", { charset: name }), isDefault: false });
     }
     const chosen = await this.page.ask({
       title: this.page.text("text.choose.title", { charset: name }),
-      message: this.page.text("text.choose.message", { charset: name }),
+      message: this.page.text(isSaved ? "text.choose.message" : "text.choose.message.read", { charset: name }),
       choices: [...choices, { value: "", label: this.page.text("text.cancel") }],
     });
     if (chosen === "reopen") {
@@ -321,21 +340,24 @@ export class TextView implements DocumentView {
     this.#isSettling = false;
   }
 
-  async #comparisonWith(theirs: LoadedDocument): Promise<TextComparison | undefined> {
-    const source = await this.#source(theirs);
-    if (!source || !this.#view) {
-      return undefined;
-    }
-    const { doc, lineEnds } = splitLines(source.decoded.text);
-    const form = { charset: source.charset, byteOrderMark: source.byteOrderMark, lineEnds };
+  #comparisonOf({ decoded, charset, byteOrderMark }: Source, mine: EditorState): TextComparison {
+    const { doc, lineEnds } = splitLines(decoded.text);
     const [theirLabel, myLabel] = [this.page.text("text.theirs"), this.page.text("text.mine")];
+    const form = { charset, byteOrderMark, lineEnds };
     return new TextComparison(
       { label: theirLabel, doc, extensions: textEditor(form, this.page, theirLabel) },
-      {
-        label: myLabel,
-        doc: this.#view.state.doc,
-        extensions: textEditor(fileFormOf(this.#view.state), this.page, myLabel),
-      },
+      { label: myLabel, doc: mine.doc, extensions: textEditor(fileFormOf(mine), this.page, myLabel) },
     );
   }
+}
+
+function placeIn(view: EditorView): Place {
+  const { head } = view.state.selection.main;
+  const { number, from } = view.state.doc.lineAt(head);
+  return { line: number, column: head - from, scroll: view.scrollSnapshot(), hasFocus: view.hasFocus };
+}
+
+function cursorAt(doc: Text, { line, column }: Place): EditorSelection {
+  const { from, to } = doc.line(Math.min(line, doc.lines));
+  return EditorSelection.single(Math.min(from + column, to));
 }

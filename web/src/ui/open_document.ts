@@ -45,6 +45,7 @@ export class OpenDocument {
   #saving: AbortController | undefined;
   #chosenCharset: { found: string | undefined; readAs: string } | undefined;
   #keeper: DraftKeeper;
+  #isBrowsing = false; // among earlier versions, which are compared with what is shown
 
   /** `draft`: what is unsaved of an earlier life of the page. */
   constructor(
@@ -134,7 +135,7 @@ export class OpenDocument {
   /** To be called when the file may have changed. */
   async follow(): Promise<void> {
     const saver = this.#saver;
-    if (!saver || saver.hasTheirs) {
+    if (!saver || saver.hasTheirs || this.#isBrowsing) {
       return;
     }
     try {
@@ -157,6 +158,7 @@ export class OpenDocument {
     if (!this.#view || !this.#loaded || !this.#saver) {
       return;
     }
+    this.#isBrowsing = true;
     try {
       const isRestored = await browseVersions(this.around.client, this.#loaded, this.#view);
       if (isRestored && (await this.#saver.followTheirs()) === "kept") {
@@ -164,7 +166,10 @@ export class OpenDocument {
       }
     } catch (error) {
       this.around.tell(this.#reasonOf(error), "problem");
+    } finally {
+      this.#isBrowsing = false;
     }
+    await this.follow(); // what somebody saved meanwhile
   }
 
   focus(): void {
@@ -226,6 +231,7 @@ export class OpenDocument {
       {
         content: () => this.#view!.content(),
         write: (content, base) => this.#write(content, base),
+        saved: (content) => this.#view!.saved?.(content),
         load: () => this.#present(),
         replace: (theirs) => {
           this.#loaded = theirs;

@@ -1,0 +1,121 @@
+// SPDX-License-Identifier: Apache-2.0
+// What is unsaved of an office document, and what becomes of it when somebody else has saved.
+import assert from "node:assert/strict";
+
+import { clientOf } from "./client.mjs";
+import { browserTest } from "./harness.mjs";
+import { png, textIn, unpack, wordFiles } from "./office_files.mjs";
+import { open, save, tab } from "./package_page.mjs";
+
+const NAME = "report.docx";
+const dialog = (page) => page.getByRole("dialog");
+const choiceOf = (page, part) => dialog(page).getByLabel(`${part}: which one to keep`);
+
+// Replaces a text everywhere in the document.
+async function replace(page, found, replacement) {
+  await tab(page, "Text").click();
+  await page.getByLabel("Find", { exact: true }).fill(found);
+  await page.getByLabel("Replace with").fill(replacement);
+  await page.getByRole("button", { name: "Replace all" }).click();
+  await page.getByText("0 found").or(page.getByText("Nothing found")).waitFor();
+}
+
+browserTest("the outline marks what is unsaved, until it is saved", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const { page } = session;
+  await replace(page, "Annual report", "Budget");
+  await tab(page, "Parts").click();
+  const marked = page.locator(".package-tree .package-changed");
+  assert.equal(await marked.count(), 2);
+  await save(session, NAME);
+  await marked.first().waitFor({ state: "detached" });
+  await page.getByRole("button", { name: "Undo" }).click();
+  await marked.first().waitFor();
+  await save(session, NAME);
+  await marked.first().waitFor({ state: "detached" });
+});
+
+// The page has changed the header and the main part; somebody else saves the main part, the image and a title.
+async function conflict(t) {
+  const session = await open(t, NAME, wordFiles());
+  const { page } = session;
+  await replace(page, "Annual report", "Budget");
+  const other = await clientOf(t, session);
+  const path = session.path(NAME);
+  const document = await other.read(path, "text/xml");
+  const changed = (uri, change) => {
+    const part = document.parts.find(({ partUri }) => partUri === uri);
+    assert.notEqual(change(part.content), part.content, uri);
+    part.content = change(part.content);
+  };
+  changed("/word/document.xml", (xml) => xml.replace("</w:body>", "<w:p><w:r><w:t>Theirs at the end</w:t></w:r></w:p></w:body>"));
+  changed("/docProps/core.xml", (xml) => xml.replace(/<dc:title>.*?<\/dc:title>/, "<dc:title>Their title</dc:title>"));
+  changed("/word/media/image1.png", () => `data:image/png;base64,${Buffer.from(png(40, 10, [0, 0, 200])).toString("base64")}`);
+  assert.equal(await other.write(path, document), true);
+  await page.locator(".mark.theirs").waitFor();
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByText("somebody else has saved").waitFor();
+  return { session, page };
+}
+
+const isSaved = (page) => page.locator(".mark").waitFor({ state: "detached" });
+
+browserTest("two editions of a document are compared part by part, and put together", async (t) => {
+  const { session, page } = await conflict(t);
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  // What only they have changed is theirs, and what only I have changed is mine, before anything is chosen.
+  assert.equal(await choiceOf(page, "/word/header1.xml").inputValue(), "mine");
+  assert.equal(await choiceOf(page, "/docProps/core.xml").inputValue(), "theirs");
+  assert.equal(await choiceOf(page, "/word/media/image1.png").inputValue(), "theirs");
+  await dialog(page).getByRole("button", { name: "/word/media/image1.png" }).click();
+  await dialog(page).getByRole("img", { name: "/word/media/image1.png: Theirs" }).waitFor();
+  // The part that both have changed: their last paragraph is brought over into mine.
+  await dialog(page).getByRole("button", { name: "/word/document.xml" }).click();
+  await dialog(page).locator(".cm-mergeView").hover();
+  await page.mouse.wheel(0, 10_000);
+  await dialog(page).locator(".cm-mergeView").getByText("Theirs at the end").waitFor();
+  const arrows = await dialog(page).getByRole("button", { name: "Take this change over from theirs" }).all();
+  const heights = await Promise.all(arrows.map(async (arrow) => (await arrow.boundingBox()).y));
+  await arrows[heights.indexOf(Math.max(...heights))].click();
+  assert.equal(await choiceOf(page, "/word/document.xml").inputValue(), "together");
+  await dialog(page).getByRole("button", { name: "Save put together" }).click();
+  await isSaved(page);
+  const saved = session.read(NAME);
+  assert.match(textIn(saved, "word/document.xml"), /The Budget<.*Theirs at the end</s);
+  assert.match(textIn(saved, "word/header1.xml"), /Budget/);
+  assert.match(textIn(saved, "docProps/core.xml"), /Their title/);
+  assert.ok(Buffer.from(unpack(saved)["word/media/image1.png"]).equals(png(40, 10, [0, 0, 200])));
+});
+
+browserTest("of two editions of a document, mine can be kept", async (t) => {
+  const { session, page } = await conflict(t);
+  await dialog(page).getByRole("button", { name: "Keep mine" }).click();
+  await isSaved(page);
+  const saved = session.read(NAME);
+  assert.match(textIn(saved, "word/document.xml"), /The Budget</);
+  assert.doesNotMatch(textIn(saved, "word/document.xml"), /Theirs/);
+  assert.doesNotMatch(textIn(saved, "docProps/core.xml"), /Their title/);
+});
+
+browserTest("of two editions of a document, theirs can be taken", async (t) => {
+  const { session, page } = await conflict(t);
+  const theirs = session.read(NAME);
+  await dialog(page).getByRole("button", { name: "Take theirs" }).click();
+  await isSaved(page);
+  assert.ok(session.read(NAME).equals(theirs));
+  await page.getByLabel("Find", { exact: true }).fill("Theirs at the end");
+  await page.getByText("1 found").waitFor();
+});
+
+browserTest("a comparison that is left changes nothing", async (t) => {
+  const { session, page } = await conflict(t);
+  const theirs = session.read(NAME);
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  await dialog(page).getByRole("button", { name: "/word/document.xml" }).click();
+  await dialog(page).locator(".cm-mergeView").waitFor();
+  await dialog(page).getByRole("button", { name: "Back" }).click();
+  await dialog(page).getByRole("button", { name: "Decide later" }).click();
+  await page.locator(".mark.unsaved").waitFor();
+  assert.equal(await page.locator(".cm-mergeView").count(), 0);
+  assert.ok(session.read(NAME).equals(theirs));
+});

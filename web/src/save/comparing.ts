@@ -1,0 +1,31 @@
+// SPDX-License-Identifier: Apache-2.0
+// A question that is answered while looking at a comparison.
+import type { Comparison, DocumentView, LoadedDocument } from "../document_view.js";
+import { type Question, ask } from "../ui/dialog.js";
+import { text } from "../ui/text.js";
+
+/**
+ * Asks `question` beside a comparison of what `view` holds with `theirs`. When the answer is "apply", the view takes
+ * over the comparison's result. Where the two cannot be compared that is told, and the answer is nothing.
+ */
+export async function askComparing(
+  view: DocumentView,
+  theirs: LoadedDocument,
+  question: Question,
+): Promise<string | undefined> {
+  let comparison: Comparison | undefined;
+  try {
+    comparison = await view.compare(theirs);
+    const choice = await ask({ ...question, body: comparison.element });
+    if (choice === "apply") {
+      comparison.apply();
+    }
+    return choice;
+  } catch (error) {
+    const message = error instanceof Error ? error.message : String(error);
+    await ask({ title: question.title, message, choices: [{ value: "", label: text("action.back"), isDefault: true }] });
+    return undefined;
+  } finally {
+    comparison?.close();
+  }
+}
