@@ -68,7 +68,8 @@ export class Session {
     session.expectedProblems = expectedProblems;
     test.after(() => session.#end()); // before the host ends, which the page would complain of
     session.host = await Host.start(test, ["--listen", "127.0.0.1:0", "--root", session.folder, ...hostOptions]);
-    session.context = await (await browser()).newContext({ locale: "en-US", ...contextOptions });
+    session.contextOptions = { locale: "en-US", ...contextOptions };
+    session.context = await session.#newContext();
     session.page = await session.newPage();
     return session;
   }
@@ -76,6 +77,7 @@ export class Session {
   constructor(test, files) {
     this.folder = join(temporaryFolder(test), "documents");
     this.problems = [];
+    this.contexts = [];
     mkdirSync(this.folder);
     for (const [name, content] of Object.entries(files)) {
       this.write(name, content);
@@ -99,7 +101,22 @@ export class Session {
 
   /** Another page in the same browser, which shares its storage with the others. */
   async newPage(fragment = "") {
-    const page = await this.context.newPage();
+    return this.#openPage(this.context, fragment);
+  }
+
+  /** The page of another person, in a browser window of its own: neither hides the other, and slows it down. */
+  async newWindow() {
+    return this.#openPage(await this.#newContext(), "");
+  }
+
+  async #newContext() {
+    const context = await (await browser()).newContext(this.contextOptions);
+    this.contexts.push(context);
+    return context;
+  }
+
+  async #openPage(context, fragment) {
+    const page = await context.newPage();
     page.setDefaultTimeout(30_000);
     page.on("pageerror", (error) => this.#note(`exception: ${error.stack ?? error}`));
     page.on("console", (message) => message.type() === "error" && this.#note(`console: ${message.text()}`));
@@ -127,7 +144,7 @@ export class Session {
   }
 
   async #end() {
-    await this.context?.close();
+    await Promise.all(this.contexts.map((context) => context.close()));
     if (this.problems.length > 0) {
       throw new Error(`the page had problems:\n${this.problems.join("\n")}`);
     }

@@ -28,6 +28,13 @@ async function type(page, typed) {
   await page.keyboard.type(typed);
 }
 
+// Puts `inserted` at the beginning of the text, which has the focus, at once.
+async function insert(page, inserted) {
+  await page.keyboard.press("Control+Home");
+  await page.keyboard.insertText(inserted);
+  await isUnsaved(page, "a.txt");
+}
+
 const isUnsaved = (page, name) => tab(page, name).locator(".mark.unsaved").waitFor();
 const isSaved = (page, name) => tab(page, name).locator(".mark.unsaved").waitFor({ state: "detached" });
 
@@ -63,7 +70,7 @@ browserTest("what somebody else saves is shown at once where nothing is unsaved"
 async function conflict(t) {
   const session = await Session.start(t, { "a.txt": "one\ntwo\nthree\n" });
   const { page: mine } = session;
-  const theirs = await session.newPage();
+  const theirs = await session.newWindow();
   await open(mine, "a.txt");
   await open(theirs, "a.txt");
   await type(mine, "mine ");
@@ -93,6 +100,7 @@ browserTest("of two pages, the second to save can take the other's", async (t) =
   const { session, mine } = await conflict(t);
   await dialog(mine).getByRole("button", { name: "Take theirs" }).click();
   await isSaved(mine, "a.txt");
+  await mine.locator(".cm-editor.cm-focused").waitFor(); // to type on at once
   assert.match(await shownText(mine), /^one\ntwo\nthree\ntheirs/);
   assert.equal(session.read("a.txt").toString(), "one\ntwo\nthree\ntheirs");
 });
@@ -111,6 +119,42 @@ browserTest("of two pages, the second to save can put both together", async (t) 
   assert.equal(session.read("a.txt").toString(), "mine one\ntwo\nthree\nand theirs\n");
 });
 
+browserTest("what cannot be compared is told, and the question is asked again", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" }, { expectedProblems: [/ERR_FAILED/] });
+  const { page } = session;
+  await session.context.route("**/charsets/koi8-r.bin", (route) => route.abort());
+  await open(page, "a.txt");
+  await type(page, "mine ");
+  // "Say more of these soft French loaves" in KOI8-R, which the page cannot get the table of.
+  const theirs = Buffer.from("d3ddc5dbd820d6c520c5ddc520dcd4c9c820cdd1c7cbc9c820c6d2c1cec3d5dad3cbc9c820c2d5cccfcb0a", "hex");
+  const other = await clientOf(t, session);
+  await other.write(session.path("a.txt"), theirs.toString("latin1"), { encoding: "KOI8-R" });
+  await tab(page, "a.txt").locator(".mark.theirs").waitFor();
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  await dialog(page).getByText(/Failed to fetch/).waitFor();
+  await dialog(page).getByRole("button", { name: "Back" }).click();
+  await dialog(page).getByRole("button", { name: "Keep mine" }).click();
+  await isSaved(page, "a.txt");
+  assert.equal(session.read("a.txt").toString(), "mine one\n");
+});
+
+browserTest("a draft does not outlive its save, when the page is left at once", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page } = session;
+  await open(page, "a.txt");
+  for (let round = 0; round < 5; ++round) {
+    await type(page, `r${round} `);
+    await page.evaluate(() => new Promise((resolve) => setTimeout(resolve, 245))); // a draft is about to be stored
+    await page.keyboard.press("Control+s");
+    await isSaved(page, "a.txt");
+    await page.reload();
+    await session.waitUntilConnected(page);
+    await text(page).waitFor();
+    assert.equal(await page.locator(".mark").count(), 0, `round ${round}`);
+  }
+});
+
 browserTest("a person can decide later, and nothing is lost", async (t) => {
   const { session, mine } = await conflict(t);
   await mine.keyboard.press("Escape");
@@ -122,24 +166,16 @@ browserTest("a person can decide later, and nothing is lost", async (t) => {
 
 browserTest("two pages that save at once overwrite nothing unseen", async (t) => {
   const session = await Session.start(t, { "a.txt": "start\n" });
-  const pages = [session.page, await session.newPage()];
+  const pages = [session.page, await session.newWindow()];
   for (const page of pages) {
     await open(page, "a.txt");
+    await text(page).click();
   }
   for (let race = 0; race < RACES; ++race) {
-    for (const [index, page] of pages.entries()) {
-      await type(page, `p${index}r${race} `);
-    }
+    await Promise.all(pages.map((page, index) => insert(page, `p${index}r${race} `)));
     await Promise.all(pages.map((page) => page.keyboard.press("Control+s")));
-    // One is saved; the other one is asked, and puts its own in the place of what it has seen.
-    const asked = await waitFor("who is asked", async () => {
-      for (const page of pages) {
-        if (await dialog(page).isVisible()) {
-          return page;
-        }
-      }
-      return undefined;
-    });
+    // One is saved; the other one is asked, and puts its own in the place of what it has seen, or takes that.
+    const asked = await Promise.any(pages.map((page) => dialog(page).waitFor().then(() => page)));
     const winner = pages[1 - pages.indexOf(asked)];
     await isSaved(winner, "a.txt");
     assert.ok(session.read("a.txt").toString().startsWith(`p${pages.indexOf(winner)}r${race} `), `race ${race}`);
