@@ -5,11 +5,9 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include <future>
 #include <random>
 #include <sstream>
 #include <stdexcept>
-#include <vector>
 
 #include "platform/i18n/codecvt.h"
 #include "platform/i18n/detection/legacy_charsets.h"
@@ -376,18 +374,6 @@ TEST(DetectCharset, SurvivesCodesOfCharactersThatTheCharsetDoesNotEncode) {
     for (int byte = 0x80; byte <= 0xFF; ++byte) {
         const std::string bytes = "?J\x8E" + std::string(1, static_cast<char>(byte));
         EXPECT_EQ(roundTrip(detect(bytes), bytes), bytes) << byte;
-    }
-}
-
-TEST(DetectCharset, MayBeCalledFromManyThreads) {
-    const std::string russian = encoded("ru", "KOI8-R");
-    const std::string japanese = encoded("ja", "EUC-JP");
-    std::vector<std::future<std::string>> answers;
-    for (int i = 0; i < 8; ++i) {
-        answers.push_back(std::async(std::launch::async, detect, i % 2 == 0 ? russian : japanese));
-    }
-    for (std::size_t i = 0; i < answers.size(); ++i) {
-        EXPECT_EQ(answers[i].get(), i % 2 == 0 ? "KOI8-R" : "EUC-JP");
     }
 }
 
