@@ -153,8 +153,8 @@ const CharacterTraits* allTraits() {
     return table.data();
 }
 
-Cost signCost(char16_t before, char16_t sign, char16_t after) {
-    const CharacterTraits& traits = traitsOf(sign);
+Cost signCost(const CharacterTraits* all, char16_t before, char16_t sign, char16_t after) {
+    const CharacterTraits& traits = all[sign];
     const unsigned rules = traits.signRules;
     if (traits.signBits >= controlBits) {
         return bits(traits.signBits);
@@ -165,8 +165,8 @@ Cost signCost(char16_t before, char16_t sign, char16_t after) {
     if (isBlank(before) && isBlank(after) && (rules & dash) != 0) {
         return bits(standingAloneBits);
     }
-    const CharacterTraits& left = traitsOf(before);
-    const CharacterTraits& right = traitsOf(after);
+    const CharacterTraits& left = all[before];
+    const CharacterTraits& right = all[after];
     if ((rules & boxDrawing) != 0) {
         if ((left.signRules & boxDrawing) != 0) {
             return bits(boxDrawingBits) / 2;

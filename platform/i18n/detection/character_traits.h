@@ -31,7 +31,7 @@ inline const CharacterTraits& traitsOf(char16_t c) {
 }
 
 /// The cost of the non-ASCII character `sign`, which is not a letter, between its neighbours; those
-/// are '\0' at the ends of the text.
-Cost signCost(char16_t before, char16_t sign, char16_t after);
+/// are '\0' at the ends of the text. `all` is what allTraits() returns.
+Cost signCost(const CharacterTraits* all, char16_t before, char16_t sign, char16_t after);
 
 }  // namespace platform::i18n::detail

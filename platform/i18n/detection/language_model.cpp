@@ -106,10 +106,7 @@ BigramModel::BigramModel(const LetterTable& table) : table_(&table) {
     }
 }
 
-BigramModel::Class BigramModel::classOf(char16_t c) const {
-    if (c < alphabetLimit) {
-        return classes_[c];
-    }
+BigramModel::Class BigramModel::classBeyondAlphabets(char16_t c) const {
     return traitsOf(c).isLetter ? foreignScript_ : Class{0};
 }
 

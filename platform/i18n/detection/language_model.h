@@ -25,7 +25,9 @@ public:
     /// Made from `table`, which must outlive it.
     explicit BigramModel(const LetterTable& table);
 
-    Class classOf(char16_t c) const;
+    Class classOf(char16_t c) const {
+        return c < alphabetLimit ? classes_[c] : classBeyondAlphabets(c);
+    }
 
     /// The cost of a letter of class `current` after one of class `before`, in whole; 0 where
     /// neither is a letter.
@@ -40,6 +42,8 @@ public:
 private:
     // The letters of alphabets lie below this, but for some presentation forms.
     static constexpr std::size_t alphabetLimit = 0x2000;
+
+    Class classBeyondAlphabets(char16_t c) const;
 
     const LetterTable* table_;
     std::size_t stride_;
@@ -96,6 +100,7 @@ Cost capitalCost(LetterCase before);
 template <class Characters>
 Cost costBesideWords(const TextCounts& counts, const Characters& characters,
                      const CharacterTraits* traits, Cost limit) {
+    const CharacterTraits* const all = allTraits();
     Cost cost = counts.asciiCost;
     for (const UnitPair& pair : counts.pairs) {
         if (traits[pair.current].letterCase == LetterCase::capital) {
@@ -104,8 +109,8 @@ Cost costBesideWords(const TextCounts& counts, const Characters& characters,
     }
     for (const UnitTriple& triple : counts.triples) {
         if (!traits[triple.current].isLetter) {
-            cost += triple.count * signCost(characters(triple.before), characters(triple.current),
-                                            characters(triple.after));
+            cost += triple.count * signCost(all, characters(triple.before),
+                                            characters(triple.current), characters(triple.after));
             if (cost > limit) {
                 break;
             }

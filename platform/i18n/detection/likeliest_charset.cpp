@@ -152,7 +152,8 @@ private:
     }
 
     void consider(const LegacyCharset& charset, Cost cost) {
-        if (cost < best_.cost) {
+        // Of two that cost the same, the commoner one, which stands first among all.
+        if (cost < best_.cost || (cost == best_.cost && &charset < best_.charset)) {
             best_ = {&charset, cost};
         }
     }
@@ -200,39 +201,46 @@ private:
         // The commonest pairs decide which candidates are worth pursuing, the rest which is best.
         const std::span<const UnitPair> pairs(counts.pairs);
         const std::size_t few = std::min<std::size_t>(pairs.size(), 64);
-        std::vector<Reading> readings = readingsOf(counts);
-        for (Reading& reading : readings) {
-            reading.cost += costIn(reading, pairs.first(few));
-        }
-        std::stable_sort(readings.begin(), readings.end(),
-                         [](const Reading& a, const Reading& b) { return a.cost < b.cost; });
-        for (const Reading& reading : readings) {
-            consider(*reading.charset, reading.cost + costIn(reading, pairs.subspan(few)));
+        // A value above what was left to the best when it was found out, where it is above that.
+        std::map<const LegacyCharset*, Cost> besideWords;
+        for (Reading& reading : readingsOf(pairs.first(few))) {
+            const auto [beside, isNew] = besideWords.try_emplace(reading.charset);
+            if (isNew) {
+                beside->second = besideWordsIn(reading, counts);
+            }
+            reading.cost += beside->second;
+            if (reading.cost <= best_.cost) {
+                consider(*reading.charset, reading.cost + costIn(reading, pairs.subspan(few)));
+            }
         }
     }
 
-    // The candidates that are not too expensive before any word is counted.
-    std::vector<Reading> readingsOf(const TextCounts& counts) const {
+    // The candidates with their costs but for those beside words, the cheapest first.
+    std::vector<Reading> readingsOf(std::span<const UnitPair> pairs) const {
         std::vector<Reading> readings;
         for (const LegacyCharset& charset : legacyCharsets()) {
             if (charset.kind() != CharsetKind::singleByte || !charset.decodes(values_) ||
                 isExcluded(charset)) {
                 continue;
             }
-            const auto characterOf = [&](char16_t byte) {
-                return byte == 0 ? u'\0' : charset.characterOf(byte);
-            };
             const Cost prior = priorOf(charset);
-            const Cost cost =
-                prior + costBesideWords(counts, characterOf, charset.traits(), best_.cost - prior);
-            if (cost > best_.cost) {
-                continue;
-            }
             for (const LegacyCharset::Language& language : charset.languages()) {
-                readings.push_back({&charset, &language, cost + priors_.of(*language.model)});
+                Reading& reading = readings.emplace_back(
+                    Reading{&charset, &language, prior + priors_.of(*language.model)});
+                reading.cost += costIn(reading, pairs);
             }
         }
+        std::stable_sort(readings.begin(), readings.end(),
+                         [](const Reading& a, const Reading& b) { return a.cost < b.cost; });
         return readings;
+    }
+
+    Cost besideWordsIn(const Reading& reading, const TextCounts& counts) const {
+        const auto characterOf = [&](char16_t byte) {
+            return byte == 0 ? u'\0' : reading.charset->characterOf(byte);
+        };
+        return costBesideWords(counts, characterOf, reading.charset->traits(),
+                               best_.cost - reading.cost);
     }
 
     Cost costIn(const Reading& reading, std::span<const UnitPair> pairs) const {
