@@ -11,10 +11,12 @@
 
 #include <chrono>
 #include <filesystem>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <set>
 #include <string>
+#include <system_error>
 #include <thread>
 #include <utility>
 #include <vector>
@@ -45,16 +47,20 @@ using testing::UnorderedElementsAre;
 
 class GuardedBundle : public testing::Test {
 protected:
-    void SetUp() override { start(); }
+    void SetUp() override { start(history_); }
 
-    void start() {
+    // Whatever is published is preceded by a call of `atPublication`.
+    void start(
+        const std::shared_ptr<host::History>& history,
+        std::function<void()> atPublication = [] {}) {
         host_ = std::make_unique<host::BundleHost>(
             SERIALIZATION_BUNDLE, std::size_t{1} << 28,
-            [this](const JsonMessage& message) {
+            [this, atPublication = std::move(atPublication)](const JsonMessage& message) {
+                atPublication();
                 const std::lock_guard lock(mutex_);
                 published_.emplace_back(message.payload());
             },
-            host::Guard{history_, std::make_shared<host::Saves>(state_ / "locks", history_)});
+            host::Guard{history, std::make_shared<host::Saves>(state_ / "locks", history)});
     }
 
     // What is published for a request with these members beside the usual ones.
@@ -125,7 +131,7 @@ protected:
             isOther = ::syscall(SYS_setgroups, 0, nullptr) == 0 &&
                       ::syscall(SYS_setresgid, nobody, nobody, nobody) == 0 &&
                       ::syscall(SYS_setresuid, nobody, nobody, nobody) == 0;
-            start();
+            start(history_);
         }).join();
         ASSERT_TRUE(isOther);
         writeFile(at("a.txt"), "old");
@@ -385,6 +391,25 @@ TEST_F(GuardedBundle, KeepsWhatSavesReplace) {
     ASSERT_EQ(versions.size(), 2U);
     const FileDescriptor newest = history_->open(document, versions[0].time);
     EXPECT_EQ(readFile("/proc/self/fd/" + std::to_string(newest.get())), "two");
+}
+
+// To delete a large file takes time, for which no client should wait.
+TEST_F(GuardedBundle, DeletesWhatASaveReplacedAfterItsAnswer) {
+    writeFile(at("a.txt"), "old");
+    const auto isStillThere = [old = at("a.txt") + " (deleted)"] {
+        const fs::directory_iterator open("/proc/self/fd");
+        return std::any_of(begin(open), end(open), [&](const fs::directory_entry& entry) {
+            std::error_code ignored;
+            return fs::read_symlink(entry, ignored) == old;
+        });
+    };
+    std::vector<bool> wasThere;
+    host_.reset();
+    start(nullptr, [&] { wasThere.push_back(isStillThere()); });
+    EXPECT_EQ(write(at("a.txt"), "new"), outcome(at("a.txt"), true, true));
+    EXPECT_THAT(wasThere, ElementsAre(true, true));
+    EXPECT_FALSE(isStillThere());
+    host_.reset();
 }
 
 TEST_F(GuardedBundle, RemovesWhatKilledSavesLeftADayAgo) {
