@@ -84,7 +84,7 @@ REPETITIONS = "REPETITIONS"
 AHEAD = Ratio(1, text="ahead of all")
 
 # As in the service's unit; for the peers, too.
-LARGE_PAGES = {"GLIBC_TUNABLES": "glibc.malloc.hugetlb=1"}
+HUGE_PAGES = {"GLIBC_TUNABLES": "glibc.malloc.hugetlb=1"}
 
 SECTIONS = {
     "json": Section(
@@ -202,7 +202,7 @@ def results_of(section, repetitions, root=ROOT, only_ours=False):
         command = command_of(program, repetitions, root, section.ours if only_ours else "")
         print("== " + " ".join(command), file=sys.stderr)
         output = subprocess.run(command, cwd=root, check=True, stdout=subprocess.PIPE, text=True,
-                                env=os.environ | LARGE_PAGES).stdout
+                                env=os.environ | HUGE_PAGES).stdout
         repetitions_of_all = [result for result in json.loads(output)["benchmarks"]
                               if result.get("run_type", "iteration") == "iteration"]
         for result in repetitions_of_all:
