@@ -1,16 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 // A client of the bundle over NATS, as a browser would be one: nats-core over WebSocket.
-import WebSocket from "../../web/node_modules/ws/wrapper.mjs";
 import { TimeoutError, wsconnect } from "../../web/node_modules/@nats-io/nats-core/lib/mod.js";
+import "./web_socket.mjs";
 
 export const READ_REQUEST = "/zpr/service/readRequest_cpp";
 export const READ_RESPONSE = "/zpr/service/readResponse/";
 export const WRITE_REQUEST = "/zpr/service/writeRequest_cpp";
 export const WRITE_RESPONSE = "/zpr/service/writeResponse/";
 export const NOTIFICATION = "/zpr/service/notifyFileSystemRequest";
-
-// Browsers have it; Node.js before version 22 has not.
-globalThis.WebSocket = WebSocket;
 
 // Takes "ws://user:password@host:port" apart.
 export function parseUrl(url) {

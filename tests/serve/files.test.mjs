@@ -6,12 +6,10 @@ import { mkdirSync, readFileSync, writeFileSync } from "node:fs";
 import { join } from "node:path";
 import { test } from "node:test";
 
-import WebSocket from "../../web/node_modules/ws/wrapper.mjs";
 import { FilesError, connect, textOf, utf8 } from "../../web/client/dist/index.js";
 import { parseUrl } from "./client.mjs";
 import { Host, temporaryFolder, waitFor } from "./processes.mjs";
-
-globalThis.WebSocket = WebSocket; // Node.js before version 22 has none
+import "./web_socket.mjs";
 
 async function start(test) {
   const folder = temporaryFolder(test);

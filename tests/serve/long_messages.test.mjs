@@ -7,14 +7,12 @@ import { join } from "node:path";
 import { test } from "node:test";
 import { setTimeout as sleep } from "node:timers/promises";
 
-import WebSocket from "../../web/node_modules/ws/wrapper.mjs";
 import { headers } from "../../web/client/node_modules/@nats-io/nats-core/lib/mod.js";
 import { AskAgain, connect, utf8 } from "../../web/client/dist/index.js";
 import { parseUrl } from "./client.mjs";
 import { MessageServer } from "./message_server.mjs";
 import { Host, IS_SANITIZED, temporaryFolder, waitFor } from "./processes.mjs";
-
-globalThis.WebSocket = WebSocket; // Node.js before version 22 has none
+import "./web_socket.mjs";
 
 const MEGABYTES = IS_SANITIZED ? 5 : 60;
 

@@ -4,11 +4,9 @@ import { readFileSync, writeFileSync } from "node:fs";
 import { createServer } from "node:net";
 import { join } from "node:path";
 
-import WebSocket from "../../web/node_modules/ws/wrapper.mjs";
 import { connect } from "../../web/client/dist/index.js";
 import { HOST, Program, ROOT, waitFor } from "./processes.mjs";
-
-globalThis.WebSocket = WebSocket; // Node.js before version 22 has none
+import "./web_socket.mjs";
 
 export async function freePorts(count) {
   const servers = Array.from({ length: count }, () => createServer().listen(0, "127.0.0.1"));

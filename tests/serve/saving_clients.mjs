@@ -10,10 +10,8 @@ import { readFileSync, rmSync } from "node:fs";
 import { join } from "node:path";
 import { setTimeout as sleep } from "node:timers/promises";
 
-import WebSocket from "../../web/node_modules/ws/wrapper.mjs";
 import { connect } from "../../web/client/dist/index.js";
-
-globalThis.WebSocket = WebSocket; // Node.js before version 22 has none
+import "./web_socket.mjs";
 
 const [url, folder, name, count, megabytes] = process.argv.slice(2);
 const text = randomBytes((megabytes * 750_000) | 0).toString("base64");

@@ -1,10 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 // Somebody else, who saves while a page is open: the client library under Node.js.
-import WebSocket from "../../../web/node_modules/ws/wrapper.mjs";
 import { connect } from "../../../web/client/dist/index.js";
 import { parseUrl } from "../../serve/client.mjs";
-
-globalThis.WebSocket = WebSocket; // Node.js before version 22 has none
+import "../../serve/web_socket.mjs";
 
 /** A client of the session's host. */
 export async function clientOf(test, session) {
