@@ -34,3 +34,12 @@ function(project_bundle target)
     target_link_options(${target} PRIVATE "LINKER:--no-undefined")
   endif()
 endfunction()
+
+# project_uses_bundle(<target>)
+#
+# Has the project's bundle built before <target>, whose sources get its file as SERIALIZATION_BUNDLE.
+function(project_uses_bundle target)
+  add_dependencies(${target} com_vorplanex_serialization)
+  target_compile_definitions(${target} PRIVATE
+    SERIALIZATION_BUNDLE="$<TARGET_FILE:com_vorplanex_serialization>")
+endfunction()
