@@ -135,9 +135,9 @@ std::string legacyCharset(std::string_view bytes) {
     return otherwise;
 }
 
-// The EBCDIC charset of a text that is ASCII by its bytes, as letters of Hebrew are there; empty
-// when it costs less as ASCII. Lists of e-mail addresses do: most small letters of ASCII, and all its
-// digits, are controls in EBCDIC, or nothing.
+// The EBCDIC charset of a text that is ASCII by its bytes, as Hebrew without digits is; empty when
+// the text costs less as ASCII. Real ASCII costs far more in EBCDIC: its digits, line ends and most
+// of its small letters are controls or nothing there.
 std::string asciiLookingEbcdic(std::string_view bytes) {
     constexpr std::size_t headSize = 4096;
     // Nearly all text in ASCII has a blank near its beginning, and so costs next to nothing here.
