@@ -5,6 +5,7 @@ import { writeFileSync } from "node:fs";
 import { join } from "node:path";
 
 import { temporaryFolder } from "../../serve/processes.mjs";
+import { faults, outOfReach } from "./accessibility.mjs";
 import { browserTest } from "./harness.mjs";
 import {
   BINARY,
@@ -206,6 +207,48 @@ browserTest("the preview shows the document and follows what is edited", async (
   await preview.getByText("The Budget of 2026").waitFor();
   await page.getByRole("button", { name: "Preview" }).click();
   assert.equal(await page.locator("iframe").count(), 0);
+});
+
+// What there is to see of a document, one after the other.
+async function* views(page) {
+  await page.locator(".package-paragraphs p").first().waitFor();
+  yield "its text";
+  await page.getByLabel("Find", { exact: true }).fill("report");
+  await page.locator(".package-paragraphs mark").first().waitFor();
+  yield "what was found";
+  for (const name of ["document.xml", "image1.png"]) {
+    await openPart(page, name);
+    yield name;
+  }
+  await page.getByRole("treeitem", { name: /^The package itself/ }).click();
+  yield "the package itself";
+  await tab(page, "Properties").click();
+  yield "its properties";
+  await page.getByRole("button", { name: "Preview" }).click();
+  await page.frameLocator("iframe[title=Preview]").getByText("of 2026").waitFor();
+  yield "its preview";
+}
+
+for (const colorScheme of ["light", "dark"]) {
+  browserTest(`axe finds nothing in the ${colorScheme} views of a document`, async (t) => {
+    const { page } = await open(t, "report.docx", wordFiles(), { colorScheme, viewport: { width: 1000, height: 700 } });
+    for await (const view of views(page)) {
+      assert.deepEqual(await faults(page), [], view);
+    }
+  });
+}
+
+browserTest("at a width of 360 pixels every view of a document is in reach", async (t) => {
+  const { page } = await open(t, "report.docx", wordFiles(), { viewport: { width: 360, height: 640 } });
+  for await (const view of views(page)) {
+    assert.deepEqual(await outOfReach(page), [], view);
+    assert.equal(await page.evaluate(() => document.documentElement.scrollWidth), 360, view);
+  }
+  await openPart(page, "document.xml");
+  const editor = page.locator(".package-pane > .cm-editor");
+  await editor.scrollIntoViewIfNeeded();
+  const { height } = await editor.boundingBox();
+  assert.ok(height > 300, `${height} pixels for a part's text`);
 });
 
 browserTest("a hostile document does nothing", async (t) => {

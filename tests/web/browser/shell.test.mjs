@@ -1,14 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 // The page around the documents: connection, tabs, links, languages, colours, small windows, screen readers.
 import assert from "node:assert/strict";
-import { readFileSync } from "node:fs";
-import { createRequire } from "node:module";
-import { join } from "node:path";
 
-import { ROOT } from "../../serve/processes.mjs";
+import { faults } from "./accessibility.mjs";
 import { browserTest, Session } from "./harness.mjs";
-
-const AXE = readFileSync(createRequire(join(ROOT, "web/package.json")).resolve("axe-core/axe.min.js"), "utf8");
 
 const row = (page, name) => page.locator(".tree .row", { has: page.getByText(name, { exact: true }) });
 const tab = (page, name) => page.getByRole("tab", { name });
@@ -16,13 +11,6 @@ const tab = (page, name) => page.getByRole("tab", { name });
 async function open(page, name) {
   await row(page, name).click();
   await page.locator(".panel:not([hidden]) .cm-content").waitFor();
-}
-
-// What axe finds fault with on the page as it is.
-async function faults(page) {
-  await page.evaluate(AXE);
-  const { violations } = await page.evaluate(() => window.axe.run());
-  return violations.map(({ id, nodes }) => `${id}: ${nodes.map((node) => node.html).join(" ")}`);
 }
 
 // The address of the page with another word in its fragment.

@@ -9,6 +9,8 @@ import { byName, sizeOf, textOf } from "./part_kinds.js";
 /** Stands in the tree for the package itself. */
 export const PACKAGE = "/";
 
+let folders = 0;
+
 export class PartTree {
   readonly element = element("ul", { role: "tree", className: "package-tree" });
 
@@ -80,15 +82,17 @@ export class PartTree {
       group.append(element("ul", { role: "none" }, ...items));
       return group;
     }
-    const label = element("span", { className: "package-folder" }, textOf(name));
-    const folder = element("li", {
+    const group = element("ul", { role: "group", id: `package-folder-${++folders}` }, ...items);
+    const label = element("span", {
       role: "treeitem",
+      className: "package-folder",
       "aria-expanded": "true",
-      "aria-label": textOf(name),
+      "aria-level": 1,
+      "aria-owns": group.id,
       tabIndex: -1,
     });
-    folder.append(label, element("ul", { role: "group" }, ...items));
-    return folder;
+    label.textContent = textOf(name);
+    return element("li", { role: "none" }, label, group);
   }
 
   #item(uri: string, label: string, level: number): HTMLElement {
@@ -131,7 +135,7 @@ export class PartTree {
 
   #expand(folder: HTMLElement, isExpanded: boolean): void {
     folder.setAttribute("aria-expanded", String(isExpanded));
-    folder.querySelector("ul")!.hidden = !isExpanded;
+    (folder.nextElementSibling as HTMLElement).hidden = !isExpanded;
   }
 
   #moveByKey(event: KeyboardEvent): void {
@@ -158,7 +162,7 @@ export class PartTree {
       next = isExpanded ? items[index + 1] : undefined;
       this.#expand(current, true);
     } else if (event.key === "ArrowLeft") {
-      next = isFolder ? undefined : (current.parentElement?.closest<HTMLElement>("[role=treeitem]") ?? undefined);
+      next = isFolder ? undefined : folderOf(current);
       if (isFolder) {
         this.#expand(current, false);
       }
@@ -175,6 +179,11 @@ export class PartTree {
   }
 }
 
+function folderOf(part: HTMLElement): HTMLElement | undefined {
+  const label = part.parentElement?.previousElementSibling;
+  return label instanceof HTMLElement && label.role === "treeitem" ? label : undefined;
+}
+
 function itemName(item: HTMLElement): string {
-  return (item.querySelector(".package-name, .package-folder")?.textContent ?? item.textContent ?? "").toLowerCase();
+  return (item.querySelector(".package-name") ?? item).textContent!.toLowerCase();
 }

@@ -7,7 +7,7 @@ import type { Panel } from "./package_view.js";
 import { PROPERTIES, propertyEdit, readProperties, type PropertyName } from "./properties.js";
 
 export class PropertiesPanel implements Panel {
-  readonly element = element("form", { className: "package-properties" });
+  readonly element = element("div", { className: "package-properties" });
 
   #fields = new Map<PropertyName, HTMLInputElement | HTMLTextAreaElement>();
   #problem: HTMLElement;
@@ -26,7 +26,6 @@ export class PropertiesPanel implements Panel {
       this.#fields.set(name, field);
       this.element.append(element("label", {}, page.text(`package.properties.${name}`), field));
     }
-    this.element.addEventListener("submit", (event) => event.preventDefault());
     this.#stopListening = model.listen((_parts, editor) => editor === this || this.show());
   }
 

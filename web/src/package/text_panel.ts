@@ -219,7 +219,7 @@ export class TextPanel implements Panel {
       const entry = this.#entries[this.#listed]!;
       if (entry.uri !== this.#heading) {
         this.#heading = entry.uri;
-        made.push(element("h3", { title: textOf(entry.uri) }, this.#nameOf(entry.uri)));
+        made.push(element("h2", { title: textOf(entry.uri) }, this.#nameOf(entry.uri)));
       }
       made.push(this.#paragraph(entry));
     }

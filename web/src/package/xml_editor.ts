@@ -30,6 +30,8 @@ export function editorBasics(isXml: boolean, length: number): Extension[] {
     bracketMatching(),
     ...(isXml && length < LONGEST_COLOURED ? [xml(), foldGutter(), syntaxHighlighting(COLOURS)] : []),
     EditorView.lineWrapping,
+    // The browser gives it the focus without that, but not every program that looks for what can have it knows.
+    EditorView.contentAttributes.of({ tabindex: "0" }),
   ];
 }
 

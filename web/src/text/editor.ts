@@ -30,6 +30,7 @@ export function textEditor(form: FileForm, page: Page, label: string): Extension
     // Escape, and then Tab, leaves the editor.
     keymap.of([{ key: "Tab", run: insertTab }, ...searchKeymap, ...historyKeymap, ...defaultKeymap]),
     EditorState.phrases.of(PHRASES[document.documentElement.lang] ?? {}),
-    EditorView.contentAttributes.of({ "aria-label": label }),
+    // The browser gives it the focus without the index, but not every program that looks for what can have it knows.
+    EditorView.contentAttributes.of({ "aria-label": label, tabindex: "0" }),
   ];
 }
