@@ -13,7 +13,7 @@ namespace platform::text {
 inline std::string quoted(std::string_view text) {
     std::string result = "\"";
     for (const char c : text) {
-        result += c >= '\0' && c < ' ' ? '?' : c;
+        result += static_cast<unsigned char>(c) < ' ' ? '?' : c;
     }
     return result += '"';
 }
