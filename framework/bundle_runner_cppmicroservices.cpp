@@ -9,6 +9,7 @@
 
 #include <chrono>
 #include <exception>
+#include <new>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -33,8 +34,10 @@ public:
             framework_.Stop();
             framework_.WaitForStop(std::chrono::milliseconds::zero());  // however long it takes
         } catch (const std::exception&) {
-            // It stops on a thread of its own, which the system may refuse. What is left running
-            // has no subscriptions any more and ends with the process.
+            // It stops on a thread of its own, which the system may refuse; its destructor would
+            // try again and, failing, end the process. So it stays until the process ends by
+            // itself.
+            static_cast<void>(new (std::nothrow) cppmicroservices::Framework(framework_));
         }
     }
 
