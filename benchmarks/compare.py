@@ -36,7 +36,10 @@ def checkout(commit, folder):
 
 
 def figures_of(section, root):
-    """One value for each of our figures: {(what, input, unit): (value, whether more is better)}."""
+    """One value for each of our figures: {(what, input, unit): (value, whether more is better)}. None
+    where the sources in `root` lack one of the section's programs."""
+    if not all(run.is_built(program, root) for program in section.programs):
+        return {}
     results = run.results_of(section, 1, root, only_ours=True)
     values = {}
     for row in section.rows:
@@ -120,4 +123,5 @@ def main():
         sys.exit(1 if report(values, more_is_better, old, new) else 0)
 
 
-main()
+if __name__ == "__main__":
+    main()

@@ -129,6 +129,9 @@ SECTIONS = {
             Row("write_text", "MB/s", []),
             Row("small_request", "µs more than an empty handler", [Limit(20, "below 20 µs")]),
         ]),
+    "detection": Section(
+        programs=["detection_benchmark"],
+        rows=[Row("tell a charset", "ms", [Limit(0.5, "0.5 ms")])]),
     "document_growth": Section(
         programs=["growth_benchmark"],
         order=("what", "who", "input"),
@@ -191,6 +194,12 @@ def command_of(program, repetitions, root, only):
     return [str(root / BUILD.relative_to(ROOT) / "bin" / program), f"--benchmark_repetitions={repetitions}",
             "--benchmark_enable_random_interleaving=true", "--benchmark_format=json",
             "--benchmark_min_time=0.1"] + ([f"--benchmark_filter=/{only}(/|$)"] if only else [])
+
+
+def is_built(program, root):
+    """Whether a program of the sources in `root` is there; those of other languages always are."""
+    command = command_of(program, 1, root, "")
+    return not command[0].startswith(str(root)) or pathlib.Path(command[0]).exists()
 
 
 def results_of(section, repetitions, root=ROOT, only_ours=False):
