@@ -55,7 +55,7 @@ int main(int argc, char** argv) {
              {"taiwanese", "zh-Hant"},
              {"korean", "ko"},
          }) {
-        benchmark::RegisterBenchmark(("tell a charset/" + name + "/ours").c_str(), detectLegacy,
+        benchmark::RegisterBenchmark(("detect a charset/" + name + "/ours").c_str(), detectLegacy,
                                      language);
     }
     benchmark::Initialize(&argc, argv);

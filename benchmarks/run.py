@@ -131,7 +131,7 @@ SECTIONS = {
         ]),
     "detection": Section(
         programs=["detection_benchmark"],
-        rows=[Row("tell a charset", "ms", [Limit(0.5, "0.5 ms")])]),
+        rows=[Row("detect a charset", "ms", [Limit(0.5, "0.5 ms")])]),
     "document_growth": Section(
         programs=["growth_benchmark"],
         order=("what", "who", "input"),
