@@ -156,6 +156,8 @@ std::shared_ptr<NatsBus> makeBus(NatsOptions options, const ServeOptions& serve)
     options.connectTimeout = longestConnect;
     // Counting the processors opens files that the threads which ask may not be allowed to open.
     options.concurrency = std::max(2U, std::thread::hardware_concurrency());
+    // Many documents that are saved at once must not hold up those that are read.
+    options.separateChannels = {platform::messaging::writeRequestChannel};
     // A large document must not hold up the small ones behind it.
     options.concurrentChannels = {platform::messaging::readRequestChannel,
                                   platform::messaging::filesRequestChannel};

@@ -79,9 +79,10 @@ async function startWorkers(test, folder, documents, servers) {
     const perServer = servers.map(async ({ monitoringPort }) => {
       const response = await fetch(`http://127.0.0.1:${monitoringPort}/connz`);
       const { connections } = await response.json();
-      return connections.filter(({ subscriptions }) => subscriptions === 3).length;
+      return connections.reduce((sum, { subscriptions }) => sum + subscriptions, 0);
     });
-    return (await Promise.all(perServer)).reduce((sum, count) => sum + count) === workers.length;
+    // To three kinds of requests, to offers of each, and to words about pieces.
+    return (await Promise.all(perServer)).reduce((sum, count) => sum + count) === 7 * workers.length;
   });
   return workers;
 }

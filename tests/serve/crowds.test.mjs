@@ -114,6 +114,17 @@ for (const clients of IS_LONG ? [6, 20, 100] : [6]) {
   });
 }
 
+test("documents that are saved or travel in pieces come over other connections than small reads", async (t) => {
+  const { server } = await setUp(t);
+  const { connections } = await server.told("connz?subs=1&auth=1");
+  const subjects = connections
+    .filter((one) => one.authorized_user === "worker")
+    .map((one) => one.subscriptions_list.map((subject) => subject.replace(/piece.*/, "piece")).sort());
+  const [read, write, files] = ["readRequest_cpp", "writeRequest_cpp", "filesRequest_host"].map((one) => `/zpr/service/${one}`);
+  const transfers = [read, write, files].map((one) => `${one}/offer`).concat("/zpr/service/piece").sort();
+  assert.deepEqual(new Set(subjects.map(String)), new Set([[files, read], [write], transfers].map(String)));
+});
+
 // A word about pieces, said by hand.
 function say(client, subject, word, { reply, payload } = {}) {
   const header = headers();

@@ -96,11 +96,11 @@ export class MessageServer {
     return worker;
   }
 
-  // How many workers listen to requests and offers.
+  // How many workers listen to writes, to other requests, and to offers.
   async #workers() {
     const connections = (await this.connections()).filter((one) => one.authorized_user === "worker");
     const count = (subscriptions) => connections.filter((one) => one.subscriptions === subscriptions).length;
-    return Math.min(count(3), count(4));
+    return Math.min(count(1), count(2), count(4));
   }
 
   // A connected client library; by way of `port`, if that is another.

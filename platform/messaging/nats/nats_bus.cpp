@@ -1,8 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 // The core holds the connections, which clients and subscriptions share. Messages of one piece go
-// over the first. Long messages have one of their own, so that nothing waits behind a document:
+// over the first. Documents come over others, so that nothing waits behind them:
 //
 //   first:     requests and answers of one piece, notifications
+//   separate:  requests of one piece on the separate channels
 //   transfers: offers of long requests; the pieces and what is said about them
 #include "platform/messaging/nats/nats_bus.h"
 
@@ -57,7 +58,10 @@ public:
     std::shared_ptr<Subscription> subscribe(const std::string& channel, MessageHandler handler);
     void publish(const std::string& channel, DataBuffer payload);
     std::size_t maxPayload(const std::string& channel);
-    bool isConnected() const { return first_->isConnected(); }
+    bool isConnected() const {
+        return first_->isConnected() && separate_->isConnected() &&
+               (!transfers_ || transfers_->isConnected());
+    }
     std::uint64_t reconnects() const { return first_->reconnects(); }
     NatsBacklog backlog() const;
     bool drain(std::chrono::milliseconds timeout);
@@ -70,9 +74,16 @@ private:
     std::shared_ptr<NatsSource> makeSource(const std::string& channel, std::size_t threads);
     std::unique_ptr<Listener> listenToOffers(const std::string& channel);
     std::string groupOf(const std::string& channel) const;
+    const std::shared_ptr<KeptConnection>& connectionOf(const std::string& channel) const;
+
+    // Those that messages of one piece come over.
+    std::vector<std::shared_ptr<KeptConnection>> incoming() const;
 
     const NatsOptions options_;
     const std::shared_ptr<KeptConnection> first_;
+
+    // The first, when no channel is separate.
+    const std::shared_ptr<KeptConnection> separate_;
 
     // Null when no messages are long.
     const std::shared_ptr<KeptConnection> transfers_;
@@ -130,7 +141,9 @@ public:
 
     ~ChannelSubscription() override {
         offers_.reset();
-        core_->first_->remove(source_);
+        for (const auto& connection : core_->incoming()) {
+            connection->remove(source_);
+        }
         whole_.reset();
         threads_.close();
     }
@@ -177,6 +190,8 @@ private:
 NatsBus::Core::Core(NatsOptions options)
     : options_(std::move(options)),
       first_(std::make_shared<KeptConnection>(options_)),
+      separate_(options_.separateChannels.empty() ? first_
+                                                  : std::make_shared<KeptConnection>(options_)),
       transfers_(options_.longMessages.answerPrefixes.empty()
                      ? nullptr
                      : std::make_shared<KeptConnection>(options_)),
@@ -199,6 +214,9 @@ NatsBus::Core::~Core() {
 
 std::shared_ptr<MessageService> NatsBus::Core::connect(const std::string& clientName) {
     first_->connect(clientName);
+    if (separate_ != first_) {
+        separate_->connect(clientName + " separate channels");
+    }
     if (transfers_) {
         transfers_->connect(clientName + " transfers");
         const std::lock_guard lock(mutex_);
@@ -221,6 +239,7 @@ std::shared_ptr<Subscription> NatsBus::Core::subscribe(const std::string& channe
     const std::size_t threads =
         deliveryThreadCount(channel, options_.concurrentChannels, options_.concurrency);
     auto source = makeSource(channel, threads);
+    const std::shared_ptr<KeptConnection>& connection = connectionOf(channel);
     std::shared_ptr<Subscription> subscription;
     if (long_ && long_->areLong(channel)) {
         subscription = std::make_shared<ChannelSubscription>(
@@ -230,8 +249,8 @@ std::shared_ptr<Subscription> NatsBus::Core::subscribe(const std::string& channe
         subscription = std::make_shared<ChannelSubscription>(shared_from_this(), source,
                                                              std::move(handler), threads);
     }
-    first_->add(source);
-    first_->requirePermitted(channel);
+    connection->add(source);
+    connection->requirePermitted(channel);
     return subscription;
 }
 
@@ -258,6 +277,18 @@ std::string NatsBus::Core::groupOf(const std::string& channel) const {
     return contains(options_.queueChannels, channel) ? options_.queueGroup : "";
 }
 
+const std::shared_ptr<KeptConnection>& NatsBus::Core::connectionOf(
+    const std::string& channel) const {
+    return contains(options_.separateChannels, channel) ? separate_ : first_;
+}
+
+std::vector<std::shared_ptr<KeptConnection>> NatsBus::Core::incoming() const {
+    if (separate_ == first_) {
+        return {first_};
+    }
+    return {first_, separate_};
+}
+
 void NatsBus::Core::publish(const std::string& channel, DataBuffer payload) {
     try {
         if (!long_ || !long_->publish(channel, payload)) {
@@ -280,24 +311,29 @@ std::size_t NatsBus::Core::maxPayload(const std::string& channel) {
 
 NatsBacklog NatsBus::Core::backlog() const {
     NatsBacklog all;
-    for (const auto& source : first_->sources()) {
-        const NatsBacklog one = source->backlog();
-        all.messages += one.messages;
-        all.bytes += one.bytes;
-        all.dropped += one.dropped;
+    for (const auto& connection : incoming()) {
+        for (const auto& source : connection->sources()) {
+            const NatsBacklog one = source->backlog();
+            all.messages += one.messages;
+            all.bytes += one.bytes;
+            all.dropped += one.dropped;
+        }
     }
     return all;
 }
 
 bool NatsBus::Core::drain(std::chrono::milliseconds timeout) {
     const Clock::time_point deadline = Clock::now() + timeout;
-    first_->stop();
+    std::vector<std::shared_ptr<NatsSource>> sources;
+    for (const auto& connection : incoming()) {
+        connection->stop();
+        for (const auto& source : connection->sources()) {
+            source->drain(connection->isConnected());
+            sources.push_back(source);
+        }
+    }
     if (transfers_) {
         transfers_->stop();
-    }
-    const std::vector<std::shared_ptr<NatsSource>> sources = first_->sources();
-    for (const auto& source : sources) {
-        source->drain(isConnected());
     }
     bool finished = true;
     for (const auto& source : sources) {
@@ -308,7 +344,10 @@ bool NatsBus::Core::drain(std::chrono::milliseconds timeout) {
         long_->close();
         finished = transfers_->close(deadline) && finished;
     }
-    return first_->close(deadline) && finished;
+    for (const auto& connection : incoming()) {
+        finished = connection->close(deadline) && finished;
+    }
+    return finished;
 }
 
 NatsBus::NatsBus(std::shared_ptr<Core> core) : core_(std::move(core)) {}

@@ -63,6 +63,10 @@ struct NatsOptions {
     std::string queueGroup;
     std::vector<std::string> queueChannels;
 
+    /// Channels whose messages come over a connection of their own, so that others do not queue
+    /// behind them at the servers.
+    std::vector<std::string> separateChannels;
+
     /// As those of InProcessBusOptions.
     std::vector<std::string> concurrentChannels;
     std::size_t concurrency = 0;
@@ -113,11 +117,11 @@ public:
     ~NatsBus();
 
     /// A client of the bus. The first call connects to a server, under the name `clientName`;
-    /// later clients share that connection. The future holds an exception when no server can be
+    /// later clients share its connections. The future holds an exception when no server can be
     /// reached, or one refuses the connection.
     futures::Future<std::shared_ptr<MessageService>> connect(const std::string& clientName);
 
-    /// True while connected to a server.
+    /// True while all connections are made.
     bool isConnected() const;
 
     /// How many times a lost connection has been replaced since the first `connect`.

@@ -93,6 +93,32 @@ TEST_P(NatsDrain, FinishesWhatWasTakenAndLeavesTheRestToOthers) {
 INSTANTIATE_TEST_SUITE_P(Threads, NatsDrain, testing::Values(1, 3),
                          testing::PrintToStringParamName());
 
+TEST(NatsDrainEnd, FinishesWhatWasTakenOnASeparateChannel) {
+    const test::NatsServer server;
+    NatsOptions options = workerOf(server, 1);
+    options.separateChannels = {"requests"};
+    BusAtServer worker(options);
+    BusAtServer client(server);
+    std::latch started(1);
+    std::latch release(1);
+    const auto requests = worker.subscribe("requests", [&](const JsonMessage& m) {
+        started.count_down();
+        release.wait();
+        worker.publish("answers", "done " + textOf(m));
+    });
+    Inbox<std::string> answers;
+    const auto subscription = client.collect("answers", answers);
+    client.publish("requests", "x");
+    started.wait();
+    EXPECT_TRUE(worker.bus->isConnected());
+    std::future<bool> drained =
+        std::async(std::launch::async, [&] { return worker.bus->drain(std::chrono::seconds(60)); });
+    EXPECT_EQ(drained.wait_for(std::chrono::milliseconds(100)), std::future_status::timeout);
+    release.count_down();
+    EXPECT_TRUE(drained.get());
+    EXPECT_THAT(answers.waitFor(1), ElementsAre("done x"));
+}
+
 TEST(NatsDrainEnd, HasTheServerHaveWhatWasPublished) {
     const test::NatsServer server("max_payload: 64MB\nmax_pending: 256MB");
     BusAtServer client(server);

@@ -157,6 +157,23 @@ TEST(NatsBus, AReleasedSubscriptionGetsNothingMore) {
     EXPECT_THAT(released.items(), ElementsAre("1"));
 }
 
+TEST(NatsBus, AReleasedSubscriptionOfASeparateChannelGetsNothingMore) {
+    const test::NatsServer server;
+    NatsOptions options = optionsFor(server);
+    options.separateChannels = {"x"};
+    BusAtServer bus(options);
+    Inbox<std::string> released;
+    Inbox<std::string> staying;
+    auto first = bus.collect("x", released);
+    const auto second = bus.collect("x", staying);
+    bus.publish("x", "1");
+    released.waitFor(1);
+    first.reset();
+    bus.publish("x", "2");
+    EXPECT_THAT(staying.waitFor(2), ElementsAre("1", "2"));
+    EXPECT_THAT(released.items(), ElementsAre("1"));
+}
+
 TEST(NatsBus, ReleaseWaitsForTheHandlerThatRuns) {
     const test::NatsServer server;
     BusAtServer bus(server);
