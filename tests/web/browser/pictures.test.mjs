@@ -46,7 +46,6 @@ for (const colorScheme of ["light", "dark"]) {
 
 browserTest("the small page has its picture", async (t) => {
   const { page } = await Session.start(t, files, { viewport: { width: 360, height: 640 } });
-  await page.getByRole("button", { name: "Show or hide the files" }).click();
   await row(page, "market-list.utf-8.txt").click();
   await page.locator(".cm-content").waitFor();
   await take(page, folderFor(t), "small");

@@ -131,8 +131,12 @@ browserTest("the colours are the system's, or those that are chosen", async (t) 
 
 browserTest("at a width of 360 pixels everything is in reach", async (t) => {
   const { page } = await Session.start(t, { "a.txt": "one\n" }, { viewport: { width: 360, height: 640 } });
-  await page.getByRole("button", { name: "Show or hide the files" }).click();
-  await open(page, "a.txt");
+  await open(page, "a.txt"); // the files are shown while nothing is open
+  assert.equal(await page.locator(".files").isVisible(), false);
+  const toggle = page.getByRole("button", { name: "Show or hide the files" });
+  await toggle.click();
+  assert.equal(await page.locator(".files").isVisible(), true);
+  await toggle.click();
   assert.equal(await page.locator(".files").isVisible(), false);
   for (const name of ["Save", "Versions", "Copy link"]) {
     const box = await page.getByRole("button", { name, exact: true }).boundingBox();

@@ -96,6 +96,9 @@ export class PartsPanel implements Panel {
     this.#shown = uri;
     this.#tree.select(uri);
     this.#fillPane();
+    if (this.element.scrollHeight > this.element.clientHeight) {
+      this.#pane.scrollIntoView(); // in a small window, below the outline
+    }
   }
 
   #letGo(): void {

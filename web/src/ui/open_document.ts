@@ -26,7 +26,8 @@ export interface Surroundings {
 /** What there is to say of an open document beside its name. */
 export type Mark = "unsaved" | "theirs";
 
-const ANSWER_TIME = 10_000; // ms that a save's answer may take to begin, before it is asked for again
+const ANSWER_TIME = 10_000; // ms that a save's answer may take to begin, before it is asked for again,
+const ANSWER_TIME_PER_MB = 200; // and what a long document takes to be written and read back, on a slow machine
 const SLOW = 4_000; // ms without a sign of an answer, after which a reader is told
 const PAUSE = 3_000; // ms between the tries of a save that nobody answers
 
@@ -265,7 +266,7 @@ export class OpenDocument {
     const options = {
       baseVersion: base,
       signal: saving.signal,
-      timeout: ANSWER_TIME,
+      timeout: ANSWER_TIME + (ANSWER_TIME_PER_MB * sizeOf(content)) / 1e6,
       onProgress: ({ direction, bytes, total }: Progress) => {
         const part = { done: bytesText(bytes), total: bytesText(total) };
         this.#setStatus(direction === "sent" && bytes < total ? text("save.progress", part) : text("save.waiting"));
@@ -398,6 +399,10 @@ export class OpenDocument {
     }
     return text("document.failed", { name: this.name, reason: reasonText(error) });
   }
+}
+
+function sizeOf({ kind, content }: DocumentContent): number {
+  return kind === "text" ? content.length : content.parts.reduce((sum, part) => sum + part.content.length, 0);
 }
 
 function reasonText(error: unknown): string {

@@ -71,7 +71,7 @@ export class Workspace {
     });
     this.connection("connected");
     this.#listen();
-    this.#updateNow();
+    this.#activate(undefined);
     void this.#tree.start().catch(() => options.messages.tell(text("connection.noworker"), "problem"));
   }
 
@@ -158,7 +158,7 @@ export class Workspace {
 
   #activate(one: OpenDocument | undefined): void {
     this.#active = one;
-    this.element.classList.remove("with-files");
+    this.element.classList.toggle("with-files", one === undefined); // in a small window, instead of the documents
     if (one) {
       this.#tree.show(one.path);
     }
