@@ -76,6 +76,21 @@ bool isAscii(std::string_view bytes) {
     return all < 0x80;
 }
 
+// Whether it is a control code that texts do not hold.
+constexpr bool isStrayControl(char c) {
+    const auto byte = static_cast<unsigned char>(c);
+    return byte < 0x20 && (byte < '\t' || byte > '\r') && byte != 0x1A && byte != 0x1B;
+}
+
+bool hasStrayControls(std::string_view bytes) {
+    // Without an early exit, as above.
+    unsigned char found = 0;
+    for (const char byte : bytes) {
+        found |= static_cast<unsigned char>(isStrayControl(byte));
+    }
+    return found != 0;
+}
+
 // Whether so much of the sample is control codes that it is not text in any legacy charset.
 bool isBinary(std::string_view sample) {
     // Counted in bytes, block by block, for the compiler to do many at once.
@@ -84,10 +99,7 @@ bool isBinary(std::string_view sample) {
     for (std::size_t begin = 0; begin < sample.size(); begin += blockSize) {
         std::uint8_t found = 0;
         for (const char c : sample.substr(begin, blockSize)) {
-            const auto byte = static_cast<unsigned char>(c);
-            const bool isText =
-                byte >= 0x20 || (byte >= '\t' && byte <= '\r') || byte == 0x1A || byte == 0x1B;
-            found = static_cast<std::uint8_t>(found + (isText ? 0 : 1));
+            found = static_cast<std::uint8_t>(found + (isStrayControl(c) ? 1 : 0));
         }
         controls += found;
     }
@@ -168,7 +180,8 @@ std::string findCharset(std::string_view bytes) {
             return ebcdic;
         }
     }
-    if (bytes.find('\0') != std::string_view::npos || isBinary(bytes)) {
+    if (hasStrayControls(bytes) &&
+        (bytes.find('\0') != std::string_view::npos || isBinary(bytes))) {
         const std::optional<detail::UnmarkedUnicode> unicode = detail::unmarkedUnicode(bytes);
         return unicode ? unicode->charset : "UTF-8";
     }
