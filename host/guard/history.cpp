@@ -10,7 +10,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <charconv>
 #include <exception>
 #include <future>
@@ -23,6 +22,7 @@
 
 #include "host/guard/document_version.h"
 #include "host/guard/file_content.h"
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -107,7 +107,7 @@ void removeIfAbandoned(const fs::path& path) {
 FileDescriptor copyTo(const fs::path& path, int from) {
     FileDescriptor to(::open(path.c_str(), O_RDWR | O_CREAT | O_TRUNC | O_CLOEXEC, 0600));
     if (!to) {
-        throw std::system_error(errno, std::generic_category(), path.string());
+        platform::throwSystemError(path.c_str());
     }
     if (::ioctl(to.get(), FICLONE, from) != 0) {
         copyContent(from, to.get());
@@ -117,7 +117,7 @@ FileDescriptor copyTo(const fs::path& path, int from) {
 
 void syncToDisk(const FileDescriptor& file, const fs::path& path) {
     if (!file || ::fsync(file.get()) != 0) {
-        throw std::system_error(errno, std::generic_category(), path.string());
+        platform::throwSystemError(path.c_str());
     }
 }
 
@@ -353,7 +353,7 @@ void History::keepToShare(const fs::path& root, std::uint64_t added) {
     }
     struct statvfs system {};
     if (::statvfs(root.c_str(), &system) != 0) {
-        throw std::system_error(errno, std::generic_category(), root.string());
+        platform::throwSystemError(root.c_str());
     }
     const auto size = static_cast<double>(system.f_blocks) * static_cast<double>(system.f_frsize);
     usage.most = static_cast<std::uint64_t>(size * options_.share);

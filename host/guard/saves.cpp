@@ -19,6 +19,7 @@
 #include "platform/i18n/codecvt.h"
 #include "platform/posix/atomic_file.h"
 #include "platform/posix/open_regular_file.h"
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -51,7 +52,7 @@ FileDescriptor openRegular(const std::string& path) {
 FileDescriptor makeFileInMemory() {
     FileDescriptor file(::memfd_create("new content", MFD_CLOEXEC));
     if (!file) {
-        throw std::system_error(errno, std::generic_category(), "cannot be kept in memory");
+        platform::throwSystemError("cannot be kept in memory");
     }
     return file;
 }
@@ -59,7 +60,7 @@ FileDescriptor makeFileInMemory() {
 void sync(int file) {
     // Some file systems cannot sync folders, and say so.
     if (::fsync(file) != 0 && errno != EINVAL) {
-        throw std::system_error(errno, std::generic_category(), "may not be safe on disk");
+        platform::throwSystemError("may not be safe on disk");
     }
 }
 
@@ -72,7 +73,7 @@ void syncWithFolder(int file, const std::filesystem::path& document) {
     if (folder) {
         sync(folder.get());
     } else if (errno != EACCES) {
-        throw std::system_error(errno, std::generic_category(), "may not be safe on disk");
+        platform::throwSystemError("may not be safe on disk");
     }
 }
 

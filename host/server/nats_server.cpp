@@ -7,17 +7,16 @@
 #include <sys/stat.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <chrono>
 #include <exception>
 #include <optional>
 #include <stdexcept>
 #include <string_view>
-#include <system_error>
 #include <utility>
 
 #include "host/server/client_delivery.h"
 #include "host/standard_streams.h"
+#include "platform/posix/system_error.h"
 
 namespace host {
 
@@ -50,7 +49,7 @@ void writePrivateFile(const std::filesystem::path& file, std::string_view text) 
     const platform::FileDescriptor to(
         ::open(file.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, S_IRUSR | S_IWUSR));
     if (to.get() < 0) {
-        throw std::system_error(errno, std::generic_category(), file.string());
+        platform::throwSystemError(file.c_str());
     }
     writeAll(to.get(), {text});
 }

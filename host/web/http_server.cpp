@@ -213,7 +213,7 @@ private:
             return handler_(request);
         } catch (const std::exception& error) {
             spdlog::error("a request over HTTP failed: {}", error.what());
-            return {500, "text/plain; charset=utf-8", "This failed.\n", {}, {}};
+            return plainText(500, "This failed.\n");
         }
     }
 

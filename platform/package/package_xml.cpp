@@ -5,17 +5,16 @@
 #include <sys/random.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <cstddef>
 #include <exception>
 #include <memory>
 #include <new>
 #include <stdexcept>
-#include <system_error>
 
 #include "platform/i18n/codecvt.h"
 #include "platform/package/about.h"
 #include "platform/package/part_name.h"
+#include "platform/posix/system_error.h"
 #include "platform/text/case.h"
 
 namespace platform::package {
@@ -37,8 +36,7 @@ unsigned long hashSalt() {
     static const unsigned long salt = [] {
         unsigned long number = 0;
         if (::getrandom(&number, sizeof number, GRND_NONBLOCK) != sizeof number) {
-            throw std::system_error(errno, std::generic_category(),
-                                    "needs a random number to read");
+            throwSystemError("needs a random number to read");
         }
         return number | 1U;  // zero means none
     }();
