@@ -6,7 +6,6 @@
 
 #include <cstddef>
 #include <exception>
-#include <filesystem>
 #include <functional>
 #include <memory>
 #include <set>
@@ -15,6 +14,7 @@
 
 #include "json/parser.h"
 #include "tests/support/failing_malloc.h"
+#include "tests/support/names_in.h"
 #include "tests/support/process_state.h"
 #include "tests/support/running_bundle.h"
 #include "tests/support/temporary_directory.h"
@@ -57,13 +57,7 @@ protected:
             R"({"relationshipId":"i","relationshipType":"t","target":"a.xml"}]}})")["v"];
     }
 
-    std::set<std::string> names() const {
-        std::set<std::string> result;
-        for (const auto& entry : std::filesystem::directory_iterator(folder.path())) {
-            result.insert(entry.path().filename().string());
-        }
-        return result;
-    }
+    std::set<std::string> names() const { return test::namesIn(folder.path()); }
 
     /// Sends the request once for each of its allocations, which fails then. Before each time
     /// `prepare` is called, and afterwards `check` with what the bundle published and what it
