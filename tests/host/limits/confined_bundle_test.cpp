@@ -127,7 +127,12 @@ protected:
         host::GuardOptions options(GetParam());
         options.folder = scratch / "state";
         guard = host::makeGuard(options, {inside});
-        bundle = startConfined(readWrite(), guard);
+        // CppMicroServices reads the bundle's file once more when it starts it.
+        bundle = startConfined(
+            FRAMEWORK_READS_BUNDLE
+                ? Confinement({.readWrite = {inside}, .readOnly = {SERIALIZATION_BUNDLE}})
+                : readWrite(),
+            guard);
     }
 
     std::string read(const fs::path& path, const char* contentType) {
@@ -273,8 +278,11 @@ TEST_P(ConfinedBundle, TellsOfWritesOutsideAsOfOthersThatFail) {
 
 TEST_P(ConfinedBundle, ReadsNoDevicesAndNothingOfProc) {
     for (const char* path : {"/dev/zero", "/proc/self/environ", "/proc/self/maps", "/proc/cpuinfo",
-                             "/etc/passwd", "/proc/self/exe", SERIALIZATION_BUNDLE}) {
+                             "/etc/passwd", "/proc/self/exe"}) {
         EXPECT_EQ(read(path, textType), R"({"data":"","status":true})") << path;
+    }
+    if (!FRAMEWORK_READS_BUNDLE) {
+        EXPECT_EQ(read(SERIALIZATION_BUNDLE, textType), R"({"data":"","status":true})");
     }
     EXPECT_EQ(write("/dev/null", textType, "x").back(), "false");
     EXPECT_EQ(write("/proc/self/comm", textType, "x").back(), "false");
