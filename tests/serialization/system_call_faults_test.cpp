@@ -11,7 +11,6 @@
 #include <cerrno>
 #include <cstddef>
 #include <exception>
-#include <filesystem>
 #include <functional>
 #include <memory>
 #include <set>
@@ -24,6 +23,7 @@
 #include "platform/messaging/in_process_bus.h"
 #include "platform/messaging/transport.h"
 #include "serialization/serialization.h"
+#include "tests/support/names_in.h"
 #include "tests/support/process_state.h"
 #include "tests/support/system_call_supervisor.h"
 #include "tests/support/temporary_directory.h"
@@ -116,13 +116,7 @@ protected:
         RecordProperty("faults", std::to_string(faults));
     }
 
-    std::set<std::string> names() const {
-        std::set<std::string> result;
-        for (const auto& entry : std::filesystem::directory_iterator(folder.path())) {
-            result.insert(entry.path().filename().string());
-        }
-        return result;
-    }
+    std::set<std::string> names() const { return test::namesIn(folder.path()); }
 
     test::TemporaryDirectory folder;
     const std::string path = (folder / "document").string();
