@@ -291,7 +291,7 @@ TEST(NatsLongMessages, AreTakenBeforeTheBusEnds) {
     const auto announced = client.hear().value();
     std::atomic<bool> drained = false;
     std::jthread drain([&] { drained = worker.bus->drain(longestWait); });
-    std::this_thread::sleep_for(std::chrono::milliseconds(50));  // time for a drain that does not wait
+    std::this_thread::sleep_for(std::chrono::milliseconds(50));  // time for a hasty drain
     EXPECT_FALSE(drained);
     EXPECT_TRUE(client.take(announced) == worker.answer);
     drain.join();
