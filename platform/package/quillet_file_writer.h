@@ -35,10 +35,10 @@ public:
     /// equal ones: where the target has an entry of the same name and content, the deflated bytes
     /// of that are reused, whichever program wrote them.
     ///
-    /// A relationship, such as a hyperlink, becomes external if its target mode is 0 and also if its
-    /// target can be no part of the package: an absolute URI, or a reference that leads to none of
-    /// its parts. The top-level type of a content type is stored in lower case. Everything else is
-    /// stored as it is.
+    /// A relationship, such as a hyperlink, becomes external if its target mode is 0 and also if
+    /// its target can be no part of the package: an absolute URI, or a reference that leads to none
+    /// of its parts. The top-level type of a content type is stored in lower case. Everything else
+    /// is stored as it is.
     ///
     /// Throws std::runtime_error, beginning with the path and naming the part, when the package is
     /// one that could not be read back (an invalid or reserved part name, two that are equal but
