@@ -120,7 +120,8 @@ test("documents that are saved or travel in pieces come over other connections t
   const subjects = connections
     .filter((one) => one.authorized_user === "worker")
     .map((one) => one.subscriptions_list.map((subject) => subject.replace(/piece.*/, "piece")).sort());
-  const [read, write, files] = ["readRequest_cpp", "writeRequest_cpp", "filesRequest_host"].map((one) => `/zpr/service/${one}`);
+  const requests = ["readRequest_cpp", "writeRequest_cpp", "filesRequest_host"];
+  const [read, write, files] = requests.map((one) => `/zpr/service/${one}`);
   const transfers = [read, write, files].map((one) => `${one}/offer`).concat("/zpr/service/piece").sort();
   assert.deepEqual(new Set(subjects.map(String)), new Set([[files, read], [write], transfers].map(String)));
 });

@@ -57,7 +57,8 @@ export class MessageServer {
   // Starts it, again if it has been killed.
   async run() {
     const path = `${process.env.PATH}:/usr/sbin`;
-    this.program = new Program(this.test, ["nats-server", "-c", this.configuration], { PATH: path, ...this.environment });
+    const environment = { PATH: path, ...this.environment };
+    this.program = new Program(this.test, ["nats-server", "-c", this.configuration], environment);
     await waitFor("the message server", () => {
       if (this.program.hasEnded) {
         throw new Error(this.program.errors);

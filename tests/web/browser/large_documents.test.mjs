@@ -14,7 +14,8 @@ const MEGABYTES = IS_LONG ? 300 : 30;
 browserTest(`${MEGABYTES} MB are written and read byte for byte`, { timeout: 600_000 }, async (t) => {
   const session = await Session.start(t, {}, { bypassCSP: true });
   const library = readFileSync(join(ROOT, "web/client/dist/index.js"), "utf8");
-  await session.page.addScriptTag({ type: "module", content: `${library}\nglobalThis.library = { connect, stringOf };` });
+  const content = `${library}\nglobalThis.library = { connect, stringOf };`;
+  await session.page.addScriptTag({ type: "module", content });
   const { server, user, password } = parseUrl(session.host.webSocket);
   const file = session.path("large.txt");
   const outcome = await session.page.evaluate(
