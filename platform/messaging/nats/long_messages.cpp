@@ -105,12 +105,6 @@ private:
     bool ended_ = false;  // guarded by the mutex of all
 };
 
-std::shared_ptr<LongMessages> LongMessages::create(const LongMessageOptions& options, Send send) {
-    std::shared_ptr<LongMessages> made(new LongMessages(options, std::move(send)));
-    made->timer_ = std::thread([all = made.get()] { all->runTimer(); });
-    return made;
-}
-
 LongMessages::LongMessages(const LongMessageOptions& options, Send send)
     : options_(options),
       worker_(makeWorkerName()),
@@ -124,6 +118,13 @@ LongMessages::LongMessages(const LongMessageOptions& options, Send send)
 
 LongMessages::~LongMessages() {
     close();
+}
+
+void LongMessages::start() {
+    const std::lock_guard lock(mutex_);
+    if (!closed_ && !timer_.joinable()) {
+        timer_ = std::thread([this] { runTimer(); });
+    }
 }
 
 void LongMessages::takeWord(natsMsg* received) {
@@ -246,18 +247,20 @@ bool LongMessages::drain(Time deadline) {
 
 void LongMessages::close() {
     Notes notes;
+    std::thread timer;
     {
         const std::lock_guard lock(mutex_);
         refusing_ = true;
         closed_ = true;
+        timer = std::move(timer_);
         notes = incoming_.stopAll(workerEnds);
         std::ranges::move(outgoing_.stopAll(workerEnds), std::back_inserter(notes));
     }
     changed_.notify_all();
     timerWakes_.notify_one();
     sendAll(notes);
-    if (timer_.joinable()) {
-        timer_.join();
+    if (timer.joinable()) {
+        timer.join();
     }
 }
 

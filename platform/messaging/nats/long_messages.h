@@ -36,12 +36,15 @@ public:
     /// Sends a message with the header of pieces. What it throws is logged and dropped.
     using Send = std::function<void(const Note&)>;
 
-    /// Starts a thread. `send` is called by several threads at once, until `close` has returned.
-    static std::shared_ptr<LongMessages> create(const LongMessageOptions& options, Send send);
-
+    /// `send` is called by several threads at once, until `close` has returned.
+    LongMessages(const LongMessageOptions& options, Send send);
     LongMessages(const LongMessages&) = delete;
     LongMessages& operator=(const LongMessages&) = delete;
     ~LongMessages();
+
+    /// Starts the thread that sends pieces and notices what stands still, unless it runs already or
+    /// `close` was called.
+    void start();
 
     /// The subject on which clients speak to this worker alone.
     std::string subject() const { return piecesPrefix + worker_ + ".>"; }
@@ -83,8 +86,6 @@ public:
 private:
     class WholeRequests;
 
-    LongMessages(const LongMessageOptions& options, Send send);
-
     void runTimer();
     std::optional<ReturnAddress> addressOf(const std::string& channel, natsMsg* received) const;
     std::shared_ptr<const void> expectAnswer(const ReturnAddress& address);
@@ -108,8 +109,8 @@ private:
     int sending_ = 0;  // client messages whose replies are not all sent yet
     bool refusing_ = false;
     bool closed_ = false;
-
     std::thread timer_;
+
     const std::shared_ptr<Subscription> roomWatch_;
 };
 

@@ -196,7 +196,7 @@ NatsBus::Core::Core(NatsOptions options)
                      ? nullptr
                      : std::make_shared<KeptConnection>(options_)),
       long_(transfers_
-                ? LongMessages::create(
+                ? std::make_shared<LongMessages>(
                       options_.longMessages,
                       [first = first_, transfers = transfers_](const nats::Note& note) {
                           // An announcement does not wait behind pieces.
@@ -219,6 +219,7 @@ std::shared_ptr<MessageService> NatsBus::Core::connect(const std::string& client
     }
     if (transfers_) {
         transfers_->connect(clientName + " transfers");
+        long_->start();
         const std::lock_guard lock(mutex_);
         if (!words_) {
             words_ = std::make_unique<Listener>(

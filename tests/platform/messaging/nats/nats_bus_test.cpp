@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "tests/platform/messaging/nats/bus_at_server.h"
+#include "tests/support/process_state.h"
 
 namespace platform::messaging {
 namespace {
@@ -315,6 +316,16 @@ TEST(NatsBus, OnlyTheChannelsOfTheQueueJoinTheGroup) {
     one.publish("news", "1");
     EXPECT_THAT(ofOne.waitFor(1), ElementsAre("1"));
     EXPECT_THAT(ofOther.waitFor(1), ElementsAre("1"));
+}
+
+// A host confines the thread that connects, and with it those that meet anything from outside.
+TEST(NatsBus, StartsNoThreadBeforeItConnects) {
+    NatsOptions options;
+    options.servers = {"nats://127.0.0.1:1"};
+    options.longMessages.answerPrefixes = {{"/ask", "/answer/"}};
+    const std::size_t before = test::settledThreads();
+    const auto bus = NatsBus::create(options);
+    EXPECT_EQ(test::settledThreads(), before);
 }
 
 TEST(NatsBus, FailsToConnectWhereThereIsNoServer) {
