@@ -69,7 +69,7 @@ browserTest("conflict and versions have their pictures", async (t) => {
   await page.getByRole("dialog").locator(".cm-content").first().waitFor();
   await take(page, folder, "conflict");
   await page.getByRole("dialog").getByRole("button", { name: "Save put together" }).click();
-  await page.locator(".mark").waitFor({ state: "detached" });
+  await page.waitForFunction(() => document.querySelector(".mark") === null);
   await waitFor("the copies", async () => (await other.versions(path)).length === 2);
   await page.getByRole("button", { name: "Versions" }).click();
   await page.getByRole("dialog").getByRole("radio").first().waitFor();
