@@ -44,7 +44,7 @@ void requireBounded(const nats::Notes& notes) {
         require(note.payload.size() <= nats::pieceSize);
         bytes += note.payload.size();
     }
-    require(bytes <= nats::answerWindow);
+    require(bytes <= nats::windowSize);
 }
 
 // One client's words, with numbers that are near to those that matter.

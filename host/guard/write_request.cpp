@@ -102,10 +102,16 @@ std::string_view textOf(const Members& members, const std::string& key) {
     return found == members.end() ? std::string_view() : found->second;
 }
 
-bool readString(const Members& members, const std::string& key, std::string& target) {
+// Reads a member that is a string. The text of that string, without what may follow it up to the
+// next member; nothing where it is none.
+std::optional<std::string_view> readString(const Members& members, const std::string& key,
+                                           std::string& target) {
     const std::string_view text = textOf(members, key);
     json::Input input{text.data(), text.data() + text.size()};
-    return json::parseString(input, target) == json::Status::success;
+    if (json::parseString(input, target) != json::Status::success) {
+        return std::nullopt;
+    }
+    return std::string_view(text.data(), input.position);
 }
 
 // Whether the bundle accepts `path` as one.
@@ -121,11 +127,14 @@ std::optional<WriteRequest> readWriteRequest(std::string_view payload) {
     WriteRequest request;
     std::string contentType;
     if (!members || !readString(*members, "rtcId", request.rtcId) ||
-        !readString(*members, "contentType", contentType) ||
-        !readString(*members, "filePath", request.filePath) || !isPath(request.filePath)) {
+        !readString(*members, "contentType", contentType)) {
         return std::nullopt;
     }
-    request.filePathText = textOf(*members, "filePath");
+    const auto filePathText = readString(*members, "filePath", request.filePath);
+    if (!filePathText || !isPath(request.filePath)) {
+        return std::nullopt;
+    }
+    request.filePathText = *filePathText;
     request.isPackage = contentType == packageContentType;
     const std::string_view content = textOf(*members, "content");
     if (!content.starts_with(request.isPackage ? '{' : '"')) {

@@ -14,7 +14,7 @@ namespace host {
 struct WriteRequest {
     std::string rtcId;
     std::string filePath;
-    std::string_view filePathText;  // as it stands in the request
+    std::string_view filePathText;  // the string as it stands in the request, in quotation marks
     bool isPackage = false;
     std::string_view text;    // a text as it stands in the request: JSON, of the charset `encoding`
     std::string encoding;     // of a text
@@ -33,7 +33,7 @@ std::string withFilePath(std::string_view payload, const std::string& filePath);
 
 /// Another path in the text of a request, in place of its own: a large request is not copied for
 /// it, which would take as much memory again. The bytes of the request are overwritten, and
-/// restored by the destructor; nothing else may read them in between.
+/// restored by the destructor; they must be writable, and nothing else may read them in between.
 class PathOverwrite {
 public:
     /// Writes `filePath` over `filePathText` of a request, where there is room for it.

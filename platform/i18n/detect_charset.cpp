@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 // Detection of the charset of a text file.
 //
-// In this order: a byte-order mark; ASCII, charsets of escape sequences, UTF-8, and UTF-16 and
-// UTF-32 without a mark; the legacy charsets, by the text's cost in each
-// (detection/likeliest_charset.cpp). The result decodes the whole file and, but for escape
+// In this order: a byte-order mark; ASCII, charsets of escape sequences, UTF-8, UTF-16 and UTF-32
+// without a mark, and EBCDIC that is ASCII by its bytes; the legacy charsets, by the text's cost in
+// each (detection/likeliest_charset.cpp). The result decodes the whole file and, but for escape
 // sequences that no converter writes, encodes it back to the same bytes.
 #include "platform/i18n/detect_charset.h"
 
@@ -148,8 +148,8 @@ std::string legacyCharset(std::string_view bytes) {
 }
 
 // The EBCDIC charset of a text that is ASCII by its bytes, as Hebrew without digits is; empty when
-// the text costs less as ASCII. Real ASCII costs far more in EBCDIC: its digits, line ends and most
-// of its small letters are controls or nothing there.
+// the text costs less as ASCII. Real ASCII costs far more in EBCDIC: its digits and line ends are
+// controls there, and p, r, s, u, v and w nothing.
 std::string asciiLookingEbcdic(std::string_view bytes) {
     constexpr std::size_t headSize = 4096;
     // Nearly all text in ASCII has a blank near its beginning, and so costs next to nothing here.
@@ -158,9 +158,8 @@ std::string asciiLookingEbcdic(std::string_view bytes) {
         return {};
     }
     const auto likely = detail::likeliestCharset(detail::charsetSample(bytes), bytes, {});
-    return likely && likely->charset->kind() == detail::CharsetKind::ebcdic &&
-                   likely->charset->fit(bytes).decodes
-               ? likely->charset->name()
+    return likely && likely->charset->kind() == detail::CharsetKind::ebcdic
+               ? likely->charset->fit(bytes).name
                : std::string();
 }
 
@@ -171,13 +170,11 @@ std::string findCharset(std::string_view bytes) {
     if (!simdjson::validate_utf8(bytes.data(), bytes.size())) {
         return legacyCharset(bytes);
     }
-    // Valid UTF-8, but so are the bytes of escape sequences, and some of EBCDIC and UTF-16.
-    if (isAscii(bytes)) {
+    // Valid UTF-8, but so are the bytes of escape sequences, and some of UTF-16 and EBCDIC.
+    const bool ascii = isAscii(bytes);
+    if (ascii) {
         if (std::string escaped = detail::escapedCharset(bytes); !escaped.empty()) {
             return escaped;
-        }
-        if (std::string ebcdic = asciiLookingEbcdic(bytes); !ebcdic.empty()) {
-            return ebcdic;
         }
     }
     if (hasStrayControls(bytes) &&
@@ -185,7 +182,8 @@ std::string findCharset(std::string_view bytes) {
         const std::optional<detail::UnmarkedUnicode> unicode = detail::unmarkedUnicode(bytes);
         return unicode ? unicode->charset : "UTF-8";
     }
-    return "UTF-8";
+    const std::string ebcdic = ascii ? asciiLookingEbcdic(bytes) : "";
+    return ebcdic.empty() ? "UTF-8" : ebcdic;
 }
 
 }  // namespace

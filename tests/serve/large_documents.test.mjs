@@ -75,7 +75,8 @@ test("a client on a slow line gets its answer, and the server holds little of it
   t.diagnostic(`${megabytes} MB in ${seconds} s; the server held up to ${mostPending} bytes`);
   assert.ok(answer.data === text.toString("latin1"));
   assert.ok(seconds > megabytes / 2, "the line was not slow");
-  assert.ok(mostPending < 16 * MEGABYTE, `the server held ${mostPending} bytes`);
+  // What the client has room for, and a piece.
+  assert.ok(mostPending < 5.5 * MEGABYTE, `the server held ${mostPending} bytes`);
 });
 
 test("300 MB are written and read byte for byte", { skip: !IS_LONG || IS_SANITIZED }, async (t) => {

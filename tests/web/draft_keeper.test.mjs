@@ -83,3 +83,24 @@ test("a draft that cannot be stored is told of once", async () => {
   }
   assert.deepEqual([log, made.isPending], [["full"], true]);
 });
+
+test("a draft that fails while an earlier one is being stored is not taken for stored", async () => {
+  let count = 0;
+  const made = new DraftKeeper({
+    store: async () => {
+      if (++count === 2) {
+        throw new Error("full");
+      }
+      await sleep(30);
+    },
+    remove: async () => {},
+    failed: () => {},
+  });
+  made.changed();
+  const first = made.flush();
+  made.changed();
+  await made.flush();
+  await first;
+  await sleep(60); // in which the first is done
+  assert.equal(made.isPending, true);
+});

@@ -72,7 +72,7 @@ IncomingTransfers::Progress IncomingTransfers::piece(const std::string& id, std:
         transfer.progress = received + bytes.size();
         transfer.moved = now;
     }
-    const std::size_t room = std::min(transfer.length, received + bytes.size() + requestWindow);
+    const std::size_t room = std::min(transfer.length, received + bytes.size() + windowSize);
     // Not for every piece when pieces are small.
     if (room == transfer.room || (room < transfer.room + pieceSize && room != transfer.length)) {
         return {};
@@ -229,7 +229,7 @@ Note IncomingTransfers::tellRoom(Transfer& transfer, Time now) const {
 }
 
 std::size_t IncomingTransfers::aheadOf(const Transfer& transfer) const {
-    return std::min(transfer.length, requestWindow);
+    return std::min(transfer.length, windowSize);
 }
 
 }  // namespace platform::messaging::nats

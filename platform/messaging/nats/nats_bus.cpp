@@ -62,7 +62,7 @@ public:
         return first_->isConnected() && separate_->isConnected() &&
                (!transfers_ || transfers_->isConnected());
     }
-    std::uint64_t reconnects() const { return first_->reconnects(); }
+    std::uint64_t reconnects() const;
     NatsBacklog backlog() const;
     bool drain(std::chrono::milliseconds timeout);
 
@@ -93,7 +93,7 @@ private:
     std::unique_ptr<Listener> words_;  // none before the first connection
 };
 
-// The thread that handles what comes on one subject of the second connection.
+// The thread that handles what comes on one subject of the connection for transfers.
 class NatsBus::Core::Listener {
 public:
     Listener(std::shared_ptr<KeptConnection> connection, const std::string& subject,
@@ -308,6 +308,14 @@ std::size_t NatsBus::Core::maxPayload(const std::string& channel) {
     const std::optional<std::size_t> inPieces =
         long_ ? long_->longestAnswer(channel) : std::nullopt;
     return std::max(inPieces.value_or(0), first_->maxPayload());
+}
+
+std::uint64_t NatsBus::Core::reconnects() const {
+    std::uint64_t all = transfers_ ? transfers_->reconnects() : 0;
+    for (const auto& connection : incoming()) {
+        all += connection->reconnects();
+    }
+    return all;
 }
 
 NatsBacklog NatsBus::Core::backlog() const {

@@ -44,7 +44,7 @@ Notes OutgoingTransfers::room(const std::string& id, std::uint64_t end, Time now
     Transfer& transfer = found->second;
     const std::size_t length = transfer.payload.size();
     const auto until = static_cast<std::size_t>(
-        std::min<std::uint64_t>({end, length, transfer.sent + answerWindow}));
+        std::min<std::uint64_t>({end, length, transfer.sent + windowSize}));
     Notes notes;
     while (transfer.sent < until) {
         const std::size_t size = std::min(pieceSize, until - transfer.sent);

@@ -4,10 +4,12 @@
 //
 //   worker                                  client
 //     answer <worker> 9000000 ----------->
-//                            <------------  room 8388608
+//                            <------------  room 4194304
 //     piece 0, 1 MiB         ------------>
-//     ... 7 more             ------------>
-//                            <------------  room 9000000
+//     ... 3 more             ------------>
+//                            <------------  room 6291456
+//     piece 4194304, 1 MiB   ------------>
+//     ...
 //     piece 8388608, the rest ----------->    its memory is free again
 //
 // Either may send "stop" at any time. An answer that the client does not fetch ends with "stop".
@@ -39,7 +41,7 @@ public:
     /// ask again. A second answer for the same client's id is dropped.
     Notes answer(const ReturnAddress& address, DataBuffer payload, Time now);
 
-    /// The client `id` has room up to `end`. Sends at most `answerWindow` bytes, so that a client
+    /// The client `id` has room up to `end`. Sends at most `windowSize` bytes, so that a client
     /// that claims endless room does not make servers hold a document for it.
     Notes room(const std::string& id, std::uint64_t end, Time now);
 

@@ -30,13 +30,10 @@ inline constexpr const char* piecesHeader = "Zpr-Pieces";
 /// The longest piece.
 inline constexpr std::size_t pieceSize = std::size_t{1} << 20;
 
-/// How far a client may be ahead of a worker with its request: enough to keep a fast line busy, and
-/// no more than servers may hold for a receiver that stops.
-inline constexpr std::size_t requestWindow = 4 * pieceSize;
-
-/// How far a worker may be ahead of a client with its answer. More than the other way round, since
-/// clients tell their room only once in a few pieces.
-inline constexpr std::size_t answerWindow = 8 * pieceSize;
+/// How far a sender may be ahead of its receiver: enough to keep a fast line busy, and no more than
+/// servers may hold for a receiver that stops. Twice as much made documents hardly faster, and had
+/// servers cut off lines that were too slow to take it within the time they give for a write.
+inline constexpr std::size_t windowSize = 4 * pieceSize;
 
 /// What a client says.
 struct ClientWord {

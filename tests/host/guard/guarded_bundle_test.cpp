@@ -8,6 +8,7 @@
 #include <sys/syscall.h>
 #include <sys/xattr.h>
 #include <unistd.h>
+#include <algorithm>
 
 #include <chrono>
 #include <filesystem>

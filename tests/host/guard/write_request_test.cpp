@@ -2,6 +2,7 @@
 // What the guard reads of a write request has to be what the bundle reads.
 #include "host/guard/write_request.h"
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <limits.h>
 
@@ -113,6 +114,17 @@ TEST(WriteRequest, HasAnotherPathWrittenOverItsOwnForAWhile) {
         EXPECT_EQ(json::parse(own)["filePath"], json::Value("/é\""));
         EXPECT_EQ(path, R"("/\u00E9\"")");
     }
+}
+
+// The bundle refuses such a request, and is to see that it is one.
+TEST(WriteRequest, KeepsWhatStandsBehindItsPathWhenAnotherIsWrittenOverIt) {
+    std::string own =
+        R"({"rtcId":"1","filePath":"/123456789"x "y":1,"contentType":"a","content":"","encoding":""})";
+    const std::string_view path = readWriteRequest(own)->filePathText;
+    EXPECT_EQ(path, R"("/123456789")");
+    const PathOverwrite overwrite(path, "/b");
+    EXPECT_TRUE(overwrite.isDone());
+    EXPECT_THAT(own, testing::HasSubstr(R"("/b"        x "y":1,)"));
 }
 
 TEST(WriteRequest, KeepsItsPathWhereThereIsNoRoomForAnother) {

@@ -10,7 +10,7 @@ import { headers, type Msg, type NatsConnection, type Subscription } from "@nats
 
 const HEADER = "Zpr-Pieces";
 const PIECE = 2 ** 20;
-const WINDOW = 8 * PIECE;
+const WINDOW = 4 * PIECE;
 const GRANT = 2 * PIECE;
 const GRANT_INTERVAL = 1_000; // ms
 const STANDSTILL = 40_000; // ms; longer than a worker gives up after

@@ -59,7 +59,9 @@ export class DraftKeeper {
 
   // At once, since the page may be left before an earlier one is done, and its draft must not outlive a save.
   #start(action: () => Promise<void>): void {
-    this.#last = Promise.all([this.#last, action()]).then(
+    const done = action();
+    done.catch(() => {}); // it is looked at when those before it are done
+    this.#last = this.#last.then(() => done).then(
       () => void (this.#hasFailed = false),
       (reason: unknown) => {
         if (!this.#hasFailed) {

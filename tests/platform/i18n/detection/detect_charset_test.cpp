@@ -183,7 +183,9 @@ TEST(DetectCharset, TakesAsciiForItselfHoweverManyItsAtSigns) {
          {"@", "@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@@", "ABC@DEF@GHI",
           "ada@example.org\nben@example.org\neve@example.com\n", "@media\n@import\n@page\n",
           "@BEEF@DEAD@FACE@FEED@CAFE@BABE@FADE@BEAD@DEED@FEEB@ACED@BADE\n",
-          "@@@@@@@@\n@@@  @@@\n@@@@@@@@\n", "@property\n@staticmethod\n@dataclass\n"}) {
+          "@@@@@@@@\n@@@  @@@\n@@@@@@@@\n", "@property\n@staticmethod\n@dataclass\n",
+          "GATTACA@GATTACA@CATTAGA@GAGA@ACTA@TATA@CAT", "HIGHER@EDUCATION@FOR@ALL",
+          "EEEE@EEEE@EEEE@EEEE@EEEE"}) {
         EXPECT_EQ(detect(text), "UTF-8") << text;
     }
     std::mt19937 random(3);
@@ -194,6 +196,26 @@ TEST(DetectCharset, TakesAsciiForItselfHoweverManyItsAtSigns) {
         }
         EXPECT_EQ(detect(text), "UTF-8") << text;
     }
+    // Of what is letters in both.
+    const std::string_view letters = "ABCDEFGHIQRSTUVWXY";
+    for (int round = 0; round < 300; ++round) {
+        std::string text(60 + random() % 300, '@');
+        for (char& c : text) {
+            c = random() % 6 == 0 ? '@' : letters[random() % letters.size()];
+        }
+        EXPECT_EQ(detect(text), "UTF-8") << text;
+    }
+}
+
+TEST(DetectCharset, TakesNoArmenianInUtf16ForEbcdicWhoseTabsAndBlanksItHas) {
+    std::string units;
+    for (const char16_t c :
+         std::u16string_view(u"\u0540\u0531\u0545\u0531\u054D\u054F\u0531\u0546"
+                             u"\u0540\u0531\u0545\u0531\u054D\u054F\u0531\u0546")) {
+        units += static_cast<char>(c >> 8);
+        units += static_cast<char>(c & 0xFF);
+    }
+    EXPECT_NE(detect(units), "IBM424");
 }
 
 TEST(DetectCharset, ReadsAPageInManyLanguages) {

@@ -67,7 +67,7 @@ TEST_F(OutgoingTransfersTest, SendsNothingTwice) {
 
 TEST_F(OutgoingTransfersTest, SendsNoMoreThanAWindowAtOnceWhateverRoomIsClaimed) {
     answer("ada.1", 10 * pieceSize);
-    EXPECT_EQ(room("ada.1", ~std::uint64_t{0}).size(), answerWindow / pieceSize);
+    EXPECT_EQ(room("ada.1", ~std::uint64_t{0}).size(), windowSize / pieceSize);
 }
 
 TEST_F(OutgoingTransfersTest, KeepsThePayloadOfPiecesThatAreNotSentYet) {
