@@ -105,27 +105,22 @@ if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU" AND CMAKE_CXX_COMPILER_VERSION VERSION_L
   list(APPEND test_options -Wno-array-bounds -Wno-stringop-overflow)
 endif()
 
-# UndefinedBehaviorSanitizer looks at what is tested. In the tests themselves it took two fifths of their
-# compilation.
-set(unchecked_test_options "")
+# The checks of UndefinedBehaviorSanitizer that stand at every pointer. In the tests' own sources they took two fifths
+# of the compilation; what is tested keeps them, and AddressSanitizer finds most of what they find.
 if(EDITOR_SERIALIZATION_SANITIZERS MATCHES "undefined")
-  set(unchecked_test_options -fno-sanitize=undefined)
+  list(APPEND test_options -fno-sanitize=null,alignment,object-size,vptr)
 endif()
 
-# project_test(<name> [TESTS_HEADERS] SOURCES ... [LINKS ...])
+# project_test(<name> SOURCES ... [LINKS ...])
 #
 # Declares the test program `<name>_test` and registers each of its tests with CTest as <name>.<test>.
-# TESTS_HEADERS says that most of the code under test is in headers.
 function(project_test name)
-  cmake_parse_arguments(arg "TESTS_HEADERS" "" "SOURCES;LINKS" ${ARGN})
+  cmake_parse_arguments(arg "" "" "SOURCES;LINKS" ${ARGN})
   set(target "${name}_test")
   add_executable(${target} ${arg_SOURCES})
   target_include_directories(${target} PRIVATE "${PROJECT_SOURCE_DIR}")
   target_compile_options(${target} PRIVATE ${test_options})
-  if(NOT (arg_TESTS_HEADERS AND unchecked_test_options))
-    target_compile_options(${target} PRIVATE ${unchecked_test_options})
-    target_precompile_headers(${target} REUSE_FROM editor_test_support)
-  endif()
+  target_precompile_headers(${target} REUSE_FROM editor_test_support)
   target_link_libraries(${target} PRIVATE ${arg_LINKS} editor_test_support GTest::gmock GTest::gtest_main)
   # Without the values of parameters, which may be addresses and differ from run to run.
   gtest_discover_tests(${target} TEST_PREFIX "${name}." NO_PRETTY_VALUES DISCOVERY_TIMEOUT 60
