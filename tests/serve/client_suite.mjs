@@ -24,7 +24,7 @@ import {
   encode,
   parseUrl,
 } from "./client.mjs";
-import { IS_SANITIZED, ROOT, waitFor } from "./processes.mjs";
+import { IS_SANITIZED, ROOT, atEnd, waitFor } from "./processes.mjs";
 import { RawClient, webSocketFrame } from "./raw_client.mjs";
 
 const { values: target } = parseArgs({
@@ -58,7 +58,7 @@ async function expectService(client, file, data) {
 
 async function connected(test, options) {
   const client = await Client.connect(target.websocket, options);
-  test.after(() => client.close());
+  atEnd(test, () => client.close());
   return client;
 }
 
@@ -149,7 +149,7 @@ test("a document that is larger than the server takes is told of", async (t) => 
 test("a program with a plain socket is served", async (t) => {
   const file = example("market-list.utf-8.txt");
   const client = await RawClient.connect(target.nats);
-  t.after(() => client.close());
+  atEnd(t, () => client.close());
   const rtcId = `${user}.raw`;
   client.send(`SUB ${READ_RESPONSE}${rtcId} 1\r\n`);
   client.publish(READ_REQUEST, encode({ rtcId, contentType: "text/plain", filePath: file }));
@@ -174,7 +174,7 @@ test("a client that never reads holds up no other", async (t) => {
   const large = join(target.folder, "for who does not read.txt");
   writeFileSync(large, "x".repeat(2_000_000));
   const silent = await RawClient.connect(target.websocket);
-  t.after(() => silent.close());
+  atEnd(t, () => silent.close());
   silent.socket.pause();
   const rtcId = `${user}.silent`;
   silent.send(`SUB ${READ_RESPONSE}${rtcId} 1\r\n`);
@@ -190,7 +190,7 @@ test("a client that never reads holds up no other", async (t) => {
 
 test("a client that sends half a frame holds up no other", async (t) => {
   const half = await RawClient.connect(target.websocket);
-  t.after(() => half.close());
+  atEnd(t, () => half.close());
   const frame = webSocketFrame(`PUB ${READ_REQUEST} 1000\r\n${"x".repeat(1000)}\r\n`);
   half.socket.write(frame.subarray(0, frame.length / 2));
   const file = example("server.log");
@@ -203,7 +203,7 @@ test("a client that sends half a frame holds up no other", async (t) => {
 test("a client that floods keeps no other from being served", async (t) => {
   const file = example("empty.txt");
   const flooder = await RawClient.connect(target.websocket);
-  t.after(() => flooder.close());
+  atEnd(t, () => flooder.close());
   const request = encode({ rtcId: `${user}.flood`, contentType: "text/plain", filePath: file });
   const message = `PUB ${READ_REQUEST} ${request.length}\r\n${request}\r\n`;
   const frame = webSocketFrame(message.repeat(100));

@@ -10,7 +10,7 @@ import { test } from "node:test";
 import { wsconnect } from "../../web/node_modules/@nats-io/nats-core/lib/mod.js";
 import { Client } from "./client.mjs";
 import { freePorts } from "./message_server.mjs";
-import { HOST, IS_SANITIZED, Program, ROOT, temporaryFolder, waitFor } from "./processes.mjs";
+import { HOST, IS_SANITIZED, Program, ROOT, atEnd, temporaryFolder, waitFor } from "./processes.mjs";
 
 const NAMES = ["one", "two", "three"];
 const WORKER = "worker's password";
@@ -108,7 +108,7 @@ test("hosts work for servers that run elsewhere", async (t) => {
 
   await t.test("and each change is made by one of them", async (t) => {
     const client = await Client.connect(webSocket(servers[2]));
-    t.after(() => client.close());
+    atEnd(t, () => client.close());
     const answers = [];
     const rtcId = "ada.once";
     client.connection.subscribe(`/zpr/service/writeResponse/${rtcId}`, {
@@ -184,7 +184,7 @@ test("a worker shows its token and its certificate, and trusts the authority tha
   const taken = new Program(t, [...worker, ...options(names)]);
   const connection = await wsconnect({ servers: `ws://127.0.0.1:${webSocketPort}`, token });
   const client = new Client(connection, "anyone");
-  t.after(() => client.close());
+  atEnd(t, () => client.close());
   const answer = await client.read("/no/such/file", "text/plain", { seconds: 0.5, tries: 60 });
   assert.equal(answer.status, false, taken.errors);
   taken.signal("SIGTERM");

@@ -3,7 +3,7 @@
 // EDITOR_SERIALIZATION_LONG_TESTS=1 has them come in hundreds.
 import assert from "node:assert/strict";
 import { randomBytes } from "node:crypto";
-import { mkdtempSync, readFileSync, rmSync, writeFileSync } from "node:fs";
+import { readFileSync, writeFileSync } from "node:fs";
 import { join } from "node:path";
 import { test } from "node:test";
 import { setTimeout as sleep } from "node:timers/promises";
@@ -17,15 +17,8 @@ const LIMIT = 2_000_000_000;
 
 const longText = (megabytes) => randomBytes((megabytes * 750_000) | 0).toString("base64");
 
-// On tmpfs, so that disks do not count.
-function documentsIn(test) {
-  const folder = mkdtempSync("/dev/shm/serve-test-");
-  test.after(() => rmSync(folder, { recursive: true, force: true }));
-  return folder;
-}
-
 async function setUp(test) {
-  const documents = documentsIn(test);
+  const documents = temporaryFolder(test, "/dev/shm"); // tmpfs, so that disks do not count
   const server = await MessageServer.start(test, temporaryFolder(test));
   // The sanitizers take more than any limit.
   const limit = IS_SANITIZED ? [] : ["--memory-limit", String(LIMIT)];

@@ -8,7 +8,7 @@ import { test } from "node:test";
 
 import { FilesError, connect, textOf, utf8 } from "../../web/client/dist/index.js";
 import { parseUrl } from "./client.mjs";
-import { Host, temporaryFolder, waitFor } from "./processes.mjs";
+import { Host, atEnd, temporaryFolder, waitFor } from "./processes.mjs";
 import "./web_socket.mjs";
 
 async function start(test) {
@@ -16,7 +16,7 @@ async function start(test) {
   const host = await Host.start(test, ["--root", folder, "--history", temporaryFolder(test)]);
   const { server, user, password } = parseUrl(host.webSocket);
   const client = await connect({ servers: server, user, pass: password });
-  test.after(() => client.close());
+  atEnd(test, () => client.close());
   return { folder, client };
 }
 

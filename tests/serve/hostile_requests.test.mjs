@@ -7,7 +7,7 @@ import { test } from "node:test";
 import { setTimeout as sleep } from "node:timers/promises";
 
 import { Client, READ_REQUEST, READ_RESPONSE, encode } from "./client.mjs";
-import { Host, IS_SANITIZED, temporaryFolder, waitFor } from "./processes.mjs";
+import { Host, IS_SANITIZED, atEnd, temporaryFolder, waitFor } from "./processes.mjs";
 import { RawClient } from "./raw_client.mjs";
 
 const CLIENTS = 8;
@@ -28,7 +28,7 @@ function rawClients(test, host) {
   return Promise.all(
     Array.from({ length: CLIENTS }, async () => {
       const client = await RawClient.connect(host.nats);
-      test.after(() => client.close());
+      atEnd(test, () => client.close());
       return client;
     }),
   );
@@ -37,7 +37,7 @@ function rawClients(test, host) {
 // Reads the file again and again until `isOver`.
 async function readMeanwhile(test, host, file, isOver) {
   const client = await Client.connect(host.webSocket);
-  test.after(() => client.close());
+  atEnd(test, () => client.close());
   let longest = 0;
   do {
     const begin = performance.now();
@@ -110,7 +110,7 @@ test("requests that would take more than all may are refused", { skip: IS_SANITI
 test("documents that expand take nobody's memory", async (t) => {
   const { host, folder, file } = await start(t, 400);
   const client = await Client.connect(host.webSocket);
-  t.after(() => client.close());
+  atEnd(t, () => client.close());
   const content = "\0".repeat(1_000_000);
   const part = { partUri: "/a.bin", contentType: "x/y", content, relationship: [] };
   const path = join(folder, "zeros.docx");

@@ -11,7 +11,7 @@ import { test } from "node:test";
 import { setTimeout as sleep } from "node:timers/promises";
 
 import { MessageServer } from "./message_server.mjs";
-import { IS_LONG, IS_SANITIZED, temporaryFolder } from "./processes.mjs";
+import { IS_LONG, IS_SANITIZED, atEnd, temporaryFolder } from "./processes.mjs";
 
 const MEGABYTE = 1_000_000;
 
@@ -46,7 +46,7 @@ async function slowLine(test, port, rate) {
     })().catch(() => {});
   });
   await new Promise((resolve) => line.listen(0, "127.0.0.1", resolve));
-  test.after(() => line.close());
+  atEnd(test, () => line.close());
   return line.address().port;
 }
 

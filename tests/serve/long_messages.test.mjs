@@ -11,7 +11,7 @@ import { headers } from "../../web/client/node_modules/@nats-io/nats-core/lib/mo
 import { AskAgain, connect, utf8 } from "../../web/client/dist/index.js";
 import { parseUrl } from "./client.mjs";
 import { MessageServer } from "./message_server.mjs";
-import { Host, IS_SANITIZED, temporaryFolder, waitFor } from "./processes.mjs";
+import { Host, IS_SANITIZED, atEnd, temporaryFolder, waitFor } from "./processes.mjs";
 import "./web_socket.mjs";
 
 const MEGABYTES = IS_SANITIZED ? 5 : 60;
@@ -19,7 +19,7 @@ const MEGABYTES = IS_SANITIZED ? 5 : 60;
 async function clientOf(test, host) {
   const { server, user, password } = parseUrl(host.webSocket);
   const client = await connect({ servers: server, user, pass: password });
-  test.after(() => client.close());
+  atEnd(test, () => client.close());
   return client;
 }
 

@@ -5,7 +5,7 @@ import { createServer } from "node:net";
 import { join } from "node:path";
 
 import { connect } from "../../web/client/dist/index.js";
-import { HOST, Program, ROOT, waitFor } from "./processes.mjs";
+import { HOST, Program, ROOT, atEnd, waitFor } from "./processes.mjs";
 import "./web_socket.mjs";
 
 export async function freePorts(count) {
@@ -108,7 +108,7 @@ export class MessageServer {
   async connect(user, { port = this.webSocketPort, ...options } = {}) {
     const servers = `ws://127.0.0.1:${port}`;
     const client = await connect({ servers, user, pass: PASSWORD, reconnectTimeWait: 100, ...options });
-    this.test.after(() => client.close());
+    atEnd(this.test, () => client.close());
     return client;
   }
 }

@@ -7,7 +7,7 @@ import { join } from "node:path";
 import { test } from "node:test";
 
 import { Client } from "./client.mjs";
-import { Host, IS_SANITIZED, ROOT, temporaryFolder, waitFor } from "./processes.mjs";
+import { Host, IS_SANITIZED, ROOT, atEnd, temporaryFolder, waitFor } from "./processes.mjs";
 
 // A host whose root is a folder with one text.
 async function startWithMetrics(test) {
@@ -36,7 +36,7 @@ function valueOf(metrics, name) {
 test("it counts what it is asked, by kind and outcome", async (t) => {
   const { host, root, url } = await startWithMetrics(t);
   const client = await Client.connect(host.webSocket);
-  t.after(() => client.close());
+  atEnd(t, () => client.close());
   await client.read(join(root, "file.txt"));
   await client.read(join(root, "file.txt"));
   await client.read(join(root, "none.docx"), "text/xml");

@@ -25,6 +25,7 @@ import {
   IS_SANITIZED,
   Program,
   ROOT,
+  atEnd,
   isRunning,
   temporaryFolder,
   waitFor,
@@ -35,7 +36,7 @@ const UNRESPONSIVE_BUNDLE = process.env.UNRESPONSIVE_BUNDLE;
 
 async function connected(test, host, options) {
   const client = await Client.connect(host.webSocket, options);
-  test.after(() => client.close());
+  atEnd(test, () => client.close());
   return client;
 }
 
@@ -210,7 +211,7 @@ test("its message server is listened to while clients take their last answers", 
   const host = await Host.start(t, []);
   const { user } = parseUrl(host.nats);
   const slow = await RawClient.connect(host.nats);
-  t.after(() => slow.close());
+  atEnd(t, () => slow.close());
   const rtcId = `${user}.slow`;
   slow.send(`SUB ${READ_RESPONSE}${rtcId} 1\r\n`);
   // More than sockets hold.
@@ -220,7 +221,7 @@ test("its message server is listened to while clients take their last answers", 
   await slow.waitFor("MSG ");
   slow.socket.pause();
   const forger = await RawClient.connect(host.nats);
-  t.after(() => forger.close());
+  atEnd(t, () => forger.close());
   host.signal("SIGTERM");
   await waitFor("the signal", () => host.errors.includes("asked to by signal 15"));
   // The server has a line to say about each: more than a pipe holds.

@@ -18,10 +18,31 @@ export const IS_LONG = process.env.EDITOR_SERIALIZATION_LONG_TESTS === "1";
 
 export const ROOT = new URL("../../", import.meta.url).pathname;
 
+const actionsAtEnd = new WeakMap();
+
+// Has `action` done when the test is over, after those that are asked for later: a client leaves before its server
+// ends, and that before its folder is removed. Hooks of `test` itself run the other way round.
+export function atEnd(test, action) {
+  if (!actionsAtEnd.has(test)) {
+    const actions = [];
+    actionsAtEnd.set(test, actions);
+    test.after(async () => {
+      const failures = [];
+      while (actions.length > 0) {
+        await Promise.resolve().then(actions.pop()).catch((failure) => failures.push(failure));
+      }
+      if (failures.length > 0) {
+        throw failures[0];
+      }
+    });
+  }
+  actionsAtEnd.get(test).push(action);
+}
+
 // A new folder, which is removed when the test is over.
-export function temporaryFolder(test) {
-  const folder = mkdtempSync(join(tmpdir(), "serve-test-"));
-  test.after(() => rmSync(folder, { recursive: true, force: true }));
+export function temporaryFolder(test, parent = tmpdir()) {
+  const folder = mkdtempSync(join(parent, "serve-test-"));
+  atEnd(test, () => rmSync(folder, { recursive: true, force: true }));
   return folder;
 }
 
@@ -79,7 +100,7 @@ export class Program {
         resolve(status ?? signal);
       });
     });
-    test.after(() => this.kill());
+    atEnd(test, () => this.kill());
   }
 
   get id() {

@@ -10,7 +10,7 @@ import { test } from "node:test";
 import { setTimeout as sleep } from "node:timers/promises";
 
 import { Client, WRITE_REQUEST, encode } from "./client.mjs";
-import { HOST, IS_SANITIZED, Program, temporaryFolder, waitFor } from "./processes.mjs";
+import { HOST, IS_SANITIZED, Program, atEnd, temporaryFolder, waitFor } from "./processes.mjs";
 
 const KILLS = Number(process.env.SAVES_KILLS ?? 12);
 const PAIRS = Number(process.env.SAVES_PAIRS ?? 40);
@@ -48,7 +48,7 @@ async function setUp(t) {
     return file && JSON.parse(readFileSync(join(folder, file), "utf8") || "null");
   });
   const client = await Client.connect(ports.websocket[0].replace("ws://", "ws://ada:x@"));
-  t.after(() => client.close());
+  atEnd(t, () => client.close());
   const startWorkers = async (count) => {
     const options = ["--root", documents, "--nats", ports.nats[0], "--history", join(folder, "state")];
     const workers = Array.from({ length: count }, () => new Program(t, [HOST, "serve", ...options]));

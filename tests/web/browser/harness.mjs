@@ -6,7 +6,7 @@ import { createRequire } from "node:module";
 import { dirname, join } from "node:path";
 import { after, test } from "node:test";
 
-import { Host, ROOT, temporaryFolder, waitFor } from "../../serve/processes.mjs";
+import { Host, ROOT, atEnd, temporaryFolder, waitFor } from "../../serve/processes.mjs";
 
 const { chromium } = createRequire(join(ROOT, "web/package.json"))("playwright-core");
 
@@ -66,8 +66,8 @@ export class Session {
   static async start(test, files = {}, { hostOptions = [], expectedProblems = [], ...contextOptions } = {}) {
     const session = new Session(test, files);
     session.expectedProblems = expectedProblems;
-    test.after(() => session.#end()); // before the host ends, which the page would complain of
     session.host = await Host.start(test, ["--listen", "127.0.0.1:0", "--root", session.folder, ...hostOptions]);
+    atEnd(test, () => session.#end()); // before the host ends, which the page would complain of
     session.contextOptions = { locale: "en-US", ...contextOptions };
     session.context = await session.#newContext();
     session.page = await session.newPage();

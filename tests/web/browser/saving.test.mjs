@@ -4,7 +4,7 @@
 import assert from "node:assert/strict";
 import { chmodSync, unlinkSync } from "node:fs";
 
-import { waitFor } from "../../serve/processes.mjs";
+import { atEnd, waitFor } from "../../serve/processes.mjs";
 import { clientOf } from "./client.mjs";
 import { browserTest, Session } from "./harness.mjs";
 
@@ -252,7 +252,7 @@ browserTest("a save that cannot be made says what may be the matter, and keeps t
   await type(page, "mine ");
   chmodSync(session.path("a.txt"), 0o444);
   chmodSync(session.folder, 0o555);
-  t.after(() => chmodSync(session.folder, 0o755));
+  atEnd(t, () => chmodSync(session.folder, 0o755));
   await page.keyboard.press("Control+s");
   await page.getByText(/write-protected/).waitFor();
   await isUnsaved(page, "a.txt");
