@@ -31,7 +31,7 @@ export class Client {
   static async connect(url, options = {}) {
     const { server, user, password } = parseUrl(url);
     return new Client(
-      await wsconnect({ servers: server, user, pass: password, timeout: 60_000, ...options }),
+      await wsconnect({ servers: server, user, pass: password, timeout: 240_000, ...options }),
       user,
     );
   }
@@ -43,7 +43,7 @@ export class Client {
   }
 
   // The answer to a request; asks again when there is none in `seconds`, up to `tries` times.
-  async ask(requestChannel, responsePrefix, request, { seconds = 60, tries = 1 } = {}) {
+  async ask(requestChannel, responsePrefix, request, { seconds = 240, tries = 1 } = {}) {
     for (let left = tries; left > 0; --left) {
       const rtcId = `${this.idPrefix}-${++this.requests}`;
       const subscription = this.connection.subscribe(responsePrefix + rtcId, {

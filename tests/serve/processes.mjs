@@ -47,7 +47,7 @@ export function temporaryFolder(test, parent = tmpdir()) {
 }
 
 // Waits until `condition` returns something that counts as true, and returns that.
-export async function waitFor(what, condition, seconds = 60) {
+export async function waitFor(what, condition, seconds = 240) {
   const latest = Date.now() + seconds * 1000;
   for (;;) {
     const result = await condition();
