@@ -99,28 +99,28 @@ std::size_t lengthOf(const std::u16string& path) {
 /// Everything that `file` still holds, which is probably `expectedSize` bytes.
 /// Throws std::system_error on an input error, and as soon as it is more than a text may have.
 std::string readToEnd(const FileDescriptor& file, std::size_t expectedSize) {
+    // A string fills what it becomes longer by with zeros: of a piece, these are still in the
+    // processor's cache when the file's bytes take their place.
     constexpr std::size_t smallestPiece = 4096;
+    constexpr std::size_t largestPiece = 256 * 1024;
+    const std::size_t piece = std::clamp(expectedSize + 1, smallestPiece, largestPiece);
     std::string bytes;
-    std::size_t length = 0;
     // One byte more than expected, so that the end is seen without growing.
-    const std::size_t room = std::max(expectedSize + 1, smallestPiece);
-    bytes.resize(room);
+    bytes.reserve(std::max(expectedSize + 1, piece));
     for (;;) {
-        const ssize_t count = ::read(file.get(), bytes.data() + length, bytes.size() - length);
-        if (count < 0 && errno == EINTR) {
-            continue;
+        const std::size_t length = bytes.size();
+        if (length == bytes.capacity()) {
+            requireTextLength(length);
+            bytes.reserve(length * 2);
         }
-        if (count < 0) {
+        bytes.resize(std::min(length + piece, bytes.capacity()));
+        const ssize_t count = ::read(file.get(), bytes.data() + length, bytes.size() - length);
+        if (count < 0 && errno != EINTR) {
             platform::throwSystemError("The file cannot be read");
         }
+        bytes.resize(length + static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
         if (count == 0) {
-            bytes.resize(length);
             return bytes;
-        }
-        length += static_cast<std::size_t>(count);
-        if (length == bytes.size()) {
-            requireTextLength(length);
-            bytes.resize(bytes.size() * 2);
         }
     }
 }
