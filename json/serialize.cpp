@@ -8,7 +8,6 @@
 #include <cmath>
 #include <iterator>
 #include <limits>
-#include <optional>
 #include <stack>
 #include <string_view>
 #include <type_traits>
@@ -147,9 +146,9 @@ private:
 /// Writes the text of a tree, until it turns out longer than allowed.
 class Writer {
 public:
-    /// `memory` gets the text; it is enlarged where `estimate` turns out too low.
-    Writer(std::string& memory, std::size_t estimate, std::size_t limit)
-        : text(memory), maxLength(limit) {
+    /// `resize` makes the memory for the text; it is enlarged where `estimate` turns out too low.
+    Writer(const TextMemory& resize, std::size_t estimate, std::size_t limit)
+        : resizeText(resize), maxLength(limit) {
         enlarge(0, estimate);
     }
 
@@ -197,14 +196,16 @@ public:
             position = std::to_chars(position, end, number).ptr;
     }
 
-    /// Ends the text. Returns false when it is too long.
+    /// Gives up the memory that is not used. Returns false when the text is too long.
     bool finish() {
-        text.resize(length());
-        return !tooLong && text.size() <= maxLength;
+        if (tooLong || length() > maxLength)
+            return false;
+        resizeText(length());
+        return true;
     }
 
 private:
-    std::size_t length() const { return static_cast<std::size_t>(position - text.data()); }
+    std::size_t length() const { return static_cast<std::size_t>(position - begin); }
 
     void put(char c) {
         if (require(1))
@@ -224,7 +225,7 @@ private:
     /// Makes room for `wanted` more bytes, or for as many as are allowed. `certain`: how many bytes
     /// will be written at least; returns false when the text is too long with them.
     bool enlarge(std::size_t certain, std::size_t wanted) {
-        const std::size_t used = end == nullptr ? 0 : length();
+        const std::size_t used = length();
         if (used > maxLength || certain > maxLength - used) {
             tooLong = true;
             return false;
@@ -232,37 +233,45 @@ private:
         // A little more than allowed, since each write needs room for the longest text that it
         // could produce.
         constexpr std::size_t margin = 2 * longestNumber;
-        const std::size_t most = maxLength + std::min(margin, text.max_size() - maxLength);
-        const std::size_t size = std::min(used + std::max(wanted, used / 2), most);
-        detail::overwrite(text, size, [size](char*) { return size; });
-        position = text.data() + used;
-        end = text.data() + text.size();
+        const std::size_t size = std::min(used + std::max(wanted, used / 2), maxLength + margin);
+        begin = resizeText(size);
+        position = begin + used;
+        end = begin + size;
         return true;
     }
 
     static constexpr std::ptrdiff_t longestNumber = 32;
 
     const detail::StringKernels& kernels = detail::stringKernels();
-    std::string& text;
+    const TextMemory& resizeText;
     const std::size_t maxLength;
     bool tooLong = false;
+    char* begin = nullptr;  // of the memory
     char* position = nullptr;
-    char* end = nullptr;  // of the memory
+    char* end = nullptr;
 };
+
+char* resize(std::string& text, std::size_t size) {
+    detail::overwrite(text, size, [size](char*) { return size; });
+    return text.data();
+}
 
 }  // namespace
 
-std::optional<std::string> serialize(const Value& value, std::size_t maxLength) {
+bool serialize(const Value& value, std::size_t maxLength, const TextMemory& resize) {
+    constexpr std::size_t longest = std::numeric_limits<std::ptrdiff_t>::max() / 2;
     Estimate estimate;
     TreeWalk(estimate).walk(value);
-    std::string text;
-    Writer writer(text, estimate.length, std::min(maxLength, text.max_size()));
+    Writer writer(resize, estimate.length, std::min(maxLength, longest));
     TreeWalk(writer).walk(value);
-    return writer.finish() ? std::optional(std::move(text)) : std::nullopt;
+    return writer.finish();
 }
 
 std::string serialize(const Value& value) {
-    return serialize(value, std::numeric_limits<std::size_t>::max()).value();
+    std::string text;
+    const auto resizeText = [&text](std::size_t size) { return resize(text, size); };
+    serialize(value, std::numeric_limits<std::size_t>::max(), resizeText);
+    return text;
 }
 
 }  // namespace json

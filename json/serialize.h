@@ -3,7 +3,7 @@
 #pragma once
 
 #include <cstddef>
-#include <optional>
+#include <functional>
 #include <string>
 
 #include "json/value.h"
@@ -20,8 +20,12 @@ namespace json {
 /// Takes time linear in the size of the text, and no stack in proportion to the nesting.
 std::string serialize(const Value& value);
 
-/// The same, or nothing when the text has more than `maxLength` bytes. Takes memory for little more
-/// than `maxLength` bytes, however long the text would be.
-std::optional<std::string> serialize(const Value& value, std::size_t maxLength);
+/// Makes the memory of a text `size` bytes long, keeping what it holds, and returns its beginning.
+using TextMemory = std::function<char*(std::size_t size)>;
+
+/// Writes the same text into memory from `resize`, which is called last with the length of the
+/// text. Returns false, after a part of it, when the text has more than `maxLength` bytes. Asks for
+/// little more than `maxLength` bytes, however long the text would be. Throws what `resize` throws.
+bool serialize(const Value& value, std::size_t maxLength, const TextMemory& resize);
 
 }  // namespace json

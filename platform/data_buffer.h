@@ -71,6 +71,23 @@ public:
     /// Declares the first `length` bytes to be in use. `length` is at most `capacity()`.
     void setLength(std::size_t length) noexcept { length_ = length; }
 
+    /// Makes storage for exactly `size` bytes and declares all of them to be in use: first those
+    /// that were, then any. Throws as the constructor does, and leaves the buffer as it was.
+    void resize(std::size_t size) {
+        if (size == 0) {
+            *this = {};
+            return;
+        }
+        void* const storage = std::realloc(data_.get(), size);
+        if (storage == nullptr) {
+            throw std::runtime_error("Out of memory!");
+        }
+        static_cast<void>(data_.release());  // freed, or the same as `storage`
+        data_.reset(static_cast<char*>(storage));
+        capacity_ = size;
+        length_ = size;
+    }
+
     /// The bytes in use. Valid as long as `data()` is.
     std::string_view view() const noexcept { return {data_.get(), length_}; }
 

@@ -21,6 +21,17 @@ std::string tooLarge(std::size_t longestAnswer) {
            std::to_string(longestAnswer) + " bytes that can be sent";
 }
 
+/// The JSON text of `value`, which is not kept beside it; nothing when it is longer than
+/// `maxLength` bytes. Throws std::runtime_error "Out of memory!".
+std::optional<DataBuffer> messageOf(json::Value value, std::size_t maxLength) {
+    DataBuffer message;
+    const bool isWhole = json::serialize(value, maxLength, [&message](std::size_t size) {
+        message.resize(size);
+        return message.data();
+    });
+    return isWhole ? std::optional(std::move(message)) : std::nullopt;
+}
+
 }  // namespace
 
 Serialization::Serialization() {
@@ -44,22 +55,17 @@ bool Serialization::isControl(char16_t unit) const noexcept {
 }
 
 void Serialization::publish(const std::string& channel, json::Value value) const {
-    const std::string text = json::serialize(value);
-    // A large document must not be held three times.
-    value = json::Value();
-    messageService->publish(channel, DataBuffer::copyOf(text));
+    messageService->publish(channel, messageOf(std::move(value), anyLength).value());
 }
 
 void Serialization::publishReadResult(const std::string& channel, json::Value result,
                                       std::size_t longestAnswer) const {
-    const std::optional<std::string> text = json::serialize(result, longestAnswer);
-    if (!text) {
+    std::optional<DataBuffer> message = messageOf(std::move(result), longestAnswer);
+    if (!message) {
         publish(channel, json::Object{{exceptionKey, tooLarge(longestAnswer)}, {statusKey, false}});
         return;
     }
-    // A large document must not be held three times.
-    result = json::Value();
-    messageService->publish(channel, DataBuffer::copyOf(*text));
+    messageService->publish(channel, std::move(*message));
 }
 
 // Reading a text takes up to three times its bytes beside them, for UTF-16 and the charset's own

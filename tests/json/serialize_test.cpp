@@ -9,7 +9,9 @@
 #include <cstdint>
 #include <limits>
 #include <optional>
+#include <stdexcept>
 #include <string>
+#include <vector>
 
 #include "json/parser.h"
 #include "tests/json/random_json.h"
@@ -166,22 +168,50 @@ TEST(RoundTrip, GivesBackTypedIntegers) {
     EXPECT_EQ(parse(serialize(unsignedObject)), unsignedObject);
 }
 
-TEST(Serialize, GivesNothingWhenTheTextIsLongerThanAllowed) {
+/// The text in memory of exactly its length, or nothing when it has more than `maxLength` bytes.
+std::optional<std::string> serializeInto(const Value& value, std::size_t maxLength) {
+    std::vector<char> memory;
+    const bool isWhole = serialize(value, maxLength, [&](std::size_t size) {
+        EXPECT_LE(size, maxLength + 100);
+        memory.resize(size);
+        memory.shrink_to_fit();  // so that it moves
+        return memory.data();
+    });
+    return isWhole ? std::optional(std::string(memory.begin(), memory.end())) : std::nullopt;
+}
+
+TEST(SerializeInto, GivesNothingWhenTheTextIsLongerThanAllowed) {
     RandomJson random(1);
     for (int i = 0; i < 500; ++i) {
         const Value value = random.tree(i % 20);
         const std::string text = serialize(value);
-        EXPECT_EQ(serialize(value, text.size()), text);
-        EXPECT_EQ(serialize(value, text.size() + 1), text);
+        EXPECT_EQ(serializeInto(value, text.size()), text);
+        EXPECT_EQ(serializeInto(value, text.size() + 1), text);
         for (std::size_t length = text.size(); length > 0; length /= 2)
-            EXPECT_EQ(serialize(value, length - 1), std::nullopt) << text;
+            EXPECT_EQ(serializeInto(value, length - 1), std::nullopt) << text;
     }
 }
 
-TEST(Serialize, GivesNothingForAStringWhoseEscapesMakeItTooLong) {
+TEST(SerializeInto, GivesNothingForAStringWhoseEscapesMakeItTooLong) {
     const Value value = std::string(10'000, '\0');
-    EXPECT_EQ(serialize(value, 60'001), std::nullopt);
-    EXPECT_EQ(serialize(value, 60'002), serialize(value));
+    EXPECT_EQ(serializeInto(value, 60'001), std::nullopt);
+    EXPECT_EQ(serializeInto(value, 60'002), serialize(value));
+}
+
+TEST(SerializeInto, PassesOnWhatItsMemoryThrows) {
+    const Value value = std::string(10'000, 'x');
+    for (int allowed = 0; allowed < 2; ++allowed) {
+        std::string memory;
+        int calls = 0;
+        const auto resize = [&](std::size_t size) {
+            if (calls++ == allowed)
+                throw std::runtime_error("Out of memory!");
+            memory.resize(size);
+            return memory.data();
+        };
+        EXPECT_THROW(serialize(value, 1'000'000, resize), std::runtime_error);
+        EXPECT_EQ(calls, allowed + 1);
+    }
 }
 
 }  // namespace

@@ -3,6 +3,10 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <cstring>
+#include <limits>
+#include <stdexcept>
 #include <string>
 #include <utility>
 
@@ -34,6 +38,29 @@ TEST(DataBuffer, HasNoneOfItsBytesInUseAtFirst) {
     buffer.data()[0] = 'x';
     buffer.setLength(1);
     EXPECT_EQ(buffer.view(), "x");
+}
+
+TEST(DataBuffer, KeepsItsBytesWhenItIsResized) {
+    DataBuffer buffer;
+    std::string expected;
+    for (const std::size_t size : {3U, 100'000U, 20'000'000U, 100'000U, 5U}) {
+        const std::size_t kept = std::min(size, expected.size());
+        buffer.resize(size);
+        ASSERT_EQ(buffer.length(), size);
+        EXPECT_EQ(buffer.capacity(), size);
+        EXPECT_TRUE(buffer.view().substr(0, kept) == expected.substr(0, kept));
+        std::memset(buffer.data() + kept, static_cast<int>(size % 128), size - kept);
+        expected = buffer.view();
+    }
+    buffer.resize(0);
+    EXPECT_EQ(buffer.data(), nullptr);
+    EXPECT_EQ(buffer.capacity(), 0U);
+}
+
+TEST(DataBuffer, StaysAsItWasWhenThereIsNoMemoryToResizeIt) {
+    DataBuffer buffer = DataBuffer::copyOf("text");
+    EXPECT_THROW(buffer.resize(std::numeric_limits<std::size_t>::max() / 2), std::runtime_error);
+    EXPECT_EQ(buffer.view(), "text");
 }
 
 TEST(DataBuffer, GivesItsStorageAwayWhenItIsMoved) {

@@ -63,7 +63,7 @@ extern "C" [[gnu::visibility("default")]] void* realloc(void* memory, std::size_
     if (moved == nullptr && size != 0) {
         taken(memory, 0);  // stays as it was
     }
-    return taken(moved, size);
+    return taken(moved, moved == memory ? 0 : size);  // noted only where it is memory anew
 }
 
 extern "C" [[gnu::visibility("default")]] void* aligned_alloc(std::size_t alignment,
