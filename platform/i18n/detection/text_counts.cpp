@@ -12,7 +12,6 @@ namespace {
 // The cost of any ASCII character: about the entropy of letters by themselves, punctuation
 // included.
 constexpr Cost asciiBits = bits(5);
-// A control character that texts do not hold.
 constexpr Cost strayControlBits = bits(20);
 
 // Counts keys: a hash table with open addressing.
@@ -71,10 +70,7 @@ bool isWordUnit(char16_t unit) {
 }
 
 Cost costOfAscii(char16_t unit) {
-    const bool isStray =
-        (unit < 0x20 && !(unit >= '\t' && unit <= '\r') && unit != 0x1B && unit != 0x1A) ||
-        unit == 0x7F;
-    return isStray ? strayControlBits : asciiBits;
+    return isStrayControl(static_cast<char>(unit)) ? strayControlBits : asciiBits;
 }
 
 std::uint64_t keyOf(char16_t first, char16_t second, char16_t third = 0) {

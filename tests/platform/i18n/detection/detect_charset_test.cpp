@@ -5,6 +5,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <array>
 #include <random>
 #include <sstream>
 #include <stdexcept>
@@ -204,6 +205,25 @@ TEST(DetectCharset, TakesAsciiForItselfHoweverManyItsAtSigns) {
             c = random() % 6 == 0 ? '@' : letters[random() % letters.size()];
         }
         EXPECT_EQ(detect(text), "UTF-8") << text;
+    }
+}
+
+// There, DEL is a quotation mark and @ a blank.
+TEST(DetectCharset, TakesNoTextWithManyDeletesForEbcdic) {
+    constexpr std::array separators{"\x7F", "@\x7F", "\x7F\x7F@"};
+    constexpr std::array words{"the", "quick", "user", "NAME", "FOX", "A"};
+    std::mt19937 random(5);
+    for (int round = 0; round < 1000; ++round) {
+        const char* const separator = separators[random() % separators.size()];
+        std::string text;
+        for (std::size_t i = 1 + random() % 60; i != 0; --i) {
+            text += words[random() % words.size()];
+            text += separator;
+        }
+        EXPECT_EQ(detect(text), "UTF-8") << text;
+        text += std::string("caf\xE9") + separator + "d\xE9j\xE0" + separator;
+        EXPECT_NE(detect(text), "IBM037") << text;
+        EXPECT_NE(detect(text), "IBM424") << text;
     }
 }
 
