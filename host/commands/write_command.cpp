@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "host/commands/write_command.h"
 
-#include <malloc.h>
 #include <simdjson.h>
 #include <spdlog/spdlog.h>
 
@@ -27,6 +26,7 @@
 #include "host/commands/stop_signals.h"
 #include "host/commands/text_file.h"
 #include "host/exit_status.h"
+#include "host/limits/freed_memory.h"
 #include "host/standard_streams.h"
 #include "json/serialize.h"
 #include "json/value.h"
@@ -132,7 +132,7 @@ void requireNoDocument(const WriteOptions& options, const std::string& why) {
 
 struct Request {
     platform::DataBuffer text;  // empty when it is known to fail
-    std::string refusal;        // why it fails; empty when nothing is seen that speaks against it
+    std::string refusal;        // why it fails; empty when no reason is known
 };
 
 Request makePackageRequest(const WriteOptions& options, PackageText package) {
@@ -214,7 +214,7 @@ std::string whyNoAnswer(const std::string& file) {
 // Sends `request` to the bundle. Returns its answer; nothing when there is none.
 std::optional<std::string> send(const WriteOptions& options, platform::DataBuffer request) {
     // The threads that answer the request cannot use the memory that parsing the content has taken.
-    ::malloc_trim(0);
+    returnFreedMemory();
     // A first signal to end does not cut a save short; a second one does.
     blockStopSignals();
     const StopSignals signals([] {});
