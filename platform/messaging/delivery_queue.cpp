@@ -54,7 +54,7 @@ private:
     bool ended_ = false;
 
     // The messages left at the end, to be destroyed without the mutex. Made with the queue, because
-    // even an empty one takes memory, and closing a queue must not need any.
+    // even an empty deque allocates, and closing a queue must not.
     std::deque<QueuedMessage> dropped_;
 };
 

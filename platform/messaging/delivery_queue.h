@@ -26,8 +26,8 @@ public:
     /// Queues `message`, or drops it when the queue is closed. Any thread may call it.
     void push(QueuedMessage message);
 
-    /// Drops what is queued and ends delivery, with the promise of DeliveryThreads::close. Must be
-    /// called once, or by one thread at a time.
+    /// Drops what is queued and ends delivery, with the guarantee of DeliveryThreads::close. Must
+    /// be called once, or by one thread at a time.
     void close();
 
 private:

@@ -55,10 +55,10 @@ public:
     /// A client that is known to observers as `clientName`. Names need not differ.
     futures::Future<std::shared_ptr<MessageService>> connect(const std::string& clientName);
 
-    /// Has `observer` called for every message that the bus accepts, on the publishing thread,
-    /// before the message is delivered and before `publish` returns: a slow observer slows the
-    /// publisher down. Several threads may be in it at once. It lasts as long as the returned
-    /// handle, with the promise that `Subscription` gives.
+    /// Calls `observer` for every message that the bus accepts, on the publishing thread, before
+    /// the message is delivered and before `publish` returns: a slow observer slows the publisher
+    /// down. Several threads may call it at once. It lasts as long as the returned handle, with the
+    /// guarantee that `Subscription` gives.
     [[nodiscard]] std::shared_ptr<Subscription> observe(MessageObserver observer);
 
     /// Blocks until every message that was accepted, also those that handlers publish, has been

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// A share of the process's memory, from which requests and messages take theirs: what is large
-// reserves its bytes before it allocates them.
+// A budget for the memory of requests and messages: what is large reserves its bytes before it
+// allocates them.
 #pragma once
 
 #include <cstddef>
@@ -68,8 +68,8 @@ public:
     /// budget has fewer bytes altogether.
     Reservation reserve(std::size_t bytes);
 
-    /// Has `callback` called whenever bytes have been given back, on the thread that gives them
-    /// back: those that `tryReserve` has refused may try again. It must neither throw nor end the
+    /// Calls `callback` whenever bytes have been given back, on the thread that gives them back:
+    /// whoever was refused by `tryReserve` may try again. It must neither throw nor end the
     /// handle, and it must not take a lock that is held while bytes are given back. It lasts as
     /// long as the returned handle: when the handle's destruction returns, it is not running and
     /// will not run again.

@@ -65,7 +65,7 @@ public:
     MessageService& operator=(const MessageService&) = delete;
     virtual ~MessageService() = default;
 
-    /// Has `handler` called for every message that is published on `channel` once the future has
+    /// Calls `handler` for every message that is published on `channel` once the future has
     /// resolved: on the bus's own threads, one at a time and in order unless the channel is set to
     /// concurrent delivery. An exception that leaves the handler is logged with the channel and
     /// dropped.
@@ -76,16 +76,16 @@ public:
     /// when the bus has accepted the message, or holds an exception when it has not.
     virtual futures::Future<void> publish(const std::string& channel, DataBuffer payload) = 0;
 
-    /// The length, in bytes, of the longest payload that can be published on `channel` now. Whoever
-    /// builds a message can stop when it gets longer. Services without such a limit need not
+    /// The length, in bytes, of the longest payload that can be published on `channel` now: a
+    /// caller may stop building a message that gets longer. Services without such a limit need not
     /// override this.
     virtual std::size_t maxPayload([[maybe_unused]] const std::string& channel) const {
         return std::numeric_limits<std::size_t>::max();
     }
 
-    /// Returns when there is memory of `bytes` for the message that the calling handler handles.
-    /// The handler has it until it returns, or asks again, for other bytes then. Whoever is about
-    /// to take much memory asks before; services that do not share it out need not override this.
+    /// Waits until `bytes` bytes of memory are free for the calling handler, and reserves them
+    /// until it returns or calls this again. To be called before a large document is read; services
+    /// that do not limit memory need not override this.
     virtual void awaitMemory([[maybe_unused]] std::size_t bytes) {}
 };
 

@@ -31,7 +31,7 @@ void enter(Map& types, std::string key, std::string_view mediaType) {
     }
 }
 
-// Whether `extension` can stand in a default: other ones would have to be compared after escaping.
+// Whether `extension` may get a default: with other characters, readers would compare its escapes.
 bool canHaveDefault(std::string_view extension) {
     return !extension.empty() && std::all_of(extension.begin(), extension.end(), [](char c) {
         return (c >= 'a' && c <= 'z') || (c >= '0' && c <= '9') || c == '-' || c == '_';

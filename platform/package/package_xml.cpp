@@ -30,8 +30,8 @@ constexpr char separator = '\n';
 // keeps all elements that are open, and a document of nothing else would take fifty times its size.
 constexpr std::size_t maxDepth = 256;
 
-// What the parser's hash tables are salted with, so that nobody can make a document whose names
-// collide. By itself, the parser gets a salt in a way that ends the process if there is none.
+// The salt of the parser's hash tables, so that nobody can make a document whose names collide.
+// Left to choose one itself, the parser ends the process when the system has no random number.
 unsigned long hashSalt() {
     static const unsigned long salt = [] {
         unsigned long number = 0;

@@ -27,7 +27,7 @@ public:
     QuilletFileReader& operator=(const QuilletFileReader&) = delete;
     ~QuilletFileReader();
 
-    /// The size of the package, before memory is taken for its parts. The file stays open for
+    /// The size of the package, without allocating its parts. The file stays open for
     /// read(). Throws what read() throws, but says nothing about what is in the parts.
     PackageSize size();
 

@@ -237,7 +237,7 @@ std::string AtomicFile::temporaryPath() const {
 }
 
 void AtomicFile::startSync() const noexcept {
-    ::sync_file_range(temporary_.get(), 0, 0, SYNC_FILE_RANGE_WRITE);  // all is as well without it
+    ::sync_file_range(temporary_.get(), 0, 0, SYNC_FILE_RANGE_WRITE);  // may fail: commit() syncs
 }
 
 void AtomicFile::write(std::string_view bytes) {

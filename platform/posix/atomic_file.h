@@ -43,7 +43,7 @@ public:
     bool canStandForTarget() const;
 
     /// What is at the target's name now, opened to be read; none where there is no regular file, or
-    /// it may not be read. A lease that another program holds is waited for.
+    /// it may not be read. Waits for a lease that another program holds.
     FileDescriptor openTarget() const;
 
     /// The temporary file, open for reading and writing until the commit.
@@ -59,8 +59,8 @@ public:
     /// Whether the new content has replaced the old.
     bool isCommitted() const noexcept { return temporaryName_.empty(); }
 
-    /// Has the system begin to write to the disk what is in the temporary file, so that commit()
-    /// need not wait for as much. Returns at once.
+    /// Starts writing the content of the temporary file to the disk, so that commit() has less to
+    /// wait for. Returns at once.
     void startSync() const noexcept;
 
     /// Appends to the new content. Throws std::system_error when that fails, after which commit

@@ -14,7 +14,7 @@ namespace {
 constexpr std::chrono::milliseconds shortestWait(1);
 constexpr std::chrono::milliseconds longestWait(50);
 
-// Opens the file at `path` once the lease of it is gone. Meanwhile a descriptor that opens nothing
+// Opens the file at `path` once the lease on it is gone. Meanwhile a descriptor that opens nothing
 // refers to the file, which is then opened through it: so it is the same regular file that was
 // examined, whatever has taken its path. Trying again and again is only milliseconds slower than a
 // blocking open, and it ends on systems where the kernel never takes a lease away.

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Opens files without hanging on a pipe that nobody ever opens at the other end, on a device, or on
-// a file of which another program keeps a lease.
+// a file on which another program keeps a lease.
 #pragma once
 
 #include <sys/stat.h>
@@ -18,10 +18,10 @@ namespace platform {
 constexpr std::chrono::milliseconds leasePatience = std::chrono::seconds(60);
 
 /// Opens the file at `path` (UTF-8) with `flags` of open(2), to which it adds those that keep it
-/// from hanging, and with `mode` if that creates the file. Where another program holds a lease of a
-/// regular file, as file servers do, the holder is asked to release it and waited for, as a
-/// blocking open does, but for `patience` at most. Returns no descriptor, with the reason in errno,
-/// if the file cannot be opened; EWOULDBLOCK if the lease was not given up in time.
+/// from hanging, and with `mode` if that creates the file. Where another program holds a lease on a
+/// regular file, as file servers do, the kernel asks the holder to release it; this waits for that
+/// as a blocking open does, but for `patience` at most. Returns no descriptor, with the reason in
+/// errno, if the file cannot be opened; EWOULDBLOCK if the lease was not given up in time.
 ///
 /// What is opened may be anything but a folder: a caller that needs a regular file checks
 /// afterwards, and before, because opening a device can have effects.

@@ -145,9 +145,9 @@ RoundTripCodes* roundTripCodesOf(UConverter* converter) {
     return found->second.get();
 }
 
-// Whether any of `characters` is in `text`. Always goes to the end, in units as wide as those of
-// the text, so that the compiler makes it five times faster than find_first_of, which took a fifth
-// of the time of decoding.
+// Whether any of `characters` is in `text`. Without an early exit, and in units as wide as those of
+// the text, so that the compiler vectorizes it: five times faster than find_first_of, which took a
+// fifth of the time of decoding.
 bool hasAnyOf(std::u16string_view text, std::u16string_view characters) {
     std::uint16_t found = 0;
     for (const char16_t character : characters) {
@@ -293,7 +293,7 @@ private:
 
     std::optional<EncodingFailure> encodeAll(std::u16string_view text, std::string& bytes) {
         if (text.empty()) {
-            // Some converters would put an escape sequence even before empty text.
+            // Some converters would write an escape sequence even for empty text.
             return std::nullopt;
         }
         bytes.reserve(text.size());

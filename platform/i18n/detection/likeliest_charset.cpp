@@ -25,8 +25,8 @@ namespace platform::i18n::detail {
 
 namespace {
 
-// What a text saves in the charset that it names: about as much evidence as ten letters.
-// Declarations are wrong often enough, as documents are converted without them.
+// What a text saves in the charset that it names: about as much evidence as ten letters. Many
+// declarations are wrong, since documents are converted and their declarations are not.
 constexpr Cost hintBits = bits(40);
 
 constexpr Cost infinite = std::numeric_limits<Cost>::max() / 2;
@@ -152,7 +152,7 @@ private:
     }
 
     void consider(const LegacyCharset& charset, Cost cost) {
-        // Of two that cost the same, the commoner one, which stands first among all.
+        // Of two that cost the same, the commoner one, which comes first in the list.
         if (cost < best_.cost || (cost == best_.cost && &charset < best_.charset)) {
             best_ = {&charset, cost};
         }
@@ -201,7 +201,7 @@ private:
         // The commonest pairs decide which candidates are worth pursuing, the rest which is best.
         const std::span<const UnitPair> pairs(counts.pairs);
         const std::size_t few = std::min<std::size_t>(pairs.size(), 64);
-        // A value above what was left to the best when it was found out, where it is above that.
+        // Where one is above the limit that it was computed with, any value above that.
         std::map<const LegacyCharset*, Cost> besideWords;
         for (Reading& reading : readingsOf(pairs.first(few))) {
             const auto [beside, isNew] = besideWords.try_emplace(reading.charset);
@@ -215,7 +215,7 @@ private:
         }
     }
 
-    // The candidates with their costs but for those beside words, the cheapest first.
+    // The candidates with their costs without those beside words, the cheapest first.
     std::vector<Reading> readingsOf(std::span<const UnitPair> pairs) const {
         std::vector<Reading> readings;
         for (const LegacyCharset& charset : legacyCharsets()) {

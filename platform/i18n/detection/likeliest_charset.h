@@ -21,8 +21,8 @@ struct LikelyCharset {
 bool looksLikeEbcdic(std::string_view sample);
 
 /// The charset in which `sample` costs least, of those that can decode it and, as far as its byte
-/// values tell, the whole file `bytes` that it is of; nothing when there is none but those in
-/// `excluded`. Linear in the length of the sample.
+/// values tell, the whole file `bytes` that it was taken from; nothing when there is none but those
+/// in `excluded`. Linear in the length of the sample.
 std::optional<LikelyCharset> likeliestCharset(std::string_view sample, std::string_view bytes,
                                               const std::vector<const LegacyCharset*>& excluded);
 

@@ -34,7 +34,7 @@ std::optional<std::uint64_t> largestBacklog(const nats::Connection& connection,
     if (status == NATS_TIMEOUT) {
         return std::nullopt;
     }
-    nats::check(status, "The NATS server does not tell about its clients");
+    nats::check(status, "The NATS server does not report on its clients");
     const std::unique_ptr<natsMsg, nats::Destroy> reply(received);
     simdjson::dom::parser parser;
     std::uint64_t bytes = 0;
@@ -45,7 +45,7 @@ std::optional<std::uint64_t> largestBacklog(const nats::Connection& connection,
             .at_pointer("/data/connections/0/pending_bytes")
             .get(bytes);
     if (error != simdjson::SUCCESS) {
-        throw std::runtime_error("The NATS server does not tell what waits for its clients.");
+        throw std::runtime_error("The NATS server does not report what waits for its clients.");
     }
     return bytes;
 }

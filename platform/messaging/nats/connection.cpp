@@ -171,8 +171,8 @@ std::string withoutSecrets(std::string_view url) {
 }
 
 // Threads of libnats release connections, and with them OpenSSL's objects, at any time, even while
-// the process exits, when OpenSSL would be cleaned up before them. It is not when its first user
-// asks so, which libnats would be.
+// the process exits, when OpenSSL would have cleaned up already. Whoever initializes OpenSSL first
+// can switch that off, so this has to come before libnats.
 void keepOpenSslToTheEnd() {
     OPENSSL_init_crypto(OPENSSL_INIT_NO_ATEXIT, nullptr);
 }
@@ -215,7 +215,7 @@ SubscriptionHandle Connection::own(natsSubscription* subscription) {
 }
 
 // The thread of libnats 3.4 that reads from the server may still be using a subscription that has
-// been unsubscribed. It is not once it has read the answer to a later ping; without an answer, the
+// been unsubscribed, until it has read the answer to a later ping. Without an answer, the
 // subscription is kept until one comes, or until that thread has ended.
 void Connection::release(natsSubscription* subscription) {
     natsSubscription_Unsubscribe(subscription);

@@ -9,7 +9,7 @@
 namespace platform::messaging::nats {
 namespace {
 
-// How often a waiting client is told that it is still waiting.
+// How often a waiting client is reminded that it is still waiting.
 constexpr std::chrono::seconds reminderInterval{5};
 
 }  // namespace
@@ -126,7 +126,7 @@ bool IncomingTransfers::admitOneOf(Queues::iterator queue, Notes& notes, Time no
 }
 
 // The user whose first offer has waited for the longest, if that is too long. Counted from when it
-// came to be the first, so that a user with many offers does not shut out the others with them.
+// became the first, so that a user with many offers does not shut out the others with them.
 IncomingTransfers::Queues::iterator IncomingTransfers::mostOvertaken(Time now) {
     const auto first = std::ranges::min_element(
         waiting_, {}, [](const Queues::value_type& each) { return each.second.since; });

@@ -10,7 +10,7 @@
 //     piece 1048576, 1 MiB   ------------>
 //                            <------------  room <worker> 5242880
 //     ...
-//     piece 8388608, the rest ----------->    whole: it is handed on
+//     piece 8388608, the rest ----------->    complete: it is handled
 //
 // Either may send "stop" at any time. A piece out of turn or past the room, and a transfer that
 // stands still, end with "stop": nothing is handled and the memory is free again.
@@ -63,8 +63,8 @@ public:
     IncomingTransfers(std::string worker, Limits limits, Reserve reserve)
         : worker_(std::move(worker)), limits_(limits), reserve_(std::move(reserve)) {}
 
-    /// A client offers a request of `length` bytes on `channel`. A client whose offer is known
-    /// already is told its room again.
+    /// A client offers a request of `length` bytes on `channel`. A client that repeats its offer
+    /// gets its room again.
     Notes offer(const std::string& channel, const ReturnAddress& address, std::uint64_t length,
                 Time now);
 
@@ -79,7 +79,7 @@ public:
     /// The client `id` has given up.
     Notes stop(const std::string& id, Time now);
 
-    /// There may be memory again.
+    /// Memory may have become free.
     Notes admitWaiting(Time now);
 
     /// Must be called about every second: ends transfers that stand still, and reminds waiting

@@ -180,8 +180,8 @@ void KeptConnection::add(const std::shared_ptr<NatsSource>& source) {
 
 void KeptConnection::requirePermitted(const std::string& channel) {
     const char* reason = nullptr;
-    // The text is the connection's own and is written anew with each error, such as those of a
-    // reconnection: so it is read only after a refusal.
+    // The connection overwrites its text with each error, such as those of a reconnection: so it is
+    // read only after a refusal.
     if (natsConnection_GetLastError(connection()->get(), &reason) != NATS_NOT_PERMITTED) {
         return;
     }
@@ -223,14 +223,14 @@ void KeptConnection::requireSent(natsStatus status, const Connection& connection
                                  " bytes.");
     }
     if (status == NATS_INSUFFICIENT_BUFFER) {
-        throw std::runtime_error("No server is connected, and as much as may wait for one does.");
+        throw std::runtime_error("No server is connected, and no more messages can wait for one.");
     }
     if (status == NATS_TIMEOUT) {
         // The server has a part of the message and would take what comes next for the rest.
         natsConnection_Close(connection.get());
     }
     check(status, "The message could not be sent");
-    // Not asked from libnats, whose lock is contended by the threads that send and receive.
+    // Not read from libnats, since the threads that send and receive contend for its lock.
     if (disconnected_) {
         unsent_ = true;
     }
@@ -242,7 +242,7 @@ std::size_t KeptConnection::maxPayload() {
         const std::lock_guard lock(mutex_);
         connection = connection_;
     }
-    // Asked each time, since the next server, or this one after it was configured anew, may differ.
+    // Read each time: another server, or this one with another configuration, may differ.
     const std::int64_t limit = connection ? natsConnection_GetMaxPayload(connection->get()) : 0;
     // Zero until a server has reported it.
     return static_cast<std::size_t>(limit > 0 ? std::min(limit, largestMessage) : largestMessage);

@@ -281,8 +281,8 @@ void LongMessages::runTimer() {
     }
 }
 
-// The answers to a request are published nowhere but where those of its channel are, whatever a
-// client has written into the request.
+// Where a client wants its answer; none unless that is below its request channel's answer prefix,
+// so that no client can have messages sent to other channels.
 std::optional<ReturnAddress> LongMessages::addressOf(const std::string& channel,
                                                      natsMsg* received) const {
     const char* const reply = natsMsg_GetReply(received);

@@ -38,8 +38,8 @@ using nats::NatsSource;
 using nats::ReceivedMessage;
 using text::printable;
 
-// The bound on waiting messages about transfers: all that clients may have been told to send, and
-// more.
+// The bounds on waiting messages about transfers: more than all that clients are given room to
+// send.
 constexpr std::size_t maxPendingWords = 1 << 20;
 constexpr std::size_t maxPendingPieces = std::size_t{512} << 20;
 

@@ -128,13 +128,13 @@ public:
     std::uint64_t reconnects() const;
 
     /// What has come and waits to be handled, over all subscriptions, and how many messages the
-    /// subscriptions have dropped because too much waited. It begins anew with each connection.
+    /// subscriptions have dropped because too much waited. It restarts with each connection.
     NatsBacklog backlog() const;
 
-    /// Ends the bus in good order: unsubscribes at the server, has the handlers finish the messages
-    /// that were taken, sends what they published, and closes the connection. Returns false when
-    /// that takes longer than `timeout`; what is left is then given up. From then on every
-    /// operation fails. Also ends a `connect` that is still trying. Must not be called from a
+    /// Shuts the bus down gracefully: unsubscribes at the server, lets the handlers finish the
+    /// messages that were taken, sends what they published, and closes the connection. Returns
+    /// false when that takes longer than `timeout`; what is left is then abandoned. From then on
+    /// every operation fails. Also ends a `connect` that is still trying. Must not be called from a
     /// handler.
     bool drain(std::chrono::milliseconds timeout);
 

@@ -2,7 +2,7 @@
 // Reads zip archives: the directory when the archive is opened, and each entry's bytes on demand.
 //
 // The code of this folder is our own because the libraries for zip archives do not do three things
-// that documents need. They take memory before they check whether entries overlap or claim more
+// that documents need. They allocate memory before they check whether entries overlap or claim more
 // than their data can expand to. They report that an archive is bad, but not what is wrong with
 // which entry. And they cannot write the same bytes for the same entries, or reuse an entry's
 // deflated bytes only where these are known to hold exactly the content.
@@ -40,7 +40,7 @@ public:
     };
 
     /// Opens the archive at the UTF-8 `path` and reads its directory. What is not a regular file is
-    /// refused without waiting; a lease of another program is waited for, for `patience`. Throws
+    /// refused without waiting; another program's lease is waited for, for `patience`. Throws
     /// std::runtime_error saying what is wrong with the file (without its path) or, about one
     /// entry, with its name.
     explicit Archive(const std::string& path, std::chrono::milliseconds patience = leasePatience);
@@ -50,7 +50,7 @@ public:
 
     /// Throws std::runtime_error naming what goes beyond the limits when one of `entries` of this
     /// archive does, or all of them together do, or when one claims a size to which its data cannot
-    /// expand. To be called before memory is taken for them.
+    /// expand. To be called before memory is allocated for them.
     void requireWithinLimits(std::span<const Entry* const> entries) const;
 
     /// Reads and expands `entry` of this archive into `out`, which has `entry.size` bytes, and

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // How much of a package is accepted. A package is expanded into memory as a whole, and a file of a
 // few kilobytes can claim to expand to anything, so all of these are checked against what the
-// archive declares before memory is taken. The writer keeps to them too: what it writes can be
+// archive declares before memory is allocated. The writer keeps to them too: what it writes can be
 // read.
 #pragma once
 

@@ -21,7 +21,7 @@ namespace platform::package::zip {
 /// read from it counts as absent.
 class ReusableEntries {
 public:
-    /// Reads the directory of the archive at the UTF-8 `path`, without waiting for a lease of it.
+    /// Reads the directory of the archive at the UTF-8 `path`, without waiting for a lease on it.
     /// Takes time and memory in proportion to its directory.
     explicit ReusableEntries(const std::string& path);
 
