@@ -110,7 +110,7 @@ private:
         ~ContextEnd() { setContext(nullptr); }
     };
 
-    // Runs code of the bundle. Its exceptions go no further: their types are unloaded with the
+    // Runs code of the bundle. Its exceptions are replaced, since their types are unloaded with the
     // library.
     template <typename Call>
     void attempt(const char* what, Call call) const {

@@ -25,7 +25,7 @@ void waitUntilReady(int fd, short events) {
     }
 }
 
-// True when the call that just failed should be repeated; waits first if need be.
+// True when the call that just failed should be repeated; waits until that makes sense.
 bool shallRetry(int fd, short events) {
     if (errno == EINTR) {
         return true;

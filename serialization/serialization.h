@@ -233,8 +233,8 @@ private:
     void publishReadResult(const std::string& channel, json::Value result,
                            std::size_t longestAnswer) const;
 
-    /// Returns when there is memory for a document of `bytes` with what it takes to answer with it,
-    /// and `more` bytes. Throws std::runtime_error when no answer of up to `longestAnswer` bytes
+    /// Waits until there is memory for a document of `bytes` bytes, its answer, and `more` bytes
+    /// besides. Throws std::runtime_error when no answer of up to `longestAnswer` bytes
     /// can hold it.
     void awaitMemory(std::uintmax_t bytes, std::uintmax_t more, std::size_t longestAnswer) const;
 

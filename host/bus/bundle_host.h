@@ -46,8 +46,8 @@ public:
     void waitUntilIdle();
 
     /// The same, but when that takes longer than `timeout`, calls `giveUp` and ends the process
-    /// with the exit status of a failed request: the bundle is still at work, and any orderly end
-    /// would wait for it.
+    /// with the exit status of a failed request: the bundle is still at work, and a graceful
+    /// shutdown would wait for it.
     void waitUntilIdle(std::chrono::seconds timeout, const std::function<void()>& giveUp);
 
 private:

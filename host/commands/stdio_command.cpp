@@ -103,7 +103,7 @@ int takeMessages(FrameReader& input, BundleHost& host, const std::shared_future<
 }  // namespace
 
 int runStdio(const StdioOptions& options, int input, int output) {
-    // When asked to end, the command takes no more requests but finishes those that it has taken.
+    // On a signal, the command takes no more requests but finishes those that it has taken.
     blockStopSignals();
     FrameOutput frames(output);
     const Guard guard = makeGuard(options.guard, {});

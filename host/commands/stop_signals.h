@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The signals that ask the program to end.
+// The signals that ask the program to shut down.
 #pragma once
 
 #include <functional>
@@ -15,7 +15,7 @@ namespace host {
 /// StopSignals takes them. Must be called before any other thread is started.
 void blockStopSignals();
 
-/// Handles SIGTERM and SIGINT: the first signal asks the program to end in good order, the second
+/// Handles SIGTERM and SIGINT: the first signal asks the program to shut down, the second
 /// ends the process at once, with the exit status of a failure.
 class StopSignals {
 public:

@@ -11,7 +11,7 @@
 namespace host {
 
 /// A client that does what `client` does, except that write requests reach their handler through
-/// the saves of `guard`, and the answers say what has become of the document. A request that is
+/// the saves of `guard`, and the answers say what has happened to the document. A request that is
 /// malformed reaches the handler as it is. The handler of read requests is stored in `guard` when
 /// it is subscribed.
 std::shared_ptr<platform::messaging::MessageService> savingSafely(

@@ -36,7 +36,7 @@ struct EarlierVersion {
 };
 
 struct HistoryOptions {
-    std::filesystem::path folder;  // is made if need be
+    std::filesystem::path folder;  // made where it is missing
 
     /// Only documents below these have versions; empty: all documents have.
     std::vector<std::filesystem::path> roots;
@@ -65,7 +65,7 @@ public:
     /// Whether `path` is `folder` or below it, links followed.
     static bool isBelow(const std::filesystem::path& path, const std::filesystem::path& folder);
 
-    /// Has the content of `old` copied as the newest version of `document`. Returns at once.
+    /// Copies the content of `old` as the newest version of `document`, without waiting for that.
     /// Versions that are too many, older than 30 days, or beyond the share of the disk are removed,
     /// the oldest first. Failures are logged. When copies are much slower than saves, versions are
     /// left out.

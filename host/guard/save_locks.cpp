@@ -17,7 +17,7 @@ namespace host {
 
 namespace {
 
-// Longer than a save waits for a lease of its file.
+// Longer than a save waits for a lease on its file.
 constexpr std::chrono::seconds longestWait{90};
 constexpr std::chrono::milliseconds pause{2};
 

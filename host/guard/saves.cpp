@@ -199,7 +199,7 @@ private:
         if (!askBundle_(path).isWritten || !holdsTextOf(request_, text.get())) {
             throw std::runtime_error("the text is not valid in the charset");
         }
-        // Who ends this process while it writes leaves a mixture, so the old text is kept before.
+        // A process that is killed while it writes leaves a mixture, so the old text is kept first.
         if (history_ != nullptr) {
             history_->keepNow(file.copy(), document_);
         }
@@ -208,7 +208,7 @@ private:
         return true;
     }
 
-    // For where there is no document to lose.
+    // For paths at which there is no document that could be lost.
     bool saveUnguarded() {
         if (request_.baseVersion.is<std::string>() && existed_) {
             throw std::runtime_error("has no version");
@@ -260,8 +260,8 @@ private:
         return expected == (current ? versionOf(current.get()) : std::string());
     }
 
-    // A client that had no answer asks again, and must not take its own save for another's. That
-    // save may have failed at its last step, which was to sync.
+    // Whether the save was made before, by a client that got no answer and asks again: its own save
+    // must not look like another's. That one may have failed at its last step, so it is synced.
     bool isRepetition(int current, bool isSame) {
         if (isSame) {
             syncWithFolder(current, document_);

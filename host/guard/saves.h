@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // Saves that cannot lose a document, whatever fails.
 //
-// The bundle writes texts in place and tells only whether it could open the file. So it is given
+// The bundle writes texts in place and reports only whether it could open the file. So it is given
 // another path, of a new file in the same folder, and what it wrote there is compared with what was
 // asked for, made safe on disk, and takes the old file's place by renaming. Where a new file cannot
 // stand for the old (it has other names, is a mount point, belongs to somebody else, or its folder
@@ -30,8 +30,8 @@ struct BundleAnswer {
     bool existed = false;
 };
 
-/// Has the bundle handle the request, with another path in it unless `otherPath` is empty. Throws
-/// BundleFailure.
+/// Makes the bundle handle the request, with `otherPath` in place of its path unless that is empty.
+/// Throws BundleFailure.
 using AskBundle = std::function<BundleAnswer(const std::string& otherPath)>;
 
 /// The bundle ended a request with an exception, and so without an answer. It is not a
@@ -50,7 +50,7 @@ struct SaveResult {
     platform::FileDescriptor replaced;
 };
 
-/// Saves documents, several at once if need be.
+/// Saves documents. May be used by several threads at once.
 class Saves {
 public:
     /// `history` gets what saves replace; it may be null. `lockFile` is that of SaveLocks.

@@ -9,9 +9,9 @@ namespace host {
 /// The most that a thread that answers requests keeps.
 inline constexpr std::size_t keptMemory = std::size_t{32} << 20U;
 
-/// Has the C library keep freed memory for later requests, about `keptMemory` for each thread that
-/// answers them. By default it returns most of it to the system, which then has to find and clear
-/// every page anew; which takes about as long as the rest of reading a document. Must be called
+/// Makes the C library keep freed memory for later requests, about `keptMemory` for each thread
+/// that answers them. By default it returns most of it to the system, which then has to find and
+/// clear every page again: about as long as the rest of reading a document takes. Must be called
 /// before there are other threads.
 void keepFreedMemory();
 

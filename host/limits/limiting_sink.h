@@ -17,7 +17,7 @@
 namespace host {
 
 /// `text` as one line of at most 2000 bytes: what is longer is cut, and controls (line breaks, the
-/// escapes that terminals obey) and bytes that are no UTF-8 are written as \xNN.
+/// escapes that terminals obey) and bytes that are not UTF-8 are written as \xNN.
 std::string asLine(std::string_view text);
 
 /// Passes log lines on to another sink, but only so many in a period of time from one logger at one

@@ -40,7 +40,7 @@ std::uint64_t controlGroupLimit() {
     return least;
 }
 
-// Has threads take as much for their stacks as they need and no more: the limit counts all of what
+// Gives threads stacks of the size that they need and no more: the limit counts all of what
 // a stack may become, which by default is 8 MB for each of some twenty threads.
 void keepStacksSmall() {
     constexpr std::size_t stackSize = std::size_t{1} << 20U;

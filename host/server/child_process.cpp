@@ -62,7 +62,7 @@ std::vector<char*> makeEnvironment(const std::vector<std::string>& own) {
                                 char* const* environment, int output, int failure, pid_t host) {
     ::setpgid(0, 0);
     ::prctl(PR_SET_PDEATHSIG, SIGKILL);
-    // The host may have ended before it was asked to take the program with it.
+    // The signal is not sent if the host ended before it was requested.
     bool isReady = ::getppid() == host;
     // The program handles the signals that the host blocks or ignores.
     sigset_t none;

@@ -38,7 +38,7 @@ std::vector<std::string> garbageCollection() {
 using Clock = std::chrono::steady_clock;
 using std::chrono::milliseconds;
 
-// How long the server may take to end when it is asked to.
+// How long the server may take to exit after the signal.
 constexpr milliseconds longestStop{5'000};
 
 // How often to check for another event while the server's output is read.
@@ -160,7 +160,7 @@ void NatsProcess::end() {
             return;
         }
     }
-    spdlog::warn("nats-server does not end; killing it");
+    spdlog::warn("nats-server does not exit; killing it");
 }
 
 std::string NatsProcess::collect() {

@@ -45,7 +45,7 @@ public:
     /// Logs the server's output until `end` is ready: a server whose output nobody reads blocks.
     void followUntil(const std::future<void>& end);
 
-    /// Ends the server, by force if need be.
+    /// Stops the server, by force if it does not exit in time.
     void end();
 
     /// Waits for the server's end and returns its reason, with the last error that the server

@@ -132,8 +132,8 @@ json::Object Serialization::readTextDocument(std::u16string path, std::size_t lo
     try {
         if (exists(path)) {
             result[statusKey] = true;
-            // What stays of a text is hardly shorter than its file: a byte-order mark goes, and
-            // escape sequences that a charset can do without.
+            // The text is hardly shorter than the file: it only loses a byte-order mark, and escape
+            // sequences that change nothing.
             const std::size_t length = lengthOf(path);
             requireTextLength(length);
             awaitMemory(length, 0, longestAnswer);
@@ -173,7 +173,7 @@ std::string Serialization::readFileBytes(std::u16string path) const {
     if (!opened.descriptor) {
         return {};
     }
-    // Checked before memory is taken for a file that is too large.
+    // Checked before memory is allocated for a file that is too large.
     const auto size = static_cast<std::size_t>(opened.status.st_size);
     requireTextLength(size);
     return readToEnd(opened.descriptor, size);

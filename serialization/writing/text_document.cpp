@@ -36,7 +36,7 @@ bool isPipe(const struct stat& status) {
 
 /// Opens the file at `path`, which is truncated, or made. A pipe is not opened, for nobody might
 /// ever read it; in case the file becomes one just now, this does not wait either. Another
-/// program's lease of the file is waited for.
+/// program's lease on the file is waited for.
 FileDescriptor openForWriting(const std::string& path) {
     struct stat status = {};
     if (::stat(path.c_str(), &status) == 0 && isPipe(status)) {
