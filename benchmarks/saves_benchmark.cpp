@@ -58,7 +58,7 @@ public:
               },
               host::makeGuard(options(isGuarded), {})) {}
 
-    // Returns when the answer came. The bundle has let go of the request by the end.
+    // Returns when the answer came. The bundle has released the request by the end.
     Clock::time_point save(DataBuffer request) {
         isSaved_ = false;
         host_.publish(platform::messaging::writeRequestChannel, std::move(request));

@@ -117,7 +117,7 @@ TEST_F(SerializationTest, CleanedTextKeepsEveryOtherCodeUnit) {
     }
 }
 
-/// The rule as it is put: on UTF-16, code unit by code unit.
+/// The rule as it is stated: on UTF-16, code unit by code unit.
 std::string cleanedByUnits(const Serialization& service, const std::u16string& text) {
     std::u16string units = text;
     for (char16_t& unit : units) {

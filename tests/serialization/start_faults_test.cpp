@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What becomes of a start of the bundle, and of its end, when any of their system calls fails:
+// What happens when any of the system calls of the bundle's start, or of its end, fails:
 // those of the library's loading and of the threads that wait for requests.
 
 #include <gtest/gtest.h>

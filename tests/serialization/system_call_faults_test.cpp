@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What becomes of each kind of request when any of the system calls along its way fails.
+// What happens to each kind of request when any of the system calls along its way fails.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -27,7 +27,7 @@ public:
 
     struct Setup {
         platform::messaging::InProcessBusOptions bus = {};
-        /// Makes the client that the bundle gets from the one of the bus; empty: it gets that one.
+        /// Makes the bundle's client from the bus's own; empty: the bundle gets the bus's own.
         std::function<std::shared_ptr<platform::messaging::MessageService>(
             std::shared_ptr<platform::messaging::MessageService>)>
             wrapClient = {};

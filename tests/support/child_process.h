@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// A program that runs beside a test and ends with it at the latest.
+// A program that runs beside a test and does not outlive it.
 #pragma once
 
 #include <sys/types.h>

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Another program that holds a lease of a file, as file servers do for their clients.
+// Another program that holds a lease on a file, as file servers do for their clients.
 #pragma once
 
 #include <filesystem>
@@ -10,11 +10,11 @@
 
 namespace test {
 
-/// A process that has a write lease of a file: programs that open the file have to wait until the
+/// A process that has a write lease on a file: programs that open the file have to wait until the
 /// lease is released.
 class LeaseHolder {
 public:
-    /// Takes the lease of `file`. When another process opens it, the lease is released after
+    /// Takes the lease on `file`. When another process opens it, the lease is released after
     /// `delay`; without one, not before this object is destroyed.
     LeaseHolder(const std::filesystem::path& file, std::optional<std::chrono::milliseconds> delay);
     LeaseHolder(const LeaseHolder&) = delete;

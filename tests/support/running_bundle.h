@@ -52,7 +52,7 @@ inline std::vector<std::string> takeBusLog() {
 /// The bundle from its library, which notes what it publishes.
 class RunningBundle {
 public:
-    /// Sends `payload` and returns all that the bundle publishes until it has come to rest, in
+    /// Sends `payload` and returns all that the bundle publishes until it is idle, in
     /// order.
     std::vector<Message> send(const std::string& channel, std::string_view payload) {
         bundle_.sendAndWait(channel, payload);

@@ -51,7 +51,7 @@ Subprocess::Subprocess(const std::vector<std::string>& command) {
                      StandardStreams{inputRead.get(), outputWrite.get(), errorsWrite.get()});
     input_ = std::move(inputWrite);
     output_ = std::move(outputRead);
-    // Read all the while, so that a program with much to say does not wait for it to be heard.
+    // Read all the while, so that a program that writes much does not block.
     errors_ =
         std::async(std::launch::async, [from = std::move(errorsRead)] { return readToEnd(from); });
 }

@@ -32,7 +32,7 @@ protected:
         return run(command);
     }
 
-    // Has `stdio` save a text of one byte.
+    // Saves a text of one byte through `stdio`.
     Outcome writeByStdio(std::initializer_list<std::string> more) {
         std::vector<std::string> command = hostCommand({"stdio", "--history", state_});
         command.insert(command.end(), more);

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What becomes of the command `stdio` when any of the allocations of its run fails.
+// What happens to the command `stdio` when any of the allocations of its run fails.
 
 #include <dlfcn.h>
 #include <gtest/gtest.h>

@@ -49,7 +49,7 @@ class StdioCommand : public ::testing::Test {
 protected:
     StdioCommand() { writeFile(file_, "text"); }
 
-    // Runs the command with `input` to its end, which is to be a good one.
+    // Runs the command with `input` and expects success.
     std::vector<Message> answersTo(const std::string& input) {
         const Outcome outcome = test::run(command_, input);
         EXPECT_EQ(outcome.status, 0) << outcome.errors;

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What becomes of the command `stdio` when any of the system calls of its run fails: those of the
+// What happens to the command `stdio` when any of the system calls of its run fails: those of the
 // bundle's loading, of its threads, of its requests and of the frames.
 
 #include <gmock/gmock.h>

@@ -90,7 +90,7 @@ protected:
                 isSaved ? "true" : "false"};
     }
 
-    // Saves on the base of a version, and expects to be told the version that this has made.
+    // Makes a save that names the version `base`, and expects an answer with the new version.
     void expectSaved(const std::string& path, json::Value content, const std::string& base,
                      bool existed) {
         const std::vector<std::string> messages =

@@ -98,7 +98,7 @@ public:
 
     bool isMounted() const { return isMounted_; }
 
-    // Has a file of its own take what is free but for `room` bytes.
+    // Fills the disk with a file until only `room` bytes are free.
     void leaveFree(std::uint64_t room) const {
         const std::string filler = folder_ + "/filler";
         fs::remove(filler);
@@ -175,7 +175,7 @@ protected:
         return saving(at("a.txt"), std::move(request));
     }
 
-    // The document is as it was or as it shall be; and answered true only when it is new.
+    // Expects the old document or the new one, and the answer true only with the new one.
     void expectOldOrNew(const std::string& old) {
         const std::string now = readFile(at("a.txt"));
         EXPECT_TRUE(now == old || now == new_) << now.size() << " bytes: " << now.substr(0, 20);

@@ -84,7 +84,7 @@ private:
     host::BundleHost host_;
 };
 
-// It in a process that has loaded it and used nothing of it.
+// Starts the bundle on a confined thread, in a process that has only loaded its library.
 std::unique_ptr<Bundle> startConfined(const Confinement& confinement, const host::Guard& guard) {
     if (::dlopen(SERIALIZATION_BUNDLE, RTLD_NOW | RTLD_LOCAL) == nullptr) {
         throw std::runtime_error(::dlerror());

@@ -33,8 +33,8 @@ protected:
     host::CommandLine line;
 };
 
-// Has each option of each command stand in the command's part of `text`, written as `written` has
-// it. Returns how many there are.
+// Expects each option of each command in the command's part of the text, in the form that `written`
+// gives it. Returns how many there are.
 template <typename PartOf, typename Written>
 std::size_t expectAllOptions(const std::vector<const CLI::App*>& commands, PartOf partOf,
                              Written written) {

@@ -110,7 +110,7 @@ TEST_F(PrivateFolders, NameThePlaceThatIsMissing) {
 }
 
 TEST_F(PrivateFolders, NameThePlaceThatHasNoRoom) {
-    // The system's error differs from that of a full disk, the way it takes here does not.
+    // The system's error differs from that of a full disk, but is handled alike.
     rlimit limit{};
     ASSERT_EQ(::getrlimit(RLIMIT_FSIZE, &limit), 0);
     const rlimit none{0, limit.rlim_max};

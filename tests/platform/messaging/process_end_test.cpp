@@ -82,8 +82,8 @@ bool isWaiting(const std::string& id) {
     return name != std::string::npos && status.compare(name + 2, 1, "S") == 0;
 }
 
-// Has a fork find no thread in malloc: what the address sanitizer has locked for it stays locked in
-// the child.
+// To be called before a fork, so that no thread is in malloc: a lock that the address sanitizer
+// holds there would stay locked in the child.
 void waitUntilTheOtherThreadsWait() {
     const std::string self = std::to_string(::getpid());
     for (const auto& task : std::filesystem::directory_iterator("/proc/self/task")) {

@@ -69,7 +69,7 @@ protected:
         writer.close(false);
     }
 
-    // Makes a save of which `decide` fails calls, and counts these.
+    // Makes a save whose calls `decide` may fail, and counts them.
     void superviseSave(std::string& error, const std::function<int(int, int)>& decide) {
         supervise(saving(error), [&](int call, int index) {
             const int decided = decide(call, index);

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The bundle's start and end against each other and against requests that come in all the time. Who
-// destroys the activator while its start-up still runs is not guarded against; all else is.
+// The bundle's start and end against each other and against requests that come in all the time. The
+// one thing not allowed is to destroy the activator while its start-up still runs.
 
 #include <gtest/gtest.h>
 

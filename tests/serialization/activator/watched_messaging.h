@@ -22,7 +22,7 @@ public:
     using Created = futures::Future<std::shared_ptr<MessageService>>;
     using Subscribed = futures::Future<std::shared_ptr<Subscription>>;
 
-    /// Becomes the transport of the process until its end.
+    /// Is the transport of the process while it lives.
     WatchedMessaging();
     WatchedMessaging(const WatchedMessaging&) = delete;
     WatchedMessaging& operator=(const WatchedMessaging&) = delete;

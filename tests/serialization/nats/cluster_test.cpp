@@ -192,7 +192,7 @@ TEST(NatsCluster, AnswersEveryRequestWhileServersAndWorkersAreKilled) {
     }
     std::cout << answered << " requests answered, " << again << " repeated, the longest after "
               << longest.count() << " ms (clients ask again after 500 ms)\n";
-    // No packages but whole ones; what a killed worker was writing stands beside them at most.
+    // Only whole packages, and beside them at most what a killed worker was writing.
     PatientClient reader(cluster.urls(), "reader");
     for (int i = 0; i < 4; ++i) {
         const std::string answer =

@@ -3,7 +3,7 @@
 //
 //     nats_worker BUNDLE URL...
 //
-// Ends in good order on SIGTERM.
+// Shuts down gracefully on SIGTERM.
 #include <signal.h>
 
 #include <chrono>

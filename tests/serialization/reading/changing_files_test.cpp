@@ -286,7 +286,7 @@ TEST_F(FilesThatChange, LeaveNothingWhenTheirFolderIsDeletedDuringASave) {
     EXPECT_FALSE(std::filesystem::exists(folder.path()));
 }
 
-// While another program has a lease of the file, which it gives up shortly after it is asked to.
+// While another program has a lease on the file, which it releases shortly after it is asked to.
 class FilesUnderALease : public FilesThatChange {
 protected:
     bool takeLease() {

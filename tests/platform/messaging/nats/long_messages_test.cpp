@@ -36,7 +36,7 @@ void require(natsStatus status) {
     }
 }
 
-// A client that says just what a test has it say.
+// A client that sends exactly what a test tells it to.
 class PieceClient {
 public:
     struct Heard {

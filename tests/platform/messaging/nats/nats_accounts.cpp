@@ -74,7 +74,7 @@ public:
         return base32(withChecksum(prefix + raw(EVP_PKEY_get_raw_private_key)));
     }
 
-    /// Who `subject` is, in the words of this key's owner.
+    /// A JWT in which this key's owner says who `subject` is.
     std::string certify(const Key& subject, const std::string& properties) const {
         const std::string claims = R"({"jti":"1","iat":1700000000,"iss":")" + name() +
                                    R"(","name":"test","sub":")" + subject.name() +

@@ -44,7 +44,7 @@ TEST(NatsPublish, KnowsTheLongestPayloadThatTheServerTakes) {
     const auto client = bus->connect("client").get();
     EXPECT_EQ(client->maxPayload("/any"), 1000u);
     bus->drain(std::chrono::seconds(5));
-    // Publishing tells what is wrong; the length is not.
+    // Publishing says what is wrong; the length is not.
     EXPECT_GT(client->maxPayload("/any"), 1000u);
 }
 
