@@ -15,6 +15,7 @@
 #include "host/exit_status.h"
 #include "host/guard/guarded_client.h"
 #include "host/limits/memory_limit.h"
+#include "platform/messaging/resolved.h"
 #include "platform/messaging/transport.h"
 
 namespace host {
@@ -45,9 +46,7 @@ platform::messaging::Transport transportOf(const std::shared_ptr<InProcessBus>& 
         if (guard.saves) {
             client = savingSafely(std::move(client), guard);
         }
-        futures::Promise<std::shared_ptr<MessageService>> promise;
-        promise.setValue(std::move(client));
-        return promise.getFuture();
+        return resolved([&client] { return client; });
     };
 }
 

@@ -7,10 +7,12 @@
 #include <stdexcept>
 #include <utility>
 
+#include "host/bus/forwarding_client.h"
 #include "json/find_string.h"
 #include "json/serialize.h"
 #include "json/value.h"
 #include "platform/messaging/channels.h"
+#include "platform/messaging/resolved.h"
 
 namespace host {
 
@@ -30,7 +32,7 @@ void publishFailure(MessageService& client, const std::string& channel, const st
     client.publish(channel, DataBuffer::copyOf(json::serialize(answer)));
 }
 
-void answerForWantOfMemory(MessageService& client, const JsonMessage& request) noexcept {
+void answerOutOfMemory(MessageService& client, const JsonMessage& request) noexcept {
     try {
         answerFailedRead(client, request.payload(), std::string(outOfMemory));
     } catch (const std::exception&) {
@@ -43,53 +45,43 @@ void handleRead(MessageService& client, const MessageHandler& handler, const Jso
     try {
         handler(request);
     } catch (const std::bad_alloc&) {
-        answerForWantOfMemory(client, request);
+        answerOutOfMemory(client, request);
         throw;
     } catch (const std::runtime_error& error) {
         if (error.what() == outOfMemory) {
-            answerForWantOfMemory(client, request);
+            answerOutOfMemory(client, request);
         }
         throw;
     }
 }
 
-class AnsweringClient final : public MessageService {
+class AnsweringClient final : public ForwardingClient {
 public:
-    explicit AnsweringClient(std::shared_ptr<MessageService> client) : client_(std::move(client)) {}
+    using ForwardingClient::ForwardingClient;
 
     futures::Future<std::shared_ptr<Subscription>> subscribe(const std::string& channel,
                                                              MessageHandler handler) override {
         if (channel != platform::messaging::readRequestChannel) {
-            return client_->subscribe(channel, std::move(handler));
+            return next()->subscribe(channel, std::move(handler));
         }
-        return client_->subscribe(
-            channel, [client = client_, handler = std::move(handler)](const JsonMessage& request) {
+        return next()->subscribe(
+            channel, [client = next(), handler = std::move(handler)](const JsonMessage& request) {
                 handleRead(*client, handler, request);
             });
     }
 
     futures::Future<void> publish(const std::string& channel, DataBuffer payload) override {
-        futures::Promise<void> promise;
-        try {
-            client_->publish(channel, std::move(payload)).get();
-            promise.setValue();
-        } catch (const std::exception& error) {
-            if (channel.starts_with(platform::messaging::readResponsePrefix)) {
-                publishFailure(*client_, channel, error.what());
+        return platform::messaging::resolved([&] {
+            try {
+                next()->publish(channel, std::move(payload)).get();
+            } catch (const std::exception& error) {
+                if (channel.starts_with(platform::messaging::readResponsePrefix)) {
+                    publishFailure(*next(), channel, error.what());
+                }
+                throw;
             }
-            promise.setException(std::current_exception());
-        }
-        return promise.getFuture();
+        });
     }
-
-    std::size_t maxPayload(const std::string& channel) const override {
-        return client_->maxPayload(channel);
-    }
-
-    void awaitMemory(std::size_t bytes) override { client_->awaitMemory(bytes); }
-
-private:
-    const std::shared_ptr<MessageService> client_;
 };
 
 }  // namespace

@@ -16,6 +16,7 @@
 #include <utility>
 
 #include "host/bus/failed_reads.h"
+#include "host/bus/forwarding_client.h"
 #include "host/bus/request_kind.h"
 #include "host/limits/freed_memory.h"
 #include "json/find_string.h"
@@ -44,10 +45,10 @@ std::size_t smallWork(const MemoryBudget& budget) {
 // The share of the budget that all waiting messages may have together.
 constexpr std::size_t waitingShare = 8;
 
-// Reserved for the document of the message that the thread handles; null when it handles none.
+// What is reserved for the document of the message that the thread handles; null between messages.
 thread_local MemoryBudget::Reservation* documentOfThread = nullptr;
 
-// Has `handler` handle `message`, and gives back what was reserved for its document.
+// Calls `handler` with `message`, and gives back what was reserved for its document.
 void handleOne(const MessageHandler& handler, const JsonMessage& message) {
     class Document {
     public:
@@ -190,30 +191,24 @@ private:
     bool isHandling_ = false;  // a thread handles large requests
 };
 
-class AdmittingClient final : public MessageService {
+class AdmittingClient final : public ForwardingClient {
 public:
     AdmittingClient(std::shared_ptr<MessageService> client, RequestBudgets budgets,
                     std::shared_ptr<RequestMetrics> metrics)
-        : client_(std::move(client)), budgets_(std::move(budgets)), metrics_(std::move(metrics)) {}
+        : ForwardingClient(std::move(client)),
+          budgets_(std::move(budgets)),
+          metrics_(std::move(metrics)) {}
 
     futures::Future<std::shared_ptr<Subscription>> subscribe(const std::string& channel,
                                                              MessageHandler handler) override {
-        const auto admission = std::make_shared<Admission>(client_, budgets_.requests, metrics_,
+        const auto admission = std::make_shared<Admission>(next(), budgets_.requests, metrics_,
                                                            channel, std::move(handler));
-        return client_->subscribe(
+        return next()->subscribe(
             channel, [admission](const JsonMessage& message) { admission->handle(message); });
     }
 
-    futures::Future<void> publish(const std::string& channel, DataBuffer payload) override {
-        return client_->publish(channel, std::move(payload));
-    }
-
-    std::size_t maxPayload(const std::string& channel) const override {
-        return client_->maxPayload(channel);
-    }
-
-    // A thread that waits here holds nothing that others wait for. So one that asks for more than
-    // the budget gets all of it and goes on: what was asked for is only the most that may be used.
+    // A thread that waits here holds nothing that others wait for. One that asks for more than the
+    // budget gets all of it and goes on, since `bytes` is only an upper bound.
     void awaitMemory(std::size_t bytes) override {
         MemoryBudget& budget = *budgets_.documents;
         if (documentOfThread != nullptr) {
@@ -225,7 +220,6 @@ public:
     }
 
 private:
-    const std::shared_ptr<MessageService> client_;
     const RequestBudgets budgets_;
     const std::shared_ptr<RequestMetrics> metrics_;
 };

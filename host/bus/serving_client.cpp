@@ -10,18 +10,18 @@
 #include <exception>
 #include <optional>
 #include <string_view>
-#include <system_error>
 #include <utility>
 
+#include "host/bus/forwarding_client.h"
 #include "host/bus/request_kind.h"
+#include "host/guard/history.h"
 #include "json/find_string.h"
 #include "platform/messaging/channels.h"
+#include "platform/messaging/resolved.h"
 
 namespace host {
 
 namespace {
-
-namespace fs = std::filesystem;
 
 using Clock = std::chrono::steady_clock;
 using platform::DataBuffer;
@@ -93,38 +93,21 @@ bool mayBeRefusal(const std::string& channel, std::string_view answer) {
            (channel.starts_with(platform::messaging::writeResponsePrefix) && answer != "true");
 }
 
-// With symbolic links followed, as far as the path exists.
-fs::path withoutLinks(const fs::path& path) {
-    std::error_code error;
-    fs::path result = fs::weakly_canonical(path, error);
-    return error ? path.lexically_normal() : result;
-}
-
-bool isBelow(const fs::path& path, const fs::path& folder) {
-    return std::mismatch(folder.begin(), folder.end(), path.begin(), path.end()).first ==
-           folder.end();
-}
-
-class ServingClient final : public MessageService {
+class ServingClient final : public ForwardingClient {
 public:
     ServingClient(std::shared_ptr<MessageService> client, ServingOptions options)
-        : client_(std::move(client)), options_(std::move(options)) {
-        for (fs::path& root : options_.roots) {
-            root = withoutLinks(root);
-        }
-    }
+        : ForwardingClient(std::move(client)), options_(std::move(options)) {}
 
     futures::Future<std::shared_ptr<Subscription>> subscribe(const std::string& channel,
                                                              MessageHandler handler) override {
-        futures::Promise<std::shared_ptr<Subscription>> promise;
-        try {
-            promise.setValue(
-                client_->subscribe(channel, prepared(channel, std::move(handler))).get());
-        } catch (const std::exception& error) {
-            options_.subscriptionFailure->set(error.what());
-            promise.setException(std::current_exception());
-        }
-        return promise.getFuture();
+        return platform::messaging::resolved([&] {
+            try {
+                return next()->subscribe(channel, prepared(channel, std::move(handler))).get();
+            } catch (const std::exception& error) {
+                options_.subscriptionFailure->set(error.what());
+                throw;
+            }
+        });
     }
 
     futures::Future<void> publish(const std::string& channel, DataBuffer payload) override {
@@ -134,14 +117,8 @@ public:
                 logIfOutside(requestOfThread->message());
             }
         }
-        return client_->publish(channel, std::move(payload));
+        return next()->publish(channel, std::move(payload));
     }
-
-    std::size_t maxPayload(const std::string& channel) const override {
-        return client_->maxPayload(channel);
-    }
-
-    void awaitMemory(std::size_t bytes) override { client_->awaitMemory(bytes); }
 
 private:
     MessageHandler prepared(const std::string& channel, MessageHandler handler) const {
@@ -168,9 +145,8 @@ private:
         if (!path || path->empty() || path->size() >= PATH_MAX) {
             return;  // It names no file, inside or outside.
         }
-        const fs::path file = withoutLinks(*path);
         if (std::none_of(options_.roots.begin(), options_.roots.end(),
-                         [&file](const fs::path& root) { return isBelow(file, root); })) {
+                         [&path](const auto& root) { return History::isBelow(*path, root); })) {
             spdlog::warn(
                 "refused {}, which is in no folder of --root; workers of other folders need a "
                 "group and message servers, or an account, of their own",
@@ -178,8 +154,7 @@ private:
         }
     }
 
-    const std::shared_ptr<MessageService> client_;
-    ServingOptions options_;
+    const ServingOptions options_;
 };
 
 }  // namespace

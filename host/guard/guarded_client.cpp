@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "host/guard/guarded_client.h"
 
-#include <cstddef>
 #include <exception>
 #include <optional>
 #include <stdexcept>
@@ -10,11 +9,13 @@
 #include <utility>
 #include <vector>
 
+#include "host/bus/forwarding_client.h"
 #include "host/bus/publications.h"
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "json/value.h"
 #include "platform/messaging/channels.h"
+#include "platform/messaging/resolved.h"
 
 namespace host {
 
@@ -59,18 +60,18 @@ void publishResult(MessageService& client, const WriteRequest& request, const Sa
     client.publish(platform::messaging::notificationChannel,
                    DataBuffer::copyOf(json::serialize(std::move(notification))));
     if (!result.version.empty()) {
-        json::Object word{{"status", true}, {"version", result.version}};
+        json::Object version{{"status", true}, {"version", result.version}};
         client.publish(platform::messaging::filesResponsePrefix + request.rtcId,
-                       DataBuffer::copyOf(json::serialize(std::move(word))));
+                       DataBuffer::copyOf(json::serialize(std::move(version))));
     }
     client.publish(platform::messaging::writeResponsePrefix + request.rtcId,
                    DataBuffer::copyOf(result.isSaved ? "true" : "false"));
 }
 
-class GuardedClient final : public MessageService {
+class GuardedClient final : public ForwardingClient {
 public:
     GuardedClient(std::shared_ptr<MessageService> client, Guard guard)
-        : client_(std::move(client)), guard_(std::move(guard)) {}
+        : ForwardingClient(std::move(client)), guard_(std::move(guard)) {}
     GuardedClient(const GuardedClient&) = delete;
     GuardedClient& operator=(const GuardedClient&) = delete;
 
@@ -83,28 +84,18 @@ public:
             *guard_.read = handler;
         }
         if (channel != platform::messaging::writeRequestChannel) {
-            return client_->subscribe(channel, std::move(handler));
+            return next()->subscribe(channel, std::move(handler));
         }
-        return client_->subscribe(
+        return next()->subscribe(
             channel,
-            [client = client_, saves = guard_.saves, bundle = std::move(handler)](
+            [client = next(), saves = guard_.saves, bundle = std::move(handler)](
                 const JsonMessage& message) { handleWrite(*client, *saves, bundle, message); });
     }
 
     futures::Future<void> publish(const std::string& channel, DataBuffer payload) override {
-        if (!keepBack(channel, payload)) {
-            return client_->publish(channel, std::move(payload));
-        }
-        futures::Promise<void> promise;
-        promise.setValue();
-        return promise.getFuture();
+        return keepBack(channel, payload) ? platform::messaging::resolved([] {})
+                                          : next()->publish(channel, std::move(payload));
     }
-
-    std::size_t maxPayload(const std::string& channel) const override {
-        return client_->maxPayload(channel);
-    }
-
-    void awaitMemory(std::size_t bytes) override { client_->awaitMemory(bytes); }
 
 private:
     static void handleWrite(MessageService& client, Saves& saves, const MessageHandler& bundle,
@@ -132,7 +123,6 @@ private:
         }
     }
 
-    const std::shared_ptr<MessageService> client_;
     const Guard guard_;
 };
 

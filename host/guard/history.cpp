@@ -145,7 +145,7 @@ std::string History::nameOf(const std::string& path) {
     std::error_code error;
     const fs::path absolute = fs::absolute(path, error);
     const fs::path canonical = fs::weakly_canonical(absolute, error);
-    return error ? absolute.string() : canonical.string();
+    return (error ? absolute.lexically_normal() : canonical).string();
 }
 
 bool History::isBelow(const fs::path& path, const fs::path& folder) {
