@@ -11,6 +11,7 @@
 #include <chrono>
 #include <cstdlib>
 #include <fstream>
+#include <functional>
 #include <future>
 #include <memory>
 #include <optional>
@@ -21,7 +22,6 @@
 #include <vector>
 
 #include "framework/bundle_runner.h"
-#include "futures/future.h"
 #include "host/bus/bundle_location.h"
 #include "host/bus/failed_reads.h"
 #include "host/bus/request_admission.h"
@@ -39,6 +39,7 @@
 #include "host/standard_streams.h"
 #include "platform/messaging/channels.h"
 #include "platform/messaging/nats/nats_bus.h"
+#include "platform/messaging/resolved.h"
 #include "platform/messaging/transport.h"
 #include "platform/posix/file_descriptor.h"
 
@@ -50,22 +51,34 @@ using platform::messaging::MemoryBudget;
 using platform::messaging::NatsBus;
 using platform::messaging::NatsOptions;
 
-// Resets the process's transport, which keeps the bus alive, at the end of its life.
-class TransportEnd {
+using ConnectClient =
+    std::function<std::shared_ptr<platform::messaging::MessageService>(const std::string& name)>;
+
+// The process's transport, while it lives: the bundle gets its client by `connect`.
+class ServingTransport {
 public:
-    TransportEnd() = default;
-    TransportEnd(const TransportEnd&) = delete;
-    TransportEnd& operator=(const TransportEnd&) = delete;
-    ~TransportEnd() { platform::messaging::setTransport({}); }
+    ServingTransport(const ConnectClient& connect, const Guard& guard) {
+        using namespace platform::messaging;
+        setTransport([=](const std::string& name, const MessageServiceOptions&) {
+            std::shared_ptr<MessageService> client = connect(name);
+            if (guard.saves) {
+                client = savingSafely(std::move(client), guard);
+            }
+            return resolved([&client] { return client; });
+        });
+    }
+    ServingTransport(const ServingTransport&) = delete;
+    ServingTransport& operator=(const ServingTransport&) = delete;
+    ~ServingTransport() { platform::messaging::setTransport({}); }
 };
 
-// The host's name for the servers.
+// The name under which the host is a client of the servers.
 constexpr const char* clientName = "serialization_host";
 
 // How long the servers may be out of reach when the host starts.
 constexpr std::chrono::seconds longestConnect{5};
 
-// How long the requests that were taken may need when the host ends.
+// How long the requests that were taken may still run when the host shuts down.
 constexpr std::chrono::seconds longestDrain{60};
 
 // To servers, what follows white space is the next word of their protocol.
@@ -141,10 +154,10 @@ NatsOptions connectionTo(const OtherServers& servers) {
     return options;
 }
 
-// The memory for requests is divided for good between those that come in pieces, long answers, and
+// The memory for requests has fixed shares for those that come in pieces, for long answers, and for
 // requests that are being handled, each of which takes its bytes and its values, more than twice
-// its length. If they shared it, transfers and requests that wait to be handled could hold all of
-// it, while the request that is to be handled first waits for more.
+// its length. If they shared it, transfers and waiting requests could hold all of it, while the
+// request that is next waits for more.
 constexpr std::uint64_t memoryOfTransfers(std::uint64_t memoryForRequests) {
     return memoryForRequests / 5;
 }
@@ -154,7 +167,7 @@ constexpr std::uint64_t memoryToHandle(std::uint64_t memoryForRequests) {
 
 std::shared_ptr<NatsBus> makeBus(NatsOptions options, const ServeOptions& serve) {
     options.connectTimeout = longestConnect;
-    // Counting the processors opens files that the threads which ask may not be allowed to open.
+    // Counted now: it opens files that the confined threads may not open.
     options.concurrency = std::max(2U, std::thread::hardware_concurrency());
     // Many documents that are saved at once must not hold up those that are read.
     options.separateChannels = {platform::messaging::writeRequestChannel};
@@ -180,8 +193,17 @@ struct Confinements {
     Confinement metrics;
 };
 
-// What is needed to find servers by name, to trust them, and to tell them who the host is; needed
-// again for each new connection.
+// Confines the thread that calls the result, if there are confinements, which must outlive it.
+std::function<void()> confining(const std::optional<Confinements>& confinements,
+                                Confinement Confinements::*part) {
+    return [&confinements, part] {
+        if (confinements) {
+            ((*confinements).*part).confineThisThread();
+        }
+    };
+}
+
+// The files that each new connection needs: to find servers by name, to trust them, and to log in.
 std::vector<std::filesystem::path> filesOf(const OtherServers& servers) {
     if (servers.urls.empty()) {
         return {};
@@ -241,13 +263,12 @@ bool isReady(const std::shared_future<void>& future) {
     return future.wait_for(std::chrono::seconds::zero()) == std::future_status::ready;
 }
 
-// Connects `bus` on a thread of its own, from which the threads of the connection come. Gives up
-// when `stop` becomes ready; returns false then.
-bool connect(NatsBus& bus, const Confinement* confinement, const std::shared_future<void>& stop) {
+// Connects `bus` on a thread of its own, which calls `prepare` first and from which the threads of
+// the connection come. Gives up when `stop` becomes ready; returns false then.
+bool connect(NatsBus& bus, const std::function<void()>& prepare,
+             const std::shared_future<void>& stop) {
     std::future<void> connected = std::async(std::launch::async, [&] {
-        if (confinement != nullptr) {
-            confinement->confineThisThread();
-        }
+        prepare();
         bus.connect(clientName).get();
     });
     while (connected.wait_for(std::chrono::milliseconds(10)) == std::future_status::timeout) {
@@ -366,15 +387,11 @@ int runServe(const ServeOptions& options, int output) {
         folder ? startOwnServer(options, web.get(), *folder) : nullptr;
     const std::shared_ptr<NatsBus> bus =
         makeBus(server ? server->workerConnection() : connectionTo(options.otherServers), options);
-    if (!connect(*bus, confinements ? &confinements->network : nullptr, signals.first())) {
+    if (!connect(*bus, confining(confinements, &Confinements::network), signals.first())) {
         return exitDone;
     }
     if (web) {
-        web->start([&] {
-            if (confinements) {
-                confinements->web.confineThisThread();
-            }
-        });
+        web->start(confining(confinements, &Confinements::web));
     }
 
     ServingOptions serving;
@@ -384,44 +401,30 @@ int runServe(const ServeOptions& options, int output) {
     const std::unique_ptr<MetricsServer> metrics =
         makeMetricsServer(options, bus, budgets.requests, serving.metrics);
     const LoadedLibrary library(options.bundle);
-    if (confinements) {
-        // The threads that handle requests come from this one.
-        confinements->bundle.confineThisThread();
-        serving.prepareThread = [&confinements] { confinements->documents.confineThisThread(); };
-    }
-    const auto connectClient = [bus, budgets, serving](const std::string& name) {
-        // The bus is connected, so that this is no waiting. A request that waits for memory may be
+    // The threads that handle requests come from this one.
+    confining(confinements, &Confinements::bundle)();
+    serving.prepareThread = confining(confinements, &Confinements::documents);
+    const ConnectClient connectClient = [bus, budgets, serving](const std::string& name) {
+        // The bus is connected, so get() does not wait. A request that waits for memory may be
         // handled on another thread than the one that brought it, and is counted on that.
         return answeringFailedReads(servingClient(
             admittingRequests(bus->connect(name).get(), budgets, serving.metrics), serving));
     };
-    platform::messaging::setTransport([connectClient, guard](
-                                          const std::string& name,
-                                          const platform::messaging::MessageServiceOptions&) {
-        futures::Promise<std::shared_ptr<platform::messaging::MessageService>> promise;
-        std::shared_ptr<platform::messaging::MessageService> client = connectClient(name);
-        promise.setValue(guard.saves ? savingSafely(std::move(client), guard) : std::move(client));
-        return promise.getFuture();
-    });
-    const TransportEnd transportEnd;
+    const ServingTransport transport(connectClient, guard);
     const framework::BundleRunner bundle(options.bundle);
     serving.subscriptionFailure->check();
     const FileService files(connectClient(clientName), guard, rootsToTell(options.roots));
     if (metrics) {
-        metrics->start([&] {
-            if (confinements) {
-                confinements->metrics.confineThisThread();
-            }
-        });
+        metrics->start(confining(confinements, &Confinements::metrics));
     }
     tellHowToConnect(web.get(), metrics.get(), server.get(), output);
     signals.first().wait();
     if (!bus->drain(longestDrain)) {
-        spdlog::error("requests that were taken have not been done after {} s and are given up",
+        spdlog::error("requests are still unfinished after {} s and are abandoned",
                       longestDrain.count());
         server.reset();
         spdlog::default_logger()->flush();
-        std::_Exit(exitRequestFailed);  // The bundle's end would wait for them.
+        std::_Exit(exitRequestFailed);  // Destroying the bundle would wait for them.
     }
     return exitDone;
 }
