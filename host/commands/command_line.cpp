@@ -9,7 +9,6 @@
 #include <functional>
 #include <limits>
 #include <memory>
-#include <numeric>
 #include <optional>
 #include <regex>
 #include <sstream>
@@ -17,7 +16,6 @@
 #include <string_view>
 #include <utility>
 
-#include "host/limits/limiting_sink.h"
 #include "host/server/nats_configuration.h"
 
 namespace host {
@@ -64,7 +62,7 @@ private:
 };
 
 // `validator` without its text in the help, where the description says what is valid.
-CLI::Validator untold(CLI::Validator validator) {
+CLI::Validator withoutHelpText(CLI::Validator validator) {
     return validator.description("");
 }
 
@@ -73,8 +71,8 @@ CLI::Validator check(const std::function<std::string(std::string&)>& fault) {
     return CLI::Validator(fault, "");
 }
 
-// The bytes of which `text` speaks, such as "65536" or "500 MB"; nothing where it is no size, or
-// one of more bytes than can be counted.
+// The number of bytes that `text` means, such as "65536" or "500 MB"; nothing where it is no size,
+// or one too large for the type.
 std::optional<std::uint64_t> bytesOf(const std::string& text) {
     static const std::regex form("([0-9]+) *(?:([kmgtpe])i?)?b?", std::regex::icase);
     std::smatch match;
@@ -128,7 +126,7 @@ void declareTimeout(CLI::App& command, std::chrono::seconds& timeout) {
             "--timeout", [&timeout](unsigned seconds) { timeout = std::chrono::seconds(seconds); },
             "How long to wait for an answer (default: " + std::to_string(timeout.count()) + ")")
         ->type_name("SECONDS")
-        ->check(untold(CLI::Range(1U, 1'000'000'000U)));
+        ->check(withoutHelpText(CLI::Range(1U, 1'000'000'000U)));
 }
 
 void declareContentType(CLI::App& command, std::string& contentType, const std::string& usual) {
@@ -214,7 +212,7 @@ CLI::Option& declareOtherServers(CLI::App& command, OtherServers& options) {
                                  const std::string& description) {
         return command.add_option(name, file, description)
             ->type_name("FILE")
-            ->check(untold(CLI::ExistingFile))
+            ->check(withoutHelpText(CLI::ExistingFile))
             ->needs(&servers);
     };
     declareFile("--creds", options.credentialsFile, "The credentials to log in with");
@@ -250,7 +248,7 @@ void declareWeb(CLI::App& command, WebOptions& options) {
                     "The folder to serve to browsers (default: a page that reads documents; none "
                     "with --nats)")
         ->type_name("DIR")
-        ->check(untold(CLI::ExistingDirectory))
+        ->check(withoutHelpText(CLI::ExistingDirectory))
         ->excludes(none);
     command
         .add_option_function<std::string>(
@@ -321,7 +319,7 @@ void declareGuard(CLI::App& command, GuardOptions& options) {
                     "The earlier versions to keep of each document (default: " +
                         std::to_string(options.versions) + ")")
         ->type_name("N")
-        ->check(untold(CLI::Range(1U, 1'000'000U)));
+        ->check(withoutHelpText(CLI::Range(1U, 1'000'000U)));
     declareNegation(command, "--no-history", options.keepsVersions, "Keep no earlier versions");
 }
 
@@ -331,7 +329,7 @@ void declareServe(CLI::App& command, ServeOptions& options) {
                     "A folder that clients may use; may be given several times (default: all)")
         ->type_name("DIR")
         ->allow_extra_args(false)
-        ->check(untold(CLI::ExistingDirectory));
+        ->check(withoutHelpText(CLI::ExistingDirectory));
     declareNegation(command, "--no-confinement", options.isConfined,
                     "Do not have the kernel keep clients to the folders of --root");
     declareGuard(command, options.guard);
@@ -340,7 +338,7 @@ void declareServe(CLI::App& command, ServeOptions& options) {
                     "The longest request or answer, in bytes or with a unit such as MB (default: "
                     "1 GB, and at most a tenth of --memory-limit)")
         ->type_name("SIZE")
-        ->transform(untold(CLI::AsSizeValue(false)));
+        ->transform(withoutHelpText(CLI::AsSizeValue(false)));
     declareWeb(command, options.web);
     declareMetrics(command, options);
     declareOwnServer(command, options.ownServer,
@@ -395,77 +393,15 @@ void declareHistory(CLI::App& command, HistoryCommandOptions& options) {
     CLI::Option* const shown =
         command.add_option("--show", options.shown, "Print a version, as read does")
             ->type_name("N")
-            ->check(untold(CLI::PositiveNumber));
+            ->check(withoutHelpText(CLI::PositiveNumber));
     command.add_option("--restore", options.restored, "Save a version as the newest")
         ->type_name("N")
-        ->check(untold(CLI::PositiveNumber))
+        ->check(withoutHelpText(CLI::PositiveNumber))
         ->excludes(shown);
     command
         .add_option("--content-type", options.contentType,
                     "The content type to show it as (default: by its content)")
         ->type_name("TYPE");
-}
-
-// How many characters have to be put in, taken out or replaced to make `to` of `from`.
-std::size_t editDistance(std::string_view from, std::string_view to) {
-    // That from the beginning of `from` up to here, to each beginning of `to`.
-    std::vector<std::size_t> row(to.size() + 1);
-    std::iota(row.begin(), row.end(), std::size_t{0});
-    for (std::size_t i = 0; i < from.size(); ++i) {
-        std::size_t diagonal = std::exchange(row[0], i + 1);
-        for (std::size_t j = 0; j < to.size(); ++j) {
-            const std::size_t replaced = diagonal + (from[i] == to[j] ? 0 : 1);
-            diagonal = row[j + 1];
-            row[j + 1] = std::min({replaced, diagonal + 1, row[j] + 1});
-        }
-    }
-    return row.back();
-}
-
-// The one of `names` that was probably meant by `word`.
-std::optional<std::string> nearest(const std::string& word, const std::vector<std::string>& names) {
-    const auto distance = [&word](const std::string& name) { return editDistance(word, name); };
-    const auto best = std::min_element(
-        names.begin(), names.end(),
-        [&](const auto& one, const auto& other) { return distance(one) < distance(other); });
-    const bool isNear = best != names.end() && distance(*best) <= word.size() / 2;
-    return isNear ? std::optional(*best) : std::nullopt;
-}
-
-std::vector<std::string> optionsOf(const CLI::App& app) {
-    std::vector<std::string> names;
-    for (const CLI::Option* option : app.get_options()) {
-        for (const std::string& name : option->get_lnames()) {
-            names.push_back("--" + name);
-        }
-    }
-    return names;
-}
-
-std::string question(const std::optional<std::string>& name) {
-    return name ? "; did you mean \"" + *name + "\"?" : "";
-}
-
-// What is wrong with the word that `app` did not understand.
-std::string unknown(const CLI::App& app, const std::string& word) {
-    const std::vector<CLI::App*> commands = app.get_subcommands();
-    if (word.starts_with("-")) {
-        std::vector<std::string> names = optionsOf(app);
-        for (const CLI::App* command : commands) {
-            const std::vector<std::string> more = optionsOf(*command);
-            names.insert(names.end(), more.begin(), more.end());
-        }
-        const std::string name = word.substr(0, word.find('='));
-        return "there is no option \"" + name + "\"" + question(nearest(name, names));
-    }
-    if (commands.empty()) {
-        std::vector<std::string> names;
-        for (const CLI::App* command : app.get_subcommands({})) {
-            names.push_back(command->get_name());
-        }
-        return "there is no command \"" + word + "\"" + question(nearest(word, names));
-    }
-    return "the argument \"" + word + "\" is one too many";
 }
 
 bool isOption(const CLI::App& app, const std::string& argument) {
@@ -498,7 +434,7 @@ void describe(CLI::App& app, CommandLine& line) {
                    "warning, error, critical or off (default: " +
                        line.logLevel + ")")
         ->type_name("LEVEL")
-        ->check(untold(
+        ->check(withoutHelpText(
             CLI::IsMember({"trace", "debug", "info", "warning", "error", "critical", "off"})));
     declareSize(
         app, "--memory-limit", line.memoryLimit,
@@ -547,18 +483,6 @@ void parse(CLI::App& app, std::vector<std::string> arguments) {
     }
     std::reverse(arguments.begin(), arguments.end());  // as the parser takes them
     app.parse(std::move(arguments));
-}
-
-std::string complaint(const CLI::App& app, const CLI::ParseError& error) {
-    const std::vector<std::string> notUnderstood = app.remaining(true);
-    std::string text = error.what();
-    if (!notUnderstood.empty()) {
-        text = unknown(app, notUnderstood.front());
-    } else if (app.get_subcommands().empty() && dynamic_cast<const CLI::RequiredError*>(&error)) {
-        text = "a command is missing";
-    }
-    return std::string(programName) + ": " + asLine(text) +
-           "\nRun with --help for more information.\n";
 }
 
 }  // namespace host

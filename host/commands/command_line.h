@@ -39,7 +39,7 @@ struct CommandLine {
 /// values that `line` has then are the defaults. Both must live until the parsing is done.
 void describe(CLI::App& app, CommandLine& line);
 
-/// Has `app` parse `arguments`, those of the program without its own name. One that looks like an
+/// Lets `app` parse `arguments`, those of the program without its own name. One that looks like an
 /// option, but is none and names a file, is taken for that file, since a pattern of the shell may
 /// expand to such names; so is everything after "--". Throws CLI::ParseError.
 void parse(CLI::App& app, std::vector<std::string> arguments);
