@@ -4,7 +4,6 @@
 #include "json/parse_memory.h"
 
 #include <algorithm>
-#include <cstdint>
 
 #include "json/string_kernels.h"
 #include "json/value.h"

@@ -2,7 +2,6 @@
 // The kernels that every machine can run, and the choice among all.
 #include "json/string_kernels.h"
 
-#include <cstddef>
 #include <cstdint>
 
 #ifdef __SSE2__

@@ -5,7 +5,6 @@
 #include <cstddef>
 #include <optional>
 #include <stdexcept>
-#include <utility>
 
 #include "json/serialize.h"
 #include "serialization/reading/result_keys.h"

@@ -9,7 +9,6 @@
 
 #include <array>
 #include <cstdlib>
-#include <cstring>
 #include <system_error>
 #include <utility>
 

@@ -14,7 +14,6 @@
 #include <sstream>
 #include <stdexcept>
 #include <system_error>
-#include <utility>
 #include <vector>
 
 #include "platform/i18n/codecvt.h"

@@ -7,7 +7,6 @@
 #include <unistd.h>
 
 #include <stdexcept>
-#include <system_error>
 
 #include "host/guard/file_content.h"
 #include "platform/posix/open_regular_file.h"

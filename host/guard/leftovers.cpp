@@ -10,7 +10,6 @@
 #include <exception>
 #include <filesystem>
 #include <memory>
-#include <string_view>
 
 #include "platform/posix/atomic_file.h"
 #include "platform/posix/file_descriptor.h"

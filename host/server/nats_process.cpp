@@ -14,7 +14,6 @@
 #include <iterator>
 #include <sstream>
 #include <stdexcept>
-#include <string_view>
 #include <system_error>
 #include <vector>
 

@@ -10,7 +10,6 @@
 #include <simdjson.h>
 #include <unicode/utf8.h>
 
-#include <algorithm>
 #include <array>
 #include <cstdint>
 #include <optional>

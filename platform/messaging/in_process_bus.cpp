@@ -4,7 +4,6 @@
 // and the bus share; queues and observers guard themselves.
 #include "platform/messaging/in_process_bus.h"
 
-#include <algorithm>
 #include <condition_variable>
 #include <mutex>
 #include <stdexcept>
@@ -95,11 +94,6 @@ private:
 
 using ObserverFunction = RevocableFunction<std::string_view, const JsonMessage&>;
 
-template <typename T>
-void eraseFrom(std::vector<std::shared_ptr<T>>& list, const std::shared_ptr<T>& item) {
-    list.erase(std::remove(list.begin(), list.end(), item), list.end());
-}
-
 }  // namespace
 
 // What the clients and the subscriptions of a bus share. No callback runs while its mutex is held.
@@ -154,7 +148,7 @@ public:
             const std::lock_guard lock(core_->mutex_);
             const auto found = core_->queues_.find(channel_);
             if (found != core_->queues_.end()) {
-                eraseFrom(found->second, queue_);
+                std::erase(found->second, queue_);
                 if (found->second.empty()) {
                     core_->queues_.erase(found);
                 }
@@ -184,7 +178,7 @@ public:
     ~Observation() override {
         {
             const std::lock_guard lock(core_->mutex_);
-            eraseFrom(core_->observers_, observer_);
+            std::erase(core_->observers_, observer_);
         }
         observer_->revoke();
     }

@@ -3,7 +3,6 @@
 #include "platform/messaging/transport.h"
 
 #include <mutex>
-#include <utility>
 
 #include "platform/messaging/in_process_bus.h"
 

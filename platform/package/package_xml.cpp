@@ -13,7 +13,6 @@
 
 #include "platform/i18n/codecvt.h"
 #include "platform/package/about.h"
-#include "platform/package/part_name.h"
 #include "platform/posix/system_error.h"
 #include "platform/text/case.h"
 

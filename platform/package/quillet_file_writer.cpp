@@ -19,7 +19,6 @@
 #include "platform/package/package_xml.h"
 #include "platform/package/part_name.h"
 #include "platform/package/relationships.h"
-#include "platform/package/zip/limits.h"
 #include "platform/package/zip/reusable_entries.h"
 #include "platform/package/zip/writer.h"
 #include "platform/posix/atomic_file.h"

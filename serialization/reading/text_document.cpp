@@ -6,7 +6,6 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstddef>
-#include <cstdint>
 #include <exception>
 #include <iostream>
 #include <stdexcept>

@@ -5,7 +5,6 @@
 #include <algorithm>
 #include <memory>
 #include <stdexcept>
-#include <utility>
 
 #include "platform/i18n/charsets/charset.h"
 

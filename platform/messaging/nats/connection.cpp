@@ -11,7 +11,6 @@
 #include <unordered_map>
 #include <vector>
 
-#include "platform/messaging/nats/subject.h"
 #include "platform/text/quoted.h"
 
 namespace platform::messaging::nats {

@@ -7,7 +7,6 @@
 #include <exception>
 #include <limits>
 #include <stdexcept>
-#include <utility>
 
 #include "platform/messaging/log.h"
 #include "platform/messaging/nats/handles.h"

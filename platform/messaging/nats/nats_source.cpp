@@ -12,7 +12,6 @@
 
 #include "platform/messaging/log.h"
 #include "platform/messaging/nats/handles.h"
-#include "platform/messaging/nats/subject.h"
 #include "platform/text/quoted.h"
 
 namespace platform::messaging::nats {
