@@ -11,7 +11,7 @@ import { setTimeout as sleep } from "node:timers/promises";
 import { MessageServer, memoryOf } from "./message_server.mjs";
 import { IS_LONG, IS_SANITIZED, temporaryFolder, waitFor } from "./processes.mjs";
 
-const KILLS = IS_LONG ? 200 : 20;
+const KILLS = IS_LONG ? 200 : 8;
 const MEGABYTES = IS_SANITIZED ? 3 : 12;
 const PATIENTLY = { tries: 100, timeout: 3000 };
 
