@@ -8,6 +8,8 @@ import { room } from "./room.mjs";
 
 const { SaveRefused, Saver } = await room("save/saver.ts");
 
+const textOf = (content) => ({ kind: "text", content, encoding: "UTF-8" });
+
 // A host with one text, whose versions are "v" and what it holds, and a view on it.
 class Desk {
   disk = "one";
@@ -31,13 +33,15 @@ class Desk {
     return text === undefined ? "" : `v${text}`;
   }
 
-  open() {
+  // `unsaved`: what a page that is gone has left.
+  open(version = this.versionOf(this.disk), unsaved) {
     this.saver = new Saver(
       {
-        content: async () => ({ kind: "text", content: this.view, encoding: "UTF-8" }),
+        draft: () => this.view,
+        content: async () => textOf(this.view),
         write: (content, base) => this.write(content, base),
         saved: (content) => this.saved.push(content.content),
-        load: async () => this.disk === undefined ? undefined : { path: "/t", version: this.versionOf(this.disk), answer: { status: true, data: this.disk } },
+        load: async () => this.loaded(),
         replace: (theirs) => (this.view = theirs.answer.data),
         resolve: async (theirs) => {
           this.conflicts.push(theirs?.answer.data);
@@ -45,9 +49,23 @@ class Desk {
         },
         update: () => {},
       },
-      this.versionOf(this.disk),
+      version,
+      unsaved,
     );
     return this;
+  }
+
+  // The page is gone, and its draft, which holds `view`, is shown by another one. It was stored when `sent` had been
+  // sent, and edited since; or, without that, before anything was sent.
+  reopen(version, view, sent) {
+    this.view = view;
+    const sentContent = async () => textOf(sent ?? view);
+    return this.open(version, { sent: sent ?? view, sentContent, isEditedSince: sent !== undefined });
+  }
+
+  loaded() {
+    const version = this.versionOf(this.disk);
+    return this.disk === undefined ? undefined : { path: "/t", version, answer: { status: true, data: this.disk } };
   }
 
   type(text) {
@@ -157,6 +175,81 @@ test("a save whose answer was lost is not taken for somebody else's", async () =
   desk.type("three");
   assert.equal(await desk.saver.save(), true);
   assert.deepEqual([desk.disk, desk.conflicts], ["three", []]);
+});
+
+test("a draft that the file holds by now is saved", async () => {
+  const desk = new Desk();
+  desk.disk = "two";
+  desk.reopen("vone", "two");
+  assert.equal(desk.saver.isUnsaved, true);
+  assert.equal(await desk.saver.noticed(desk.loaded()), "same");
+  assert.deepEqual([desk.saver.isUnsaved, desk.saver.hasTheirs, desk.saver.baseVersion], [false, false, "vtwo"]);
+  assert.deepEqual([desk.saved, desk.conflicts], [["two"], []]);
+});
+
+test("what a page sent before it was gone may reach the file after its draft is shown again", async () => {
+  const desk = new Desk().reopen("vone", "two");
+  assert.equal(await desk.saver.noticed(desk.loaded()), "same");
+  assert.equal(desk.saver.isUnsaved, true);
+  desk.disk = "two";
+  assert.equal(await desk.saver.followTheirs(), "same");
+  assert.deepEqual([desk.saver.isUnsaved, desk.saver.baseVersion], [false, "vtwo"]);
+});
+
+test("a draft that was edited after a save was sent is based on that save, and unsaved", async () => {
+  const desk = new Desk();
+  desk.disk = "two";
+  desk.reopen("vone", "three", "two");
+  assert.equal(desk.saver.sent, "two");
+  assert.equal(await desk.saver.noticed(desk.loaded()), "same");
+  assert.deepEqual([desk.saver.isUnsaved, desk.saver.baseVersion, desk.saver.sent], [true, "vtwo", undefined]);
+  assert.equal(await desk.saver.save(), true);
+  assert.deepEqual([desk.disk, desk.conflicts], ["three", []]);
+});
+
+test("what somebody else saved while a draft lay is kept beside it", async () => {
+  for (const sent of [undefined, "two"]) {
+    const desk = new Desk();
+    desk.disk = "theirs";
+    desk.reopen("vone", "mine", sent);
+    assert.equal(await desk.saver.noticed(desk.loaded()), "kept");
+    assert.deepEqual([desk.saver.isUnsaved, desk.saver.hasTheirs, desk.view], [true, true, "mine"]);
+    assert.equal(await desk.saver.save(), false);
+    assert.deepEqual([desk.disk, desk.conflicts], ["theirs", ["theirs"]]);
+  }
+});
+
+test("an empty draft of a file that was removed is not taken for saved", async () => {
+  const desk = new Desk().reopen("vone", "");
+  const removed = { path: "/t", version: "", answer: { status: true, data: "" } };
+  assert.equal(await desk.saver.noticed(removed), "kept");
+  assert.equal(desk.saver.isUnsaved, true);
+});
+
+test("what was sent is told while its answer is awaited and something else was typed", async () => {
+  const desk = new Desk().open();
+  const told = [];
+  desk.write = async (content, base) => {
+    told.push(desk.saver.sent);
+    desk.type("three");
+    told.push(desk.saver.sent);
+    return desk.store(content, base);
+  };
+  desk.type("two");
+  await desk.saver.save();
+  assert.deepEqual([...told, desk.saver.sent], [undefined, "two", undefined]);
+});
+
+test("a save that was made without an answer is no longer unsaved when it is heard of", async () => {
+  const desk = new Desk().open();
+  desk.write = async (content, base) => {
+    desk.store(content, base);
+    throw new Error("no answer");
+  };
+  desk.type("two");
+  await assert.rejects(desk.saver.save(), /no answer/);
+  assert.equal(await desk.saver.followTheirs(), "same");
+  assert.deepEqual([desk.saver.isUnsaved, desk.saver.baseVersion], [false, "vtwo"]);
 });
 
 test("without a word of the version, what was saved is looked at before it is built on", async () => {

@@ -112,3 +112,22 @@ test("what a charset lacks is counted, and the first of it is found, also far be
   assert.deepEqual({ ...lacking, characters: lacking.characters.size }, { characters: 2, count: 3, first: before.length + 2 });
   assert.equal(encodeFile(stateOf(before).doc, fileFormOf(stateOf(""))).lacking, undefined);
 });
+
+test("a draft tells what a save of it sends", async () => {
+  const { ChangeSet, contentOf, makeDraft } = form;
+  const draftOf = (charset) => {
+    const state = stateOf("a\r\nb\nc\r\n\u6e2f", { charset, byteOrderMark: true });
+    const changes = ChangeSet.of([{ from: 1, insert: "\n" }, { from: 2, to: 3 }], state.doc.length);
+    const { state: edited } = state.update({ changes });
+    const base = new Blob([Buffer.from("a\r\nb\nc\r\n\u6e2f")]); // in the charset that it was read in
+    return { edited, draft: makeDraft(base, "UTF-8", changes, fileFormOf(edited)) };
+  };
+  for (const charset of [UTF8, UTF16]) {
+    const { edited, draft } = draftOf(charset);
+    const content = bytesOf(edited).toString("latin1");
+    assert.deepEqual(await contentOf(structuredClone(draft), charsets), { kind: "text", content, encoding: charset.name });
+  }
+  const { draft } = draftOf(UTF8);
+  const half = ChangeSet.of({ from: 0, insert: "\ud83d" }, 7).toJSON(); // of which a save asks
+  assert.equal(await contentOf({ ...draft, changes: half }, charsets), undefined);
+});

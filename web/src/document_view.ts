@@ -81,5 +81,14 @@ export interface Page {
   reopen(charset?: string): void;
 }
 
-/** Makes the view of a document; `draft` is what an earlier view of it said was unsaved. */
-export type ViewFactory = (loaded: LoadedDocument, page: Page, draft?: unknown) => DocumentView;
+/** What shows documents of one kind. Drafts are what their views said was unsaved. */
+export interface Room {
+  /** Makes the view of a document, with the edits of `draft`. */
+  open(loaded: LoadedDocument, page: Page, draft?: unknown): DocumentView;
+
+  /**
+   * What a save sent when the view held `draft`; `later` is the view's draft by now. Parts that neither of them changes
+   * are taken from `loaded`, what is saved now. Nothing where it cannot be told, such as where a save asks first.
+   */
+  contentOf(draft: unknown, later: unknown, loaded: LoadedDocument): Promise<DocumentContent | undefined>;
+}

@@ -3,9 +3,11 @@
 import assert from "node:assert/strict";
 
 import { MessageServer } from "../../serve/message_server.mjs";
-import { temporaryFolder } from "../../serve/processes.mjs";
+import { temporaryFolder, waitFor } from "../../serve/processes.mjs";
 import { browserTest, Session } from "./harness.mjs";
-import { editor, open, save, typeAtTheEnd } from "./text_page.mjs";
+import { textIn, wordFiles } from "./office_files.mjs";
+import { open as openPackage } from "./package_page.mjs";
+import { charset, editor, open, save, shown, typeAtTheEnd } from "./text_page.mjs";
 
 const said = (page) => page.locator(".state .document");
 const isSaved = (page) => page.locator(".tab.active .unsaved").waitFor({ state: "detached", timeout: 60_000 });
@@ -92,4 +94,97 @@ browserTest("a save during which the server is killed is made when the server is
   assert.equal(session.read("a.txt").toString(), "one\ntwo");
   await save(page);
   assert.equal(session.read("a.txt").toString(), "one\ntwo three");
+});
+
+// The page asks for a save of `name`, and is closed before the host has made it. Then the host makes it, and another
+// page is opened, which shows what the first one left. `answer` answers the question that a save asks, and
+// `whileSaving` is done while it is under way, on the first page, whose draft then holds `kept`.
+async function loseAnswer(session, name, kept, { answer, whileSaving } = {}) {
+  const { page, host } = session;
+  const before = session.read(name);
+  host.signal("SIGSTOP");
+  await page.keyboard.press("Control+s");
+  await answer?.(page);
+  await said(page).getByText(/Saving/).waitFor();
+  await whileSaving?.(page);
+  await session.waitForDraft(page, kept);
+  await page.close();
+  host.signal("SIGCONT");
+  await waitFor("the save", () => !session.read(name).equals(before));
+  session.page = await session.newPage();
+  return session.page;
+}
+
+async function assertNobodyElse(page) {
+  assert.equal(await page.locator(".mark.theirs").count(), 0);
+  assert.equal(await page.getByText(/somebody else/).count(), 0);
+}
+
+browserTest("a save whose page is gone before the answer comes is found to be made", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  await open(session, "a.txt");
+  await typeAtTheEnd(session.page, "two");
+  const page = await loseAnswer(session, "a.txt", "two");
+  await isSaved(page);
+  assert.equal(await editor(page).innerText(), "one\ntwo");
+  await assertNobodyElse(page);
+  await typeAtTheEnd(page, " three");
+  await save(page);
+  await assertNobodyElse(page);
+  assert.equal(session.read("a.txt").toString(), "one\ntwo three");
+  await page.reload();
+  await editor(page).waitFor();
+  assert.equal(await page.locator(".mark").count(), 0);
+});
+
+browserTest("what was typed while a save was under way whose page is gone is unsaved, and no conflict", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  await open(session, "a.txt");
+  await typeAtTheEnd(session.page, "two");
+  const page = await loseAnswer(session, "a.txt", " three", { whileSaving: (saving) => typeAtTheEnd(saving, " three") });
+  await page.getByText(/have been restored/).waitFor();
+  assert.equal(session.read("a.txt").toString(), "one\ntwo");
+  await assertNobodyElse(page);
+  await save(page);
+  assert.equal(session.read("a.txt").toString(), "one\ntwo three");
+});
+
+browserTest("a text that a page that is gone was saving as UTF-8 is found to be saved", async (t) => {
+  const session = await Session.start(t, { "a.txt": Buffer.from("caf\xe9\r\n", "latin1") });
+  await open(session, "a.txt");
+  await typeAtTheEnd(session.page, "\u6e2f"); // which the file's charset lacks
+  await session.waitForDraft(session.page, "\u6e2f");
+  const toUtf8 = async (page) => {
+    await page.waitForTimeout(500); // in which a draft is stored that does not have the answer yet
+    await page.getByRole("dialog").getByRole("button", { name: /UTF-8/ }).click();
+  };
+  const page = await loseAnswer(session, "a.txt", "UTF-8", { answer: toUtf8 });
+  await isSaved(page);
+  await assertNobodyElse(page);
+  assert.equal(await shown(charset(page)), "UTF-8");
+  assert.equal(session.read("a.txt").toString(), "caf\u00e9\r\n\u6e2f");
+});
+
+browserTest("an office document whose page is gone before the answer comes is found to be saved", async (t) => {
+  const session = await openPackage(t, "report.docx", wordFiles());
+  const replaceAll = async (page, found, replacement) => {
+    await page.getByLabel("Find", { exact: true }).fill(found);
+    await page.getByLabel("Replace with").fill(replacement);
+    await page.getByRole("button", { name: "Replace all" }).click();
+  };
+  await replaceAll(session.page, "Annual report", "Budget");
+  const page = await loseAnswer(session, "report.docx", "Budget");
+  await page.locator(".package").waitFor();
+  await isSaved(page);
+  await assertNobodyElse(page);
+
+  await replaceAll(page, "Budget", "Plan");
+  const other = await loseAnswer(session, "report.docx", "Project", { whileSaving: (saving) => replaceAll(saving, "Plan", "Project") });
+  await other.getByText(/have been restored/).waitFor();
+  assert.match(textIn(session.read("report.docx"), "word/header1.xml"), /Plan, page/);
+  await assertNobodyElse(other);
+  await other.keyboard.press("Control+s");
+  await isSaved(other);
+  assert.equal(await other.getByRole("dialog").count(), 0);
+  assert.match(textIn(session.read("report.docx"), "word/header1.xml"), /Project, page/);
 });

@@ -4,7 +4,7 @@ import { test } from "node:test";
 
 import { room } from "../room.mjs";
 
-const { PackageModel, combine, findDifferences, kindOf, partBytes, propertyEdit, readProperties, sizeOf, withImage } =
+const { PackageModel, combine, documentSent, findDifferences, kindOf, partBytes, propertyEdit, readProperties, sizeOf, withImage } =
   await room("package/comparison.ts", "package/package_model.ts", "package/part_kinds.ts", "package/properties.ts");
 
 const part = (partUri, content, contentType = "application/xml", relationship = []) => ({
@@ -250,4 +250,25 @@ test("a document without properties gets a part and a relationship for them, whi
   model.undo();
   assert.equal(model.document().parts.length, 1);
   assert.equal(model.relationships.length, 1);
+});
+
+test("drafts tell which document was sent, however it was edited since", () => {
+  const model = new PackageModel(read());
+  model.edit(setting("/a.xml", "<sent/>"));
+  const [sent, document] = [model.draft(), model.document()];
+  assert.deepEqual(documentSent(document, sent, sent), document);
+  model.edit(setting("/a.xml", "<later/>"));
+  model.edit(setting("/b.bin", "later"));
+  assert.deepEqual(documentSent(document, sent, model.draft()), document);
+});
+
+test("a part that was edited after a document was sent is not taken from what is saved by now", () => {
+  const model = new PackageModel(read());
+  model.edit(setting("/a.xml", "<sent/>"));
+  const [sent, document] = [model.draft(), model.document()];
+  model.edit(setting("/b.bin", "later"));
+  const theirs = { ...document, parts: [document.parts[0], part("/b.bin", "theirs", "application/x")] };
+  assert.deepEqual(documentSent(theirs, sent, model.draft()), document); // and so differs from theirs
+  model.edit({ relationships: [{ relationshipId: "rId1", relationshipType: "t", target: "a.xml" }] });
+  assert.equal(documentSent(document, sent, model.draft()), undefined);
 });

@@ -2,6 +2,7 @@
 // A package in memory: what was read, what was changed since, and the way back. Parts are values; an edit puts
 // another one in the place of a part, so what is not edited is sent back as it came.
 import type { Document, Part, Relationship } from "../../client/src/index.js";
+import type { LoadedDocument } from "../document_view.js";
 
 /** What is unsaved, as IndexedDB stores it. */
 export interface PackageDraft {
@@ -164,6 +165,24 @@ export class PackageModel {
       listener(changed, editor);
     }
   }
+}
+
+export function documentOf({ answer }: LoadedDocument): Document {
+  return { parts: answer.parts ?? [], relationships: answer.relationships ?? [] };
+}
+
+/**
+ * The document that was sent to be saved when a view held `sent`; `later` is the view's draft by now. What neither
+ * changes is taken from `document`, what is saved now. Nothing where the drafts do not tell.
+ */
+export function documentSent(document: Document, sent: PackageDraft, later: PackageDraft): Document | undefined {
+  if (later.relationships && !sent.relationships) {
+    return undefined;
+  }
+  const parts = new Map(document.parts.map((part) => [part.partUri, part]));
+  Object.entries(later.parts).forEach(([uri, { base }]) => putInto(parts, uri, base));
+  Object.entries(sent.parts).forEach(([uri, { part }]) => putInto(parts, uri, part));
+  return { parts: [...parts.values()], relationships: sent.relationships ?? document.relationships };
 }
 
 function putInto(parts: Map<string, Part>, uri: string, part: Part | null): void {

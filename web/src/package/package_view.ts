@@ -1,10 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 // A package in its tab: its text, its parts and its properties, one at a time, and a preview beside them.
-import type { Document } from "../../client/src/index.js";
 import type { Comparison, DocumentContent, DocumentView, LoadedDocument, Page } from "../document_view.js";
 import { button, element } from "../ui/dom.js";
 import { compareDocuments } from "./comparison.js";
-import { PackageModel, type PackageDraft } from "./package_model.js";
+import { PackageModel, type PackageDraft, documentOf } from "./package_model.js";
 import { kindOf, textOf } from "./part_kinds.js";
 import { decodePart } from "./part_text.js";
 import { PartsPanel } from "./parts_panel.js";
@@ -270,10 +269,6 @@ export class PackageView implements DocumentView {
     });
     return answer === "save" && !this.#isClosed;
   }
-}
-
-function documentOf({ answer }: LoadedDocument): Document {
-  return { parts: answer.parts ?? [], relationships: answer.relationships ?? [] };
 }
 
 function isWordDocument(model: PackageModel): boolean {

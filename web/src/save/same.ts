@@ -14,23 +14,28 @@ export function isSame(loaded: LoadedDocument, sent: DocumentContent): boolean {
     return answer.data === sent.content || (mark !== "" && answer.data === sent.content.slice(mark.length));
   }
   const { parts, relationships } = sent.content;
+  const there = new Map(answer.parts?.map((part) => [part.partUri, part]));
   return (
     answer.parts?.length === parts.length &&
-    haveSame(answer.relationships ?? [], relationships, relationshipKey) &&
-    haveSame(answer.parts, parts, partKey)
+    haveSame(answer.relationships ?? [], relationships) &&
+    parts.every((part) => isSamePart(there.get(part.partUri), part))
   );
 }
 
-function haveSame<Item>(some: Item[], others: Item[], keyOf: (item: Item) => string): boolean {
+function isSamePart(loaded: Part | undefined, sent: Part): boolean {
+  return (
+    loaded !== undefined &&
+    loaded.content === sent.content &&
+    loaded.contentType.toLowerCase() === sent.contentType.toLowerCase() &&
+    haveSame(loaded.relationship ?? [], sent.relationship ?? [])
+  );
+}
+
+function haveSame(some: readonly Relationship[], others: readonly Relationship[]): boolean {
   const keys = new Set(some.map(keyOf));
-  return some.length === others.length && others.every((item) => keys.has(keyOf(item)));
+  return some.length === others.length && others.every((one) => keys.has(keyOf(one)));
 }
 
-function relationshipKey({ relationshipId, relationshipType, target }: Relationship): string {
+function keyOf({ relationshipId, relationshipType, target }: Relationship): string {
   return [relationshipId, relationshipType, target].join("\n");
-}
-
-function partKey({ partUri, contentType, content, relationship }: Part): string {
-  const relationships = (relationship ?? []).map(relationshipKey).sort();
-  return [partUri, contentType.toLowerCase(), ...relationships, content].join("\n");
 }

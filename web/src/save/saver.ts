@@ -12,6 +12,8 @@ export interface SaveResult {
 
 /** What a Saver needs of the document and its surroundings. */
 export interface SaveTarget {
+  /** What is unsaved, as it is stored. */
+  draft(): unknown;
   /** The document as it stands; nothing when the person thinks better of saving it. */
   content(): Promise<DocumentContent | undefined>;
   /** Has it saved if the document still has the version `base`. Throws when no answer came. */
@@ -28,6 +30,15 @@ export interface SaveTarget {
   update(): void;
 }
 
+/** What an earlier life of the page left unsaved. */
+export interface Unsaved {
+  /** What may have been sent to be saved, as a draft, and its content, where that can be told. */
+  sent: unknown;
+  sentContent(): Promise<DocumentContent | undefined>;
+  /** Whether there were edits after that. */
+  isEditedSince: boolean;
+}
+
 /** The host answered that it did not save, though nobody else has. */
 export class SaveRefused extends Error {}
 
@@ -38,15 +49,18 @@ export class Saver {
   #isWantedAgain = false;
   #hasTheirs = false;
   // What was sent last, while it is not known whether it was saved, or as which version.
-  #sent: DocumentContent | undefined;
+  #sent: { content(): Promise<DocumentContent | undefined>; draft: unknown; edits: number } | undefined;
 
-  /** `version` is what the document is based on; `isUnsaved` where it already differs from that. */
+  /** `version` is what the document is based on, and `unsaved` how it already differs from that. */
   constructor(
     private target: SaveTarget,
     private version: string,
-    isUnsaved = false,
+    unsaved?: Unsaved,
   ) {
-    this.#edits = isUnsaved ? 1 : 0;
+    this.#edits = unsaved ? 1 : 0;
+    if (unsaved) {
+      this.#sent = { content: unsaved.sentContent, draft: unsaved.sent, edits: unsaved.isEditedSince ? 0 : 1 };
+    }
   }
 
   /** The version that the document is based on. */
@@ -65,6 +79,11 @@ export class Saver {
   /** Whether somebody else has saved, and it has not been decided what becomes of it. */
   get hasTheirs(): boolean {
     return this.#hasTheirs;
+  }
+
+  /** What was sent last, as a draft, while it is not known what became of it and there were edits since. */
+  get sent(): unknown {
+    return this.#sent && this.#sent.edits !== this.#edits ? this.#sent.draft : undefined;
   }
 
   /** To be called on every edit. */
@@ -95,12 +114,17 @@ export class Saver {
     await this.#running?.catch(() => undefined);
     const theirs = await this.target.load();
     await this.#running?.catch(() => undefined);
-    if (!theirs || theirs.version === this.version) {
+    return theirs ? this.noticed(theirs) : "same";
+  }
+
+  /** To be called when `theirs` was found to be saved now, while no save was under way. */
+  async noticed(theirs: LoadedDocument): Promise<"same" | "shown" | "kept"> {
+    const base = this.version;
+    if (theirs.version === base || (await this.#isOwn(theirs))) {
       return "same";
     }
-    if (this.#isOwn(theirs)) {
-      this.#basedOn(theirs.version);
-      return "same";
+    if (this.#running || this.version !== base) {
+      return "same"; // a save finds out for itself
     }
     if (this.isUnsaved) {
       this.#hasTheirs = true;
@@ -128,7 +152,7 @@ export class Saver {
         return false;
       }
       const earlier = this.#sent;
-      this.#sent = content;
+      this.#sent = { content: async () => content, draft: this.target.draft(), edits };
       const result = await this.target.write(content, this.version);
       if (result.isSaved) {
         await this.#saved(edits, content, result);
@@ -163,8 +187,7 @@ export class Saver {
     if (version === this.version) {
       throw new SaveRefused();
     }
-    if (theirs && this.#isOwn(theirs)) {
-      this.#basedOn(version);
+    if (theirs && (await this.#isOwn(theirs))) {
       return "mine";
     }
     this.#hasTheirs = true;
@@ -178,8 +201,18 @@ export class Saver {
     return decision;
   }
 
-  #isOwn(theirs: LoadedDocument): boolean {
-    return this.#sent !== undefined && isSame(theirs, this.#sent);
+  // Whether `theirs` is what was sent last, and so has been saved.
+  async #isOwn(theirs: LoadedDocument): Promise<boolean> {
+    const sent = this.#sent;
+    const content = await sent?.content();
+    const isFile = theirs.version !== "";
+    if (!isFile || !sent || !content || sent !== this.#sent || !isSame(theirs, content)) {
+      return false;
+    }
+    this.#savedEdits = sent.edits;
+    this.target.saved(content);
+    this.#basedOn(theirs.version);
+    return true;
   }
 
   #show(theirs: LoadedDocument): void {

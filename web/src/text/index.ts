@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 // The view in which a text is edited.
-import type { ViewFactory } from "../document_view.js";
+import type { Room } from "../document_view.js";
 import { Charsets } from "./charsets/index.js";
+import { type TextDraft, contentOf } from "./draft.js";
 import { TextView } from "./text_view.js";
 
 async function loadTable(file: string): Promise<Uint8Array> {
@@ -14,4 +15,7 @@ async function loadTable(file: string): Promise<Uint8Array> {
 
 const charsets = new Charsets(loadTable);
 
-export const openText: ViewFactory = (loaded, page, draft) => new TextView(charsets, loaded, page, draft);
+export const texts: Room = {
+  open: (loaded, page, draft) => new TextView(charsets, loaded, page, draft),
+  contentOf: (draft) => contentOf(draft as TextDraft, charsets),
+};

@@ -9,10 +9,10 @@ import { nameOf } from "../files/paths.js";
 import { element } from "../ui/dom.js";
 import { ByteSink, type Charset, type Charsets, type Decoded, ESCAPED } from "./charsets/index.js";
 import { TextComparison } from "./comparison.js";
-import { type TextDraft, makeDraft } from "./draft.js";
+import { type TextDraft, formOf, makeDraft } from "./draft.js";
 import { textEditor } from "./editor.js";
 import { type EncodedText, type FileForm, encodeFile, fileFormOf, setFileForm } from "./file_form.js";
-import { fromStored, splitLines, uniform } from "./lines.js";
+import { splitLines, uniform } from "./lines.js";
 import { StatusBar } from "./status_bar.js";
 
 const MOST_NAMED = 10; // lacking characters that a question names
@@ -45,7 +45,7 @@ export class TextView implements DocumentView {
   #draft: TextDraft | undefined; // that has not been applied yet
   #isClosed = false;
   #wantsFocus = false;
-  #isSettling = false; // what changes then is part of the save that is under way
+  #isTelling = true; // the page of what is changed
 
   constructor(
     private charsets: Charsets,
@@ -219,9 +219,12 @@ export class TextView implements DocumentView {
     if (!draft || !charset) {
       return;
     }
-    const lineEnds = fromStored(draft.lineEnd, draft.otherLineEnds);
-    const effects = setFileForm.of({ charset, byteOrderMark: draft.byteOrderMark, lineEnds });
-    this.#view!.dispatch({ changes: ChangeSet.fromJSON(draft.changes), effects });
+    this.#withoutTelling(() =>
+      this.#view!.dispatch({
+        changes: ChangeSet.fromJSON(draft.changes),
+        effects: setFileForm.of(formOf(draft, charset)),
+      }),
+    );
     this.#draft = undefined;
   }
 
@@ -230,7 +233,7 @@ export class TextView implements DocumentView {
       this.#changes = this.#changes.compose(update.changes);
     }
     if (update.docChanged || fileFormOf(update.startState) !== fileFormOf(update.state)) {
-      if (!this.#isSettling) {
+      if (this.#isTelling) {
         this.page.changed();
       }
       this.#status.show(update.state);
@@ -335,9 +338,16 @@ export class TextView implements DocumentView {
 
   #settle(form: Partial<FileForm>, changes: { from: number; to: number; insert: string }[] = []): void {
     const view = this.#view!;
-    this.#isSettling = true;
-    view.dispatch({ changes, effects: setFileForm.of({ ...fileFormOf(view.state), ...form }) });
-    this.#isSettling = false;
+    this.#withoutTelling(() =>
+      view.dispatch({ changes, effects: setFileForm.of({ ...fileFormOf(view.state), ...form }) }),
+    );
+  }
+
+  // For changes that are part of the save that is under way, or that the page knows as a draft.
+  #withoutTelling(change: () => void): void {
+    this.#isTelling = false;
+    change();
+    this.#isTelling = true;
   }
 
   #comparisonOf({ decoded, charset, byteOrderMark }: Source, mine: EditorState): TextComparison {

@@ -2,13 +2,13 @@
 // A document that is open: read, shown in a panel by the view of its kind, saved, and followed when somebody
 // else saves it.
 import { AskAgain, type Client, type Progress } from "../../client/src/index.js";
-import type { DocumentContent, DocumentView, LoadedDocument, Page, ViewFactory } from "../document_view.js";
+import type { DocumentContent, DocumentView, LoadedDocument, Page, Room } from "../document_view.js";
 import { UnreadableDocument, load } from "../files/loading.js";
 import { isPackage, nameOf } from "../files/paths.js";
 import { resolveConflict } from "../save/conflict.js";
 import { DraftKeeper } from "../save/draft_keeper.js";
 import type { Draft, Drafts } from "../save/drafts.js";
-import { SaveRefused, type SaveResult, Saver } from "../save/saver.js";
+import { SaveRefused, type SaveResult, Saver, type Unsaved } from "../save/saver.js";
 import { browseVersions } from "../save/versions.js";
 import { ask } from "./dialog.js";
 import { button, element } from "./dom.js";
@@ -94,11 +94,11 @@ export class OpenDocument {
     const slow = setTimeout(() => this.#readAmount(text("document.slow")), SLOW);
     try {
       const loaded = await this.#load(reading.signal, draft);
-      const open = await factoryOf(this.path);
+      const room = await roomOf(this.path);
       reading.signal.throwIfAborted();
       const readAs = charset ?? draft?.readAs;
       this.#chosenCharset = readAs === undefined ? undefined : { found: loaded.charset, readAs };
-      this.#show(this.#asChosen(loaded), open, draft);
+      await this.#show(this.#asChosen(loaded), room, draft);
     } catch (error) {
       if (this.#reading === reading) {
         const again = () => void this.read({ ...(charset && { charset }), ...(draft && { draft }) });
@@ -206,18 +206,21 @@ export class OpenDocument {
     }
   }
 
-  #show(loaded: LoadedDocument, open: ViewFactory, draft?: Draft): void {
+  async #show(loaded: LoadedDocument, room: Room, draft?: Draft): Promise<void> {
     this.#view?.close();
     this.#loaded = loaded;
-    this.#saver = this.#makeSaver(draft?.version ?? loaded.version, draft !== undefined);
-    this.#view = open(this.#loaded, this.#page(), draft?.content);
+    const saver = (this.#saver = this.#makeSaver(draft?.version ?? loaded.version, draft && unsavedOf(draft, loaded, room)));
+    this.#view = room.open(this.#loaded, this.#page(), draft?.content);
     this.panel.replaceChildren(this.#view.element);
     this.#setStatus("");
-    if (draft) {
-      const isSame = draft.version === loaded.version;
-      this.around.tell(text(isSame ? "document.restored" : "document.restored.theirs", { name: this.name }));
-    } else {
+    if (!draft) {
       void this.#keeper.clear();
+      return;
+    }
+    const outcome = await saver.noticed(loaded);
+    if (saver.isUnsaved) {
+      const key = outcome === "kept" ? "document.restored.theirs" : "document.restored";
+      this.around.tell(text(key, { name: this.name }));
     }
   }
 
@@ -227,9 +230,10 @@ export class OpenDocument {
     return chosen && chosen.found === loaded.charset ? { ...loaded, readAs: chosen.readAs } : loaded;
   }
 
-  #makeSaver(version: string, isUnsaved: boolean): Saver {
+  #makeSaver(version: string, unsaved?: Unsaved): Saver {
     const saver = new Saver(
       {
+        draft: () => this.#view!.draft(),
         content: () => this.#view!.content(),
         write: (content, base) => this.#write(content, base),
         saved: (content) => this.#view!.saved?.(content),
@@ -246,7 +250,7 @@ export class OpenDocument {
         },
       },
       version,
-      isUnsaved,
+      unsaved,
     );
     return saver;
   }
@@ -274,6 +278,7 @@ export class OpenDocument {
       onAskAgain: () => this.#setStatus(text("save.again")),
     };
     this.#setStatus(text("save.waiting"));
+    this.#keeper.changed(); // so that the draft tells what was sent
     for (;;) {
       try {
         const { client } = this.around;
@@ -308,13 +313,15 @@ export class OpenDocument {
       return;
     }
     const { charset, byteOrderMark, readAs } = this.#loaded ?? {};
+    const { baseVersion, sent } = this.#saver;
     await this.around.drafts.put({
       path: this.path,
-      version: this.#saver.baseVersion,
+      version: baseVersion,
       content: this.#view.draft(),
       ...(charset !== undefined && { charset }),
       ...(byteOrderMark !== undefined && { byteOrderMark }),
       ...(readAs !== undefined && { readAs }),
+      ...(sent !== undefined && { sent }),
     });
   }
 
@@ -420,6 +427,11 @@ function pause(milliseconds: number, signal: AbortSignal): Promise<void> {
 }
 
 // The rooms are loaded when a document of theirs is opened.
-async function factoryOf(path: string): Promise<ViewFactory> {
-  return isPackage(path) ? (await import("../package/index.js")).openPackage : (await import("../text/index.js")).openText;
+async function roomOf(path: string): Promise<Room> {
+  return isPackage(path) ? (await import("../package/index.js")).packages : (await import("../text/index.js")).texts;
+}
+
+function unsavedOf(draft: Draft, loaded: LoadedDocument, room: Room): Unsaved {
+  const { content, sent = content } = draft;
+  return { sent, sentContent: () => room.contentOf(sent, content, loaded), isEditedSince: draft.sent !== undefined };
 }
