@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Office documents for tests, with what real ones have: text cut into runs, images, parts that are no text.
+import { randomFillSync } from "node:crypto";
 import { createRequire } from "node:module";
 import { join } from "node:path";
 import { deflateSync } from "node:zlib";
@@ -14,6 +15,20 @@ const DECLARATION = '<?xml version="1.0" encoding="UTF-8" standalone="yes"?>\r\n
 
 /** A PNG of one colour. */
 export function png(width, height, [red, green, blue]) {
+  const row = [0, ...Array.from({ length: width }, () => [red, green, blue]).flat()];
+  return pngOf(width, height, deflateSync(Buffer.from(Array.from({ length: height }, () => row).flat())));
+}
+
+/** A PNG that cannot be compressed, as photographs: 3 bytes for each pixel. */
+export function photograph(width, height) {
+  const rows = randomFillSync(Buffer.alloc(height * (3 * width + 1)));
+  for (let row = 0; row < height; ++row) {
+    rows[row * (3 * width + 1)] = 0; // which says that it is not stored as a difference
+  }
+  return pngOf(width, height, deflateSync(rows, { level: 0 }));
+}
+
+function pngOf(width, height, pixels) {
   const chunk = (name, data) => {
     const body = Buffer.concat([Buffer.from(name), data]);
     const result = Buffer.alloc(body.length + 8);
@@ -26,19 +41,21 @@ export function png(width, height, [red, green, blue]) {
   header.writeUInt32BE(width, 0);
   header.writeUInt32BE(height, 4);
   header.set([8, 2, 0, 0, 0], 8);
-  const row = [0, ...Array.from({ length: width }, () => [red, green, blue]).flat()];
-  const pixels = deflateSync(Buffer.from(Array.from({ length: height }, () => row).flat()));
   const signature = Buffer.from("\x89PNG\r\n\x1a\n", "latin1");
   return Buffer.concat([signature, chunk("IHDR", header), chunk("IDAT", pixels), chunk("IEND", Buffer.alloc(0))]);
 }
 
+const CRC_TABLE = Uint32Array.from({ length: 256 }, (_, byte) => {
+  for (let bit = 0; bit < 8; ++bit) {
+    byte = (byte >>> 1) ^ (byte & 1 ? 0xedb88320 : 0);
+  }
+  return byte;
+});
+
 function crc32(bytes) {
   let crc = ~0;
   for (const byte of bytes) {
-    crc ^= byte;
-    for (let bit = 0; bit < 8; ++bit) {
-      crc = (crc >>> 1) ^ (crc & 1 ? 0xedb88320 : 0);
-    }
+    crc = (crc >>> 8) ^ CRC_TABLE[(crc ^ byte) & 0xff];
   }
   return ~crc >>> 0;
 }
@@ -46,11 +63,14 @@ function crc32(bytes) {
 /** Bytes of which no charset makes a text, as in printer settings and macros. */
 export const BINARY = Uint8Array.from({ length: 600 }, (_, index) => (index * 37) % 256);
 
-/** The zip archive of files: names, and contents as texts or bytes. */
+/** The zip archive of files: names, and contents as texts or bytes. Images are stored as they are. */
 export function archive(files) {
   const entries = Object.entries(files).map(([name, content]) => [
     name,
-    typeof content === "string" ? new TextEncoder().encode(content) : new Uint8Array(content),
+    [
+      typeof content === "string" ? new TextEncoder().encode(content) : new Uint8Array(content),
+      { level: name.endsWith(".png") ? 0 : 6 },
+    ],
   ]);
   return zipSync(Object.fromEntries(entries));
 }
@@ -93,20 +113,25 @@ const CORE_OVERRIDE = { "/docProps/core.xml": "application/vnd.openxmlformats-pa
 
 const run = (text, format = "") => `<w:r>${format}<w:t xml:space="preserve">${text}</w:t></w:r>`;
 
-/** The files of a Word document; `body` is XML in front of its last paragraph. */
-export function wordFiles(body = "", more = {}) {
-  const picture =
+/** A paragraph with the image of a relationship. */
+export function wordPicture(id) {
+  return (
     '<w:p><w:r><w:drawing><wp:inline><wp:extent cx="952500" cy="952500"/><wp:docPr id="1" name="P"/>' +
     '<a:graphic><a:graphicData uri="http://schemas.openxmlformats.org/drawingml/2006/picture"><pic:pic>' +
-    '<pic:nvPicPr><pic:cNvPr id="1" name="P"/><pic:cNvPicPr/></pic:nvPicPr><pic:blipFill><a:blip r:embed="rId1"/></pic:blipFill>' +
+    `<pic:nvPicPr><pic:cNvPr id="1" name="P"/><pic:cNvPicPr/></pic:nvPicPr><pic:blipFill><a:blip r:embed="${id}"/></pic:blipFill>` +
     '<pic:spPr><a:xfrm><a:off x="0" y="0"/><a:ext cx="952500" cy="952500"/></a:xfrm></pic:spPr>' +
-    "</pic:pic></a:graphicData></a:graphic></wp:inline></w:drawing></w:r></w:p>";
+    "</pic:pic></a:graphicData></a:graphic></wp:inline></w:drawing></w:r></w:p>"
+  );
+}
+
+/** The files of a Word document; `body` is XML in front of its last paragraph. */
+export function wordFiles(body = "", more = {}) {
   const document =
     `${DECLARATION}<w:document xmlns:w="http://schemas.openxmlformats.org/wordprocessingml/2006/main" xmlns:r="${OFFICE}"` +
     ' xmlns:wp="http://schemas.openxmlformats.org/drawingml/2006/wordprocessingDrawing"' +
     ' xmlns:a="http://schemas.openxmlformats.org/drawingml/2006/main"' +
     ' xmlns:pic="http://schemas.openxmlformats.org/drawingml/2006/picture"><w:body>' +
-    `<w:p>${run("The Ann")}${run("ual re", "<w:rPr><w:b/></w:rPr>")}${run("port of 2026")}</w:p>${picture}` +
+    `<w:p>${run("The Ann")}${run("ual re", "<w:rPr><w:b/></w:rPr>")}${run("port of 2026")}</w:p>${wordPicture("rId1")}` +
     `<w:p><w:hyperlink r:id="rId2">${run("A link")}</w:hyperlink></w:p>${body}` +
     `<w:p>${run("Cr\u00e8me br\u00fbl\u00e9e \u6e2f")}</w:p></w:body></w:document>`;
   return {

@@ -2,14 +2,28 @@
 // Strings that carry bytes, one in each character, as documents do in messages.
 
 const CHUNK = 32_768; // what a call takes as arguments everywhere
+const UTF8 = new TextDecoder("utf-8", { fatal: true, ignoreBOM: true });
 
 /** The characters U+0000 to U+00FF that stand for `bytes`. */
 export function stringOf(bytes: Uint8Array): string {
   const chunks: string[] = [];
   for (let begin = 0; begin < bytes.length; begin += CHUNK) {
-    chunks.push(String.fromCharCode.apply(null, bytes.subarray(begin, begin + CHUNK) as unknown as number[]));
+    chunks.push(charactersOf(bytes.subarray(begin, begin + CHUNK)));
   }
   return chunks.join("");
+}
+
+// Decoding takes a sixth of the time, and serves where UTF-8 has one byte for each character: in ASCII, such as base64.
+function charactersOf(bytes: Uint8Array): string {
+  try {
+    const decoded = UTF8.decode(bytes);
+    if (decoded.length === bytes.length) {
+      return decoded;
+    }
+  } catch {
+    // It is no UTF-8.
+  }
+  return String.fromCharCode.apply(null, bytes as unknown as number[]);
 }
 
 /** The bytes that `characters` stand for. Throws RangeError when one is past U+00FF. */
@@ -41,7 +55,7 @@ const CHANGED = /[\u0000-\u0008\u000b\u000c\u000e-\u001f\u200b\ufffe\uffff]/;
 /** Whether `content` comes back byte for byte as the content of a part of an "application/" type. */
 export function isPlainText(content: string): boolean {
   try {
-    return !CHANGED.test(new TextDecoder("utf-8", { fatal: true, ignoreBOM: true }).decode(bytesOf(content)));
+    return !CHANGED.test(UTF8.decode(bytesOf(content)));
   } catch {
     return false;
   }

@@ -13,14 +13,14 @@ interface Archive {
   files: Record<string, ArchiveFile>;
 }
 
-/** The archive that a package would be in. */
-export function openParts({ parts, relationships }: Document): Archive {
+/** The archive that a package would be in. Blobs of parts are taken from `blobs`, and put there. */
+export function openParts({ parts, relationships }: Document, blobs: WeakMap<Part, Blob>): Archive {
   const files = Object.create(null) as Archive["files"];
   files["[Content_Types].xml"] = generated(() => contentTypes(parts));
   files["_rels/.rels"] = generated(() => relationshipsXml(relationships));
   for (const part of parts) {
     const name = textOf(part.partUri).slice(1);
-    files[name] = partFile(part);
+    files[name] = partFile(part, blobs);
     files[name.replace(/([^/]*)$/, "_rels/$1.rels")] = generated(() => relationshipsXml(part.relationship ?? []));
   }
   return { files };
@@ -33,14 +33,18 @@ function generated(make: () => string): ArchiveFile {
   return { async: async () => make() };
 }
 
-function partFile(part: Part): ArchiveFile {
+function partFile(part: Part, blobs: WeakMap<Part, Blob>): ArchiveFile {
   return {
     async: async (type) => {
       if (type === "string") {
         return decodePart(part.content)?.text ?? textOf(part.content);
       }
-      const bytes = partBytes(part);
-      return type === "blob" ? new Blob([bytes as Uint8Array<ArrayBuffer>]) : bytes;
+      if (type !== "blob") {
+        return partBytes(part);
+      }
+      const blob = blobs.get(part) ?? new Blob([partBytes(part) as Uint8Array<ArrayBuffer>]);
+      blobs.set(part, blob);
+      return blob;
     },
   };
 }

@@ -5,6 +5,7 @@
 // are shown in a frame whose sandbox runs no scripts and whose policy loads nothing but data. The frame has
 // this page's origin only so that the page can put nodes into it and keep its place; without scripts there is
 // nobody in it who could make use of that.
+import type { Part } from "../../client/src/index.js";
 import type { Page } from "../document_view.js";
 import { element } from "../ui/dom.js";
 import type { PackageModel } from "./package_model.js";
@@ -24,6 +25,7 @@ export class Preview {
   #lastTook = 0; // milliseconds
   #rendering = 0; // which one is the latest
   #urls: string[] = []; // of the images that are shown
+  #blobs = new WeakMap<Part, Blob>(); // what they are
   #stopListening: () => void;
 
   constructor(
@@ -60,7 +62,7 @@ export class Preview {
     const start = performance.now();
     try {
       const { renderDocument } = await import("./word_rendering.js");
-      const { nodes, urls } = await renderDocument(this.model.document());
+      const { nodes, urls } = await renderDocument(this.model.document(), this.#blobs);
       const shown = this.#frame.contentDocument;
       if (rendering !== this.#rendering || !shown) {
         urls.forEach((url) => URL.revokeObjectURL(url));
