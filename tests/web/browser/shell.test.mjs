@@ -2,6 +2,7 @@
 // The page around the documents: connection, tabs, links, languages, colours, small windows, screen readers.
 import assert from "node:assert/strict";
 
+import { waitFor } from "../../serve/processes.mjs";
 import { faults } from "./accessibility.mjs";
 import { browserTest, Session } from "./harness.mjs";
 
@@ -70,6 +71,24 @@ browserTest("tabs are gone through, and closed, by the keyboard", async (t) => {
   await tab(page, "b.txt").waitFor({ state: "detached" });
   assert.equal(await page.getByRole("tab").count(), 2);
   assert.equal(await page.getByRole("tabpanel").count(), 1);
+});
+
+browserTest("the tab of the document that is shown is in sight, however many there are", async (t) => {
+  const names = Array.from({ length: 15 }, (_, index) => `document number ${index}.txt`);
+  const session = await Session.start(t, Object.fromEntries(names.map((name) => [name, name])));
+  const { page } = session;
+  const isInSight = async (name) => {
+    const [all, one] = [await page.locator(".tabs").boundingBox(), await tab(page, name).boundingBox()];
+    return one.x >= all.x && one.x + one.width <= all.x + all.width;
+  };
+  for (const name of names) {
+    await open(page, name);
+    await waitFor(`the tab of ${name}`, () => isInSight(name));
+  }
+  assert.equal(await isInSight(names[0]), false);
+  await page.locator(".panel:not([hidden]) .cm-content").press("x"); // which marks its tab
+  await tab(page, names.at(-1)).locator(".mark.unsaved").waitFor();
+  assert.equal(await isInSight(names.at(-1)), true);
 });
 
 browserTest("a document with unsaved changes is closed only after asking", async (t) => {

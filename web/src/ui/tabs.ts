@@ -29,6 +29,7 @@ export class Tabs {
     this.#shown = documents;
     this.#active = active;
     this.element.replaceChildren(...documents.map((one) => this.#tab(one, one === active)));
+    this.element.querySelector(".active")?.scrollIntoView({ block: "nearest", inline: "nearest" });
     if (hadFocus) {
       this.focus();
     }
