@@ -68,13 +68,13 @@ browserTest("two editions of a document are compared part by part, and put toget
   assert.equal(await choiceOf(page, "/docProps/core.xml").inputValue(), "theirs");
   assert.equal(await choiceOf(page, "/word/media/image1.png").inputValue(), "theirs");
   await dialog(page).getByRole("button", { name: "/word/media/image1.png" }).click();
-  await dialog(page).getByRole("img", { name: "/word/media/image1.png: Theirs" }).waitFor();
+  await dialog(page).getByRole("img", { name: "/word/media/image1.png: The other version" }).waitFor();
   // The part that both have changed: their last paragraph is brought over into mine.
   await dialog(page).getByRole("button", { name: "/word/document.xml" }).click();
   await dialog(page).locator(".cm-mergeView").hover();
   await page.mouse.wheel(0, 10_000);
   await dialog(page).locator(".cm-mergeView").getByText("Theirs at the end").waitFor();
-  const arrows = await dialog(page).getByRole("button", { name: "Take this change over from theirs" }).all();
+  const arrows = await dialog(page).getByRole("button", { name: "Take this change over from the other version" }).all();
   const heights = await Promise.all(arrows.map(async (arrow) => (await arrow.boundingBox()).y));
   await arrows[heights.indexOf(Math.max(...heights))].click();
   assert.equal(await choiceOf(page, "/word/document.xml").inputValue(), "together");

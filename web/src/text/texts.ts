@@ -50,7 +50,7 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "text.failed": "The text cannot be shown: {reason}",
     "text.notShown": "This text is not shown, so there is nothing to compare.",
     "text.changedMeanwhile": "The text has changed meanwhile. Compare again.",
-    "text.theirs": "Saved by somebody else",
+    "text.theirs": "The other version",
     "text.mine": "Yours: the result",
   },
   de: {
@@ -102,7 +102,7 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "text.failed": "Der Text kann nicht gezeigt werden: {reason}",
     "text.notShown": "Dieser Text wird nicht gezeigt, es gibt also nichts zu vergleichen.",
     "text.changedMeanwhile": "Der Text hat sich inzwischen geändert. Bitte noch einmal vergleichen.",
-    "text.theirs": "Von jemand anderem gespeichert",
+    "text.theirs": "Die andere Fassung",
     "text.mine": "Ihr Text: das Ergebnis",
   },
 };
