@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // What the page's rooms agree on: a document as it was read, the view in which it is edited, and what
-// a view may ask of the page around it. text/ and package/ make views; ui/ shows them in tabs; save/
+// a view may ask of the page around it. text/, package/ and images/ make views; ui/ shows them in tabs; save/
 // takes their content, keeps their drafts and resolves their conflicts.
 import type { Client, Document, ReadAnswer } from "../client/src/index.js";
 

@@ -12,6 +12,7 @@ import { Workspace } from "./ui/workspace.js";
 // Here, since nothing would load the style sheets of chunks.
 import "./ui/page.css";
 import "./files/files.css";
+import "./images/images.css";
 import "./text/text.css";
 import "./package/package.css";
 

@@ -15,6 +15,13 @@ export function join(folder: string, name: string): string {
 
 const PACKAGES = /\.(doc|dot|xls|xlt|ppt|pps|pot)[xm]$|\.(xlam|ppam|sldx|sldm|vsdx|vstx|vssx|xps|oxps)$/i;
 
+const IMAGES = /\.(png|jpe?g|gif|webp|bmp|avif)$/i;
+
+/** Whether a document at `path` is an image that is no text, by its name. */
+export function isImage(path: string): boolean {
+  return IMAGES.test(path);
+}
+
 /** Whether a document at `path` is a package, by its name. */
 export function isPackage(path: string): boolean {
   return PACKAGES.test(path);

@@ -4,7 +4,7 @@
 import { AskAgain, type Client, type Progress } from "../../client/src/index.js";
 import type { DocumentContent, DocumentView, LoadedDocument, Page, Room } from "../document_view.js";
 import { UnreadableDocument, load } from "../files/loading.js";
-import { isPackage, nameOf } from "../files/paths.js";
+import { isImage, isPackage, nameOf } from "../files/paths.js";
 import { resolveConflict } from "../save/conflict.js";
 import { DraftKeeper } from "../save/draft_keeper.js";
 import type { Draft, Drafts } from "../save/drafts.js";
@@ -428,7 +428,10 @@ function pause(milliseconds: number, signal: AbortSignal): Promise<void> {
 
 // The rooms are loaded when a document of theirs is opened.
 async function roomOf(path: string): Promise<Room> {
-  return isPackage(path) ? (await import("../package/index.js")).packages : (await import("../text/index.js")).texts;
+  if (isPackage(path)) {
+    return (await import("../package/index.js")).packages;
+  }
+  return isImage(path) ? (await import("../images/index.js")).images : (await import("../text/index.js")).texts;
 }
 
 function unsavedOf(draft: Draft, loaded: LoadedDocument, room: Room): Unsaved {

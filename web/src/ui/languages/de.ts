@@ -57,6 +57,8 @@ export const de: Record<string, string> = {
   "document.reopen.yes": "Neu lesen",
   "document.reloaded": "{name} wurde von jemand anderem gespeichert und wird im jetzigen Stand gezeigt.",
   "document.theirs": "{name} wurde von jemand anderem gespeichert. Ihre Änderungen bleiben erhalten; beim Speichern können Sie beides vergleichen.",
+  "image.problem": "{name} lässt sich nicht als Bild zeigen.",
+  "image.compare": "Bilder lassen sich nicht vergleichen.",
   "document.restored": "{name}: Ihre ungespeicherten Änderungen sind wiederhergestellt.",
   "document.restored.theirs": "{name}: Ihre ungespeicherten Änderungen sind wiederhergestellt. Inzwischen hat jemand anderes gespeichert; beim Speichern können Sie beides vergleichen.",
   "page.tools": "Dieses Dokument",

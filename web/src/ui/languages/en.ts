@@ -57,6 +57,8 @@ export const en: Record<string, string> = {
   "document.reopen.yes": "Read again",
   "document.reloaded": "{name} was saved by somebody else and is shown as it is now.",
   "document.theirs": "{name} was saved by somebody else. Your changes are kept; when you save, you can compare both.",
+  "image.problem": "{name} cannot be shown as an image.",
+  "image.compare": "Images cannot be compared.",
   "document.restored": "{name}: your unsaved changes have been restored.",
   "document.restored.theirs": "{name}: your unsaved changes have been restored. Meanwhile somebody else has saved it; when you save, you can compare both.",
   "page.tools": "This document",
