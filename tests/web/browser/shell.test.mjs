@@ -73,6 +73,15 @@ browserTest("tabs are gone through, and closed, by the keyboard", async (t) => {
   assert.equal(await page.getByRole("tabpanel").count(), 1);
 });
 
+browserTest("a document that is opened in the tree can be typed into at once", async (t) => {
+  const { page } = await Session.start(t, { "a.txt": "one\n" });
+  const text = page.locator(".panel:not([hidden]) .cm-content");
+  await open(page, "a.txt");
+  await page.locator(".cm-editor.cm-focused").waitFor();
+  await page.keyboard.type("zero ");
+  assert.match(await text.innerText(), /^zero one/);
+});
+
 browserTest("the tab of the document that is shown is in sight, however many there are", async (t) => {
   const names = Array.from({ length: 15 }, (_, index) => `document number ${index}.txt`);
   const session = await Session.start(t, Object.fromEntries(names.map((name) => [name, name])));

@@ -211,7 +211,11 @@ export class OpenDocument {
     this.#loaded = loaded;
     const saver = (this.#saver = this.#makeSaver(draft?.version ?? loaded.version, draft && unsavedOf(draft, loaded, room)));
     this.#view = room.open(this.#loaded, this.#page(), draft?.content);
+    const hasFocus = this.panel.contains(document.activeElement);
     this.panel.replaceChildren(this.#view.element);
+    if (hasFocus) {
+      this.#view.focus(); // which was there while the document was being read
+    }
     this.#setStatus("");
     if (!draft) {
       void this.#keeper.clear();
