@@ -19,6 +19,18 @@ browserTest("the root is open, folders first, and a file is opened by a click", 
   assert.equal(await page.title(), "b.txt - Documents");
 });
 
+browserTest("a click counts though the tree is to be drawn again before the button is let go", async (t) => {
+  const { page } = await Session.start(t, { "a.txt": "one" });
+  await row(page, "a.txt").hover();
+  await page.mouse.down();
+  await page.evaluate(() => {
+    document.querySelector(".tree").dispatchEvent(new Event("scroll")); // draws it with the next frame
+    return new Promise((resolve) => requestAnimationFrame(() => requestAnimationFrame(resolve)));
+  });
+  await page.mouse.up();
+  await page.getByRole("tab", { name: "a.txt" }).waitFor();
+});
+
 browserTest("the keyboard goes through the tree, opens folders and files", async (t) => {
   const { page } = await Session.start(t, { "a.txt": "one", "inner/c.txt": "three" });
   await row(page, "a.txt").waitFor();

@@ -30,6 +30,7 @@ export class FileTree {
   #toRefresh = new Map<TreeNode, ReturnType<typeof setTimeout>>();
   #search = 0;
   #isRenderWaiting = false;
+  #isPressed = false; // A row that is drawn again while the mouse is pressed on it gets no click.
 
   constructor(private options: TreeOptions) {
     const refresh = button("\u21bb", () => void this.refresh(), { title: text("files.refresh"), "aria-label": text("files.refresh") });
@@ -40,6 +41,13 @@ export class FileTree {
     this.#tree.addEventListener("keydown", (event) => this.#key(event));
     this.#tree.addEventListener("scroll", () => this.#render(), { passive: true });
     this.#rows.addEventListener("click", (event) => this.#click(event));
+    this.#rows.addEventListener("pointerdown", ({ button }) => (this.#isPressed = button === 0));
+    for (const end of ["pointerup", "pointercancel"]) {
+      addEventListener(end, () => {
+        this.#isPressed = false;
+        this.#render();
+      });
+    }
     new ResizeObserver(() => this.#render()).observe(this.#tree);
   }
 
@@ -296,6 +304,9 @@ export class FileTree {
 
   #renderNow(): void {
     this.#isRenderWaiting = false;
+    if (this.#isPressed) {
+      return; // until the button is let go
+    }
     const rows = this.#model.rows();
     const { scrollTop, clientHeight } = this.#tree;
     const begin = Math.max(0, Math.floor(scrollTop / ROW) - BEYOND);
