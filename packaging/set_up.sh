@@ -150,13 +150,13 @@ build() {
     exec 9>&-
 }
 
-# run_tests NAME [CTEST-ARGUMENT...]: runs the tests of build/NAME in parallel, half as many again as there are
+# run_tests NAME [CTEST-ARGUMENT...]: runs the tests of build/NAME in parallel, twice as many as there are
 # processors, since many wait most of their time. Prints what is said of tests that do not pass, and the summary.
 run_tests() {
     local name=$1
     shift
     step "running the tests of $name"
-    ctest --test-dir "$root/build/$name" --parallel "$(($(nproc) * 3 / 2))" --output-on-failure \
+    ctest --test-dir "$root/build/$name" --parallel "$(($(nproc) * 2))" --output-on-failure \
         --no-tests=error "$@" |
         grep --line-buffered -vE '^ +Start +[0-9]+: |^ *[0-9]+/[0-9]+ Test +#[0-9]+: .* Passed '
 }
