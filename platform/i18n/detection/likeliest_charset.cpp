@@ -177,7 +177,12 @@ private:
         }
         const TextCounts counts(*text);
         const auto itself = [](char16_t c) { return c; };
-        const Cost prior = priorOf(charset);
+        Cost prior = priorOf(charset);
+        if (charset.kind() == CharsetKind::ebcdic) {
+            // DEL costs as little as a sign, since its byte is one in EBCDIC. But there, DEL is the
+            // byte of BEL, which is no more frequent in a text than other control codes.
+            prior += bits(15) * std::count(text->begin(), text->end(), u'\x7F');
+        }
         const Cost cost = prior + costBesideWords(counts, itself, allTraits(), best_.cost - prior);
         if (charset.kind() == CharsetKind::multiByte) {
             for (const UnigramModel& model : unigramModels()) {

@@ -11,7 +11,8 @@
 namespace platform::i18n::detail {
 
 /// Whether `byte` is a control code that texts do not hold. DEL is not counted among them: in
-/// EBCDIC its byte is the quotation mark, so ASCII text with many would cost less as EBCDIC.
+/// EBCDIC its byte is the quotation mark, so ASCII text with many would cost less as EBCDIC. What
+/// is decoded from EBCDIC pays for it elsewhere.
 constexpr bool isStrayControl(char byte) {
     const auto code = static_cast<unsigned char>(byte);
     return code < 0x20 && (code < '\t' || code > '\r') && code != 0x1A && code != 0x1B;

@@ -227,6 +227,13 @@ TEST(DetectCharset, TakesNoTextWithManyDeletesForEbcdic) {
     }
 }
 
+// There, BEL is DEL.
+TEST(DetectCharset, TakesNoShortTextWithABellForEbcdic) {
+    for (const char* const text : {"a@b@\x07", "FACE@@\x07", "@\x07", "the@quick@FOX@\x07"}) {
+        EXPECT_EQ(detect(text), "UTF-8") << text;
+    }
+}
+
 TEST(DetectCharset, TakesNoArmenianInUtf16ForEbcdicWhoseTabsAndBlanksItHas) {
     std::string units;
     for (const char16_t c :
