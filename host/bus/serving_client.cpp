@@ -96,7 +96,11 @@ bool mayBeRefusal(const std::string& channel, std::string_view answer) {
 class ServingClient final : public ForwardingClient {
 public:
     ServingClient(std::shared_ptr<MessageService> client, ServingOptions options)
-        : ForwardingClient(std::move(client)), options_(std::move(options)) {}
+        : ForwardingClient(std::move(client)), options_(std::move(options)) {
+        for (std::filesystem::path& root : options_.roots) {
+            root = History::nameOf(root);
+        }
+    }
 
     futures::Future<std::shared_ptr<Subscription>> subscribe(const std::string& channel,
                                                              MessageHandler handler) override {
@@ -145,8 +149,9 @@ private:
         if (!path || path->empty() || path->size() >= PATH_MAX) {
             return;  // It names no file, inside or outside.
         }
+        const std::string name = History::nameOf(*path);
         if (std::none_of(options_.roots.begin(), options_.roots.end(),
-                         [&path](const auto& root) { return History::isBelow(*path, root); })) {
+                         [&name](const auto& root) { return History::isBelow(name, root); })) {
             spdlog::warn(
                 "refused {}, which is in no folder of --root; workers of other folders need a "
                 "group and message servers, or an account, of their own",
@@ -154,7 +159,7 @@ private:
         }
     }
 
-    const ServingOptions options_;
+    ServingOptions options_;
 };
 
 }  // namespace

@@ -39,7 +39,7 @@ void prepare(const fs::path& folder, const std::vector<fs::path>& roots) {
     fs::create_directories(folder);
     fs::permissions(folder, fs::perms::owner_all);
     for (const fs::path& root : roots) {
-        if (History::isBelow(folder, root)) {
+        if (History::isBelow(History::nameOf(folder), History::nameOf(root))) {
             throw std::runtime_error(folder.string() + " is in the folder " + root.string() +
                                      ", which clients may use");
         }

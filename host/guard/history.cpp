@@ -148,11 +148,9 @@ std::string History::nameOf(const std::string& path) {
     return (error ? absolute.lexically_normal() : canonical).string();
 }
 
-bool History::isBelow(const fs::path& path, const fs::path& folder) {
-    const fs::path inner = nameOf(path);
-    const fs::path outer = nameOf(folder);
-    return std::mismatch(outer.begin(), outer.end(), inner.begin(), inner.end()).first ==
-           outer.end();
+bool History::isBelow(const fs::path& name, const fs::path& folder) {
+    return std::mismatch(folder.begin(), folder.end(), name.begin(), name.end()).first ==
+           folder.end();
 }
 
 void History::run() {

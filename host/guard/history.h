@@ -62,8 +62,8 @@ public:
     /// The name of the document at `path`: its absolute path, links followed.
     static std::string nameOf(const std::string& path);
 
-    /// Whether `path` is `folder` or below it, links followed.
-    static bool isBelow(const std::filesystem::path& path, const std::filesystem::path& folder);
+    /// Whether `name` is `folder` or below it, both as `nameOf` gives them.
+    static bool isBelow(const std::filesystem::path& name, const std::filesystem::path& folder);
 
     /// Copies the content of `old` as the newest version of `document`, without waiting for that.
     /// Versions that are too many, older than 30 days, or beyond the share of the disk are removed,
