@@ -13,6 +13,7 @@
 
 namespace {
 
+using test::failAllocationsFrom;
 using test::failAllocationsOf;
 using test::Message;
 using test::readRequestChannel;
@@ -25,7 +26,10 @@ using testing::IsEmpty;
 
 class OutOfMemory : public testing::Test {
 protected:
-    ~OutOfMemory() override { failAllocationsOf(0); }
+    ~OutOfMemory() override {
+        failAllocationsOf(0);
+        failAllocationsFrom(0);
+    }
 
     std::vector<Message> writeText(const std::string& path, const std::string& text) {
         json::Object request{{"rtcId", "1"},
@@ -53,6 +57,18 @@ TEST_F(OutOfMemory, ForTheResponseOfAReadMeansNoAnswer) {
 
     failAllocationsOf(0);
     EXPECT_EQ(bundle.read(path, "text/plain"), whole);
+}
+
+TEST_F(OutOfMemory, WhileTheResponseOfAReadIsWrittenMeansNoAnswer) {
+    const std::string path = (folder / "file").string();
+    test::writeFile(path, std::string(123'457, 'x'));
+    const std::vector<Message> whole = bundle.read(path, "text/plain");
+    ASSERT_EQ(whole.size(), 1u);
+
+    takeBusLog();
+    failAllocationsFrom(whole[0].payload.size() + 1);
+    EXPECT_THAT(bundle.read(path, "text/plain"), IsEmpty());
+    EXPECT_THAT(takeBusLog(), ElementsAre(HasSubstr("Out of memory!")));
 }
 
 TEST_F(OutOfMemory, ForTheNotificationOfAWriteMeansNeitherNotificationNorAnswer) {

@@ -58,12 +58,17 @@ extern "C" [[gnu::visibility("default")]] void* calloc(std::size_t count, std::s
 }
 
 extern "C" [[gnu::visibility("default")]] void* realloc(void* memory, std::size_t size) {
-    givenBack(memory);
+    const std::size_t before = memory == nullptr ? 0 : ::malloc_usable_size(memory);
     void* const moved = __libc_realloc(memory, size);
-    if (moved == nullptr && size != 0) {
-        taken(memory, 0);  // stays as it was
+    if (moved == memory) {
+        inUse -= before;
+        return taken(moved, 0);  // no memory anew
     }
-    return taken(moved, moved == memory ? 0 : size);  // noted only where it is memory anew
+    taken(moved, size);
+    if (moved != nullptr || size == 0) {
+        inUse -= before;  // after the copy
+    }
+    return moved;
 }
 
 extern "C" [[gnu::visibility("default")]] void* aligned_alloc(std::size_t alignment,

@@ -13,6 +13,8 @@ constexpr long noAllocation = std::numeric_limits<long>::max();
 std::atomic<std::size_t> failingSize = 0;
 std::atomic<int> allocationsToSpare = 0;
 
+std::atomic<std::size_t> smallestFailing = 0;
+
 // Allocations [firstFailing, lastFailing] fail.
 std::atomic<bool> isCounting = false;
 std::atomic<long> allocations = 0;
@@ -23,6 +25,9 @@ thread_local int sparing = 0;
 
 bool fails(std::size_t size) {
     if (size != 0 && size == failingSize && allocationsToSpare-- <= 0) {
+        return true;
+    }
+    if (smallestFailing != 0 && size >= smallestFailing) {
         return true;
     }
     if (!isCounting || sparing > 0) {
@@ -73,6 +78,10 @@ namespace test {
 void failAllocationsOf(std::size_t size, int spared) {
     allocationsToSpare = spared;
     failingSize = size;
+}
+
+void failAllocationsFrom(std::size_t size) {
+    smallestFailing = size;
 }
 
 void failAllocation(long index, Failing which) {
