@@ -3,8 +3,10 @@
 
 #include <algorithm>
 #include <cstddef>
+#include <cstdint>
 #include <optional>
 #include <stdexcept>
+#include <utility>
 
 #include "json/serialize.h"
 #include "serialization/reading/result_keys.h"
@@ -54,7 +56,8 @@ bool Serialization::isControl(char16_t unit) const noexcept {
 }
 
 void Serialization::publish(const std::string& channel, json::Value value) const {
-    messageService->publish(channel, messageOf(std::move(value), anyLength).value());
+    std::optional<DataBuffer> message = messageOf(std::move(value), anyLength);
+    messageService->publish(channel, std::move(message).value());
 }
 
 void Serialization::publishReadResult(const std::string& channel, json::Value result,
