@@ -82,7 +82,8 @@ export class MessageServer {
 
   // A worker with `documents` as its root.
   async startWorker(documents, args = []) {
-    const before = await this.#workers();
+    // One that was just killed may still be among the connections, and is gone a moment later.
+    const before = new Set((await this.#workerConnections()).map(({ cid }) => cid));
     const worker = new Program(this.test, [
       ...[HOST, "--log-level", "info", ...args, "serve", "--root", documents, "--no-history"],
       ...["--nats", `nats://127.0.0.1:${this.port}`, "--nats-user", "worker"],
@@ -92,16 +93,15 @@ export class MessageServer {
       if (worker.hasEnded) {
         throw new Error(worker.errors);
       }
-      return (await this.#workers()) > before;
+      const added = (await this.#workerConnections()).filter(({ cid }) => !before.has(cid));
+      // To writes, to other requests, and to offers.
+      return [1, 2, 4].every((count) => added.some(({ subscriptions }) => subscriptions === count));
     });
     return worker;
   }
 
-  // How many workers listen to writes, to other requests, and to offers.
-  async #workers() {
-    const connections = (await this.connections()).filter((one) => one.authorized_user === "worker");
-    const count = (subscriptions) => connections.filter((one) => one.subscriptions === subscriptions).length;
-    return Math.min(count(1), count(2), count(4));
+  async #workerConnections() {
+    return (await this.connections()).filter((one) => one.authorized_user === "worker");
   }
 
   // A connected client library; by way of `port`, if that is another.
