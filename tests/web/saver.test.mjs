@@ -17,8 +17,11 @@ class Desk {
   writes = [];
   conflicts = [];
   saved = []; // as the view is told
+  told = []; // what the view is told was sent
+  typing; // what the view has not taken over from an editor yet
   decide = () => undefined;
   write = async (content, base) => this.store(content, base);
+  load = async () => this.loaded();
 
   store(content, base) {
     this.writes.push(content.content);
@@ -37,11 +40,17 @@ class Desk {
   open(version = this.versionOf(this.disk), unsaved) {
     this.saver = new Saver(
       {
-        draft: () => this.view,
-        content: async () => textOf(this.view),
+        draft: (sent) => (this.told.push(sent), this.view),
+        content: async () => {
+          if (this.typing !== undefined) {
+            this.type(this.typing);
+            this.typing = undefined;
+          }
+          return textOf(this.view);
+        },
         write: (content, base) => this.write(content, base),
         saved: (content) => this.saved.push(content.content),
-        load: async () => this.loaded(),
+        load: () => this.load(),
         replace: (theirs) => (this.view = theirs.answer.data),
         resolve: async (theirs) => {
           this.conflicts.push(theirs?.answer.data);
@@ -56,11 +65,11 @@ class Desk {
   }
 
   // The page is gone, and its draft, which holds `view`, is shown by another one. It was stored when `sent` had been
-  // sent, and edited since; or, without that, before anything was sent.
+  // sent; or, without that, before anything was sent.
   reopen(version, view, sent) {
     this.view = view;
-    const sentContent = async () => textOf(sent ?? view);
-    return this.open(version, { sent: sent ?? view, sentContent, isEditedSince: sent !== undefined });
+    const stateOf = (draft) => ({ draft, content: async () => textOf(draft) });
+    return this.open(version, { held: stateOf(view), ...(sent !== undefined && { sent: stateOf(sent) }) });
   }
 
   loaded() {
@@ -200,11 +209,30 @@ test("a draft that was edited after a save was sent is based on that save, and u
   const desk = new Desk();
   desk.disk = "two";
   desk.reopen("vone", "three", "two");
-  assert.equal(desk.saver.sent, "two");
+  assert.equal(desk.saver.draft().sent, "two");
   assert.equal(await desk.saver.noticed(desk.loaded()), "same");
-  assert.deepEqual([desk.saver.isUnsaved, desk.saver.baseVersion, desk.saver.sent], [true, "vtwo", undefined]);
+  assert.deepEqual([desk.saver.isUnsaved, desk.saver.draft()], [true, { version: "vtwo", content: "three" }]);
   assert.equal(await desk.saver.save(), true);
   assert.deepEqual([desk.disk, desk.conflicts], ["three", []]);
+});
+
+test("of a draft that was edited after a save was sent, the file may hold all", async () => {
+  const desk = new Desk();
+  desk.disk = "three";
+  desk.reopen("vone", "three", "two");
+  assert.equal(await desk.saver.noticed(desk.loaded()), "same");
+  assert.deepEqual([desk.saver.isUnsaved, desk.saver.baseVersion], [false, "vthree"]);
+});
+
+test("what may reach the file after a draft is shown again is known whatever is typed meanwhile", async () => {
+  for (const [disk, sent] of [["held", undefined], ["held", "sent"], ["sent", "sent"]]) {
+    const desk = new Desk().reopen("vone", "held", sent);
+    desk.type("later");
+    assert.deepEqual(desk.saver.draft(), { version: "vone", content: "later", sent: sent ?? "held" });
+    desk.disk = disk;
+    assert.equal(await desk.saver.followTheirs(), "same");
+    assert.deepEqual([desk.saver.isUnsaved, desk.saver.baseVersion], [true, `v${disk}`]);
+  }
 });
 
 test("what somebody else saved while a draft lay is kept beside it", async () => {
@@ -226,18 +254,41 @@ test("an empty draft of a file that was removed is not taken for saved", async (
   assert.equal(desk.saver.isUnsaved, true);
 });
 
-test("what was sent is told while its answer is awaited and something else was typed", async () => {
+test("while an answer is awaited, what is to be stored tells what was sent", async () => {
   const desk = new Desk().open();
   const told = [];
   desk.write = async (content, base) => {
-    told.push(desk.saver.sent);
+    told.push(desk.saver.draft());
     desk.type("three");
-    told.push(desk.saver.sent);
+    told.push(desk.saver.draft());
     return desk.store(content, base);
   };
   desk.type("two");
   await desk.saver.save();
-  assert.deepEqual([...told, desk.saver.sent], [undefined, "two", undefined]);
+  assert.deepEqual(told, [
+    { version: "vone", content: "two", sent: "two" },
+    { version: "vone", content: "three", sent: "two" },
+  ]);
+  assert.deepEqual(desk.saver.draft(), { version: "vtwo", content: "three" });
+});
+
+test("a view is told what was sent when it is asked what is unsaved", async () => {
+  const desk = new Desk().open();
+  desk.write = () => Promise.reject(new Error("no answer"));
+  for (const text of ["two", "three"]) {
+    desk.type(text);
+    await assert.rejects(desk.saver.save(), /no answer/);
+  }
+  desk.saver.draft();
+  assert.deepEqual(desk.told, [undefined, "two", "three"]);
+});
+
+test("what a view takes over from an editor when it is asked for its content is saved with it", async () => {
+  const desk = new Desk().open();
+  desk.type("tw");
+  desk.typing = "two";
+  assert.equal(await desk.saver.save(), true);
+  assert.deepEqual([desk.disk, desk.saver.isUnsaved], ["two", false]);
 });
 
 test("a save that was made without an answer is no longer unsaved when it is heard of", async () => {

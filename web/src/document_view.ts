@@ -33,8 +33,11 @@ export interface DocumentView {
    */
   content(): Promise<DocumentContent | undefined>;
 
-  /** What is unsaved, as a value that IndexedDB can store; given to the factory after a reload. */
-  draft(): unknown;
+  /**
+   * What is unsaved, as a value that IndexedDB can store; given to the factory after a reload. `sent` is the draft that
+   * it was when it was sent to be saved, where that may have been done: what was undone since then belongs to it, too.
+   */
+  draft(sent?: unknown): unknown;
 
   /** Shows `loaded` instead, which somebody else saved; what is unsaved is given up. */
   replace(loaded: LoadedDocument): void;

@@ -270,5 +270,49 @@ test("a part that was edited after a document was sent is not taken from what is
   const theirs = { ...document, parts: [document.parts[0], part("/b.bin", "theirs", "application/x")] };
   assert.deepEqual(documentSent(theirs, sent, model.draft()), document); // and so differs from theirs
   model.edit({ relationships: [{ relationshipId: "rId1", relationshipType: "t", target: "a.xml" }] });
-  assert.equal(documentSent(document, sent, model.draft()), undefined);
+  assert.deepEqual(documentSent({ ...document, relationships: [{ relationshipId: "theirs" }] }, sent, model.draft()), document);
 });
+
+test("a draft that does not tell the relationships of before does not tell what was sent", () => {
+  const [document, relationships] = [read(), [{ relationshipId: "rId1" }]];
+  const [same, changed] = [{ kind: "package", parts: {} }, { kind: "package", parts: {}, relationships }];
+  for (const [sent, later] of [[changed, same], [same, changed], [changed, changed]]) {
+    assert.equal(documentSent(document, sent, later), undefined);
+  }
+});
+
+const RELATIONSHIP = { relationshipId: "rId1", relationshipType: "t", target: "c.xml" };
+const EDITS = {
+  "a part that is changed": setting("/a.xml", "<sent/>"),
+  "a part that is added": setting("/c.xml", "<new/>"),
+  "a part that is removed": { parts: new Map([["/a.xml", null]]) },
+  "relationships that are changed": { relationships: [RELATIONSHIP] },
+};
+for (const [what, edit] of Object.entries(EDITS)) {
+  test(`${what}, sent and then undone: that is kept by the draft, whether the save was made or not`, () => {
+    const model = new PackageModel(read());
+    model.edit(edit);
+    const [sent, document] = [model.draft(), model.document()];
+    model.undo();
+    model.edit(setting("/b.bin", "later"));
+    const later = structuredClone(model.draft(sent));
+
+    const unsaved = new PackageModel(read(), later);
+    assert.deepEqual(unsaved.draft(), new PackageModel(read(), structuredClone(model.draft())).draft()); // as if nothing had been sent
+    assert.deepEqual(partsByName(unsaved), partsByName(model));
+
+    const own = documentSent(document, sent, later);
+    assert.deepEqual(partsByName(new PackageModel(own)), partsByName(new PackageModel(document)));
+    const saved = new PackageModel(document, later);
+    assert.deepEqual(partsByName(saved), partsByName(model));
+    saved.saved(own);
+    const { parts, relationships } = saved.draft(); // all of it is unsaved
+    assert.deepEqual([Object.keys(parts).sort(), relationships], [["/b.bin", ...(edit.parts?.keys() ?? [])].sort(), edit.relationships && []]);
+  });
+}
+
+// A document whose parts may be in another order.
+function partsByName(model) {
+  const { parts, relationships } = model.document();
+  return { parts: Object.fromEntries(parts.map((one) => [one.partUri, one])), relationships };
+}

@@ -10,6 +10,7 @@ export interface PackageDraft {
   /** Changed parts by name, and what they were before; null for what is, or was, not there. */
   parts: Record<string, { part: Part | null; base: Part | null }>;
   relationships?: Relationship[];
+  baseRelationships?: Relationship[];
 }
 
 /** Contents after an edit. What is left out stays; null takes a part away. */
@@ -49,6 +50,7 @@ export class PackageModel {
         putInto(this.#parts, uri, part);
       }
       this.#relationships = draft.relationships ?? relationships;
+      this.#originalRelationships = draft.baseRelationships ?? relationships;
     }
   }
 
@@ -91,14 +93,19 @@ export class PackageModel {
     this.#originalRelationships = relationships;
   }
 
-  draft(): PackageDraft {
-    const changed = this.changedParts();
+  /**
+   * What is unsaved. What was changed in `sent`, a draft that was sent to be saved, is listed also where it is as it was
+   * before: the file may hold it as it was sent.
+   */
+  draft(sent?: PackageDraft): PackageDraft {
+    const uris = new Set([...Object.keys(sent?.parts ?? {}), ...this.changedParts()]);
+    const hasRelationships = sent?.relationships || this.#relationships !== this.#originalRelationships;
     return {
       kind: "package",
       parts: Object.fromEntries(
-        changed.map((uri) => [uri, { part: this.#parts.get(uri) ?? null, base: this.#original.get(uri) ?? null }]),
+        [...uris].map((uri) => [uri, { part: this.#parts.get(uri) ?? null, base: this.#original.get(uri) ?? null }]),
       ),
-      ...(this.#relationships !== this.#originalRelationships && { relationships: this.#relationships }),
+      ...(hasRelationships && { relationships: this.#relationships, baseRelationships: this.#originalRelationships }),
     };
   }
 
@@ -176,13 +183,14 @@ export function documentOf({ answer }: LoadedDocument): Document {
  * changes is taken from `document`, what is saved now. Nothing where the drafts do not tell.
  */
 export function documentSent(document: Document, sent: PackageDraft, later: PackageDraft): Document | undefined {
-  if (later.relationships && !sent.relationships) {
+  const { baseRelationships } = later; // which drafts of an earlier release do not have
+  if (!baseRelationships && (later.relationships || sent.relationships)) {
     return undefined;
   }
   const parts = new Map(document.parts.map((part) => [part.partUri, part]));
   Object.entries(later.parts).forEach(([uri, { base }]) => putInto(parts, uri, base));
   Object.entries(sent.parts).forEach(([uri, { part }]) => putInto(parts, uri, part));
-  return { parts: [...parts.values()], relationships: sent.relationships ?? document.relationships };
+  return { parts: [...parts.values()], relationships: sent.relationships ?? baseRelationships ?? document.relationships };
 }
 
 function putInto(parts: Map<string, Part>, uri: string, part: Part | null): void {

@@ -78,13 +78,13 @@ export class PackageView implements DocumentView {
     if (content.kind === "package") {
       const changed = this.#model.changedParts();
       this.#model.saved(content.content);
-      this.#panels.parts.refresh(changed);
+      this.#panels.parts.refresh([...changed, ...this.#model.changedParts()]);
     }
   }
 
-  draft(): PackageDraft {
+  draft(sent?: PackageDraft): PackageDraft {
     this.#commit();
-    return this.#model.draft();
+    return this.#model.draft(sent);
   }
 
   replace(loaded: LoadedDocument): void {

@@ -15,7 +15,7 @@ export interface Draft {
   readAs?: string;
   /** What the view needs to show it again. */
   content: unknown;
-  /** The same when the last save was sent, where it was edited since and nothing has been heard of that save. */
+  /** The same when the last save was sent, where it is not known what became of that save. */
   sent?: unknown;
 }
 

@@ -12,8 +12,8 @@ export interface SaveResult {
 
 /** What a Saver needs of the document and its surroundings. */
 export interface SaveTarget {
-  /** What is unsaved, as it is stored. */
-  draft(): unknown;
+  /** What is unsaved, as it is stored; `sent` as in DocumentView. */
+  draft(sent?: unknown): unknown;
   /** The document as it stands; nothing when the person thinks better of saving it. */
   content(): Promise<DocumentContent | undefined>;
   /** Has it saved if the document still has the version `base`. Throws when no answer came. */
@@ -30,13 +30,19 @@ export interface SaveTarget {
   update(): void;
 }
 
+/** A state of the document that may have been sent to be saved. */
+export interface Sent {
+  draft: unknown;
+  /** What was sent then; nothing where that cannot be told. */
+  content(): Promise<DocumentContent | undefined>;
+}
+
 /** What an earlier life of the page left unsaved. */
 export interface Unsaved {
-  /** What may have been sent to be saved, as a draft, and its content, where that can be told. */
-  sent: unknown;
-  sentContent(): Promise<DocumentContent | undefined>;
-  /** Whether there were edits after that. */
-  isEditedSince: boolean;
+  /** What it held last. */
+  held: Sent;
+  /** What it had sent, where it is not known what became of that. */
+  sent?: Sent;
 }
 
 /** The host answered that it did not save, though nobody else has. */
@@ -48,8 +54,8 @@ export class Saver {
   #running: Promise<boolean> | undefined;
   #isWantedAgain = false;
   #hasTheirs = false;
-  // What was sent last, while it is not known whether it was saved, or as which version.
-  #sent: { content(): Promise<DocumentContent | undefined>; draft: unknown; edits: number } | undefined;
+  // What may have been saved without the page knowing, and after how many edits that was. The last one is stored.
+  #sent: (Sent & { edits: number })[] = [];
 
   /** `version` is what the document is based on, and `unsaved` how it already differs from that. */
   constructor(
@@ -59,7 +65,8 @@ export class Saver {
   ) {
     this.#edits = unsaved ? 1 : 0;
     if (unsaved) {
-      this.#sent = { content: unsaved.sentContent, draft: unsaved.sent, edits: unsaved.isEditedSince ? 0 : 1 };
+      const { held, sent } = unsaved;
+      this.#sent = [{ ...held, edits: 1 }, ...(sent ? [{ ...sent, edits: 0 }] : [])];
     }
   }
 
@@ -81,9 +88,10 @@ export class Saver {
     return this.#hasTheirs;
   }
 
-  /** What was sent last, as a draft, while it is not known what became of it and there were edits since. */
-  get sent(): unknown {
-    return this.#sent && this.#sent.edits !== this.#edits ? this.#sent.draft : undefined;
+  /** What is to be stored: what is unsaved, and what was sent last while it is not known what became of that. */
+  draft(): { version: string; content: unknown; sent?: unknown } {
+    const sent = this.#sent.at(-1)?.draft;
+    return { version: this.version, content: this.target.draft(sent), ...(sent !== undefined && { sent }) };
   }
 
   /** To be called on every edit. */
@@ -146,13 +154,13 @@ export class Saver {
 
   async #saveOnce(): Promise<boolean> {
     for (;;) {
-      const edits = this.#edits;
       const content = await this.target.content();
       if (!content) {
         return false;
       }
+      const edits = this.#edits; // not before, since a view counts what is being typed when it is asked
       const earlier = this.#sent;
-      this.#sent = { content: async () => content, draft: this.target.draft(), edits };
+      this.#sent = [{ content: async () => content, draft: this.draft().content, edits }];
       const result = await this.target.write(content, this.version);
       if (result.isSaved) {
         await this.#saved(edits, content, result);
@@ -201,18 +209,22 @@ export class Saver {
     return decision;
   }
 
-  // Whether `theirs` is what was sent last, and so has been saved.
+  // Whether `theirs` is what may have been sent, and so has been saved.
   async #isOwn(theirs: LoadedDocument): Promise<boolean> {
-    const sent = this.#sent;
-    const content = await sent?.content();
-    const isFile = theirs.version !== "";
-    if (!isFile || !sent || !content || sent !== this.#sent || !isSame(theirs, content)) {
-      return false;
+    const all = theirs.version === "" ? [] : this.#sent;
+    for (const { content, edits } of all) {
+      const sent = await content();
+      if (all !== this.#sent) {
+        return false;
+      }
+      if (sent && isSame(theirs, sent)) {
+        this.#savedEdits = edits;
+        this.target.saved(sent);
+        this.#basedOn(theirs.version);
+        return true;
+      }
     }
-    this.#savedEdits = sent.edits;
-    this.target.saved(content);
-    this.#basedOn(theirs.version);
-    return true;
+    return false;
   }
 
   #show(theirs: LoadedDocument): void {
@@ -223,7 +235,7 @@ export class Saver {
 
   #basedOn(version: string): void {
     this.version = version;
-    this.#sent = undefined;
+    this.#sent = [];
     this.#hasTheirs = false;
     this.target.update();
   }

@@ -237,7 +237,7 @@ export class OpenDocument {
   #makeSaver(version: string, unsaved?: Unsaved): Saver {
     const saver = new Saver(
       {
-        draft: () => this.#view!.draft(),
+        draft: (sent) => this.#view!.draft(sent),
         content: () => this.#view!.content(),
         write: (content, base) => this.#write(content, base),
         saved: (content) => this.#view!.saved?.(content),
@@ -282,7 +282,8 @@ export class OpenDocument {
       onAskAgain: () => this.#setStatus(text("save.again")),
     };
     this.#setStatus(text("save.waiting"));
-    this.#keeper.changed(); // so that the draft tells what was sent
+    this.#keeper.changed();
+    void this.#keeper.flush(); // so that the draft tells what was sent, however soon the page is gone
     for (;;) {
       try {
         const { client } = this.around;
@@ -317,15 +318,12 @@ export class OpenDocument {
       return;
     }
     const { charset, byteOrderMark, readAs } = this.#loaded ?? {};
-    const { baseVersion, sent } = this.#saver;
     await this.around.drafts.put({
       path: this.path,
-      version: baseVersion,
-      content: this.#view.draft(),
+      ...this.#saver.draft(),
       ...(charset !== undefined && { charset }),
       ...(byteOrderMark !== undefined && { byteOrderMark }),
       ...(readAs !== undefined && { readAs }),
-      ...(sent !== undefined && { sent }),
     });
   }
 
@@ -438,7 +436,7 @@ async function roomOf(path: string): Promise<Room> {
   return isImage(path) ? (await import("../images/index.js")).images : (await import("../text/index.js")).texts;
 }
 
-function unsavedOf(draft: Draft, loaded: LoadedDocument, room: Room): Unsaved {
-  const { content, sent = content } = draft;
-  return { sent, sentContent: () => room.contentOf(sent, content, loaded), isEditedSince: draft.sent !== undefined };
+function unsavedOf({ content, sent }: Draft, loaded: LoadedDocument, room: Room): Unsaved {
+  const stateOf = (draft: unknown) => ({ draft, content: () => room.contentOf(draft, content, loaded) });
+  return { held: stateOf(content), ...(sent !== undefined && { sent: stateOf(sent) }) };
 }
