@@ -291,6 +291,19 @@ test("what a view takes over from an editor when it is asked for its content is 
   assert.deepEqual([desk.disk, desk.saver.isUnsaved], ["two", false]);
 });
 
+test("a save that is found to be the page's own while it is refused is not asked about", async () => {
+  const desk = new Desk().reopen("vone", "two");
+  desk.disk = "two";
+  desk.type("three");
+  desk.load = async () => {
+    const theirs = desk.loaded();
+    void desk.saver.noticed(theirs); // which the page has read at the same time
+    return theirs;
+  };
+  assert.equal(await desk.saver.save(), true);
+  assert.deepEqual([desk.disk, desk.conflicts], ["three", []]);
+});
+
 test("a save that was made without an answer is no longer unsaved when it is heard of", async () => {
   const desk = new Desk().open();
   desk.write = async (content, base) => {

@@ -161,13 +161,14 @@ export class Saver {
       const edits = this.#edits; // not before, since a view counts what is being typed when it is asked
       const earlier = this.#sent;
       this.#sent = [{ content: async () => content, draft: this.draft().content, edits }];
-      const result = await this.target.write(content, this.version);
+      const base = this.version;
+      const result = await this.target.write(content, base);
       if (result.isSaved) {
         await this.#saved(edits, content, result);
         return true;
       }
       this.#sent = earlier; // A refused save has not been made.
-      const decision = await this.#refused();
+      const decision = await this.#refused(base);
       if (decision !== "mine") {
         return decision === "theirs";
       }
@@ -189,14 +190,14 @@ export class Saver {
     }
   }
 
-  async #refused(): Promise<"mine" | "theirs" | undefined> {
+  async #refused(base: string): Promise<"mine" | "theirs" | undefined> {
     const theirs = await this.target.load();
     const version = theirs?.version ?? "";
-    if (version === this.version) {
+    if (version === base) {
       throw new SaveRefused();
     }
-    if (theirs && (await this.#isOwn(theirs))) {
-      return "mine";
+    if (theirs && ((await this.#isOwn(theirs)) || this.version === version)) {
+      return "mine"; // also where noticed() was the one to find it out
     }
     this.#hasTheirs = true;
     this.target.update();
