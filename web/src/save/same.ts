@@ -10,8 +10,8 @@ const MARKS = ["\xff\xfe\0\0", "\0\0\xfe\xff", "\xef\xbb\xbf", "\xff\xfe", "\xfe
 export function isSame(loaded: LoadedDocument, sent: DocumentContent): boolean {
   const { answer } = loaded;
   if (sent.kind === "text") {
-    const mark = MARKS.find((one) => sent.content.startsWith(one)) ?? "";
-    return answer.data === sent.content || (mark !== "" && answer.data === sent.content.slice(mark.length));
+    const mark = loaded.byteOrderMark ? MARKS.find((one) => sent.content.startsWith(one)) : "";
+    return mark !== undefined && answer.data === sent.content.slice(mark.length);
   }
   const { parts, relationships } = sent.content;
   const there = new Map(answer.parts?.map((part) => [part.partUri, part]));
