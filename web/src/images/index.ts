@@ -28,6 +28,9 @@ class ImageView implements DocumentView {
     this.#url = URL.createObjectURL(new Blob([bytes]));
     const image = element("img", { src: this.#url, alt: nameOf(path) });
     image.addEventListener("error", () => {
+      if (image.parentNode !== this.element) {
+        return; // another one is shown by now
+      }
       const problem = this.page.text("image.problem", { name: nameOf(path) });
       this.element.replaceChildren(element("p", { className: "problem", role: "alert" }, problem));
     });
