@@ -346,8 +346,11 @@ export class TextView implements DocumentView {
   // For changes that are part of the save that is under way, or that the page knows as a draft.
   #withoutTelling(change: () => void): void {
     this.#isTelling = false;
-    change();
-    this.#isTelling = true;
+    try {
+      change();
+    } finally {
+      this.#isTelling = true;
+    }
   }
 
   #comparisonOf({ decoded, charset, byteOrderMark }: Source, mine: EditorState): TextComparison {
