@@ -6,7 +6,7 @@ import { MessageServer } from "../../serve/message_server.mjs";
 import { temporaryFolder, waitFor } from "../../serve/processes.mjs";
 import { browserTest, Session } from "./harness.mjs";
 import { textIn, wordFiles } from "./office_files.mjs";
-import { open as openPackage } from "./package_page.mjs";
+import { open as openPackage, tab } from "./package_page.mjs";
 import { charset, editor, open, save, shown, typeAtTheEnd } from "./text_page.mjs";
 
 const said = (page) => page.locator(".state .document");
@@ -46,6 +46,19 @@ browserTest("a save that nobody answers can be cancelled, and made again", async
   await save(page);
   assert.equal(await page.getByRole("dialog").count(), 0);
   assert.equal(session.read("a.txt").toString(), "one\ntwo three");
+});
+
+browserTest("what is sent to be saved is stored as it is sent", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page, host } = session;
+  await open(session, "a.txt");
+  host.signal("SIGSTOP"); // with the answer, the draft is removed
+  await typeAtTheEnd(page, "two");
+  await page.keyboard.press("Control+s");
+  await said(page).getByText(/Saving/).waitFor();
+  assert.ok(await session.hasDraft(page, "two")); // sooner than after an edit
+  host.signal("SIGCONT");
+  await isSaved(page);
 });
 
 // A page on a message server of its own, with a first worker, that has typed into a text.
@@ -159,19 +172,21 @@ browserTest("a text that a page that is gone was saving as UTF-8 is found to be 
     await page.getByRole("dialog").getByRole("button", { name: /UTF-8/ }).click();
   };
   const page = await loseAnswer(session, "a.txt", "UTF-8", { answer: toUtf8 });
+  await editor(page).waitFor(); // until when nothing is marked
   await isSaved(page);
   await assertNobodyElse(page);
   assert.equal(await shown(charset(page)), "UTF-8");
   assert.equal(session.read("a.txt").toString(), "caf\u00e9\r\n\u6e2f");
 });
 
+async function replaceAll(page, found, replacement) {
+  await page.getByLabel("Find", { exact: true }).fill(found);
+  await page.getByLabel("Replace with").fill(replacement);
+  await page.getByRole("button", { name: "Replace all" }).click();
+}
+
 browserTest("an office document whose page is gone before the answer comes is found to be saved", async (t) => {
   const session = await openPackage(t, "report.docx", wordFiles());
-  const replaceAll = async (page, found, replacement) => {
-    await page.getByLabel("Find", { exact: true }).fill(found);
-    await page.getByLabel("Replace with").fill(replacement);
-    await page.getByRole("button", { name: "Replace all" }).click();
-  };
   await replaceAll(session.page, "Annual report", "Budget");
   const page = await loseAnswer(session, "report.docx", "Budget");
   await page.locator(".package").waitFor();
@@ -179,12 +194,33 @@ browserTest("an office document whose page is gone before the answer comes is fo
   await assertNobodyElse(page);
 
   await replaceAll(page, "Budget", "Plan");
-  const other = await loseAnswer(session, "report.docx", "Project", { whileSaving: (saving) => replaceAll(saving, "Plan", "Project") });
+  const other = await loseAnswer(session, "report.docx", "Proposal", { whileSaving: (saving) => replaceAll(saving, "Plan", "Proposal") });
   await other.getByText(/have been restored/).waitFor();
   assert.match(textIn(session.read("report.docx"), "word/header1.xml"), /Plan, page/);
   await assertNobodyElse(other);
   await other.keyboard.press("Control+s");
   await isSaved(other);
   assert.equal(await other.getByRole("dialog").count(), 0);
-  assert.match(textIn(session.read("report.docx"), "word/header1.xml"), /Project, page/);
+  assert.match(textIn(session.read("report.docx"), "word/header1.xml"), /Proposal, page/);
+});
+
+browserTest("what was undone in an office document while a save was under way whose page is gone is undone", async (t) => {
+  const session = await openPackage(t, "report.docx", wordFiles());
+  await replaceAll(session.page, "Annual report", "Budget");
+  const undo = async (page) => {
+    await page.getByRole("button", { name: "Undo" }).click();
+    await tab(page, "Properties").click();
+    await page.getByLabel("Title").fill("Another title");
+  };
+  const page = await loseAnswer(session, "report.docx", "Another title", { whileSaving: undo });
+  await page.getByText(/have been restored/).waitFor();
+  const header = () => textIn(session.read("report.docx"), "word/header1.xml");
+  assert.match(header(), /Budget, page/);
+  await assertNobodyElse(page);
+  await page.getByText("Annual report, page").first().waitFor();
+  await page.keyboard.press("Control+s");
+  await isSaved(page);
+  assert.equal(await page.getByRole("dialog").count(), 0);
+  assert.match(header(), /Annual report, page/);
+  assert.match(textIn(session.read("report.docx"), "docProps/core.xml"), /Another title/);
 });
