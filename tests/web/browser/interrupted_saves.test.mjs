@@ -48,6 +48,20 @@ browserTest("a save that nobody answers can be cancelled, and made again", async
   assert.equal(session.read("a.txt").toString(), "one\ntwo three");
 });
 
+browserTest("a save that was cancelled, and made all the same, is told of", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page, host } = session;
+  await open(session, "a.txt");
+  await typeAtTheEnd(page, "two");
+  host.signal("SIGSTOP");
+  await page.keyboard.press("Control+s");
+  await page.getByRole("contentinfo").getByRole("button", { name: "Cancel" }).click();
+  await said(page).getByText(/Saving was cancelled/).waitFor();
+  host.signal("SIGCONT");
+  await isSaved(page);
+  await said(page).getByText(/Saved at/).waitFor();
+});
+
 browserTest("what is sent to be saved is stored as it is sent", async (t) => {
   const session = await Session.start(t, { "a.txt": "one\n" });
   const { page, host } = session;

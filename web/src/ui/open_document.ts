@@ -117,8 +117,7 @@ export class OpenDocument {
     try {
       const isSaved = await this.#saver.save();
       if (isSaved) {
-        const time = new Date().toLocaleTimeString(currentLanguage());
-        this.#setStatus(text("save.done", { time }));
+        this.#tellSaved();
       } else {
         this.#setStatus(this.isUnsaved ? text("save.notyet") : "");
       }
@@ -144,7 +143,11 @@ export class OpenDocument {
       if (version === saver.baseVersion) {
         return;
       }
+      const wasUnsaved = saver.isUnsaved;
       const outcome = await saver.followTheirs();
+      if (wasUnsaved && !saver.isUnsaved) {
+        this.#tellSaved(); // a save that was given up, or that failed as it seemed
+      }
       if (outcome !== "same") {
         const key = outcome === "shown" ? "document.reloaded" : "document.theirs";
         this.around.tell(text(key, { name: this.name }));
@@ -355,6 +358,10 @@ export class OpenDocument {
   #setStatus(status: string): void {
     this.status = status;
     this.around.update();
+  }
+
+  #tellSaved(): void {
+    this.#setStatus(text("save.done", { time: new Date().toLocaleTimeString(currentLanguage()) }));
   }
 
   #saveFailed(error: unknown): void {
