@@ -53,7 +53,7 @@ browserTest("a host that does not answer is told of, and the reading can be canc
   await page.getByText("Reading was cancelled.").waitFor();
   host.signal("SIGCONT");
   await page.getByRole("button", { name: "Try again" }).click();
-  await page.locator(".cm-content").waitFor();
+  await page.locator(".cm-editor.cm-focused").waitFor(); // to go on with the keyboard
 });
 
 browserTest("tabs are gone through, and closed, by the keyboard", async (t) => {

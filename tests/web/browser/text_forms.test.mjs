@@ -93,6 +93,7 @@ browserTest("a text is read in another charset, and saved in a third one", async
   const { page } = session;
   await open(session, "russian.txt");
   await readAs(page, "KOI8-R");
+  await page.locator(".cm-editor.cm-focused").waitFor(); // to go on with the keyboard
   assert.equal(await editor(page).textContent(), "\u043e\u043f\u0445\u0431\u0435\u0440");
   await readAs(page, "windows-1251");
   assert.equal(await editor(page).textContent(), "\u041f\u0420\u0418\u0412\u0415\u0422");

@@ -376,15 +376,11 @@ export class OpenDocument {
 
   #showProgress(reading: AbortController): void {
     const name = text("document.reading", { name: this.name });
-    this.panel.replaceChildren(
-      element(
-        "div",
-        { className: "waiting" },
-        element("p", {}, name),
-        element("progress", { "aria-label": name }),
-        element("p", { className: "amount", role: "status" }),
-        button(text("action.cancel"), () => reading.abort()),
-      ),
+    this.#showInstead(
+      element("p", {}, name),
+      element("progress", { "aria-label": name }),
+      element("p", { className: "amount", role: "status" }),
+      button(text("action.cancel"), () => reading.abort()),
     );
   }
 
@@ -406,7 +402,16 @@ export class OpenDocument {
 
   #showFailure(reason: string, again: () => void): void {
     const line = element("p", { className: "problem", role: "alert" }, reason);
-    this.panel.replaceChildren(element("div", { className: "waiting" }, line, button(text("action.retry"), again)));
+    this.#showInstead(line, button(text("action.retry"), again));
+  }
+
+  // In the place of the document; what had the focus leaves it to the panel.
+  #showInstead(...content: HTMLElement[]): void {
+    const hasFocus = this.panel.contains(document.activeElement);
+    this.panel.replaceChildren(element("div", { className: "waiting" }, ...content));
+    if (hasFocus) {
+      this.panel.focus();
+    }
   }
 
   #reasonOf(error: unknown): string {
