@@ -31,6 +31,24 @@ browserTest("a click counts though the tree is to be drawn again before the butt
   await page.getByRole("tab", { name: "a.txt" }).waitFor();
 });
 
+browserTest("the tree is drawn after a press whose end the page does not see", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one" });
+  const { page } = session;
+  const other = await clientOf(t, session);
+  const press = (options) => row(page, "a.txt").dispatchEvent("pointerdown", { button: 0, ...options });
+  const presses = {
+    "opens a menu with the control key": () => press({ ctrlKey: true }),
+    "opens a menu": () => press().then(() => row(page, "a.txt").dispatchEvent("contextmenu")),
+    "leaves the window": () => press().then(() => page.evaluate(() => dispatchEvent(new Event("blur")))),
+    "is followed by a key": () => press().then(() => page.keyboard.press("Shift")),
+  };
+  for (const [what, pressed] of Object.entries(presses)) {
+    await pressed();
+    await other.write(session.path(`${what}.txt`), "");
+    await row(page, `${what}.txt`).waitFor();
+  }
+});
+
 browserTest("the keyboard goes through the tree, opens folders and files", async (t) => {
   const { page } = await Session.start(t, { "a.txt": "one", "inner/c.txt": "three" });
   await row(page, "a.txt").waitFor();

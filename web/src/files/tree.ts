@@ -41,11 +41,14 @@ export class FileTree {
     this.#tree.addEventListener("keydown", (event) => this.#key(event));
     this.#tree.addEventListener("scroll", () => this.#render(), { passive: true });
     this.#rows.addEventListener("click", (event) => this.#click(event));
-    this.#rows.addEventListener("pointerdown", ({ button }) => (this.#isPressed = button === 0));
-    for (const end of ["pointerup", "pointercancel"]) {
+    this.#rows.addEventListener("pointerdown", ({ button, ctrlKey }) => (this.#isPressed = button === 0 && !ctrlKey));
+    // Where a menu or a dialog comes up, the button is let go unseen.
+    for (const end of ["pointerup", "pointercancel", "contextmenu", "blur", "keydown"]) {
       addEventListener(end, () => {
-        this.#isPressed = false;
-        this.#render();
+        if (this.#isPressed) {
+          this.#isPressed = false;
+          this.#render();
+        }
       });
     }
     new ResizeObserver(() => this.#render()).observe(this.#tree);
