@@ -99,6 +99,7 @@ browserTest("a text is read in another charset, and saved in a third one", async
   assert.equal(await editor(page).textContent(), "\u041f\u0420\u0418\u0412\u0415\u0422");
   await charset(page).selectOption("IBM866");
   await choose(page, "Save in IBM866");
+  await page.locator(".tab.active .unsaved").waitFor(); // once the table of IBM866 is loaded
   await save(page);
   assert.equal(session.read("russian.txt").toString("hex"), "8f9088828592");
 });
