@@ -23,6 +23,14 @@ class Desk {
   write = async (content, base) => this.store(content, base);
   load = async () => this.loaded();
 
+  // Saves from now on are made, but nobody hears of it.
+  loseAnswers() {
+    this.write = async (content, base) => {
+      this.store(content, base);
+      throw new Error("no answer");
+    };
+  }
+
   store(content, base) {
     this.writes.push(content.content);
     if (base !== this.versionOf(this.disk)) {
@@ -176,16 +184,27 @@ test("a save that comes while the person decides is not overwritten either", asy
 
 test("a save whose answer was lost is not taken for somebody else's", async () => {
   const desk = new Desk().open();
-  desk.write = async (content, base) => {
-    desk.store(content, base);
-    throw new Error("no answer");
-  };
+  desk.loseAnswers();
   desk.type("two");
   await assert.rejects(desk.saver.save(), /no answer/);
   desk.write = async (content, base) => desk.store(content, base);
   desk.type("three");
   assert.equal(await desk.saver.save(), true);
   assert.deepEqual([desk.disk, desk.conflicts], ["three", []]);
+});
+
+test("nor is one before it, of which there was no answer either", async () => {
+  const desk = new Desk().open();
+  desk.loseAnswers();
+  desk.type("two");
+  await assert.rejects(desk.saver.save(), /no answer/);
+  desk.write = () => Promise.reject(new Error("nobody is there"));
+  desk.type("three");
+  await assert.rejects(desk.saver.save(), /nobody is there/);
+  desk.write = async (content, base) => desk.store(content, base);
+  desk.type("four");
+  assert.equal(await desk.saver.save(), true);
+  assert.deepEqual([desk.disk, desk.conflicts], ["four", []]);
 });
 
 test("a draft that the file holds by now is saved", async () => {
@@ -308,10 +327,7 @@ test("a save that is found to be the page's own while it is refused is not asked
 
 test("a save that was made without an answer is no longer unsaved when it is heard of", async () => {
   const desk = new Desk().open();
-  desk.write = async (content, base) => {
-    desk.store(content, base);
-    throw new Error("no answer");
-  };
+  desk.loseAnswers();
   desk.type("two");
   await assert.rejects(desk.saver.save(), /no answer/);
   assert.equal(await desk.saver.followTheirs(), "same");

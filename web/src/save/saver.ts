@@ -160,7 +160,9 @@ export class Saver {
       }
       const edits = this.#edits; // not before, since a view counts what is being typed when it is asked
       const earlier = this.#sent;
-      this.#sent = [{ content: async () => content, draft: this.draft().content, edits }];
+      const state = { content: async () => content, draft: this.draft().content, edits };
+      // Each may be a large document. The first and the last are the likeliest to have been made.
+      this.#sent = [...earlier.filter((one) => one.edits !== edits).slice(0, 3), state];
       const base = this.version;
       const result = await this.target.write(content, base);
       if (result.isSaved) {
