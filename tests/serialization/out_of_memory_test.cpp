@@ -4,6 +4,8 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <cstddef>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -40,35 +42,33 @@ protected:
         return bundle.send(writeRequestChannel, json::serialize(std::move(request)));
     }
 
+    /// `fail` makes allocations fail, given the length of the answer.
+    void expectNoAnswerToARead(const std::function<void(std::size_t)>& fail) {
+        const std::string path = (folder / "file").string();
+        test::writeFile(path, std::string(123'457, 'x'));
+        const std::vector<Message> whole = bundle.read(path, "text/plain");
+        ASSERT_EQ(whole.size(), 1u);
+
+        takeBusLog();
+        fail(whole[0].payload.size());
+        EXPECT_THAT(bundle.read(path, "text/plain"), IsEmpty());
+        EXPECT_THAT(takeBusLog(), ElementsAre(HasSubstr("Out of memory!")));
+
+        failAllocationsOf(0);
+        failAllocationsFrom(0);
+        EXPECT_EQ(bundle.read(path, "text/plain"), whole);
+    }
+
     test::TemporaryDirectory folder;
     RunningBundle bundle;
 };
 
 TEST_F(OutOfMemory, ForTheResponseOfAReadMeansNoAnswer) {
-    const std::string path = (folder / "file").string();
-    test::writeFile(path, std::string(123'457, 'x'));
-    const std::vector<Message> whole = bundle.read(path, "text/plain");
-    ASSERT_EQ(whole.size(), 1u);
-
-    takeBusLog();
-    failAllocationsOf(whole[0].payload.size());
-    EXPECT_THAT(bundle.read(path, "text/plain"), IsEmpty());
-    EXPECT_THAT(takeBusLog(), ElementsAre(HasSubstr("Out of memory!")));
-
-    failAllocationsOf(0);
-    EXPECT_EQ(bundle.read(path, "text/plain"), whole);
+    expectNoAnswerToARead([](std::size_t length) { failAllocationsOf(length); });
 }
 
 TEST_F(OutOfMemory, WhileTheResponseOfAReadIsWrittenMeansNoAnswer) {
-    const std::string path = (folder / "file").string();
-    test::writeFile(path, std::string(123'457, 'x'));
-    const std::vector<Message> whole = bundle.read(path, "text/plain");
-    ASSERT_EQ(whole.size(), 1u);
-
-    takeBusLog();
-    failAllocationsFrom(whole[0].payload.size() + 1);
-    EXPECT_THAT(bundle.read(path, "text/plain"), IsEmpty());
-    EXPECT_THAT(takeBusLog(), ElementsAre(HasSubstr("Out of memory!")));
+    expectNoAnswerToARead([](std::size_t length) { failAllocationsFrom(length + 1); });
 }
 
 TEST_F(OutOfMemory, ForTheNotificationOfAWriteMeansNeitherNotificationNorAnswer) {

@@ -181,7 +181,8 @@ private:
         if (charset.kind() == CharsetKind::ebcdic) {
             // DEL costs as little as a sign, since its byte is one in EBCDIC. But there, DEL is the
             // byte of BEL, which is no more frequent in a text than other control codes.
-            prior += bits(15) * std::count(text->begin(), text->end(), u'\x7F');
+            prior +=
+                (strayControlBits - asciiBits) * std::count(text->begin(), text->end(), u'\x7F');
         }
         const Cost cost = prior + costBesideWords(counts, itself, allTraits(), best_.cost - prior);
         if (charset.kind() == CharsetKind::multiByte) {

@@ -9,11 +9,6 @@ namespace platform::i18n::detail {
 
 namespace {
 
-// The cost of any ASCII character: about the entropy of letters by themselves, punctuation
-// included.
-constexpr Cost asciiBits = bits(5);
-constexpr Cost strayControlBits = bits(20);
-
 // Counts keys: a hash table with open addressing.
 class Tally {
 public:

@@ -10,6 +10,12 @@
 
 namespace platform::i18n::detail {
 
+/// The cost of any ASCII character: about the entropy of letters by themselves, punctuation
+/// included.
+constexpr Cost asciiBits = bits(5);
+/// The cost of a control code that texts do not hold.
+constexpr Cost strayControlBits = bits(20);
+
 /// Whether `byte` is a control code that texts do not hold. DEL is not counted among them: in
 /// EBCDIC its byte is the quotation mark, so ASCII text with many would cost less as EBCDIC. What
 /// is decoded from EBCDIC pays for it elsewhere.

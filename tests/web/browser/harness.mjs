@@ -132,11 +132,8 @@ export class Session {
 
   /** Waits until the browser has stored a draft with `typed` in it. */
   async waitForDraft(page, typed) {
-    await waitFor("a draft", () => this.hasDraft(page, typed));
-  }
-
-  async hasDraft(page, typed) {
-    return (await page.evaluate(storedDrafts)).includes(JSON.stringify(typed).slice(1, -1));
+    const stored = JSON.stringify(typed).slice(1, -1);
+    await waitFor("a draft", async () => (await page.evaluate(storedDrafts)).includes(stored));
   }
 
   #note(problem) {
