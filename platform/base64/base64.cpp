@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <array>
 #include <cstddef>
+#include <exception>
 #include <stdexcept>
 #include <string>
 
@@ -76,22 +77,48 @@ std::size_t decodeIncomplete(Group group, std::size_t count, std::size_t end, ch
     return length;
 }
 
+std::size_t encodedLength(std::size_t bytes) {
+    return (bytes + bytesPerGroup - 1) / bytesPerGroup * charactersPerGroup;
+}
+
+// Writes the encodedLength characters of `bytes` to `text`.
+void encode(std::string_view bytes, char* text) {
+    const std::size_t groups = bytes.size() / bytesPerGroup;
+    const std::string_view rest = bytes.substr(groups * bytesPerGroup);
+    base64::kernels().encode(bytes.data(), groups, text);
+    if (!rest.empty()) {
+        std::array<char, bytesPerGroup> last{};
+        std::copy(rest.begin(), rest.end(), last.begin());
+        char* const end = text + encodedLength(bytes.size());
+        base64::plainKernels.encode(last.data(), 1, end - charactersPerGroup);
+        std::fill_n(end - (bytesPerGroup - rest.size()), bytesPerGroup - rest.size(), '=');
+    }
+}
+
 }  // namespace
 
 DataBuffer base64encode(const DataBuffer& bytes) {
-    const std::size_t groups = bytes.length() / bytesPerGroup;
-    const std::size_t leftOver = bytes.length() % bytesPerGroup;
-    DataBuffer text((groups + (leftOver == 0 ? 0 : 1)) * charactersPerGroup);
-    base64::kernels().encode(bytes.data(), groups, text.data());
-    if (leftOver != 0) {
-        std::array<char, bytesPerGroup> last{};
-        std::copy_n(bytes.data() + groups * bytesPerGroup, leftOver, last.begin());
-        char* const end = text.data() + text.capacity();
-        base64::plainKernels.encode(last.data(), 1, end - charactersPerGroup);
-        std::fill_n(end - (bytesPerGroup - leftOver), bytesPerGroup - leftOver, '=');
-    }
+    DataBuffer text(encodedLength(bytes.length()));
+    encode(bytes.view(), text.data());
     text.setLength(text.capacity());
     return text;
+}
+
+// Encodes piece by piece, since a string fills its memory before anyone else can write to it, and
+// what is appended from the processor's cache takes less time than a copy of the whole text.
+void base64encode(std::string_view bytes, std::string& text) {
+    constexpr std::size_t groups = 4096;
+    try {
+        text.reserve(text.size() + encodedLength(bytes.size()));
+    } catch (const std::exception&) {
+        throw std::runtime_error("Out of memory!");
+    }
+    std::array<char, groups * charactersPerGroup> encoded;
+    for (; !bytes.empty(); bytes.remove_prefix(std::min(bytes.size(), groups * bytesPerGroup))) {
+        const std::string_view piece = bytes.substr(0, groups * bytesPerGroup);
+        encode(piece, encoded.data());
+        text.append(encoded.data(), encodedLength(piece.size()));
+    }
 }
 
 DataBuffer base64decode(std::string_view text) {

@@ -2,6 +2,7 @@
 // Base64 text as RFC 4648, section 4, defines it: the standard alphabet, with padding, on one line.
 #pragma once
 
+#include <string>
 #include <string_view>
 
 #include "platform/data_buffer.h"
@@ -12,6 +13,9 @@ namespace platform {
 /// give a buffer without storage. Throws std::runtime_error "Out of memory!" when there is no
 /// memory. Linear.
 DataBuffer base64encode(const DataBuffer& bytes);
+
+/// Appends the base64 text of `bytes` to `text`. Throws as above, and leaves `text` as it was.
+void base64encode(std::string_view bytes, std::string& text);
 
 /// The bytes that the base64 `text` stands for. ASCII white space is skipped wherever it stands,
 /// and padding may be missing as a whole. Throws std::runtime_error naming the offset for

@@ -16,7 +16,6 @@
 
 namespace EditorServices {
 
-using platform::DataBuffer;
 using platform::filesystem::exists;
 using platform::i18n::codecvt_ustring_to_string;
 using platform::i18n::to_string;
@@ -123,11 +122,7 @@ std::string Serialization::encodePartContent(std::vector<std::uint8_t> bytes,
         // The part holds a data URI already; encoding it once more would hide the image.
         return std::string(text);
     }
-    DataBuffer image = DataBuffer::copyOf(text);
-    std::vector<std::uint8_t>().swap(bytes);  // an assignment of {} would keep the memory
-    const DataBuffer encoded = platform::base64encode(std::exchange(image, {}));
-    dataUri.reserve(dataUri.size() + encoded.length());
-    dataUri += encoded.view();
+    platform::base64encode(text, dataUri);
     return dataUri;
 }
 

@@ -9,10 +9,7 @@ namespace {
 
 constexpr long noAllocation = std::numeric_limits<long>::max();
 
-// The allocations of `failingSize` bytes fail once `allocationsToSpare` of them were made.
 std::atomic<std::size_t> failingSize = 0;
-std::atomic<int> allocationsToSpare = 0;
-
 std::atomic<std::size_t> smallestFailing = 0;
 
 // Allocations [firstFailing, lastFailing] fail.
@@ -24,7 +21,7 @@ std::atomic<long> lastFailing = noAllocation;
 thread_local int sparing = 0;
 
 bool fails(std::size_t size) {
-    if (size != 0 && size == failingSize && allocationsToSpare-- <= 0) {
+    if (size != 0 && size == failingSize) {
         return true;
     }
     if (smallestFailing != 0 && size >= smallestFailing) {
@@ -75,8 +72,7 @@ void* __libc_realloc(void* block, std::size_t size);
 
 namespace test {
 
-void failAllocationsOf(std::size_t size, int spared) {
-    allocationsToSpare = spared;
+void failAllocationsOf(std::size_t size) {
     failingSize = size;
 }
 

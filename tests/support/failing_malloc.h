@@ -7,8 +7,8 @@
 
 namespace test {
 
-/// Makes the allocations of `size` bytes fail once `spared` of them were made; none for size 0.
-void failAllocationsOf(std::size_t size, int spared = 0);
+/// Makes the allocations of `size` bytes fail; none for size 0.
+void failAllocationsOf(std::size_t size);
 
 /// Makes the allocations of `size` bytes and more fail; none for size 0.
 void failAllocationsFrom(std::size_t size);

@@ -57,6 +57,16 @@ TEST(Base64, DecodesTheStandardsTestVectors) {
     }
 }
 
+TEST(Base64, AppendsTheTextOfBytesToAString) {
+    std::mt19937 random(7);
+    for (const std::size_t length : {0, 1, 2, 3, 12'287, 12'288, 12'289, 24'576, 100'000}) {
+        const std::string bytes = randomBytes(length, random);
+        std::string text = "data:";
+        base64encode(bytes, text);
+        EXPECT_EQ(text, "data:" + plainlyEncoded(bytes)) << length;
+    }
+}
+
 TEST(Base64, GivesNoStorageForNoBytes) {
     EXPECT_EQ(base64encode(DataBuffer()).data(), nullptr);
     EXPECT_EQ(base64decode("").length(), 0U);
