@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// The page in a real browser: Chromium, driven by playwright-core, on a host of its own that serves a
-// new folder. Where there is no Chromium the tests are skipped, with a line that says so.
+// The page in a real browser, driven by playwright-core, on a host of its own that serves a new folder: in
+// Chromium, or with BROWSER=firefox in Firefox. Where there is no such browser the tests are skipped, with a
+// line that says so.
 import { existsSync, mkdirSync, readFileSync, writeFileSync } from "node:fs";
 import { createRequire } from "node:module";
 import { dirname, join } from "node:path";
@@ -8,22 +9,30 @@ import { after, test } from "node:test";
 
 import { Host, ROOT, atEnd, temporaryFolder, waitFor } from "../../serve/processes.mjs";
 
-const { chromium } = createRequire(join(ROOT, "web/package.json"))("playwright-core");
+const { chromium, firefox } = createRequire(join(ROOT, "web/package.json"))("playwright-core");
 
-const CHROMIUM = process.env.CHROMIUM || "/usr/bin/chromium";
-const IS_THERE = existsSync(CHROMIUM);
-
-const FLAGS = [
-  // Chromium has no sandbox for root, the user of tests in containers.
-  ...(process.getuid() === 0 ? ["--no-sandbox"] : []),
-  ...["--disable-gpu", "--disable-quic", "--no-first-run", "--no-proxy-server"],
-  ...["--disable-background-networking", "--disable-component-update", "--disable-sync"],
-];
+const BROWSERS = {
+  chromium: {
+    type: chromium,
+    executablePath: process.env.CHROMIUM || "/usr/bin/chromium",
+    args: [
+      // Chromium has no sandbox for root, the user of tests in containers.
+      ...(process.getuid() === 0 ? ["--no-sandbox"] : []),
+      ...["--disable-gpu", "--disable-quic", "--no-first-run", "--no-proxy-server"],
+      ...["--disable-background-networking", "--disable-component-update", "--disable-sync"],
+    ],
+  },
+  // As it comes; playwright's own is another build.
+  firefox: { type: firefox, executablePath: process.env.FIREFOX || "/usr/bin/firefox-esr", channel: "moz-firefox" },
+};
+const BROWSER = process.env.BROWSER || "chromium";
+const { type, ...launchOptions } = BROWSERS[BROWSER];
+const IS_THERE = existsSync(launchOptions.executablePath);
 
 let running; // the browser of this file's tests
 
 async function browser() {
-  running ??= chromium.launch({ executablePath: CHROMIUM, args: FLAGS });
+  running ??= type.launch(launchOptions);
   return running;
 }
 
@@ -31,13 +40,17 @@ if (IS_THERE) {
   after(async () => (await running)?.close());
 } else {
   // ctest is told to look for this line.
-  console.error(`SKIPPED: there is no Chromium at ${CHROMIUM}, so the page is not tested in a browser`);
+  console.error(`SKIPPED: there is no ${launchOptions.executablePath}, so the page is not tested in a browser`);
 }
+
+/** Why a test of what the driver of Firefox cannot do is skipped there. */
+export const lackedByFirefox = (what) => BROWSER === "firefox" && `the driver of Firefox has no ${what}`;
 
 /** A test, as those of node:test, that needs the browser. */
 export function browserTest(name, ...rest) {
   const body = rest.pop();
-  return test(name, { skip: !IS_THERE && "there is no Chromium", ...rest[0] }, body);
+  const { skip, ...options } = rest[0] ?? {};
+  return test(name, { skip: IS_THERE ? skip : "there is no browser", ...options }, body);
 }
 
 // What the page of the browser has stored as drafts, as JSON; runs there.

@@ -6,7 +6,7 @@ import { chmodSync, unlinkSync } from "node:fs";
 
 import { atEnd, waitFor } from "../../serve/processes.mjs";
 import { clientOf } from "./client.mjs";
-import { browserTest, Session } from "./harness.mjs";
+import { browserTest, lackedByFirefox, Session } from "./harness.mjs";
 
 const RACES = Number(process.env.EDITOR_RACES ?? 10);
 
@@ -98,6 +98,7 @@ browserTest("of two pages, the second to save can keep its own", async (t) => {
 
 browserTest("of two pages, the second to save can take the other's", async (t) => {
   const { session, mine } = await conflict(t);
+  await mine.bringToFront(); // Firefox gives the focus to one window
   await dialog(mine).getByRole("button", { name: "Take theirs" }).click();
   await isSaved(mine, "a.txt");
   await mine.locator(".cm-editor.cm-focused").waitFor(); // to type on at once
@@ -132,7 +133,7 @@ browserTest("what cannot be compared is told, and the question is asked again", 
   await tab(page, "a.txt").locator(".mark.theirs").waitFor();
   await page.keyboard.press("Control+s");
   await dialog(page).getByRole("button", { name: "Compare" }).click();
-  await dialog(page).getByText(/Failed to fetch/).waitFor();
+  await dialog(page).getByText(/Failed to fetch|NetworkError/).waitFor();
   await dialog(page).getByRole("button", { name: "Back" }).click();
   await dialog(page).getByRole("button", { name: "Keep mine" }).click();
   await isSaved(page, "a.txt");
@@ -164,7 +165,7 @@ browserTest("a person can decide later, and nothing is lost", async (t) => {
   assert.equal(session.read("a.txt").toString(), "one\ntwo\nthree\ntheirs");
 });
 
-browserTest("two pages that save at once overwrite nothing unseen", async (t) => {
+browserTest("two pages that save at once overwrite nothing unseen", { skip: lackedByFirefox("focus in two windows at once") }, async (t) => {
   const session = await Session.start(t, { "a.txt": "start\n" });
   const pages = [session.page, await session.newWindow()];
   for (const page of pages) {
