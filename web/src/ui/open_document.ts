@@ -52,7 +52,7 @@ export class OpenDocument {
   constructor(
     readonly path: string,
     private around: Surroundings,
-    draft?: Draft,
+    private draft?: Draft,
   ) {
     this.name = nameOf(path);
     this.panel.setAttribute("aria-labelledby", `tab-${this.id}`);
@@ -65,7 +65,7 @@ export class OpenDocument {
   }
 
   get isUnsaved(): boolean {
-    return this.#saver?.isUnsaved ?? false;
+    return this.#saver?.isUnsaved ?? this.draft !== undefined;
   }
 
   get isSaving(): boolean {
@@ -188,6 +188,7 @@ export class OpenDocument {
   /** What is unsaved is given up. */
   close(): void {
     this.#reading?.abort();
+    this.#saver = undefined; // so that the end of its save stores nothing
     this.#saving?.abort();
     void this.#keeper.clear();
     this.#view?.close();
@@ -214,6 +215,7 @@ export class OpenDocument {
     this.#loaded = loaded;
     const saver = (this.#saver = this.#makeSaver(draft?.version ?? loaded.version, draft && unsavedOf(draft, loaded, room)));
     this.#view = room.open(this.#loaded, this.#page(), draft?.content);
+    this.draft = undefined;
     const hasFocus = this.panel.contains(document.activeElement);
     this.panel.replaceChildren(this.#view.element);
     if (hasFocus) {

@@ -176,11 +176,15 @@ export class Workspace {
           { value: "save", label: text("action.save"), isDefault: true },
         ],
       });
-      if (!choice || (choice === "save" && !(await one.save()))) {
-        return;
+      const isSettled = choice === "save" ? (await one.save()) && !one.isUnsaved : choice === "discard";
+      if (!isSettled) {
+        return; // also where more was typed during the save
       }
     }
     const index = this.#documents.indexOf(one);
+    if (index < 0) {
+      return; // it was closed twice while it was being saved
+    }
     this.#documents.splice(index, 1);
     one.close();
     this.#activate(this.#active === one ? (this.#documents[index] ?? this.#documents[index - 1]) : this.#active);
