@@ -231,7 +231,7 @@ test("empty elements and an empty root take properties", () => {
   assert.deepEqual(readProperties(other), { title: "T" });
 });
 
-test("a document without properties gets a part and a relationship for them, which undo takes away", () => {
+test("a document without properties gets a part and a relationship for them, which undo takes away and redo brings back", () => {
   const model = new PackageModel({
     parts: [part("/docProps/core.xml", "taken")],
     relationships: [{ relationshipId: "rId1" }],
@@ -250,6 +250,8 @@ test("a document without properties gets a part and a relationship for them, whi
   model.undo();
   assert.equal(model.document().parts.length, 1);
   assert.equal(model.relationships.length, 1);
+  model.redo();
+  assert.deepEqual(readProperties(model), { creator: "Ada L." });
 });
 
 test("drafts tell which document was sent, however it was edited since", () => {

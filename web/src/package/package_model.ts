@@ -119,7 +119,7 @@ export class PackageModel {
   edit(edit: Edit, editor?: unknown): void {
     const last = this.#done[this.#done.length - 1];
     if (edit.joins !== undefined && last?.after.joins === edit.joins && this.#undone.length === 0) {
-      last.after = edit;
+      last.after = { ...last.after, ...edit };
       this.#put(edit);
     } else {
       this.#done.push({ before: this.#put(edit), after: edit });
