@@ -44,6 +44,20 @@ test("the charset follows the declaration as it is edited", () => {
   assert.ok(utf16.startsWith("\xff\xfe<\0?\0"));
 });
 
+test("what declares a charset that nobody writes is kept, and is no text any more", () => {
+  const decoded = decodePart(bytes(`<?xml version="1.0" encoding="UTF-8"?><a>ü 港</a>`));
+  for (const charset of ["UTF-9", "Shift_JIS"]) {
+    const text = decoded.text.replace("UTF-8", charset);
+    assert.equal(encodePart({ ...decoded, text }), bytes(text));
+    assert.equal(decodePart(bytes(text.replace("ü 港", ""))), undefined);
+  }
+});
+
+test("what loses the declaration of its charset is UTF-8", () => {
+  const decoded = decodePart(bytes(`<?xml version="1.0" encoding="windows-1251"?><a>\xcf</a>`, "latin1"));
+  assert.equal(encodePart({ ...decoded, text: "П港" }), bytes("П港"));
+});
+
 test("what would not come back is no text", () => {
   for (const content of [
     "\xff\xff\xff",

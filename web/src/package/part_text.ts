@@ -20,7 +20,7 @@ export function decodePart(content: string): PartText | undefined {
     const decoded = new TextDecoder(charset, { fatal: true, ignoreBOM: true }).decode(bytesOf(content));
     const mark = decoded.startsWith("\ufeff");
     const result = { text: mark ? decoded.slice(1) : decoded, charset, mark };
-    return encodePart(result) === content ? result : undefined;
+    return encodeDeclared(result) === content ? result : undefined;
   } catch {
     return undefined; // not in that charset, or in none that is known here
   }
@@ -28,9 +28,19 @@ export function decodePart(content: string): PartText | undefined {
 
 /**
  * The content for a part with that text, in the charset that its XML declaration names, or else in that
- * of `charset`. XML gets character references for what the charset lacks; elsewhere it is a RangeError.
+ * of `charset`. XML gets character references for what the charset lacks. Where the text cannot be written
+ * like that, it is in UTF-8, so that nothing is lost; decodePart() tells it by its declaration, if it has one.
  */
-export function encodePart({ text, charset, mark }: PartText): string {
+export function encodePart(part: PartText): string {
+  try {
+    return encodeDeclared(part);
+  } catch {
+    return stringOf(new TextEncoder().encode(part.text));
+  }
+}
+
+// Throws RangeError when the declared charset is not known or not written, or lacks what stands outside of XML.
+function encodeDeclared({ text, charset, mark }: PartText): string {
   const declared = DECLARATION.exec(text)?.[1]?.toLowerCase();
   let encoding = charset;
   let withMark = mark;

@@ -13,7 +13,8 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.export": "Export",
     "package.binary": "This part is neither text nor image. It is saved as it is.",
     "package.broken.title": "Save broken XML?",
-    "package.broken.message": "Office programs will not open the document, since this is not well-formed XML: {parts}",
+    "package.broken.message":
+      "Office programs will not open the document, since this is not well-formed XML, or not in the charset that it declares: {parts}",
     "package.broken.save": "Save anyway",
     "package.broken.cancel": "Go on editing",
     "package.text.find": "Find",
@@ -106,7 +107,7 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.binary": "Dieser Teil ist weder Text noch Bild. Er wird gespeichert, wie er ist.",
     "package.broken.title": "Fehlerhaftes XML speichern?",
     "package.broken.message":
-      "Office-Programme werden das Dokument nicht öffnen, denn dies ist kein wohlgeformtes XML: {parts}",
+      "Office-Programme werden das Dokument nicht öffnen, denn dies ist kein wohlgeformtes XML oder nicht in dem Zeichensatz, den es angibt: {parts}",
     "package.broken.save": "Trotzdem speichern",
     "package.broken.cancel": "Weiter bearbeiten",
     "package.text.find": "Suchen",
