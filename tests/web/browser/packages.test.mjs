@@ -103,6 +103,43 @@ browserTest("XML that is not well-formed is told, and saved only after asking", 
   await page.getByText(/is not well-formed/).waitFor({ state: "hidden" });
 });
 
+browserTest("what is typed into XML that declares a charset nobody knows is saved after asking", async (t) => {
+  const session = await open(t, "report.docx", wordFiles());
+  const { page } = session;
+  await openPart(page, "document.xml");
+  await page.getByRole("textbox", { name: "/word/document.xml" }).click();
+  await page.keyboard.press("Control+Home");
+  for (let count = 0; count < '<?xml version="1.0" encoding="UTF-'.length; ++count) {
+    await page.keyboard.press("ArrowRight");
+  }
+  await page.keyboard.type("9");
+  await page.waitForTimeout(500); // until when it is taken over
+  await page.keyboard.press("Control+s");
+  const dialog = page.getByRole("dialog");
+  await dialog.getByText(/word\/document\.xml/).waitFor();
+  await dialog.getByRole("button", { name: "Save anyway" }).click();
+  await page.locator(".mark.unsaved").waitFor({ state: "detached" });
+  const saved = textIn(session.read("report.docx"), "word/document.xml");
+  assert.match(saved, /^<\?xml version="1.0" encoding="UTF-98".*Cr\u00e8me br\u00fbl\u00e9e \u6e2f/s);
+});
+
+browserTest("two replacements at once, in a long part that is read again after the first, leave its XML whole", async (t) => {
+  const body = "<w:p><w:r><w:t>Annual report</w:t></w:r></w:p>".repeat(60_000);
+  const session = await open(t, "report.docx", wordFiles(body));
+  const { page } = session;
+  await page.getByLabel("Replace with").fill("Budget of the year");
+  await page.getByLabel("Find", { exact: true }).fill("Annual report");
+  await page.locator(".package-replace").nth(3).waitFor();
+  await page.evaluate(() => {
+    const buttons = document.querySelectorAll(".package-replace");
+    buttons[1].click();
+    buttons[2].click();
+  });
+  await page.getByText("60,001 found").waitFor();
+  const expected = `${body.replace("Annual report", "Budget of the year")}<w:p>`;
+  assert.ok(textIn(await save(session, "report.docx"), "word/document.xml").includes(expected));
+});
+
 browserTest("an image is shown, exported, and replaced by one that is dropped or picked", { skip: lackedByFirefox("downloads") }, async (t) => {
   const session = await open(t, "report.docx", wordFiles());
   const { page } = session;

@@ -18,7 +18,7 @@ type Matches = ReturnType<typeof findMatches>;
 
 /** A paragraph in the list. */
 interface Entry {
-  uri: string;
+  part: Part;
   block: TextBlock;
   matches: Matches;
 }
@@ -150,7 +150,7 @@ export class TextPanel implements Panel {
       for (const block of read?.blocks ?? []) {
         const matches = pattern ? findMatches(block, pattern) : [];
         if (!pattern || matches.length > 0) {
-          entries.push({ uri: part.partUri, block, matches });
+          entries.push({ part, block, matches });
         }
       }
       if (performance.now() - since > 30) {
@@ -217,9 +217,9 @@ export class TextPanel implements Panel {
     const made: HTMLElement[] = [];
     for (; this.#listed < end; ++this.#listed) {
       const entry = this.#entries[this.#listed]!;
-      if (entry.uri !== this.#heading) {
-        this.#heading = entry.uri;
-        made.push(element("h2", { title: textOf(entry.uri) }, this.#nameOf(entry.uri)));
+      if (entry.part.partUri !== this.#heading) {
+        this.#heading = entry.part.partUri;
+        made.push(element("h2", { title: textOf(this.#heading) }, nameOf(entry.part, this.page)));
       }
       made.push(this.#paragraph(entry));
     }
@@ -228,13 +228,6 @@ export class TextPanel implements Panel {
     // Observed anew, since it may still be in sight.
     this.#whenScrolled.unobserve(this.#more);
     this.#whenScrolled.observe(this.#more);
-  }
-
-  #nameOf(uri: string): string {
-    const part = this.model.part(uri);
-    const place = part && PLACES[placeOf(part)]?.[1];
-    const number = /([0-9]+)\.[^./]*$/.exec(uri)?.[1] ?? "";
-    return place ? `${this.page.text(`package.place.${place}`)} ${number}`.trim() : textOf(uri);
   }
 
   #paragraph(entry: Entry): HTMLElement {
@@ -258,22 +251,33 @@ export class TextPanel implements Panel {
   }
 
   #replace(entries: Entry[]): void {
-    const byPart = new Map<string, Entry[]>();
+    const byPart = new Map<Part, Entry[]>();
     for (const entry of entries) {
-      byPart.set(entry.uri, [...(byPart.get(entry.uri) ?? []), entry]);
+      const { part } = entry;
+      if (this.model.part(part.partUri) !== part) {
+        return; // it has changed, and is being read again for a new list
+      }
+      const replacements = byPart.get(part) ?? [];
+      replacements.push(entry);
+      byPart.set(part, replacements);
     }
     const parts = new Map<string, Part>();
-    for (const [uri, replacements] of byPart) {
-      const part = this.model.part(uri)!;
+    for (const [part, replacements] of byPart) {
       const { decoded } = this.#read(part)!;
       const text = replaceMatches(decoded.text, replacements, this.#replacement.value);
-      parts.set(uri, { ...part, content: encodePart({ ...decoded, text }) });
+      parts.set(part.partUri, { ...part, content: encodePart({ ...decoded, text }) });
     }
     this.model.edit({ parts });
     const count = entries.reduce((sum, { matches }) => sum + matches.length, 0);
     this.page.tell(this.page.text("package.text.replaced", { count }));
     this.#find.focus();
   }
+}
+
+function nameOf(part: Part, page: Page): string {
+  const place = PLACES[placeOf(part)]?.[1];
+  const number = /([0-9]+)\.[^./]*$/.exec(part.partUri)?.[1] ?? "";
+  return place ? `${page.text(`package.place.${place}`)} ${number}`.trim() : textOf(part.partUri);
 }
 
 function placeOf({ contentType }: Part): number {
