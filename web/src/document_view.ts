@@ -16,6 +16,8 @@ export interface LoadedDocument {
   byteOrderMark?: boolean;
   /** Texts: the charset in which a person wants to read it instead. */
   readAs?: string;
+  /** Whether it is an earlier version, and not what is saved now. */
+  isEarlier?: boolean;
 }
 
 /** What a save sends: a package, or a text as the bytes of its file in `encoding`. */

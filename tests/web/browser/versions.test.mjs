@@ -5,6 +5,8 @@ import assert from "node:assert/strict";
 import { waitFor } from "../../serve/processes.mjs";
 import { clientOf } from "./client.mjs";
 import { browserTest, Session } from "./harness.mjs";
+import { textIn, wordFiles } from "./office_files.mjs";
+import { open as openPackage, save as savePackage } from "./package_page.mjs";
 
 const text = (page) => page.locator(".panel:not([hidden]) .cm-content");
 const dialog = (page) => page.getByRole("dialog");
@@ -55,4 +57,28 @@ browserTest("a document without earlier versions says so", async (t) => {
   await text(page).waitFor();
   await page.getByRole("button", { name: "Versions" }).click();
   await dialog(page).getByText("There are none.").waitFor();
+});
+
+browserTest("what is taken over from an earlier version of an office document is unsaved, and outlives a reload", async (t) => {
+  const name = "report.docx";
+  const session = await openPackage(t, name, wordFiles());
+  const { page } = session;
+  await page.getByLabel("Find", { exact: true }).fill("Annual report");
+  await page.getByLabel("Replace with").fill("Budget");
+  await page.getByRole("button", { name: "Replace all" }).click();
+  await savePackage(session, name);
+  await page.locator(".mark.unsaved").waitFor({ state: "detached" });
+  const client = await clientOf(t, session);
+  await waitFor("the copy", async () => (await client.versions(session.path(name))).length === 1);
+  await page.getByRole("button", { name: "Versions" }).click();
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  await dialog(page).getByLabel("/word/header1.xml: which one to keep").selectOption("theirs");
+  await dialog(page).getByLabel("/word/document.xml: which one to keep").selectOption("mine");
+  await dialog(page).getByRole("button", { name: "Take over the result" }).click();
+  await session.waitForDraft(page, "Annual report, page");
+  await page.reload();
+  await page.getByText(/have been restored/).waitFor();
+  const saved = await savePackage(session, name);
+  assert.match(textIn(saved, "word/header1.xml"), /Annual report, page/);
+  assert.match(textIn(saved, "word/document.xml"), /The Budget</);
 });

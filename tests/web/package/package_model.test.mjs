@@ -4,7 +4,7 @@ import { test } from "node:test";
 
 import { room } from "../room.mjs";
 
-const { PackageModel, combine, documentSent, findDifferences, kindOf, partBytes, propertyEdit, readProperties, sizeOf, withImage } =
+const { PackageModel, documentSent, findDifferences, kindOf, partBytes, propertyEdit, readProperties, sizeOf, withImage } =
   await room("package/comparison.ts", "package/package_model.ts", "package/part_kinds.ts", "package/properties.ts");
 
 const part = (partUri, content, contentType = "application/xml", relationship = []) => ({
@@ -125,20 +125,18 @@ test("parts that differ are told, with who has changed them", () => {
       ["/e", "theirs"],
     ],
   );
-  const chosen = new Map([
-    ["/a", model.part("/a")],
-    ["/c", null],
-    ["/e", theirs.parts[4]],
-  ]);
-  const combined = combine(theirs, chosen, []);
-  assert.deepEqual(
-    [...combined.parts].map(({ partUri, content }) => partUri + content),
-    ["/a1", "/b2", "/d2", "/enew"],
-  );
-  assert.deepEqual(
-    ["/a", "/b", "/c", "/e"].map((uri) => combined.isChanged(uri)),
-    [true, false, true, false],
-  );
+});
+
+test("of what somebody else saved, what both have is not unsaved, and what was changed is", () => {
+  const model = new PackageModel({ parts: ["/a", "/b", "/c"].map((uri) => part(uri, "0")), relationships: [] });
+  model.edit(setting("/a", "1"));
+  model.saved({ parts: [part("/a", "0"), part("/b", "0"), part("/c", "2")], relationships: [] });
+  assert.deepEqual(model.changedParts(), ["/a", "/c"]);
+  model.edit(setting("/c", "2"));
+  assert.deepEqual(model.changedParts(), ["/a"]);
+  model.undo();
+  model.undo();
+  assert.deepEqual(model.changedParts(), ["/c"]);
 });
 
 test("what was saved is what both have from then on", () => {

@@ -33,7 +33,7 @@ export async function load(client: Reader, path: string, options: RequestOptions
 export async function loadEarlier(client: Reader, present: LoadedDocument, time: number): Promise<LoadedDocument> {
   const contentType = isPackage(present.path) ? "text/xml" : "text/plain";
   const answer = await client.readVersion(present.path, time, contentType);
-  return { ...present, version: "", answer: readable(answer) };
+  return { ...present, version: "", answer: readable(answer), isEarlier: true };
 }
 
 function readable(answer: ReadAnswer): ReadAnswer {

@@ -5,11 +5,11 @@ import { MergeView } from "@codemirror/merge";
 import { EditorState } from "@codemirror/state";
 import { EditorView, keymap } from "@codemirror/view";
 
-import type { Document, Part, Relationship } from "../../client/src/index.js";
+import type { Document, Part } from "../../client/src/index.js";
 import type { Comparison, Page } from "../document_view.js";
 import { element } from "../ui/dom.js";
 import { bytesText } from "../ui/text.js";
-import { areSame, isSame, PackageModel } from "./package_model.js";
+import { areSame, isSame, type Edit, type PackageModel } from "./package_model.js";
 import { byName, kindOf, partBytes, sizeOf, textOf } from "./part_kinds.js";
 import { decodePart, encodePart, type PartText } from "./part_text.js";
 import { editorBasics, laidOut } from "./xml_editor.js";
@@ -40,23 +40,12 @@ export function findDifferences(mine: PackageModel, theirs: Document): Differenc
   });
 }
 
-/** The edition of theirs with the parts of `chosen` in it: what is null is taken out. */
-export function combine(
-  theirs: Document,
-  chosen: Map<string, Part | null>,
-  relationships: Relationship[],
-): PackageModel {
-  const model = new PackageModel(theirs);
-  model.edit({ parts: chosen, relationships });
-  return model;
-}
-
-/** Shows the differences; `use` gets what is chosen, as changes of theirs. */
+/** Shows the differences; `use` gets what is chosen, as an edit of mine. */
 export function compareDocuments(
   mine: PackageModel,
   theirs: Document,
   page: Page,
-  use: (model: PackageModel) => void,
+  use: (chosen: Edit) => void,
 ): Comparison {
   return new PackageComparison(mine, theirs, page, use);
 }
@@ -69,10 +58,10 @@ class PackageComparison implements Comparison {
   #detail = element("div", { className: "package-difference" });
 
   constructor(
-    private mine: PackageModel,
+    mine: PackageModel,
     private theirs: Document,
     private page: Page,
-    private use: (model: PackageModel) => void,
+    private use: (chosen: Edit) => void,
   ) {
     this.#rows = findDifferences(mine, theirs).map(
       (difference) => new ComparedPart(difference, page, (row) => this.#show(row)),
@@ -93,9 +82,8 @@ class PackageComparison implements Comparison {
   }
 
   apply(): void {
-    const chosen = new Map(this.#rows.map((row) => [row.uri, row.result ?? null]));
-    const relationships = this.#relationshipsBy === "mine" ? [...this.mine.relationships] : this.theirs.relationships;
-    this.use(combine(this.theirs, chosen, relationships));
+    const parts = new Map(this.#rows.map((row) => [row.uri, row.result ?? null]));
+    this.use({ parts, ...(this.#relationshipsBy === "theirs" && { relationships: this.theirs.relationships }) });
   }
 
   close(): void {

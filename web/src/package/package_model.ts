@@ -91,6 +91,11 @@ export class PackageModel {
   saved({ parts, relationships }: Document): void {
     this.#original = new Map(parts.map((part) => [part.partUri, part]));
     this.#originalRelationships = relationships;
+    for (const part of parts) {
+      if (isSame(this.#parts.get(part.partUri), part)) {
+        this.#parts.set(part.partUri, part);
+      }
+    }
   }
 
   /**

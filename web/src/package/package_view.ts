@@ -98,12 +98,15 @@ export class PackageView implements DocumentView {
   async compare(theirs: LoadedDocument): Promise<Comparison> {
     this.#commit();
     const mine = this.#model;
-    return compareDocuments(mine, documentOf(theirs), this.page, (model) => {
+    const document = documentOf(theirs);
+    return compareDocuments(mine, document, this.page, (chosen) => {
       if (this.#model !== mine) {
         throw new Error(this.page.text("package.differences.meanwhile"));
       }
-      this.#use(model);
-      this.page.changed();
+      if (!theirs.isEarlier) {
+        this.saved({ kind: "package", content: document });
+      }
+      mine.edit(chosen);
     });
   }
 
