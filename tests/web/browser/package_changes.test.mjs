@@ -4,7 +4,7 @@ import assert from "node:assert/strict";
 
 import { clientOf } from "./client.mjs";
 import { browserTest } from "./harness.mjs";
-import { png, textIn, unpack, wordFiles } from "./office_files.mjs";
+import { png, relationships, textIn, unpack, wordFiles } from "./office_files.mjs";
 import { open, save, tab } from "./package_page.mjs";
 
 const NAME = "report.docx";
@@ -85,6 +85,27 @@ browserTest("two editions of a document are compared part by part, and put toget
   assert.match(textIn(saved, "word/header1.xml"), /Budget/);
   assert.match(textIn(saved, "docProps/core.xml"), /Their title/);
   assert.ok(Buffer.from(unpack(saved)["word/media/image1.png"]).equals(png(40, 10, [0, 0, 200])));
+});
+
+browserTest("relationships that only somebody else has changed are kept when two editions are put together", async (t) => {
+  const { "docProps/core.xml": core, ...files } = wordFiles();
+  files["_rels/.rels"] = relationships(["rId1", "officeDocument", "word/document.xml"]);
+  const session = await open(t, NAME, files);
+  const { page } = session;
+  await replace(page, "Annual report", "Budget");
+  const theirs = await session.newPage(`&file=${encodeURIComponent(session.path(NAME))}`);
+  await tab(theirs, "Properties").click();
+  await theirs.getByLabel("Title").fill("Their title");
+  await save({ page: theirs, read: (name) => session.read(name) }, NAME);
+  await page.locator(".mark.theirs").waitFor();
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  await dialog(page).getByRole("button", { name: "Save put together" }).click();
+  await isSaved(page);
+  const saved = session.read(NAME);
+  assert.match(textIn(saved, "word/header1.xml"), /Budget/);
+  assert.match(textIn(saved, "docProps/core.xml"), /Their title/);
+  assert.match(textIn(saved, "_rels/.rels"), /core\.xml/);
 });
 
 browserTest("of two editions of a document, mine can be kept", async (t) => {

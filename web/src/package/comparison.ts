@@ -54,7 +54,7 @@ class PackageComparison implements Comparison {
   readonly element = element("div", { className: "package-comparison" });
 
   #rows: ComparedPart[];
-  #relationshipsBy: Side = "mine";
+  #relationshipsBy: Side;
   #detail = element("div", { className: "package-difference" });
 
   constructor(
@@ -63,6 +63,7 @@ class PackageComparison implements Comparison {
     private page: Page,
     private use: (chosen: Edit) => void,
   ) {
+    this.#relationshipsBy = mine.areRelationshipsChanged ? "mine" : "theirs";
     this.#rows = findDifferences(mine, theirs).map(
       (difference) => new ComparedPart(difference, page, (row) => this.#show(row)),
     );
@@ -101,6 +102,7 @@ class PackageComparison implements Comparison {
 
   #relationships(): HTMLElement {
     const choice = sideChoice(this.page, this.page.text("package.differences.relationships"), ["mine", "theirs"]);
+    choice.value = this.#relationshipsBy;
     choice.addEventListener("change", () => (this.#relationshipsBy = choice.value as Side));
     return element("li", {}, element("span", {}, this.page.text("package.differences.relationships")), choice);
   }

@@ -63,6 +63,11 @@ export class PackageModel {
     return this.#relationships;
   }
 
+  /** Whether the relationships of the package are others than those that were read or saved last. */
+  get areRelationshipsChanged(): boolean {
+    return !areSame(this.#relationships, this.#originalRelationships);
+  }
+
   part(uri: string): Part | undefined {
     return this.#parts.get(uri);
   }
@@ -104,7 +109,7 @@ export class PackageModel {
    */
   draft(sent?: PackageDraft): PackageDraft {
     const uris = new Set([...Object.keys(sent?.parts ?? {}), ...this.changedParts()]);
-    const hasRelationships = sent?.relationships || this.#relationships !== this.#originalRelationships;
+    const hasRelationships = sent?.relationships || this.areRelationshipsChanged;
     return {
       kind: "package",
       parts: Object.fromEntries(
