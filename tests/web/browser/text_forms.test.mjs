@@ -39,6 +39,23 @@ browserTest("other line ends that are chosen are those of all lines", async (t) 
   assert.equal(session.read("mixed.txt").toString("latin1"), "a\r\nb\r\nc\r\nd");
 });
 
+browserTest("the byte-order mark of a text in GB18030 is kept", async (t) => {
+  // "I can eat glass without harm to my body" and a poem, behind the mark.
+  const bytes = Buffer.from(
+    "84319533ced2c4dccdcccfc2b2a3c1a7b6f8b2bbc9cbc9edcce5a1a3b4ba" +
+      "c3dfb2bbbef5cffea3acb4a6b4a6cec5cce4c4f1a1a3",
+    "hex",
+  );
+  const session = await Session.start(t, { "a.txt": bytes });
+  const { page } = session;
+  await open(session, "a.txt");
+  assert.equal(await shown(charset(page)), "GB18030");
+  assert.equal(await mark(page).isChecked(), true);
+  await typeAtTheEnd(page, "!");
+  await save(page);
+  assert.equal(session.read("a.txt").toString("hex"), `${bytes.toString("hex")}21`);
+});
+
 browserTest("a byte-order mark is told of, kept, taken away and given", async (t) => {
   const files = { "marked.txt": "\ufeffa\r\n", "bare.txt": "\u00e4\n", "wide.txt": Buffer.from("\ufeff\u0416\n", "utf16le") };
   const session = await Session.start(t, files);

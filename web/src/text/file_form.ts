@@ -62,7 +62,7 @@ export interface EncodedText {
 /** The bytes of the file, but for those of characters that its charset lacks. Linear. */
 export function encodeFile(doc: Text, { charset, byteOrderMark, lineEnds }: FileForm): EncodedText {
   const sink = new ByteSink(doc.length + 4 * doc.lines + 0x40000);
-  if (byteOrderMark && charset.isUnicode) {
+  if (byteOrderMark && charset.mayHaveMark) {
     charset.encode("\ufeff", sink);
   }
   const characters = new Set<string>();

@@ -60,8 +60,8 @@ export class StatusBar {
     this.#position.textContent = this.page.text("text.position", { line: line.number, column: head - line.from + 1 });
     this.#showCharset(charset.name);
     this.#lineEnd.value = lineEnds.exceptions.size > 0 ? "mixed" : lineEnds.usual;
-    this.#mark.checked = byteOrderMark && charset.isUnicode;
-    this.#mark.disabled = !charset.isUnicode || state.readOnly;
+    this.#mark.checked = byteOrderMark && charset.mayHaveMark;
+    this.#mark.disabled = !charset.mayHaveMark || state.readOnly;
     this.#lineEnd.disabled = state.readOnly;
   }
 

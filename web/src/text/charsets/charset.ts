@@ -15,8 +15,10 @@ export interface Decoded {
 
 export interface Charset {
   readonly name: string;
-  /** Whether it is a form of Unicode, which holds all characters and may have a byte-order mark. */
+  /** Whether it is a form of Unicode, which holds all characters. */
   readonly isUnicode: boolean;
+  /** Whether its texts may begin with a byte-order mark. */
+  readonly mayHaveMark: boolean;
   /** False of a charset in which texts are only shown. */
   readonly canEncode: boolean;
   /** The text of `bytes`. A byte-order mark is kept as U+FEFF. */

@@ -91,6 +91,7 @@ function loadedSet(table: Charset, length: 1 | 2): GraphicSet {
 
 class ShownCharset implements Charset {
   readonly isUnicode = false;
+  readonly mayHaveMark = false;
   readonly canEncode = false;
 
   constructor(

@@ -42,6 +42,7 @@ class Numbers {
 export class TableCharset implements Charset {
   readonly isUnicode = false;
   readonly canEncode = true;
+  readonly mayHaveMark: boolean;
   #sections: Section[] = [];
   #single = new Uint32Array(256).fill(NONE);
   #pages: (Uint32Array | undefined)[] = []; // codes by character, in pages of 256
@@ -51,6 +52,7 @@ export class TableCharset implements Charset {
     readonly name: string,
     table: Uint8Array,
   ) {
+    this.mayHaveMark = name === "GB18030";
     const numbers = new Numbers(table);
     for (let left = numbers.next(); left > 0; --left) {
       this.#readSection(numbers);

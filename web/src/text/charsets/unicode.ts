@@ -11,6 +11,7 @@ function loneSurrogates(text: string): Lacking[] {
 
 abstract class UnicodeForm implements Charset {
   readonly isUnicode = true;
+  readonly mayHaveMark = true;
   readonly canEncode = true;
 
   constructor(readonly name: string) {}
