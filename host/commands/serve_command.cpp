@@ -84,7 +84,7 @@ constexpr std::chrono::seconds longestDrain{60};
 // To servers, what follows white space is the next word of their protocol.
 void requireGroup(const std::string& group) {
     const bool isValid = !group.empty() && std::all_of(group.begin(), group.end(), [](char c) {
-        return c > ' ' && c != '\x7f';
+        return c > ' ' && c < '\x7f';
     });
     if (!isValid) {
         throw std::runtime_error(
