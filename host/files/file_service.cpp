@@ -142,7 +142,8 @@ private:
     }
 
     json::Object charset() {
-        const FileDescriptor file = openDocument(path());
+        const FileDescriptor file =
+            members_.contains("time") ? earlierVersion() : openDocument(path());
         if (!file) {
             throw std::runtime_error("File does not exist");
         }

@@ -198,6 +198,16 @@ TEST_F(FileServiceTest, ReadsAndRestoresEarlierVersions) {
     EXPECT_EQ(versionsOf(root_ / "a.txt").size(), 2U);
 }
 
+TEST_F(FileServiceTest, NamesTheCharsetOfAnEarlierVersion) {
+    writeFile(root_ / "a.txt", std::string("\xFE\xFF\0a", 4));
+    EXPECT_EQ(write(root_ / "a.txt", "a"), "true");
+    const json::Value time = versionsOf(root_ / "a.txt").at(0).get<json::Object>()["time"];
+    EXPECT_EQ(ask("charset", root_ / "a.txt"),
+              json::parse(R"({"byteOrderMark":false,"charset":"UTF-8","status":true})"));
+    EXPECT_EQ(ask("charset", root_ / "a.txt", {{"time", time}}),
+              json::parse(R"({"byteOrderMark":true,"charset":"UTF-16BE","status":true})"));
+}
+
 TEST_F(FileServiceTest, TellsOfTheRestoredFile) {
     write(root_ / "a.txt", "one");
     write(root_ / "a.txt", "two");
@@ -254,6 +264,7 @@ TEST_F(FileServiceTest, ShowsAndChangesNothingOutsideItsRoot) {
         EXPECT_EQ(ask("versions", folder / "secret.txt")["status"], json::Value(false));
         const json::Object version{{"time", time}, {"contentType", "text/plain"}};
         EXPECT_EQ(ask("readVersion", folder / "secret.txt", version)["status"], json::Value(false));
+        EXPECT_EQ(ask("charset", folder / "secret.txt", version)["status"], json::Value(false));
         EXPECT_EQ(ask("restore", folder / "secret.txt", version)["status"], json::Value(false));
         EXPECT_EQ(ask("restore", root_ / "secret.txt", version)["status"], json::Value(false));
         EXPECT_EQ(write(folder / "secret.txt", "x"), "false");

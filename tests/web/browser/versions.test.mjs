@@ -51,6 +51,22 @@ browserTest("an earlier version is compared with what is there, and nothing chan
   assert.equal(session.read("a.txt").toString(), "three\n");
 });
 
+browserTest("an earlier version is shown in its own charset", async (t) => {
+  const session = await Session.start(t, { "a.txt": Buffer.from("caf\xe9\n", "latin1") });
+  const { page } = session;
+  const client = await clientOf(t, session);
+  const file = session.path("a.txt");
+  assert.equal(await client.write(file, "caf\xc3\xa9 \xe6\xb8\xaf\n"), true); // in UTF-8, with U+6E2F
+  await waitFor("the copy", async () => (await client.versions(file)).length === 1);
+  await page.locator(".tree .row", { hasText: "a.txt" }).click();
+  await text(page).waitFor();
+  await page.getByRole("button", { name: "Versions" }).click();
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  const shown = dialog(page).locator(".cm-content");
+  await shown.first().waitFor();
+  assert.deepEqual((await shown.allInnerTexts()).map((one) => one.trim()), ["caf\u00e9", "caf\u00e9 \u6e2f"]);
+});
+
 browserTest("a document without earlier versions says so", async (t) => {
   const { page } = await Session.start(t, { "a.txt": "one\n" });
   await page.locator(".tree .row", { hasText: "a.txt" }).click();

@@ -190,9 +190,9 @@ export class Client {
     return this.#askFiles("list", { filePath: folder, after }, options);
   }
 
-  /** The charset in which a text is read. */
-  charset(filePath: string, options: RequestOptions = {}): Promise<Charset> {
-    return this.#askFiles("charset", { filePath }, options);
+  /** The charset in which a text is read; with a `time`, the one of its earlier version that was replaced then. */
+  charset(filePath: string, { time, ...options }: RequestOptions & { time?: number } = {}): Promise<Charset> {
+    return this.#askFiles("charset", { filePath, ...(time !== undefined && { time }) }, options);
   }
 
   /** The version of a document, a token made from its content. "" when there is none. */

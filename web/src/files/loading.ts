@@ -29,11 +29,16 @@ export async function load(client: Reader, path: string, options: RequestOptions
   }
 }
 
-/** Reads the version of `present` that was replaced at `time`. Its charset is taken to be that of `present`. */
+/** Reads the version of `present` that was replaced at `time`. Throws as load() does. */
 export async function loadEarlier(client: Reader, present: LoadedDocument, time: number): Promise<LoadedDocument> {
-  const contentType = isPackage(present.path) ? "text/xml" : "text/plain";
-  const answer = await client.readVersion(present.path, time, contentType);
-  return { ...present, version: "", answer: readable(answer), isEarlier: true };
+  const { path } = present;
+  if (isPackage(path)) {
+    return { path, version: "", isEarlier: true, answer: readable(await client.readVersion(path, time, "text/xml")) };
+  }
+  const answer = readable(await client.readVersion(path, time, "text/plain"));
+  const { charset, byteOrderMark } = await client.charset(path, { time });
+  const readAs = charset === present.charset ? present.readAs : undefined; // which was chosen for the one found
+  return { path, version: "", isEarlier: true, answer, charset, byteOrderMark, ...(readAs && { readAs }) };
 }
 
 function readable(answer: ReadAnswer): ReadAnswer {
