@@ -42,7 +42,7 @@ async function start(settings: Settings): Promise<void> {
     } else {
       const drafts = await Drafts.open(await ownWindow());
       workspace = new Workspace({ client, settings, drafts, messages });
-      workspace.restore(await drafts.take(), address.file);
+      workspace.restore(await drafts.take().catch(() => []), address.file); // told when there is one to be stored
     }
     stage.replaceChildren(workspace.element);
   } catch (error) {

@@ -274,3 +274,26 @@ browserTest("a host that is killed while it saves leaves the old file, and the p
   await session.waitForDraft(page, "unsaved ");
   assert.equal(session.read("a.txt").toString(), "one\n");
 });
+
+browserTest("a browser that stores nothing opens and saves documents all the same, and says so", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  await session.context.addInitScript(() => {
+    IDBFactory.prototype.open = () => {
+      const request = { error: new DOMException("the disk is full", "QuotaExceededError") };
+      setTimeout(() => request.onerror());
+      return request;
+    };
+  });
+  const page = await session.newPage();
+  await open(page, "a.txt");
+  await page.getByText(/unsaved changes cannot be kept in this browser \(the disk is full\)/).waitFor();
+  await type(page, "zero ");
+  await isUnsaved(page, "a.txt");
+  const asked = page.waitForEvent("dialog");
+  await page.close({ runBeforeUnload: true });
+  assert.equal((await asked).type(), "beforeunload");
+  await (await asked).dismiss();
+  await page.keyboard.press("Control+s");
+  await isSaved(page, "a.txt");
+  assert.equal(session.read("a.txt").toString(), "zero one\n");
+});

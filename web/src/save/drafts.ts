@@ -22,14 +22,13 @@ export interface Draft {
 const STORE = "drafts";
 
 export class Drafts {
+  /** Where the browser stores nothing, as when the disk is full, all that is asked of the drafts rejects. */
   static async open(window: WindowId): Promise<Drafts> {
-    const opening = indexedDB.open("editor", 1);
-    opening.onupgradeneeded = () => opening.result.createObjectStore(STORE, { keyPath: ["window", "path"] });
-    return new Drafts(await result(opening), window);
+    return new Drafts(await openDatabase().catch((reason: Error) => reason), window);
   }
 
   private constructor(
-    private database: IDBDatabase,
+    private database: IDBDatabase | Error,
     private window: WindowId,
   ) {}
 
@@ -58,7 +57,13 @@ export class Drafts {
     return [...taken.values()];
   }
 
-  #ask<Result>(mode: IDBTransactionMode, question: (store: IDBObjectStore) => IDBRequest<Result>): Promise<Result> {
+  async #ask<Result>(
+    mode: IDBTransactionMode,
+    question: (store: IDBObjectStore) => IDBRequest<Result>,
+  ): Promise<Result> {
+    if (this.database instanceof Error) {
+      throw this.database;
+    }
     const transaction = this.database.transaction(STORE, mode);
     const request = question(transaction.objectStore(STORE));
     transaction.commit(); // not only when the request is done, and the page perhaps gone
@@ -67,6 +72,12 @@ export class Drafts {
       transaction.onabort = transaction.onerror = () => reject(transaction.error ?? request.error);
     });
   }
+}
+
+async function openDatabase(): Promise<IDBDatabase> {
+  const opening = indexedDB.open("editor", 1);
+  opening.onupgradeneeded = () => opening.result.createObjectStore(STORE, { keyPath: ["window", "path"] });
+  return result(opening);
 }
 
 function result<Result>(request: IDBRequest<Result>): Promise<Result> {
