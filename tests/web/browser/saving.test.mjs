@@ -120,6 +120,22 @@ browserTest("of two pages, the second to save can put both together", async (t) 
   assert.equal(session.read("a.txt").toString(), "mine one\ntwo\nthree\nand theirs\n");
 });
 
+browserTest("both are put together by keys alone, and Escape in an editor does not leave the comparison", async (t) => {
+  const { session, mine } = await conflict(t);
+  await dialog(mine).getByRole("button", { name: "Compare" }).press("Enter");
+  const result = dialog(mine).getByRole("textbox", { name: "Yours: the result" });
+  await result.focus();
+  await mine.keyboard.press("Control+End");
+  await mine.keyboard.type("typed ");
+  await mine.keyboard.press("Escape");
+  await mine.keyboard.press("Tab");
+  await mine.waitForFunction(() => !document.activeElement.closest(".cm-content"));
+  await dialog(mine).getByRole("button", { name: /^Take this change over/ }).last().press("Enter");
+  await dialog(mine).getByRole("button", { name: "Save put together" }).press("Enter");
+  await isSaved(mine, "a.txt");
+  assert.equal(session.read("a.txt").toString(), "mine one\ntwo\nthree\ntheirs");
+});
+
 browserTest("what cannot be compared is told, and the question is asked again", async (t) => {
   const session = await Session.start(t, { "a.txt": "one\n" }, { expectedProblems: [/ERR_FAILED/] });
   const { page } = session;

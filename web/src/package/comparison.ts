@@ -7,7 +7,7 @@ import { EditorView, keymap } from "@codemirror/view";
 
 import type { Document, Part } from "../../client/src/index.js";
 import type { Comparison, Page } from "../document_view.js";
-import { element } from "../ui/dom.js";
+import { element, mergeArrow } from "../ui/dom.js";
 import { bytesText } from "../ui/text.js";
 import { areSame, isSame, type Edit, type PackageModel } from "./package_model.js";
 import { byName, kindOf, partBytes, sizeOf, textOf } from "./part_kinds.js";
@@ -193,7 +193,7 @@ class ComparedPart {
       a,
       b,
       revertControls: "a-to-b",
-      renderRevertControl: () => this.#arrow(),
+      renderRevertControl: () => mergeArrow(this.page.text("comparison.take")),
       collapseUnchanged: { margin: 3, minSize: 6 },
     });
     this.#merge = { view, decoded: my, part: mine };
@@ -203,18 +203,6 @@ class ComparedPart {
       element("h3", {}, this.page.text("package.mine")),
     );
     return element("div", {}, titles, element("p", {}, this.page.text("package.differences.hint")), view.dom);
-  }
-
-  // The view hears of the mouse only, and the keyboard is to do the same.
-  #arrow(): HTMLElement {
-    const label = this.page.text("package.differences.take");
-    const arrow = element("button", { type: "button", title: label, "aria-label": label }, "\u2192");
-    arrow.addEventListener("click", ({ detail }) => {
-      if (detail === 0) {
-        arrow.dispatchEvent(new MouseEvent("mousedown", { bubbles: true }));
-      }
-    });
-    return arrow;
   }
 
   #sides(): HTMLElement {

@@ -91,7 +91,6 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.differences.both": "changed in both",
     "package.differences.absent": "There is no such part.",
     "package.differences.relationships": "Relationships of the package",
-    "package.differences.take": "Take this change over from the other version",
     "package.differences.hint": "Mine can be edited here; the arrows bring changes over from the other version.",
   },
   de: {
@@ -184,7 +183,6 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.differences.both": "in beiden geändert",
     "package.differences.absent": "Es gibt diesen Teil nicht.",
     "package.differences.relationships": "Beziehungen des Pakets",
-    "package.differences.take": "Diese Änderung aus der anderen Fassung übernehmen",
     "package.differences.hint":
       "Meine Fassung kann hier bearbeitet werden; die Pfeile holen Änderungen aus der anderen herüber.",
   },

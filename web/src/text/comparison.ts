@@ -1,10 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 // Two states of a text beside each other: theirs, and the person's own, which becomes the result.
 import { MergeView } from "@codemirror/merge";
-import { ChangeSet, type Extension, type Text } from "@codemirror/state";
-import { EditorState } from "@codemirror/state";
+import { ChangeSet, EditorState, type Extension, type Text } from "@codemirror/state";
 import { EditorView } from "@codemirror/view";
-import { element } from "../ui/dom.js";
+import { element, mergeArrow } from "../ui/dom.js";
 
 export interface Side {
   label: string;
@@ -17,7 +16,8 @@ export class TextComparison {
   #merge: MergeView;
   #changes: ChangeSet;
 
-  constructor(theirs: Side, mine: Side) {
+  /** `take` is what the arrows say that bring a change over from theirs. */
+  constructor(theirs: Side, mine: Side, take: string) {
     this.#changes = ChangeSet.empty(mine.doc.length);
     const collect = EditorView.updateListener.of((update) => {
       this.#changes = this.#changes.compose(update.changes);
@@ -30,6 +30,7 @@ export class TextComparison {
       b: { doc: mine.doc, extensions: [mine.extensions, collect] },
       parent: this.element,
       revertControls: "a-to-b",
+      renderRevertControl: () => mergeArrow(take),
       collapseUnchanged: { margin: 3, minSize: 6 },
       // Where texts differ much, rather a coarse answer than none.
       diffConfig: { scanLimit: 500, timeout: 1000 },

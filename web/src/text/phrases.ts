@@ -22,6 +22,5 @@ export const PHRASES: Record<string, Record<string, string>> = {
     "Control character": "Steuerzeichen",
     "Selection deleted": "Auswahl gelöscht",
     "$ unchanged lines": "$ gleiche Zeilen",
-    "Revert this chunk": "Diese Stelle übernehmen",
   },
 };

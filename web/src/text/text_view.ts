@@ -360,6 +360,7 @@ export class TextView implements DocumentView {
     return new TextComparison(
       { label: theirLabel, doc, extensions: textEditor(form, this.page, theirLabel) },
       { label: myLabel, doc: mine.doc, extensions: textEditor(fileFormOf(mine), this.page, myLabel) },
+      this.page.text("comparison.take"),
     );
   }
 }

@@ -35,6 +35,12 @@ export function ask({ title, message, choices, body }: Question): Promise<string
     },
     form,
   );
+  // An editor has uses of its own for Escape: it ends a search, and lets the Tab key leave. What was typed stays.
+  body?.addEventListener("keydown", (event) => {
+    if (event.key === "Escape" && (event.target as Element).closest(".cm-editor")) {
+      event.preventDefault();
+    }
+  });
   // The policy of the page lets no form be sent, not even to a dialog.
   form.addEventListener("submit", (event) => {
     event.preventDefault();

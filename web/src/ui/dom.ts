@@ -19,6 +19,17 @@ export function element<Name extends keyof HTMLElementTagNameMap>(
   return made;
 }
 
+/** The arrow that brings a change over in a MergeView, which hears of the mouse only: keys do the same. */
+export function mergeArrow(label: string): HTMLElement {
+  const arrow = element("button", { type: "button", title: label, "aria-label": label }, "\u2192");
+  arrow.addEventListener("click", ({ detail }) => {
+    if (detail === 0) {
+      arrow.dispatchEvent(new MouseEvent("mousedown", { bubbles: true }));
+    }
+  });
+  return arrow;
+}
+
 /** A button that calls `pressed`. */
 export function button(label: string, pressed: () => void, properties: { [key: string]: unknown } = {}) {
   const made = element("button", { type: "button", ...properties }, label);

@@ -85,6 +85,7 @@ export const de: Record<string, string> = {
   "conflict.mine": "Meine behalten",
   "conflict.theirs": "Die andere nehmen",
   "conflict.together": "Zusammengefügt speichern",
+  "comparison.take": "Diese Änderung aus der anderen Fassung übernehmen",
   "conflict.later": "Später entscheiden",
   "conflict.removed.title": "{name} wurde entfernt",
   "conflict.removed.message": "Die Datei ist nicht mehr da. Sie können Ihren Text als neue Datei dieses Namens speichern.",

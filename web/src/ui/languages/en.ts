@@ -85,6 +85,7 @@ export const en: Record<string, string> = {
   "conflict.mine": "Keep mine",
   "conflict.theirs": "Take theirs",
   "conflict.together": "Save put together",
+  "comparison.take": "Take this change over from the other version",
   "conflict.later": "Decide later",
   "conflict.removed.title": "{name} has been removed",
   "conflict.removed.message": "The file is no longer there. You can save your text as a new file of that name.",
