@@ -52,6 +52,18 @@ browserTest("what is unsaved is seen in tab and title, and Ctrl+S saves it", asy
   assert.equal(session.read("a.txt").toString(), "zero one\n");
 });
 
+browserTest("Ctrl+S saves on a keyboard whose letters are not Latin", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page } = session;
+  await open(page, "a.txt");
+  await type(page, "\u0441 ");
+  await isUnsaved(page, "a.txt");
+  const event = { key: "\u044b", code: "KeyS", ctrlKey: true, bubbles: true, cancelable: true };
+  const isTaken = await text(page).evaluate((one, pressed) => !one.dispatchEvent(new KeyboardEvent("keydown", pressed)), event);
+  assert.equal(isTaken, true); // and the browser does not save the page
+  await isSaved(page, "a.txt");
+});
+
 browserTest("what somebody else saves is shown at once where nothing is unsaved", async (t) => {
   const session = await Session.start(t, { "a.txt": "one\n" });
   const { page } = session;

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // A package in its tab: its text, its parts and its properties, one at a time, and a preview beside them.
 import type { Comparison, DocumentContent, DocumentView, LoadedDocument, Page } from "../document_view.js";
-import { button, element } from "../ui/dom.js";
+import { button, element, shortcutKey } from "../ui/dom.js";
 import { compareDocuments } from "./comparison.js";
 import { PackageModel, type PackageDraft, documentOf } from "./package_model.js";
 import { kindOf, textOf } from "./part_kinds.js";
@@ -240,7 +240,7 @@ export class PackageView implements DocumentView {
   // Fields and the editor undo by themselves.
   #undoByKey(event: KeyboardEvent): void {
     const isOwn = !(event.target as Element).closest("input, textarea, .cm-editor");
-    const key = event.key.toLowerCase();
+    const key = shortcutKey(event);
     if (!isOwn || !(event.ctrlKey || event.metaKey) || (key !== "z" && key !== "y")) {
       return;
     }

@@ -30,6 +30,11 @@ export function mergeArrow(label: string): HTMLElement {
   return arrow;
 }
 
+/** The key of a shortcut, in lower case: of a letter that is not Latin, the Latin one that its key has elsewhere. */
+export function shortcutKey({ key, code }: KeyboardEvent): string {
+  return (/^[^\x00-\x7f]$/.test(key) ? code.replace(/^Key/, "") : key).toLowerCase();
+}
+
 /** A button that calls `pressed`. */
 export function button(label: string, pressed: () => void, properties: { [key: string]: unknown } = {}) {
   const made = element("button", { type: "button", ...properties }, label);

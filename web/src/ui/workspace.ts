@@ -6,7 +6,7 @@ import { type Settings, fragmentOf } from "../connection/settings.js";
 import { FileTree } from "../files/tree.js";
 import type { Draft, Drafts } from "../save/drafts.js";
 import { ask } from "./dialog.js";
-import { button, element } from "./dom.js";
+import { button, element, shortcutKey } from "./dom.js";
 import type { Messages } from "./messages.js";
 import { OpenDocument, type Surroundings } from "./open_document.js";
 import { StateLine } from "./state_line.js";
@@ -242,7 +242,7 @@ export class Workspace {
 
   #key(event: KeyboardEvent): void {
     const isCommand = (event.ctrlKey || event.metaKey) && !event.altKey && !event.shiftKey;
-    const key = event.key.toLowerCase();
+    const key = shortcutKey(event);
     if (isCommand && key === "s") {
       void this.#active?.save();
     } else if (isCommand && key === "p") {
