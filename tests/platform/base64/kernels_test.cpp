@@ -74,6 +74,23 @@ TEST_P(Base64KernelsTest, StopsBeforeTheGroupOfAnyCharacterOutsideTheAlphabet) {
     }
 }
 
+TEST_P(Base64KernelsTest, StopsBeforeAGroupOfNothingButACharacterOutsideTheAlphabet) {
+    constexpr std::size_t groups = 40;
+    const std::string text = plainlyEncoded(randomGroups(groups));
+    for (int c = 0; c < 256; ++c) {
+        if (alphabet.find(static_cast<char>(c)) != std::string_view::npos) {
+            continue;
+        }
+        for (std::size_t group = 0; group < groups; ++group) {
+            std::string changed = text;
+            changed.replace(group * charactersPerGroup, charactersPerGroup, charactersPerGroup,
+                            static_cast<char>(c));
+            char* const decoded = target.end - groups * bytesPerGroup;
+            ASSERT_EQ(kernels.decode(source.place(changed, 0).data(), groups, decoded), group) << c;
+        }
+    }
+}
+
 INSTANTIATE_TEST_SUITE_P(Base64, Base64KernelsTest,
                          testing::ValuesIn(runnableKernels().begin(), runnableKernels().end()),
                          [](const auto& kernels) { return std::string(kernels.param->name); });
