@@ -128,3 +128,19 @@ function(project_test name)
                                   # Earlier versions must not be kept among the user's own.
                                   ENVIRONMENT "XDG_STATE_HOME=${PROJECT_BINARY_DIR}/Testing/state")
 endfunction()
+
+# project_test_program(<variable> <target>)
+#
+# Sets the variable to the path under which tests start the program: its own, or that of a script which runs it in the
+# emulator, since the kernel starts no programs for another processor.
+function(project_test_program variable target)
+  set(path "$<TARGET_FILE:${target}>")
+  if(CMAKE_CROSSCOMPILING_EMULATOR)
+    set(path "${PROJECT_BINARY_DIR}/emulated/${target}")
+    list(JOIN CMAKE_CROSSCOMPILING_EMULATOR "' '" emulator)
+    file(GENERATE OUTPUT "${path}"
+      CONTENT "#!/bin/sh\nexec '${emulator}' '$<TARGET_FILE:${target}>' \"$@\"\n"
+      FILE_PERMISSIONS OWNER_READ OWNER_WRITE OWNER_EXECUTE GROUP_READ GROUP_EXECUTE WORLD_READ WORLD_EXECUTE)
+  endif()
+  set(${variable} "${path}" PARENT_SCOPE)
+endfunction()
