@@ -52,7 +52,17 @@ void DeliveryThreads::close() {
 }
 
 void DeliveryThreads::deliver(State& state) {
-    while (std::optional<QueuedMessage> queued = state.source->next()) {
+    for (;;) {
+        std::optional<QueuedMessage> queued;
+        try {
+            queued = state.source->next();
+        } catch (...) {
+            logLoss();
+            continue;
+        }
+        if (!queued) {
+            return;
+        }
         queued->whileQueued.reset();
         try {
             state.handler(queued->message);

@@ -33,7 +33,8 @@ public:
     virtual ~MessageSource() = default;
 
     /// Waits for the next message; none when there will be no more. Called by several threads at
-    /// once when a subscription has several.
+    /// once when a subscription has several. When it throws, for lack of memory, that message is
+    /// lost, which is logged, and the next one is asked for.
     virtual std::optional<QueuedMessage> next() = 0;
 
     /// Drops what waits, and has `next` return none from now on.

@@ -17,8 +17,20 @@ std::shared_ptr<spdlog::logger> findOrCreateLogger() {
     return logger ? logger : spdlog::stderr_logger_mt("messaging");
 }
 
-void logError(std::string_view callback, std::string_view channel, std::string_view reason) {
-    logger().error("The {} of channel \"{}\" failed: {}", callback, channel, reason);
+// Calls `log` with the text of the exception that is being handled.
+template <typename Log>
+void withReason(Log log) noexcept {
+    try {
+        try {
+            throw;
+        } catch (const std::exception& exception) {
+            log(exception.what());
+        } catch (...) {
+            log("an exception that is not derived from std::exception");
+        }
+    } catch (...) {
+        // A failure to log must not end the process.
+    }
 }
 
 }  // namespace
@@ -30,17 +42,13 @@ spdlog::logger& logger() {
 }
 
 void logFailure(std::string_view callback, std::string_view channel) noexcept {
-    try {
-        try {
-            throw;
-        } catch (const std::exception& exception) {
-            logError(callback, channel, exception.what());
-        } catch (...) {
-            logError(callback, channel, "an exception that is not derived from std::exception");
-        }
-    } catch (...) {
-        // A failure to log must not end the process.
-    }
+    withReason([&](std::string_view reason) {
+        logger().error("The {} of channel \"{}\" failed: {}", callback, channel, reason);
+    });
+}
+
+void logLoss() noexcept {
+    withReason([](std::string_view reason) { logger().error("A message is lost: {}", reason); });
 }
 
 }  // namespace platform::messaging

@@ -16,4 +16,8 @@ spdlog::logger& logger();
 /// with a message on `channel`. To be called in a catch block.
 void logFailure(std::string_view callback, std::string_view channel) noexcept;
 
+/// Logs the exception that is being handled as the reason why a message was lost on its way to its
+/// handler, or a part of a long one. To be called in a catch block.
+void logLoss() noexcept;
+
 }  // namespace platform::messaging
