@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "host/files/file_service.h"
 
-#include <fcntl.h>
 #include <limits.h>
 #include <spdlog/spdlog.h>
 #include <sys/mman.h>
@@ -18,6 +17,7 @@
 #include <stdexcept>
 #include <string>
 #include <string_view>
+#include <system_error>
 #include <utility>
 #include <vector>
 
@@ -48,18 +48,14 @@ constexpr std::size_t entriesOfAPage = 1000;
 
 // The regular file at `path`; none where there is none.
 FileDescriptor openDocument(const std::string& path) {
-    FileDescriptor file = platform::openWithoutHanging(path, O_RDONLY);
-    struct stat status {};
-    if (!file && errno == ENOENT) {
-        return file;
+    platform::OpenedFile opened = platform::openRegularFile(path);
+    if (opened.error != 0 && opened.error != ENOENT) {
+        throw std::system_error(opened.error, std::generic_category(), "The file cannot be opened");
     }
-    if (!file || ::fstat(file.get(), &status) != 0) {
-        platform::throwSystemError("The file cannot be opened");
-    }
-    if (!S_ISREG(status.st_mode)) {
+    if (opened.error == 0 && !opened.descriptor) {
         throw std::runtime_error("It is not a regular file");
     }
-    return file;
+    return std::move(opened.descriptor);
 }
 
 std::string bytesOf(const FileDescriptor& file) {

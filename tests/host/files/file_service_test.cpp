@@ -8,9 +8,12 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <limits.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <atomic>
+#include <chrono>
 #include <cstddef>
 #include <filesystem>
 #include <memory>
@@ -206,6 +209,26 @@ TEST_F(FileServiceTest, NamesTheCharsetOfAnEarlierVersion) {
               json::parse(R"({"byteOrderMark":false,"charset":"UTF-8","status":true})"));
     EXPECT_EQ(ask("charset", root_ / "a.txt", {{"time", time}}),
               json::parse(R"({"byteOrderMark":true,"charset":"UTF-16BE","status":true})"));
+}
+
+// To be opened once, even for a moment, lets a writer go on, whose text is then lost.
+TEST_F(FileServiceTest, DoesNotOpenAPipe) {
+    const fs::path pipe = root_ / "pipe";
+    ASSERT_EQ(::mkfifo(pipe.c_str(), 0600), 0);
+    std::atomic<bool> hasReader = false;
+    std::thread writer([&] {
+        const platform::FileDescriptor opened(::open(pipe.c_str(), O_WRONLY | O_CLOEXEC));
+        hasReader = true;
+    });
+    for (int i = 0; i < 20; ++i) {
+        for (const char* operation : {"version", "charset"}) {
+            EXPECT_EQ(ask(operation, pipe)["exception"], json::Value("It is not a regular file"));
+        }
+        std::this_thread::sleep_for(std::chrono::milliseconds(5));  // time for the writer to wait
+    }
+    EXPECT_FALSE(hasReader);
+    const platform::FileDescriptor reader(::open(pipe.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+    writer.join();
 }
 
 TEST_F(FileServiceTest, TellsOfTheRestoredFile) {
