@@ -7,37 +7,47 @@ namespace host {
 
 namespace {
 
+struct Collection {
+    std::vector<Publication> publications;
+    std::size_t longest;
+};
+
 // Where the calling thread's publications are collected; null when they go out. The bundle
 // publishes on the thread that calls its handler.
-thread_local std::vector<Publication>* keptBack = nullptr;
+thread_local Collection* keptBack = nullptr;
 
 class KeepingBack {
 public:
-    explicit KeepingBack(std::vector<Publication>& publications)
-        : before_(std::exchange(keptBack, &publications)) {}
+    explicit KeepingBack(Collection& collection) : before_(std::exchange(keptBack, &collection)) {}
     KeepingBack(const KeepingBack&) = delete;
     KeepingBack& operator=(const KeepingBack&) = delete;
     ~KeepingBack() { keptBack = before_; }
 
 private:
-    std::vector<Publication>* const before_;
+    Collection* const before_;
 };
 
 }  // namespace
 
-std::vector<Publication> publicationsOf(const std::function<void()>& work) {
-    std::vector<Publication> publications;
-    const KeepingBack keepingBack(publications);
-    work();
-    return publications;
+std::vector<Publication> publicationsOf(const std::function<void()>& work, std::size_t longest) {
+    Collection collection{{}, longest};
+    {
+        const KeepingBack keepingBack(collection);
+        work();
+    }
+    return std::move(collection.publications);
 }
 
 bool keepBack(const std::string& channel, platform::DataBuffer& payload) {
     if (keptBack == nullptr) {
         return false;
     }
-    keptBack->push_back({channel, std::move(payload)});
+    keptBack->publications.push_back({channel, std::move(payload)});
     return true;
+}
+
+std::optional<std::size_t> longestKeptBack() {
+    return keptBack == nullptr ? std::nullopt : std::optional(keptBack->longest);
 }
 
 }  // namespace host

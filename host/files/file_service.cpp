@@ -58,15 +58,6 @@ FileDescriptor openDocument(const std::string& path) {
     return std::move(opened.descriptor);
 }
 
-std::string bytesOf(const FileDescriptor& file) {
-    struct stat status {};
-    if (::fstat(file.get(), &status) != 0) {
-        platform::throwSystemError("The file cannot be read");
-    }
-    platform::i18n::requireTextLength(static_cast<std::uintmax_t>(status.st_size));
-    return readContent(file.get());
-}
-
 bool hasMark(const std::string& bytes, const std::string& charset) {
     try {
         platform::i18n::codecvt_ustring_to_string converter(charset, true);
@@ -90,8 +81,13 @@ using Roots = std::vector<std::filesystem::path>;
 // One request. Each operation returns the members of its answer beside "status".
 class Request {
 public:
-    Request(json::Object members, MessageService& client, const Guard& guard, const Roots& roots)
-        : members_(std::move(members)), client_(client), guard_(guard), roots_(roots) {}
+    Request(json::Object members, const std::string& answerChannel, MessageService& client,
+            const Guard& guard, const Roots& roots)
+        : members_(std::move(members)),
+          answerChannel_(answerChannel),
+          client_(client),
+          guard_(guard),
+          roots_(roots) {}
 
     std::string answer() {
         const std::string operation = text("operation");
@@ -188,12 +184,24 @@ private:
                              {"filePath", "/proc/self/fd/" + std::to_string(copy.get())}};
         const auto payload =
             std::make_shared<const std::string>(json::serialize(json::Value(std::move(request))));
-        const std::vector<Publication> publications = publicationsOf([&] {
-            (*guard_.read)(JsonMessage(
-                std::make_shared<const std::string>(platform::messaging::readRequestChannel),
-                std::string_view(*payload), payload));
-        });
+        const std::vector<Publication> publications = publicationsOf(
+            [&] {
+                (*guard_.read)(JsonMessage(
+                    std::make_shared<const std::string>(platform::messaging::readRequestChannel),
+                    std::string_view(*payload), payload));
+            },
+            client_.maxPayload(answerChannel_));
         return std::string(publications.at(0).payload.view());
+    }
+
+    std::string bytesOf(const FileDescriptor& file) {
+        struct stat status {};
+        if (::fstat(file.get(), &status) != 0) {
+            platform::throwSystemError("The file cannot be read");
+        }
+        const auto size = static_cast<std::size_t>(status.st_size);
+        platform::i18n::requireTextLength(size);
+        return readContent(file.get());
     }
 
     FileDescriptor earlierVersion() {
@@ -221,6 +229,7 @@ private:
     }
 
     json::Object members_;
+    const std::string& answerChannel_;
     MessageService& client_;
     const Guard& guard_;
     const Roots& roots_;
@@ -237,7 +246,7 @@ void answer(const JsonMessage& message, MessageService& client, const Guard& gua
         platform::messaging::filesResponsePrefix + members["rtcId"].get<std::string>();
     std::string answer;
     try {
-        answer = Request(std::move(members), client, guard, roots).answer();
+        answer = Request(std::move(members), channel, client, guard, roots).answer();
     } catch (const std::exception& error) {
         answer = failure(error.what());
     }

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "host/guard/guarded_client.h"
 
+#include <cstddef>
 #include <exception>
 #include <optional>
 #include <stdexcept>
@@ -95,6 +96,10 @@ public:
     futures::Future<void> publish(const std::string& channel, DataBuffer payload) override {
         return keepBack(channel, payload) ? platform::messaging::resolved([] {})
                                           : next()->publish(channel, std::move(payload));
+    }
+
+    std::size_t maxPayload(const std::string& channel) const override {
+        return longestKeptBack().value_or(next()->maxPayload(channel));
     }
 
 private:

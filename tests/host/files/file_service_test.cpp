@@ -16,6 +16,7 @@
 #include <chrono>
 #include <cstddef>
 #include <filesystem>
+#include <limits>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -25,6 +26,7 @@
 #include <vector>
 
 #include "framework/bundle_runner.h"
+#include "host/bus/forwarding_client.h"
 #include "host/guard/document_version.h"
 #include "host/guard/guarded_client.h"
 #include "host/limits/confinement.h"
@@ -44,6 +46,27 @@ using platform::messaging::JsonMessage;
 using test::readFile;
 using test::writeFile;
 using testing::ElementsAre;
+
+// What clients of the bus are told of its limits.
+struct Limits {
+    std::size_t longestRead = std::numeric_limits<std::size_t>::max();
+    std::size_t longestFileAnswer = std::numeric_limits<std::size_t>::max();
+};
+
+class LimitedClient final : public host::ForwardingClient {
+public:
+    LimitedClient(std::shared_ptr<platform::messaging::MessageService> client, Limits& limits)
+        : ForwardingClient(std::move(client)), limits_(limits) {}
+
+    std::size_t maxPayload(const std::string& channel) const override {
+        return channel.starts_with(platform::messaging::filesResponsePrefix)
+                   ? limits_.longestFileAnswer
+                   : limits_.longestRead;
+    }
+
+private:
+    Limits& limits_;
+};
 
 class FileServiceTest : public testing::Test {
 protected:
@@ -72,11 +95,13 @@ protected:
             test::BundleOnBus<framework::BundleRunner>::Setup{
                 .wrapClient =
                     [this](std::shared_ptr<platform::messaging::MessageService> client) {
-                        return host::savingSafely(std::move(client), guard_);
+                        return host::savingSafely(
+                            std::make_shared<LimitedClient>(std::move(client), limits_), guard_);
                     }},
             SERIALIZATION_BUNDLE);
         service_ = std::make_unique<host::FileService>(
-            bundle_->bus().connect("files").get(), guard_, std::vector<fs::path>{root_, outside_});
+            std::make_shared<LimitedClient>(bundle_->bus().connect("files").get(), limits_), guard_,
+            std::vector<fs::path>{root_, outside_});
     }
 
     // The payload of the last message on a channel that begins like this, after a request.
@@ -116,6 +141,7 @@ protected:
     const fs::path root_ = scratch_ / "root";
     const fs::path outside_ = scratch_ / "outside";
     const fs::path state_ = scratch_ / "state";
+    Limits limits_;
     host::Guard guard_;
     std::mutex mutex_;
     std::vector<std::pair<std::string, std::string>> published_;  // guarded by mutex_
@@ -209,6 +235,23 @@ TEST_F(FileServiceTest, NamesTheCharsetOfAnEarlierVersion) {
               json::parse(R"({"byteOrderMark":false,"charset":"UTF-8","status":true})"));
     EXPECT_EQ(ask("charset", root_ / "a.txt", {{"time", time}}),
               json::parse(R"({"byteOrderMark":true,"charset":"UTF-16BE","status":true})"));
+}
+
+// The answer goes to whoever asked the file service, and may be as long as that one takes it.
+TEST_F(FileServiceTest, HoldsAnEarlierVersionToTheLengthOfItsOwnAnswers) {
+    const std::string text(1000, 'x');
+    write(root_ / "a.txt", text);
+    write(root_ / "a.txt", "new");
+    const json::Value time = versionsOf(root_ / "a.txt")[0].get<json::Object>()["time"];
+    const auto read = [&] {
+        return ask("readVersion", root_ / "a.txt", {{"time", time}, {"contentType", "text/plain"}});
+    };
+    limits_.longestRead = 100;
+    EXPECT_EQ(read()["data"], json::Value(text));
+    limits_.longestFileAnswer = 100;
+    EXPECT_EQ(read()["exception"],
+              json::Value("The document is too large: its message would be longer than the 100 "
+                          "bytes that can be sent"));
 }
 
 // To be opened once, even for a moment, lets a writer go on, whose text is then lost.
