@@ -194,6 +194,7 @@ private:
         return std::string(publications.at(0).payload.view());
     }
 
+    // Finding its charset takes up to three times a text's bytes beside them.
     std::string bytesOf(const FileDescriptor& file) {
         struct stat status {};
         if (::fstat(file.get(), &status) != 0) {
@@ -201,6 +202,7 @@ private:
         }
         const auto size = static_cast<std::size_t>(status.st_size);
         platform::i18n::requireTextLength(size);
+        client_.awaitMemory(4 * size);
         return readContent(file.get());
     }
 

@@ -47,10 +47,11 @@ using test::readFile;
 using test::writeFile;
 using testing::ElementsAre;
 
-// What clients of the bus are told of its limits.
+// What clients of the bus are told of its limits, and what they ask for.
 struct Limits {
     std::size_t longestRead = std::numeric_limits<std::size_t>::max();
     std::size_t longestFileAnswer = std::numeric_limits<std::size_t>::max();
+    std::atomic<std::size_t> awaited = 0;
 };
 
 class LimitedClient final : public host::ForwardingClient {
@@ -63,6 +64,8 @@ public:
                    ? limits_.longestFileAnswer
                    : limits_.longestRead;
     }
+
+    void awaitMemory(std::size_t bytes) override { limits_.awaited += bytes; }
 
 private:
     Limits& limits_;
@@ -252,6 +255,12 @@ TEST_F(FileServiceTest, HoldsAnEarlierVersionToTheLengthOfItsOwnAnswers) {
     EXPECT_EQ(read()["exception"],
               json::Value("The document is too large: its message would be longer than the 100 "
                           "bytes that can be sent"));
+}
+
+TEST_F(FileServiceTest, AsksForTheMemoryThatATextTakesBeforeItFindsItsCharset) {
+    writeFile(root_ / "a.txt", std::string(100'000, 'x'));
+    ask("charset", root_ / "a.txt");
+    EXPECT_GE(limits_.awaited, 100'000U);
 }
 
 // To be opened once, even for a moment, lets a writer go on, whose text is then lost.
