@@ -4,6 +4,7 @@
 #include <fcntl.h>
 #include <spdlog/spdlog.h>
 #include <sys/mman.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -98,6 +99,28 @@ bool holdsTextOf(const WriteRequest& request, int file) {
     }
 }
 
+// Replaces the target by `file`, and calls `keep` for the old one: even when the new one is there
+// but may not be safe on disk, which throws.
+template <typename Keep>
+void commit(AtomicFile& file, Keep keep) {
+    try {
+        file.commit();
+    } catch (const std::system_error&) {
+        if (file.isCommitted()) {
+            keep();
+        }
+        throw;
+    }
+    keep();
+}
+
+bool areOneFile(const FileDescriptor& one, const FileDescriptor& other) {
+    struct stat status {};
+    struct stat otherStatus {};
+    return ::fstat(one.get(), &status) == 0 && ::fstat(other.get(), &otherStatus) == 0 &&
+           status.st_dev == otherStatus.st_dev && status.st_ino == otherStatus.st_ino;
+}
+
 // One save. The document's lock is held while the new file takes its place.
 class Save {
 public:
@@ -171,8 +194,7 @@ private:
             return isRepetition(old.get(), old && haveSameContent(old.get(), file.content()));
         }
         noteVersion(file.content());
-        file.commit();
-        keep(std::move(old));
+        commit(file, [&] { keep(std::move(old)); });
         return true;
     }
 
@@ -227,8 +249,11 @@ private:
         }
         const BundleAnswer answer = askBundle_({});
         existed_ = answer.existed;
+        const FileDescriptor current = openRegular(request_.filePath);
         if (answer.isWritten) {
-            noteVersion(openRegular(request_.filePath).get());
+            noteVersion(current.get());
+        }
+        if (!areOneFile(old, current)) {
             keep(std::move(old));
         }
         return answer.isWritten;
@@ -284,11 +309,16 @@ private:
         }
     }
 
-    void keep(FileDescriptor old) {
-        if (history_ != nullptr && old) {
-            history_->keep(std::move(old), document_);
-        } else {
+    // Nor has a save that is made failed because what it replaced cannot be kept.
+    void keep(FileDescriptor old) noexcept {
+        if (history_ == nullptr || !old) {
             replaced_ = std::move(old);
+            return;
+        }
+        try {
+            history_->keep(std::move(old), document_);
+        } catch (const std::exception& error) {
+            spdlog::warn("{}: no earlier version is kept: {}", document_, error.what());
         }
     }
 
@@ -327,10 +357,11 @@ void Saves::restore(const std::string& path, int version) {
     if (file && file->canStandForTarget()) {
         FileDescriptor old = file->openTarget();
         copyContent(version, file->content());
-        file->commit();
-        if (history_ && old) {
-            history_->keep(std::move(old), document);
-        }
+        commit(*file, [&] {
+            if (history_ && old) {
+                history_->keep(std::move(old), document);
+            }
+        });
         return;
     }
     const InPlaceFile inPlace(path);

@@ -19,6 +19,7 @@
 #include <exception>
 #include <filesystem>
 #include <functional>
+#include <map>
 #include <memory>
 #include <set>
 #include <string>
@@ -28,12 +29,14 @@
 #include "framework/bundle_runner.h"
 #include "host/guard/document_version.h"
 #include "host/guard/guarded_client.h"
+#include "host/guard/history.h"
 #include "host/guard/saves.h"
 #include "json/serialize.h"
 #include "json/value.h"
 #include "platform/messaging/channels.h"
 #include "platform/messaging/message_service.h"
 #include "platform/messaging/transport.h"
+#include "tests/support/failing_malloc.h"
 #include "tests/support/names_in.h"
 #include "tests/support/system_call_supervisor.h"
 #include "tests/support/temporary_directory.h"
@@ -259,8 +262,7 @@ protected:
     const test::TemporaryDirectory state_;
     std::string new_ = std::string(100'000, 'n');
     const std::shared_ptr<DirectService> service_ = std::make_shared<DirectService>();
-    const std::shared_ptr<host::Saves> saves_ =
-        std::make_shared<host::Saves>(state_ / "locks", nullptr);
+    std::shared_ptr<host::Saves> saves_ = std::make_shared<host::Saves>(state_ / "locks", nullptr);
     std::unique_ptr<framework::BundleRunner> bundle_;
     int refused_ = 0;
 };
@@ -305,6 +307,59 @@ TEST_F(GuardedSaveFaults, AnswerTrueToARepetitionOnlyWhenItIsSafeOnDisk) {
     savingPackage("new")();
     new_ = readFile(at("a.txt"));
     failEachSync(savingPackage("new", based));
+}
+
+// The new text is there then, although the answer is false.
+TEST_F(GuardedSaveFaults, KeepWhatWasReplacedWhenTheFolderCannotBeSynced) {
+    const auto history = std::make_shared<host::History>(
+        host::HistoryOptions{state_ / "versions", {folder_.path()}});
+    bundle_.reset();
+    saves_ = std::make_shared<host::Saves>(state_ / "locks", history);
+    bundle_ = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
+    for (const std::string type : {"text/plain", "text/xml"}) {
+        const std::string path = at(type.substr(5));
+        writeFile(path, "old");
+        int syncs = 0;
+        json::Object request{{"contentType", type}};
+        if (type == "text/xml") {
+            request["content"] = packageOf("new");
+        }
+        test::supervise(saving(path, std::move(request)),
+                        [&](int call, int) { return call == SYS_fsync && ++syncs == 2 ? EIO : 0; });
+        EXPECT_EQ(service_->answer, "false");
+        EXPECT_NE(readFile(path), "old");
+        const auto versions = history->versionsOf(host::History::nameOf(path));
+        ASSERT_EQ(versions.size(), 1U) << type;
+        EXPECT_EQ(versions[0].size, 3U);
+    }
+    bundle_.reset();
+}
+
+TEST_F(GuardedSaveFaults, TellTheTruthWhicheverAllocationFails) {
+    const auto history = std::make_shared<host::History>(
+        host::HistoryOptions{state_ / "versions", {folder_.path()}});
+    bundle_.reset();
+    saves_ = std::make_shared<host::Saves>(state_ / "locks", history);
+    bundle_ = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
+    const auto save = saving(at("a.txt"));
+    std::map<std::string, int> answers;
+    for (long failing = 0, allocations = 1; failing < allocations; ++failing) {
+        SCOPED_TRACE("allocation " + std::to_string(failing));
+        writeFile(at("a.txt"), "old");
+        test::failAllocation(failing, test::Failing::one);
+        save();
+        allocations = test::stopFailing();
+        history->waitUntilIdle();
+        ++answers[service_->answer];
+        if (service_->answer == "true") {
+            EXPECT_EQ(readFile(at("a.txt")), new_);
+        } else if (service_->answer == "false") {
+            EXPECT_EQ(readFile(at("a.txt")), "old");
+        }
+    }
+    EXPECT_GT(answers["true"], 0);
+    EXPECT_GT(answers["false"], 0);
+    bundle_.reset();
 }
 
 TEST_F(GuardedSaveFaults, LeaveTheOldTextOrTheNewOneOfAFileWithTwoNames) {
