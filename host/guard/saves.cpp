@@ -124,13 +124,13 @@ bool areOneFile(const FileDescriptor& one, const FileDescriptor& other) {
 // One save. The document's lock is held while the new file takes its place.
 class Save {
 public:
-    Save(const WriteRequest& request, const AskBundle& askBundle, SaveLocks& locks,
-         History* history)
+    Save(const WriteRequest& request, const std::string& document, const AskBundle& askBundle,
+         SaveLocks& locks, History* history)
         : request_(request),
+          document_(document),
           askBundle_(askBundle),
           locks_(locks),
-          history_(history),
-          document_(History::nameOf(request.filePath)) {}
+          history_(history) {}
 
     SaveResult make() {
         std::error_code ignored;
@@ -323,10 +323,10 @@ private:
     }
 
     const WriteRequest& request_;
+    const std::string& document_;
     const AskBundle& askBundle_;
     SaveLocks& locks_;
     History* const history_;
-    const std::string document_;
     bool existed_ = false;
     std::string version_;
     FileDescriptor replaced_;
@@ -338,8 +338,9 @@ Saves::Saves(const std::filesystem::path& lockFile, std::shared_ptr<History> his
     : locks_(lockFile), history_(std::move(history)) {}
 
 SaveResult Saves::save(const WriteRequest& request, const AskBundle& askBundle) {
-    SaveResult result = Save(request, askBundle, locks_, history_.get()).make();
-    leftovers_.removeBeside(request.filePath);
+    const std::string document = History::nameOf(request.filePath);
+    SaveResult result = Save(request, document, askBundle, locks_, history_.get()).make();
+    leftovers_.removeBeside(document);
     return result;
 }
 

@@ -428,6 +428,17 @@ TEST_F(GuardedBundle, RemovesWhatKilledSavesLeftADayAgo) {
                 ElementsAre(".~saving-0123456789abcdee.tmp", ".~saving-notes.tmp", "a.txt"));
 }
 
+TEST_F(GuardedBundle, RemovesThemWhereALinkLeads) {
+    fs::create_directory(at("inner"));
+    const std::string old = at("inner/.~saving-0123456789abcdef.tmp");
+    writeFile(old, "x");
+    fs::last_write_time(old, fs::file_time_type::clock::now() - std::chrono::hours(25));
+    writeFile(at("inner/a.txt"), "old");
+    fs::create_symlink("inner/a.txt", at("link"));
+    write(at("link"), "new");
+    EXPECT_THAT(test::namesIn(at("inner")), ElementsAre("a.txt"));
+}
+
 // A large folder takes long to list, so not every save in it does.
 TEST_F(GuardedBundle, LooksForWhatKilledSavesLeftNotWithEverySave) {
     write(at("a.txt"), "x");
