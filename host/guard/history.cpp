@@ -13,6 +13,7 @@
 #include <charconv>
 #include <exception>
 #include <future>
+#include <limits>
 #include <memory>
 #include <optional>
 #include <stdexcept>
@@ -354,7 +355,9 @@ void History::keepToShare(const fs::path& root, std::uint64_t added) {
         platform::throwSystemError(root.c_str());
     }
     const auto size = static_cast<double>(system.f_blocks) * static_cast<double>(system.f_frsize);
-    usage.most = static_cast<std::uint64_t>(size * options_.share);
+    // A file system that does not tell its size says that it has no blocks.
+    usage.most = system.f_blocks == 0 ? std::numeric_limits<std::uint64_t>::max()
+                                      : static_cast<std::uint64_t>(size * options_.share);
     usage.counted = time;
     usage.bytes = removeOldest(root, usage.most);
 }

@@ -102,6 +102,19 @@ TEST_F(HistoryTest, TakesNoMoreThanItsShareOfTheDiskAndRemovesTheOldestFirst) {
     ::umount2(root_.path().c_str(), MNT_DETACH);
 }
 
+// A tmpfs without a limit, and some file systems of networks, say that they have no blocks.
+TEST_F(HistoryTest, KeepsVersionsOfDocumentsOnAFileSystemThatDoesNotTellItsSize) {
+    if (::mount("tmpfs", root_.path().c_str(), "tmpfs", 0, "size=0,mode=700") != 0) {
+        GTEST_SKIP() << "this user may not mount a file system";
+    }
+    {
+        History history({scratch_ / "versions", {root_.path()}});
+        history.keep(fileOf("old"), document("a.txt"));
+        EXPECT_EQ(history.versionsOf(document("a.txt")).size(), 1U);
+    }
+    ::umount2(root_.path().c_str(), MNT_DETACH);
+}
+
 TEST_F(HistoryTest, LeavesTheVersionsOfOneRootWhateverIsKeptOfAnother) {
     const TemporaryDirectory other;
     if (::mount("tmpfs", root_.path().c_str(), "tmpfs", 0, "size=1000k,mode=700") != 0) {
