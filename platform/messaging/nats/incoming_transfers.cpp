@@ -31,18 +31,30 @@ Notes IncomingTransfers::offer(const std::string& channel, const ReturnAddress& 
     if (isFull(user)) {
         return {stopNote(address, "too many offers wait")};
     }
-    Transfer& transfer = transfers_[address.id];
+    Transfer transfer;
     transfer.channel = channel;
     transfer.address = address;
     transfer.length = static_cast<std::size_t>(length);
-    ++offersOf_[user];
+    std::size_t& offers = offersOf_[user];
+    const Position added = transfers_.emplace(address.id, std::move(transfer)).first;
+    ++offers;
+    try {
+        startOrQueue(added, user, now);
+    } catch (...) {  // there is no memory: it is neither started nor queued
+        transfers_.erase(added);
+        --offers;
+        throw;
+    }
+    return {tellRoom(added->second, now)};
+}
+
+void IncomingTransfers::startOrQueue(Position offered, const std::string& user, Time now) {
     const auto queue = waiting_.find(user);
     if (queue != waiting_.end()) {
-        queue->second.ids.push_back(address.id);
-    } else if (mostOvertaken(now) != waiting_.end() || !start(transfer, now)) {
-        waiting_.emplace(user, Queue{{address.id}, now});
+        queue->second.ids.push_back(offered->first);
+    } else if (mostOvertaken(now) != waiting_.end() || !start(offered->second, now)) {
+        waiting_.emplace(user, Queue{{offered->first}, now});
     }
-    return {tellRoom(transfer, now)};
 }
 
 IncomingTransfers::Progress IncomingTransfers::piece(const std::string& id, std::uint64_t offset,
@@ -98,8 +110,8 @@ Notes IncomingTransfers::admitWaiting(Time now) {
         if (!start(transfer, now)) {
             return notes;
         }
-        notes.push_back(tellRoom(transfer, now));
         leave(first, first->second.ids.begin(), now);
+        notes.push_back(tellRoom(transfer, now));
     }
     std::size_t refused = 0;
     while (refused < waiting_.size()) {
@@ -120,8 +132,9 @@ bool IncomingTransfers::admitOneOf(Queues::iterator queue, Notes& notes, Time no
     if (first == ids.end()) {
         return false;
     }
-    notes.push_back(tellRoom(transfers_.at(*first), now));
+    Transfer& started = transfers_.at(*first);
     leave(queue, first, now);
+    notes.push_back(tellRoom(started, now));
     return true;
 }
 

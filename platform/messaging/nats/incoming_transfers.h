@@ -114,6 +114,7 @@ private:
     using Queues = std::map<std::string, Queue>;
 
     bool isFull(const std::string& user) const;
+    void startOrQueue(Position offered, const std::string& user, Time now);
     bool start(Transfer& transfer, Time now);
     bool admitOneOf(Queues::iterator queue, Notes& notes, Time now);
     Queues::iterator mostOvertaken(Time now);

@@ -271,14 +271,25 @@ void LongMessages::runTimer() {
             lock, [this] { return closed_ || incoming_.count() > 0 || outgoing_.count() > 0; });
         timerWakes_.wait_for(lock, tickInterval, [this] { return closed_ || hasRoom_.load(); });
         hasRoom_ = false;
-        const Time now = std::chrono::steady_clock::now();
-        Notes notes = incoming_.tick(now);
-        std::ranges::move(outgoing_.tick(now), std::back_inserter(notes));
+        const Notes notes = tick();
         lock.unlock();
         changed_.notify_all();  // drain may wait for it
         sendAll(notes);
         lock.lock();
     }
+}
+
+// With the mutex held. What there is no memory to say is not said; the clients ask again.
+Notes LongMessages::tick() noexcept {
+    Notes notes;
+    try {
+        const Time now = std::chrono::steady_clock::now();
+        notes = incoming_.tick(now);
+        std::ranges::move(outgoing_.tick(now), std::back_inserter(notes));
+    } catch (...) {
+        logLoss();
+    }
+    return notes;
 }
 
 // Where a client wants its answer; none unless that is below its request channel's answer prefix,

@@ -87,6 +87,7 @@ private:
     class WholeRequests;
 
     void runTimer();
+    Notes tick() noexcept;
     std::optional<ReturnAddress> addressOf(const std::string& channel, natsMsg* received) const;
     std::shared_ptr<const void> expectAnswer(const ReturnAddress& address);
     void sendAll(const Notes& notes);

@@ -31,8 +31,9 @@ Notes OutgoingTransfers::answer(const ReturnAddress& address, DataBuffer payload
                      nullptr});
     const auto kept =
         std::make_shared<const KeptAnswer>(KeptAnswer{std::move(payload), std::move(reservation)});
+    std::size_t& held = bytesOf_[address.user()];
     transfers_.emplace(address.id, Transfer{address, kept->payload.view(), kept, 0, 0, now});
-    bytesOf_[address.user()] += kept->payload.length();
+    held += kept->payload.length();
     return notes;
 }
 
