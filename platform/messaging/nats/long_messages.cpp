@@ -54,6 +54,35 @@ Reserve reserveFrom(MemoryBudget& budget) {
 
 }  // namespace
 
+// While it lives, answers on a channel may go in pieces.
+class LongMessages::Expectation {
+public:
+    explicit Expectation(std::weak_ptr<LongMessages> all) : all_(std::move(all)) {}
+    Expectation(const Expectation&) = delete;
+    Expectation& operator=(const Expectation&) = delete;
+
+    // Takes the mutex.
+    ~Expectation() {
+        const auto alive = place_ ? all_.lock() : nullptr;
+        if (alive) {
+            {
+                const std::lock_guard lock(alive->mutex_);
+                alive->expected_.erase(*place_);
+            }
+            alive->changed_.notify_all();
+        }
+    }
+
+    // Must be called once, with the mutex of `all` held.
+    void begin(LongMessages& all, const ReturnAddress& address) {
+        place_ = all.expected_.emplace(address.channel, address);
+    }
+
+private:
+    const std::weak_ptr<LongMessages> all_;
+    std::optional<std::multimap<std::string, ReturnAddress>::iterator> place_;
+};
+
 // The requests on one channel that came in pieces.
 class LongMessages::WholeRequests final : public MessageSource {
 public:
@@ -61,22 +90,28 @@ public:
         : all_(std::move(all)), channel_(std::make_shared<const std::string>(channel)) {}
 
     std::optional<QueuedMessage> next() override {
-        std::optional<WholeRequest> request = nextRequest();
-        if (!request) {
+        struct Owner {
+            explicit Owner(const std::shared_ptr<LongMessages>& all) : expectation(all) {}
+
+            Expectation expectation;
+            std::shared_ptr<const DataBuffer> payload;
+        };
+        const auto owner = std::make_shared<Owner>(all_);
+        std::unique_lock lock(all_->mutex_);
+        std::deque<WholeRequest>& waiting = all_->whole_[*channel_];
+        all_->changed_.wait(lock, [&] { return ended_ || !waiting.empty(); });
+        if (ended_) {
             return std::nullopt;
         }
-        struct Owner {
-            std::shared_ptr<const DataBuffer> payload;
-            std::shared_ptr<const void> expectation;
-        };
-        const std::string_view payload = request->payload->view();
-        auto owner = std::make_shared<Owner>();
-        owner->payload = std::move(request->payload);
-        owner->expectation = all_->expectAnswer(request->address);
+        // Under one lock, so that drain finds the request waiting or its answer expected.
+        WholeRequest request = std::move(waiting.front());
+        waiting.pop_front();
+        owner->expectation.begin(*all_, request.address);
+        owner->payload = std::move(request.payload);
         // The reservation ends with the waiting: the handler reserves the request's memory together
         // with what else it needs.
-        return QueuedMessage{JsonMessage(channel_, payload, std::move(owner)),
-                             std::move(request->reservation), nullptr};
+        return QueuedMessage{JsonMessage(channel_, owner->payload->view(), owner),
+                             std::move(request.reservation), nullptr};
     }
 
     void end() override {
@@ -88,18 +123,6 @@ public:
     }
 
 private:
-    std::optional<WholeRequest> nextRequest() {
-        std::unique_lock lock(all_->mutex_);
-        std::deque<WholeRequest>& waiting = all_->whole_[*channel_];
-        all_->changed_.wait(lock, [&] { return ended_ || !waiting.empty(); });
-        if (ended_) {
-            return std::nullopt;
-        }
-        std::optional<WholeRequest> request(std::move(waiting.front()));
-        waiting.pop_front();
-        return request;
-    }
-
     const std::shared_ptr<LongMessages> all_;
     const std::shared_ptr<const std::string> channel_;
     bool ended_ = false;  // guarded by the mutex of all
@@ -314,17 +337,10 @@ std::optional<ReturnAddress> LongMessages::addressOf(const std::string& channel,
 
 // While the result lives, answers on the channel may go in pieces.
 std::shared_ptr<const void> LongMessages::expectAnswer(const ReturnAddress& address) {
+    auto expectation = std::make_shared<Expectation>(weak_from_this());
     const std::lock_guard lock(mutex_);
-    const auto position = expected_.emplace(address.channel, address);
-    return {this, [all = weak_from_this(), position](const void*) {
-                if (const auto alive = all.lock()) {
-                    {
-                        const std::lock_guard lockAgain(alive->mutex_);
-                        alive->expected_.erase(position);
-                    }
-                    alive->changed_.notify_all();
-                }
-            }};
+    expectation->begin(*this, address);
+    return expectation;
 }
 
 void LongMessages::sendAll(const Notes& notes) {

@@ -84,6 +84,7 @@ public:
     void close();
 
 private:
+    class Expectation;
     class WholeRequests;
 
     void runTimer();
