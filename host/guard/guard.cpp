@@ -36,13 +36,15 @@ void prepare(const fs::path& folder, const std::vector<fs::path>& roots) {
     if (folder.empty()) {
         throw std::runtime_error("there is no folder for them");
     }
-    fs::create_directories(folder);
-    fs::permissions(folder, fs::perms::owner_all);
     for (const fs::path& root : roots) {
         if (History::isBelow(History::nameOf(folder), History::nameOf(root))) {
             throw std::runtime_error(folder.string() + " is in the folder " + root.string() +
                                      ", which clients may use");
         }
+    }
+    // A folder that was there may be used by others, too. What is made in it is private.
+    if (fs::create_directories(folder)) {
+        fs::permissions(folder, fs::perms::owner_all);
     }
 }
 
