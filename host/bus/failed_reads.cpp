@@ -71,15 +71,16 @@ public:
     }
 
     futures::Future<void> publish(const std::string& channel, DataBuffer payload) override {
-        try {
-            next()->publish(channel, std::move(payload)).get();
-        } catch (const std::exception& error) {
-            if (channel.starts_with(platform::messaging::readResponsePrefix)) {
-                publishFailure(*next(), channel, error.what());  // what it throws is not lost
+        return platform::messaging::resolved([&] {
+            try {
+                next()->publish(channel, std::move(payload)).get();
+            } catch (const std::exception& error) {
+                if (channel.starts_with(platform::messaging::readResponsePrefix)) {
+                    publishFailure(*next(), channel, error.what());
+                }
+                throw;
             }
-            return platform::messaging::resolved([] { throw; });
-        }
-        return platform::messaging::resolved([] {});
+        });
     }
 };
 
