@@ -111,8 +111,7 @@ int main(int argc, char** argv) {
         const platform::FileDescriptor output = host::divertStandardOutput();
         return runCommandLine(argc, argv, output.get());
     } catch (const host::ReaderGone&) {
-        return host::exitRequestFailed;  // A reader that has seen enough, as head has, need not be
-                                         // told.
+        return host::exitRequestFailed;  // not told to a reader that has seen enough, such as head
     } catch (const std::exception& error) {
         std::cerr << host::programName << ": " << host::asLine(error.what()) << '\n';
         return host::exitRequestFailed;

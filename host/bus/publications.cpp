@@ -7,21 +7,23 @@ namespace host {
 
 namespace {
 
-struct Collection {
-    std::vector<Publication> publications;
-    std::size_t longest;
-};
+class Collection;
 
 // Where the calling thread's publications are collected; null when they go out. The bundle
 // publishes on the thread that calls its handler.
 thread_local Collection* keptBack = nullptr;
 
-class KeepingBack {
+// Collects what this thread publishes while it lives.
+class Collection {
 public:
-    explicit KeepingBack(Collection& collection) : before_(std::exchange(keptBack, &collection)) {}
-    KeepingBack(const KeepingBack&) = delete;
-    KeepingBack& operator=(const KeepingBack&) = delete;
-    ~KeepingBack() { keptBack = before_; }
+    explicit Collection(std::size_t longestPayload)
+        : longest(longestPayload), before_(std::exchange(keptBack, this)) {}
+    Collection(const Collection&) = delete;
+    Collection& operator=(const Collection&) = delete;
+    ~Collection() { keptBack = before_; }
+
+    const std::size_t longest;
+    std::vector<Publication> publications;
 
 private:
     Collection* const before_;
@@ -30,11 +32,8 @@ private:
 }  // namespace
 
 std::vector<Publication> publicationsOf(const std::function<void()>& work, std::size_t longest) {
-    Collection collection{{}, longest};
-    {
-        const KeepingBack keepingBack(collection);
-        work();
-    }
+    Collection collection(longest);
+    work();
     return std::move(collection.publications);
 }
 

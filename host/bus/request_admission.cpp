@@ -170,11 +170,9 @@ private:
         metrics_->refuse(*kind_);
         if (*kind_ == RequestKind::read) {
             answerFailedRead(*client_, message.payload(), reason);
-        } else {
-            if (const auto rtcId = json::findString(message.payload(), "rtcId")) {
-                client_->publish(platform::messaging::writeResponsePrefix + *rtcId,
-                                 DataBuffer::copyOf("false"));
-            }
+        } else if (const auto rtcId = json::findString(message.payload(), "rtcId")) {
+            client_->publish(platform::messaging::writeResponsePrefix + *rtcId,
+                             DataBuffer::copyOf("false"));
         }
     }
 

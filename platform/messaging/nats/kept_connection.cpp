@@ -307,8 +307,8 @@ void KeptConnection::onReconnected(const std::string& server) {
 }
 
 void KeptConnection::onClosed(const std::string& reason) {
-    // With the lock held, as isStopping does: the keeper has seen that it is closed, or is waiting
-    // by now.
+    // isStopping locks the mutex, so by now the keeper either has seen that the connection is
+    // closed, or waits and is woken.
     if (!isStopping()) {
         logger().warn("NATS has ended the connection: {}.", reason);
     }

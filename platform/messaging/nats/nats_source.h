@@ -51,7 +51,7 @@ public:
     /// theirs. Returns false when `deadline` comes first.
     bool waitUntilDrained(std::chrono::steady_clock::time_point deadline);
 
-    /// What waits of the connection that stands, and was dropped of it.
+    /// What waits, and what was dropped, since the present connection was made.
     NatsBacklog backlog();
 
     /// Logs that messages were dropped when `subscription` is this source's; returns whether it is.
@@ -76,7 +76,7 @@ private:
     SubscriptionHandle subscription_;  // none between connections and after the end
     bool finishing_ = false;           // no other subscription will come
     std::size_t finishedThreads_ = 0;
-    std::int64_t loggedDrops_ = 0;  // of the subscription that stands
+    std::int64_t loggedDrops_ = 0;  // of the present subscription
     std::chrono::steady_clock::time_point lastDropLog_;
 };
 

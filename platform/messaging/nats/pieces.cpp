@@ -7,17 +7,17 @@
 namespace platform::messaging::nats {
 namespace {
 
-struct Vocable {
+struct Form {
     std::string_view name;
     ClientWord::Kind kind;
     bool hasNumber;
 };
 
-constexpr std::array<Vocable, 5> vocabulary{{{"yes", ClientWord::Kind::yes, false},
-                                             {"offer", ClientWord::Kind::offer, true},
-                                             {"piece", ClientWord::Kind::piece, true},
-                                             {"room", ClientWord::Kind::room, true},
-                                             {"stop", ClientWord::Kind::stop, false}}};
+constexpr std::array<Form, 5> forms{{{"yes", ClientWord::Kind::yes, false},
+                                     {"offer", ClientWord::Kind::offer, true},
+                                     {"piece", ClientWord::Kind::piece, true},
+                                     {"room", ClientWord::Kind::room, true},
+                                     {"stop", ClientWord::Kind::stop, false}}};
 
 std::optional<std::uint64_t> parseNumber(std::string_view text) {
     std::uint64_t number = 0;
@@ -33,15 +33,15 @@ std::optional<std::uint64_t> parseNumber(std::string_view text) {
 std::optional<ClientWord> parseClientWord(std::string_view header) {
     const std::size_t blank = header.find(' ');
     const std::string_view name = header.substr(0, blank);
-    for (const Vocable& vocable : vocabulary) {
-        if (vocable.name != name || vocable.hasNumber != (blank != std::string_view::npos)) {
+    for (const Form& form : forms) {
+        if (form.name != name || form.hasNumber != (blank != std::string_view::npos)) {
             continue;
         }
-        if (!vocable.hasNumber) {
-            return ClientWord{vocable.kind};
+        if (!form.hasNumber) {
+            return ClientWord{form.kind};
         }
         const std::optional<std::uint64_t> number = parseNumber(header.substr(blank + 1));
-        return number ? std::optional(ClientWord{vocable.kind, *number}) : std::nullopt;
+        return number ? std::optional(ClientWord{form.kind, *number}) : std::nullopt;
     }
     return std::nullopt;
 }
