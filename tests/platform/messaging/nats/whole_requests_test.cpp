@@ -26,10 +26,10 @@ ReceivedMessage message(const std::string& subject, const std::string& word,
     return ReceivedMessage(made);
 }
 
-// Most of these many rounds ask at the moment at which the request goes over to its handler.
+// Some of these rounds ask at the moment at which the request goes over to its handler.
 TEST(WholeRequests, AreWaitedForUntilTheyHaveBeenHandled) {
     ASSERT_EQ(nats_Open(-1), NATS_OK);
-    for (int round = 0; round < 3000; ++round) {
+    for (int round = 0; round < 1000; ++round) {
         LongMessageOptions options;
         options.answerPrefixes = {{"/ask", "/answer/"}};
         const auto all = std::make_shared<LongMessages>(options, [](const Note&) {});
