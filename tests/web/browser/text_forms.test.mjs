@@ -218,3 +218,35 @@ browserTest("two texts are put together beside each other", async (t) => {
   await page.locator(".tab.active .unsaved").waitFor({ state: "detached" });
   assert.equal(session.read("list.txt").toString(), "theirs\none\ntwo\nthree\nmine\n");
 });
+
+browserTest("a charset whose table cannot be loaded is not the one that a text is saved in", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" }, { expectedProblems: [/ERR_FAILED/] });
+  const { page } = session;
+  await session.context.route("**/charsets/koi8-r.bin", (route) => route.abort());
+  await open(session, "a.txt");
+  await charset(page).selectOption("KOI8-R");
+  await choose(page, "Save in KOI8-R");
+  await page.getByRole("alert").getByText(/Failed to fetch/).waitFor();
+  assert.equal(await shown(charset(page)), "UTF-8");
+});
+
+browserTest("a text is not edited before its unsaved changes are in it again", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page } = session;
+  await open(session, "a.txt");
+  await charset(page).selectOption("KOI8-R");
+  await choose(page, "Save in KOI8-R");
+  await typeAtTheEnd(page, "two");
+  await session.waitForDraft(page, "two");
+  let release;
+  const released = new Promise((resolve) => (release = resolve));
+  await session.context.route("**/charsets/koi8-r.bin", (route) => released.then(() => route.continue()));
+  const asked = page.waitForRequest("**/charsets/koi8-r.bin");
+  await page.reload();
+  await asked;
+  await page.waitForTimeout(300); // in which the text would be shown
+  assert.equal(await editor(page).count(), 0);
+  release();
+  await editor(page).getByText("two").waitFor();
+  assert.equal(await shown(charset(page)), "KOI8-R");
+});

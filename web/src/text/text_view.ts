@@ -134,20 +134,24 @@ export class TextView implements DocumentView {
     const place = this.#view && placeIn(this.#view);
     this.element.replaceChildren(element("p", { className: "waiting", role: "status" }, this.page.text("text.loading")));
     try {
-      const source = this.#draft ? await this.#sourceOfDraft(this.#draft) : await this.#sourceOf(loaded);
+      const draft = this.#draft;
+      const source = draft ? await this.#sourceOfDraft(draft) : await this.#sourceOf(loaded);
+      const draftCharset = draft && (await this.charsets.open(draft.charset));
       if (this.#isClosed || loaded !== this.loaded) {
         return;
       }
-      if (!source) {
-        const charset = this.#draft?.baseCharset ?? loaded.readAs ?? loaded.charset ?? "UTF-8";
+      if (!source || (draft && !draftCharset)) {
+        const charset = (source ? draft?.charset : draft?.baseCharset) ?? loaded.readAs ?? loaded.charset ?? "UTF-8";
         this.#refuse(this.page.text("text.unknownCharset", { charset }));
         return;
       }
       this.#edit(source, place);
-      await this.#applyDraft();
+      if (draft && draftCharset) {
+        this.#applyDraft(draft, draftCharset);
+      }
       this.#status.offer([...(await this.charsets.names()), ...ESCAPED], this.#view!.state);
     } catch (error) {
-      this.#refuse(this.page.text("text.failed", { reason: error instanceof Error ? error.message : String(error) }));
+      this.#refuse(this.page.text("text.failed", { reason: reasonText(error) }));
     }
   }
 
@@ -213,12 +217,7 @@ export class TextView implements DocumentView {
     }
   }
 
-  async #applyDraft(): Promise<void> {
-    const draft = this.#draft;
-    const charset = draft && (await this.charsets.open(draft.charset));
-    if (!draft || !charset) {
-      return;
-    }
+  #applyDraft(draft: TextDraft, charset: Charset): void {
     this.#withoutTelling(() =>
       this.#view!.dispatch({
         changes: ChangeSet.fromJSON(draft.changes),
@@ -278,8 +277,11 @@ export class TextView implements DocumentView {
   }
 
   async #saveIn(name: string): Promise<void> {
-    const charset = await this.charsets.open(name);
-    this.#setForm({ charset: charset! });
+    try {
+      this.#setForm({ charset: (await this.charsets.open(name))! });
+    } catch (error) {
+      this.page.tell(this.page.text("text.charset.failed", { charset: name, reason: reasonText(error) }), "problem");
+    }
   }
 
   async #agreesToUtf8(charset: Charset): Promise<boolean> {
@@ -363,6 +365,10 @@ export class TextView implements DocumentView {
       this.page.text("comparison.take"),
     );
   }
+}
+
+function reasonText(error: unknown): string {
+  return error instanceof Error ? error.message : String(error);
 }
 
 function placeIn(view: EditorView): Place {
