@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The page's start: takes what the address says out of it, connects, and shows the workspace.
+// The page's start: takes the password out of the address, connects, and shows the workspace.
 import { ConnectionFailure, type ConnectionState, openConnection } from "./connection/connection.js";
 import { loginForm } from "./connection/login.js";
 import { type Settings, completeSettings, fragmentOf, readFragment, remember } from "./connection/settings.js";
@@ -16,11 +16,6 @@ import "./images/images.css";
 import "./text/text.css";
 import "./package/package.css";
 
-const address = readFragment(location.hash);
-const known = completeSettings(address, sessionStorage, localStorage);
-// At once, so that the password is not seen, kept or passed on with the address.
-history.replaceState(null, "", location.pathname + location.search + fragmentOf(known, address.file));
-
 const language = preferredLanguage(localStorage.getItem("language"), navigator.languages);
 useLanguage(language);
 document.documentElement.lang = language;
@@ -31,25 +26,52 @@ const stage = element("div", { className: "stage" });
 document.body.append(stage, messages.element);
 document.title = text("page.title");
 let workspace: Workspace | undefined;
+let connected: Settings | undefined;
+let attempts = 0; // to connect; nothing is heard any more of those before the last one
 
-async function start(settings: Settings): Promise<void> {
+// Does what the address says: connects, or shows a document.
+function follow(): void {
+  const address = readFragment(location.hash);
+  const known = completeSettings(address, sessionStorage, localStorage);
+  // At once, so that the password is not seen, kept or passed on with the address.
+  history.replaceState(null, "", location.pathname + location.search + fragmentOf(known, address.file));
+  if (workspace && !address.password && known.server === connected?.server) {
+    if (address.file) {
+      workspace.open(address.file).focus();
+    }
+  } else if (known.server && known.password) {
+    void start({ server: known.server, user: known.user ?? "", password: known.password }, address.file);
+  } else {
+    askToConnect(known, "", address.file);
+  }
+}
+
+async function start(settings: Settings, file?: string): Promise<void> {
+  const attempt = ++attempts;
   stage.replaceChildren(element("p", { className: "waiting", role: "status" }, text("connection.connecting")));
   try {
-    const client = await openConnection(settings, (state) => connectionChanged(state, settings));
+    const client = await openConnection(settings, (state) => attempt === attempts && connectionChanged(state, settings));
+    if (attempt !== attempts) {
+      return void client.close();
+    }
+    connected = settings;
     remember(settings, sessionStorage, localStorage);
     if (workspace) {
       workspace.reconnected(client, settings);
+      if (file) {
+        workspace.open(file);
+      }
     } else {
       const drafts = await Drafts.open(await ownWindow());
       workspace = new Workspace({ client, settings, drafts, messages });
-      workspace.restore(await drafts.take().catch(() => []), address.file); // told when there is one to be stored
+      workspace.restore(await drafts.take().catch(() => []), file); // told when there is one to be stored
     }
     stage.replaceChildren(workspace.element);
   } catch (error) {
     if (!(error instanceof ConnectionFailure)) {
       throw error;
     }
-    askToConnect(settings, text(`connection.${error.state}`, { server: settings.server }));
+    askToConnect(settings, text(`connection.${error.state}`, { server: settings.server }), file);
   }
 }
 
@@ -61,12 +83,10 @@ function connectionChanged(state: ConnectionState, settings: Settings): void {
 }
 
 // What is open stays as it is while this is asked.
-function askToConnect(settings: Partial<Settings>, wrong = ""): void {
-  stage.replaceChildren(loginForm(settings, wrong, (typed) => void start(typed)));
+function askToConnect(settings: Partial<Settings>, wrong = "", file?: string): void {
+  stage.replaceChildren(loginForm(settings, wrong, (typed) => void start(typed, file)));
 }
 
-if (known.server && known.password) {
-  void start({ server: known.server, user: known.user ?? "", password: known.password });
-} else {
-  askToConnect(known);
-}
+follow();
+// The person has entered another address of the page, which does not load it again.
+addEventListener("hashchange", follow);

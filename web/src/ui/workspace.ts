@@ -28,7 +28,6 @@ export class Workspace {
   #active: OpenDocument | undefined;
   #isUpdateWaiting = false;
   #isRestored = false;
-  #stopListening: () => void = () => {};
   #tabs = new Tabs(
     (one) => this.#activate(one),
     (one) => void this.#close(one),
@@ -119,6 +118,7 @@ export class Workspace {
 
   /** Goes on with another connection, in the place of one that has ended. */
   reconnected(client: Client, settings: Settings): void {
+    void this.options.client.close(); // which would go on trying
     this.options = { ...this.options, client, settings };
     this.connection("connected");
     this.#listen();
@@ -131,8 +131,7 @@ export class Workspace {
   }
 
   #listen(): void {
-    this.#stopListening();
-    this.#stopListening = this.options.client.listen(({ filePath }) => {
+    this.options.client.listen(({ filePath }) => {
       this.#tree.changed(filePath);
       void this.#documents.find((one) => one.path === filePath)?.follow();
     });
