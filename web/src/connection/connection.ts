@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // The connection to the server, and what is the matter when there is none.
 import { type Client, connect } from "../../client/src/index.js";
+import { reasonText } from "../ui/text.js";
 import type { Settings } from "./settings.js";
 
 /** "refused": the server does not take the user or the password. "closed": it will not connect again by itself. */
@@ -11,7 +12,7 @@ export class ConnectionFailure extends Error {
     readonly state: "refused" | "unreachable",
     reason: unknown,
   ) {
-    super(reason instanceof Error ? reason.message : String(reason));
+    super(reasonText(reason));
   }
 }
 

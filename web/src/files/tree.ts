@@ -3,7 +3,7 @@
 // down; the focus stays on the tree, which says which row is the active one (WAI-ARIA tree pattern).
 import { type Client, type FolderEntry } from "../../client/src/index.js";
 import { button, element } from "../ui/dom.js";
-import { text } from "../ui/text.js";
+import { reasonText, text } from "../ui/text.js";
 import { TreeModel, type TreeNode } from "./tree_model.js";
 
 const ROW = 26; // pixels, as in files.css
@@ -157,8 +157,7 @@ export class FileTree {
       folder.state = "read";
     } catch (error) {
       folder.state = "failed";
-      const reason = error instanceof Error ? error.message : String(error);
-      this.options.tell(text("files.failed", { path: folder.path, reason }), "problem");
+      this.options.tell(text("files.failed", { path: folder.path, reason: reasonText(error) }), "problem");
     }
     this.#render();
   }

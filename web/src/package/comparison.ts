@@ -41,16 +41,7 @@ export function findDifferences(mine: PackageModel, theirs: Document): Differenc
 }
 
 /** Shows the differences; `use` gets what is chosen, as an edit of mine. */
-export function compareDocuments(
-  mine: PackageModel,
-  theirs: Document,
-  page: Page,
-  use: (chosen: Edit) => void,
-): Comparison {
-  return new PackageComparison(mine, theirs, page, use);
-}
-
-class PackageComparison implements Comparison {
+export class PackageComparison implements Comparison {
   readonly element = element("div", { className: "package-comparison" });
 
   #rows: ComparedPart[];

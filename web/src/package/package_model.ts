@@ -72,6 +72,17 @@ export class PackageModel {
     return this.#parts.get(uri);
   }
 
+  /** The part that the first relationship of the package whose type `matches` leads to. */
+  relatedPart(matches: (type: string) => boolean): Part | undefined {
+    const relationship = this.#relationships.find(({ relationshipType }) => matches(relationshipType));
+    return relationship && this.#parts.get(`/${relationship.target.replace(/^\//, "")}`);
+  }
+
+  /** The part by which a reader begins: the text of a Word document, the workbook of a spreadsheet. */
+  get mainPart(): Part | undefined {
+    return this.relatedPart((type) => type.endsWith("/officeDocument"));
+  }
+
   /** The part as it was read or saved last. */
   originalPart(uri: string): Part | undefined {
     return this.#original.get(uri);

@@ -2,7 +2,7 @@
 // A package in its tab: its text, its parts and its properties, one at a time, and a preview beside them.
 import type { Comparison, DocumentContent, DocumentView, LoadedDocument, Page } from "../document_view.js";
 import { button, element, shortcutKey } from "../ui/dom.js";
-import { compareDocuments } from "./comparison.js";
+import { PackageComparison } from "./comparison.js";
 import { PackageModel, type PackageDraft, documentOf } from "./package_model.js";
 import { kindOf, textOf } from "./part_kinds.js";
 import { decodePart } from "./part_text.js";
@@ -99,7 +99,7 @@ export class PackageView implements DocumentView {
     this.#commit();
     const mine = this.#model;
     const document = documentOf(theirs);
-    return compareDocuments(mine, document, this.page, (chosen) => {
+    return new PackageComparison(mine, document, this.page, (chosen) => {
       if (this.#model !== mine) {
         throw new Error(this.page.text("package.differences.meanwhile"));
       }
@@ -274,8 +274,6 @@ export class PackageView implements DocumentView {
   }
 }
 
-function isWordDocument(model: PackageModel): boolean {
-  const main = model.relationships.find(({ relationshipType }) => relationshipType.endsWith("/officeDocument"));
-  const part = main && model.part(`/${main.target.replace(/^\//, "")}`);
-  return part !== undefined && /wordprocessingml|ms-word/i.test(part.contentType);
+function isWordDocument({ mainPart }: PackageModel): boolean {
+  return mainPart !== undefined && /wordprocessingml|ms-word/i.test(mainPart.contentType);
 }

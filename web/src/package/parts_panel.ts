@@ -35,7 +35,7 @@ export class PartsPanel implements Panel {
     this.#pane.setAttribute("aria-label", page.text("package.part"));
     this.element.append(this.#tree.element, this.#pane);
     this.#stopListening = model.listen((parts, editor) => this.#follow(parts, editor));
-    this.#shown = this.#mainPart();
+    this.#shown = model.mainPart?.partUri ?? PACKAGE;
     this.#tree.select(this.#shown);
   }
 
@@ -73,12 +73,6 @@ export class PartsPanel implements Panel {
     for (const uri of parts) {
       this.#tree.refresh(uri);
     }
-  }
-
-  #mainPart(): string {
-    const main = this.model.relationships.find(({ relationshipType }) => relationshipType.endsWith("/officeDocument"));
-    const uri = main ? `/${main.target.replace(/^\//, "")}` : PACKAGE;
-    return this.model.part(uri) ? uri : PACKAGE;
   }
 
   #follow(parts: ReadonlySet<string>, editor: unknown): void {

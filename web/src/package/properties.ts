@@ -65,10 +65,7 @@ export function propertyEdit(model: PackageModel, name: PropertyName, value: str
 }
 
 function corePart(model: PackageModel): Part | undefined {
-  const relationship = model.relationships.find(({ relationshipType }) =>
-    [RELATIONSHIP_TYPE, STRICT_RELATIONSHIP_TYPE].includes(relationshipType),
-  );
-  return relationship && model.part(`/${relationship.target.replace(/^\//, "")}`);
+  return model.relatedPart((type) => [RELATIONSHIP_TYPE, STRICT_RELATIONSHIP_TYPE].includes(type));
 }
 
 function freeName(model: PackageModel): string {

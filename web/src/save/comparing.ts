@@ -2,7 +2,7 @@
 // A question that is answered while looking at a comparison.
 import type { Comparison, DocumentView, LoadedDocument } from "../document_view.js";
 import { type Question, ask } from "../ui/dialog.js";
-import { text } from "../ui/text.js";
+import { reasonText, text } from "../ui/text.js";
 
 /**
  * Asks `question` beside a comparison of what `view` holds with `theirs`. When the answer is "apply", the view takes
@@ -22,8 +22,8 @@ export async function askComparing(
     }
     return choice;
   } catch (error) {
-    const message = error instanceof Error ? error.message : String(error);
-    await ask({ title: question.title, message, choices: [{ value: "", label: text("action.back"), isDefault: true }] });
+    const { title } = question;
+    await ask({ title, message: reasonText(error), choices: [{ value: "", label: text("action.back"), isDefault: true }] });
     return undefined;
   } finally {
     comparison?.close();

@@ -77,10 +77,10 @@ export class Drafts {
 async function openDatabase(): Promise<IDBDatabase> {
   const opening = indexedDB.open("editor", 1);
   opening.onupgradeneeded = () => opening.result.createObjectStore(STORE, { keyPath: ["window", "path"] });
-  return result(opening);
+  return resultOf(opening);
 }
 
-function result<Result>(request: IDBRequest<Result>): Promise<Result> {
+function resultOf<Result>(request: IDBRequest<Result>): Promise<Result> {
   return new Promise((resolve, reject) => {
     request.onsuccess = () => resolve(request.result);
     request.onerror = () => reject(request.error);

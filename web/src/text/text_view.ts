@@ -7,6 +7,7 @@ import { bytesOf, stringOf } from "../../client/src/index.js";
 import type { Comparison, DocumentContent, DocumentView, LoadedDocument, Page } from "../document_view.js";
 import { nameOf } from "../files/paths.js";
 import { element } from "../ui/dom.js";
+import { reasonText } from "../ui/text.js";
 import { ByteSink, type Charset, type Charsets, type Decoded, ESCAPED } from "./charsets/index.js";
 import { TextComparison } from "./comparison.js";
 import { type TextDraft, formOf, makeDraft } from "./draft.js";
@@ -68,19 +69,24 @@ export class TextView implements DocumentView {
 
   async content(): Promise<DocumentContent | undefined> {
     await this.#ready;
-    if (!this.#view || this.#view.state.readOnly) {
+    const view = this.#view;
+    if (!view || view.state.readOnly) {
       return undefined;
     }
-    const { charset } = fileFormOf(this.#view.state);
+    const { charset } = fileFormOf(view.state);
     if (!charset.canEncode && !(await this.#agreesToUtf8(charset))) {
       return undefined;
     }
-    const encoded = encodeFile(this.#view.state.doc, fileFormOf(this.#view.state));
-    if (encoded.lacking && !(await this.#settles(encoded.lacking))) {
-      return undefined;
+    for (;;) {
+      const form = fileFormOf(view.state);
+      const { bytes, lacking } = encodeFile(view.state.doc, form);
+      if (!lacking) {
+        return { kind: "text", content: stringOf(bytes), encoding: form.charset.name };
+      }
+      if (!(await this.#settles(lacking))) {
+        return undefined;
+      }
     }
-    const { bytes } = encoded.lacking ? encodeFile(this.#view.state.doc, fileFormOf(this.#view.state)) : encoded;
-    return { kind: "text", content: stringOf(bytes), encoding: fileFormOf(this.#view.state).charset.name };
   }
 
   draft(): unknown {
@@ -365,10 +371,6 @@ export class TextView implements DocumentView {
       this.page.text("comparison.take"),
     );
   }
-}
-
-function reasonText(error: unknown): string {
-  return error instanceof Error ? error.message : String(error);
 }
 
 function placeIn(view: EditorView): Place {

@@ -12,7 +12,7 @@ import { SaveRefused, type SaveResult, Saver, type Unsaved } from "../save/saver
 import { browseVersions } from "../save/versions.js";
 import { ask } from "./dialog.js";
 import { button, element } from "./dom.js";
-import { bytesText, currentLanguage, text } from "./text.js";
+import { bytesText, currentLanguage, reasonText, text } from "./text.js";
 
 /** What an open document needs of the page around it. */
 export interface Surroundings {
@@ -426,10 +426,6 @@ export class OpenDocument {
 
 function sizeOf({ kind, content }: DocumentContent): number {
   return kind === "text" ? content.length : content.parts.reduce((sum, part) => sum + part.content.length, 0);
-}
-
-function reasonText(error: unknown): string {
-  return error instanceof Error ? error.message : String(error);
 }
 
 function pause(milliseconds: number, signal: AbortSignal): Promise<void> {

@@ -30,7 +30,8 @@ export class StateLine {
 
   connection(state: ConnectionState): void {
     this.#connection.dataset.state = state;
-    this.#connection.textContent = text(state === "unreachable" || state === "refused" || state === "closed" ? "connection.none" : `connection.${state}`);
+    const isNone = ["unreachable", "refused", "closed"].includes(state);
+    this.#connection.textContent = text(isNone ? "connection.none" : `connection.${state}`);
   }
 
   document(status: string, canCancel: boolean): void {

@@ -40,6 +40,11 @@ export function text(key: string, values: Record<string, string | number> = {}):
   });
 }
 
+/** What an exception says, of whatever kind it is. */
+export function reasonText(error: unknown): string {
+  return error instanceof Error ? error.message : String(error);
+}
+
 /** A number of bytes, for people. */
 export function bytesText(bytes: number): string {
   const units = ["B", "KB", "MB", "GB"];
