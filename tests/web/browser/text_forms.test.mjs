@@ -250,3 +250,25 @@ browserTest("a text is not edited before its unsaved changes are in it again", a
   await editor(page).getByText("two").waitFor();
   assert.equal(await shown(charset(page)), "KOI8-R");
 });
+
+browserTest("a text that could not be shown does not take the place of a later one", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" }, { expectedProblems: [/ERR_FAILED/] });
+  const { page } = session;
+  let fail;
+  const failed = new Promise((resolve) => (fail = resolve));
+  await session.context.route("**/charsets/koi8-r.bin", (route) => failed.then(() => route.abort()));
+  await open(session, "a.txt");
+  const asked = page.waitForRequest("**/charsets/koi8-r.bin");
+  const other = await clientOf(t, session);
+  // "Say more of these soft French loaves" in KOI8-R.
+  const loaves = Buffer.from("d3ddc5dbd820d6c520c5ddc520dcd4c9c820cdd1c7cbc9c820c6d2c1cec3d5dad3cbc9c820c2d5cccfcb0a", "hex");
+  await other.write(session.path("a.txt"), loaves.toString("latin1"), { encoding: "KOI8-R" });
+  await asked;
+  await other.write(session.path("a.txt"), "two\n");
+  await editor(page).getByText("two").waitFor();
+  const lost = page.waitForEvent("requestfailed");
+  fail();
+  await lost;
+  await page.waitForTimeout(200); // in which the text would be taken away
+  assert.match(await editor(page).innerText(), /two/);
+});

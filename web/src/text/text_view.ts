@@ -157,7 +157,9 @@ export class TextView implements DocumentView {
       }
       this.#status.offer([...(await this.charsets.names()), ...ESCAPED], this.#view!.state);
     } catch (error) {
-      this.#refuse(this.page.text("text.failed", { reason: reasonText(error) }));
+      if (loaded === this.loaded) {
+        this.#refuse(this.page.text("text.failed", { reason: reasonText(error) }));
+      }
     }
   }
 
