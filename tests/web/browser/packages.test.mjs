@@ -71,6 +71,21 @@ browserTest("one paragraph's match is replaced alone, and that is undone and don
   assert.match(textIn(await save(session, "report.docx"), "word/header1.xml"), /Annual report, page/);
 });
 
+browserTest("Enter that ends an input method's composition replaces nothing", async (t) => {
+  const session = await open(t, "report.docx", wordFiles());
+  const { page } = session;
+  await page.getByLabel("Find", { exact: true }).fill("Annual report");
+  await page.getByText("2 found").waitFor();
+  const field = page.getByLabel("Replace with");
+  const press = (isComposing) =>
+    field.evaluate((one, event) => one.dispatchEvent(new KeyboardEvent("keydown", event)), { key: "Enter", isComposing });
+  await press(true);
+  await page.waitForTimeout(100); // in which the mark would appear
+  assert.equal(await page.locator(".mark.unsaved").count(), 0);
+  await press(false);
+  await page.locator(".mark.unsaved").waitFor();
+});
+
 browserTest("XML is laid out for reading, and saved without its layout", async (t) => {
   const session = await open(t, "report.docx", wordFiles());
   const { page } = session;

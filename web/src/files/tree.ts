@@ -205,7 +205,7 @@ export class FileTree {
       this.#filterChanged();
     } else if (event.key === "ArrowDown") {
       this.focus();
-    } else if (event.key === "Enter" && this.#active) {
+    } else if (event.key === "Enter" && this.#active && !event.isComposing) {
       this.#act(this.#active);
     } else {
       return;

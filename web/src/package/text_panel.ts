@@ -129,7 +129,7 @@ export class TextPanel implements Panel {
       input.addEventListener("input", () => void this.#search());
     }
     this.#replacement.addEventListener("keydown", (event) => {
-      if (event.key === "Enter") {
+      if (event.key === "Enter" && !event.isComposing) {
         this.#replaceAll.click();
       }
     });
