@@ -35,6 +35,21 @@ browserTest("the address of a host that was started again is followed, with what
   await waitFor("the loss", () => page.locator('[data-state="lost"]').count());
 });
 
+browserTest("a save that is under way goes on when the address of another host is entered", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" }, { expectedProblems: [/WebSocket|ERR_CONNECTION/] });
+  const { page, host } = session;
+  await open(session, "a.txt");
+  await typeAtTheEnd(page, "two");
+  host.signal("SIGSTOP"); // before it could answer
+  await page.keyboard.press("Control+s");
+  await page.locator(".state .document").getByText(/Saving/).waitFor();
+  await host.kill();
+  const again = await Host.start(t, ["--listen", new URL(host.page).host, "--root", session.folder]);
+  await enter(page, again.page);
+  await page.locator(".state .document").getByText(/Saved at/).waitFor();
+  assert.equal(session.read("a.txt").toString(), "one\ntwo");
+});
+
 browserTest("a link that is entered in the place of the page's address shows its document", async (t) => {
   const session = await Session.start(t, { "a.txt": "one\n", "b.txt": "other\n" });
   const { page } = session;

@@ -50,12 +50,14 @@ function transfersOf(nats: NatsConnection): Set<Transfer> {
   }
   const transfers = new Set<Transfer>();
   underWay.set(nats, transfers);
+  const loseAll = () => [...transfers].forEach((transfer) => transfer.lose());
   (async () => {
     for await (const { type } of nats.status()) {
       if (type === "disconnect") {
-        [...transfers].forEach((transfer) => transfer.lose());
+        loseAll();
       }
     }
+    loseAll(); // the connection is closed
   })();
   return transfers;
 }

@@ -290,13 +290,13 @@ export class OpenDocument {
     this.#keeper.changed();
     void this.#keeper.flush(); // so that the draft tells what was sent, however soon the page is gone
     for (;;) {
+      const { client } = this.around;
       try {
-        const { client } = this.around;
         return content.kind === "package"
           ? await client.save(this.path, content.content, options)
           : await client.save(this.path, content.content, { ...options, encoding: content.encoding });
       } catch (error) {
-        if (saving.signal.aborted || !(error instanceof AskAgain || this.around.client.nats.isClosed())) {
+        if (saving.signal.aborted || !(error instanceof AskAgain || client.nats.isClosed())) {
           throw error;
         }
         this.#setStatus(text("save.again"));
