@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <array>
+#include <exception>
 #include <limits>
 #include <mutex>
 #include <string_view>
@@ -58,32 +59,44 @@ std::string lastErrorOf(natsConnection* connection) {
     return status != NATS_OK ? natsStatus_GetText(status) : "the connection was cut";
 }
 
+// What `make` returns. An exception would go through libnats, which is C, and end the process; and
+// that a connection is closed has to be heard of even when there is no memory to say why.
+template <typename Make>
+std::string textOf(Make make) noexcept {
+    try {
+        return make();
+    } catch (const std::exception&) {
+        return "out of memory";  // which needs none itself
+    }
+}
+
 void onDisconnected(natsConnection* connection, void* number) {
     if (const auto events = find(number)) {
-        events->onDisconnected(lastErrorOf(connection));
+        events->onDisconnected(textOf([&] { return lastErrorOf(connection); }));
     }
 }
 
 void onReconnected(natsConnection* connection, void* number) {
     if (const auto events = find(number)) {
-        events->onReconnected(serverOf(connection));
+        events->onReconnected(textOf([&] { return serverOf(connection); }));
     }
 }
 
 void onClosed(natsConnection* connection, void* number) {
     if (const auto events = find(number)) {
-        events->onClosed(lastErrorOf(connection));
+        events->onClosed(textOf([&] { return lastErrorOf(connection); }));
     }
 }
 
 void onError(natsConnection* connection, natsSubscription* subscription, natsStatus status,
              void* number) {
     if (const auto events = find(number)) {
-        const char* text = nats_GetLastError(nullptr);
-        events->onError(
-            status,
-            text != nullptr && *text != '\0' ? text::printable(text) : lastErrorOf(connection),
-            subscription);
+        const std::string reason = textOf([&] {
+            const char* text = nats_GetLastError(nullptr);
+            return text != nullptr && *text != '\0' ? text::printable(text)
+                                                    : lastErrorOf(connection);
+        });
+        events->onError(status, reason, subscription);
     }
 }
 
