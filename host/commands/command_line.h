@@ -3,7 +3,6 @@
 // parser, the texts of --help, the hints at mistakes and the manual (host/manual/) are made.
 #pragma once
 
-#include <CLI/CLI.hpp>
 #include <cstdint>
 #include <filesystem>
 #include <string>
@@ -14,6 +13,12 @@
 #include "host/commands/serve_command.h"
 #include "host/commands/stdio_command.h"
 #include "host/commands/write_command.h"
+
+// The library's header takes a compiler seconds; only what uses the parser includes it.
+namespace CLI {
+class App;
+class ParseError;
+}  // namespace CLI
 
 namespace host {
 

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // What is wrong with a command line, and what was probably meant.
+#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cstddef>
 #include <numeric>

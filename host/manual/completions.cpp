@@ -1,25 +1,26 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <functional>
 #include <set>
+#include <string>
 #include <string_view>
+#include <vector>
 
 #include "host/commands/command_line.h"
-#include "host/manual/described_options.h"
 #include "host/manual/manual.h"
 
 namespace host {
 
 namespace {
 
-using Condition = std::function<bool(const CLI::Option&)>;
+using Condition = std::function<bool(const DescribedOption&)>;
 
 // The names of the options that `condition` holds for, put together with `separator`.
-std::string namesOfAll(const std::vector<const CLI::Option*>& options, const Condition& condition,
+std::string namesOfAll(const std::vector<DescribedOption>& options, const Condition& condition,
                        const std::string& separator) {
     std::set<std::string> unique;
-    for (const CLI::Option* option : options) {
-        if (condition(*option)) {
-            const std::vector<std::string> names = namesOf(*option);
+    for (const DescribedOption& option : options) {
+        if (condition(option)) {
+            const std::vector<std::string> names = option.names();
             unique.insert(names.begin(), names.end());
         }
     }
@@ -30,24 +31,23 @@ std::string namesOfAll(const std::vector<const CLI::Option*>& options, const Con
     return text;
 }
 
-std::string namesOfAll(const CLI::App& app) {
+std::string namesOfAll(const std::vector<DescribedOption>& options) {
     return namesOfAll(
-        optionsOf(app), [](const CLI::Option&) { return true; }, " ");
+        options, [](const DescribedOption&) { return true; }, " ");
 }
 
-std::vector<const CLI::Option*> optionsOfAllCommands(const CLI::App& app) {
-    std::vector<const CLI::Option*> options = optionsOf(app);
-    for (const CLI::App* command : commandsOf(app)) {
-        const std::vector<const CLI::Option*> more = optionsOf(*command);
-        options.insert(options.end(), more.begin(), more.end());
+std::vector<DescribedOption> optionsOfAllCommands(const DescribedProgram& program) {
+    std::vector<DescribedOption> options = program.options;
+    for (const DescribedCommand& command : program.commands) {
+        options.insert(options.end(), command.options.begin(), command.options.end());
     }
     return options;
 }
 
-std::string commandNames(const CLI::App& app, const std::string& separator) {
+std::string commandNames(const DescribedProgram& program, const std::string& separator) {
     std::string text;
-    for (const CLI::App* command : commandsOf(app)) {
-        text += (text.empty() ? "" : separator) + command->get_name();
+    for (const DescribedCommand& command : program.commands) {
+        text += (text.empty() ? "" : separator) + command.name;
     }
     return text;
 }
@@ -66,22 +66,21 @@ std::string escaped(const std::string& text, std::string_view characters,
 }
 
 // One of the arguments of zsh's _arguments: '(-h --help)'{-h,--help}'[Print this help]'.
-std::string zshArgument(const CLI::Option& option) {
-    const std::vector<std::string> names = namesOf(option);
+std::string zshArgument(const DescribedOption& option) {
+    const std::vector<std::string> names = option.names();
     std::string all;
     for (const std::string& name : names) {
         all += (all.empty() ? "" : " ") + name;
     }
     std::string value;
-    if (takesValue(option)) {
-        const char* const completer = takesFolder(option) ? "_files -/"
-                                      : takesFile(option) ? "_files"
-                                                          : " ";
-        value = ":" + option.get_type_name() + ":" + completer;
+    if (option.takesValue()) {
+        const char* const completer = option.takesFolder() ? "_files -/"
+                                      : option.takesFile() ? "_files"
+                                                           : " ";
+        value = ":" + option.value + ":" + completer;
     }
     // In single quotes, inside brackets.
-    const std::string description =
-        escaped(escaped(option.get_description(), "[]\\", "\\"), "'", "'\\'");
+    const std::string description = escaped(escaped(option.description, "[]\\", "\\"), "'", "'\\'");
     std::string text;
     for (const std::string& name : names) {
         text += " \\\n        '*" + name + "[" + description + "]" + value + "'";
@@ -89,44 +88,44 @@ std::string zshArgument(const CLI::Option& option) {
     return text;
 }
 
-std::string zshArguments(const CLI::App& app) {
+std::string zshArguments(const std::vector<DescribedOption>& options) {
     std::string text;
-    for (const CLI::Option* option : optionsOf(app)) {
-        text += zshArgument(*option);
+    for (const DescribedOption& option : options) {
+        text += zshArgument(option);
     }
     return text;
 }
 
 // A line for fish that completes `option` where `condition`, in fish, holds.
-std::string fishLine(const CLI::Option& option, const std::string& condition) {
+std::string fishLine(const DescribedOption& option, const std::string& condition) {
     std::string line = std::string("complete -c ") + programName + condition;
-    for (const std::string& name : option.get_snames()) {
+    for (const std::string& name : option.shortNames) {
         line += " -s " + name;
     }
-    for (const std::string& name : option.get_lnames()) {
+    for (const std::string& name : option.longNames) {
         line += " -l " + name;
     }
-    if (takesFolder(option)) {
+    if (option.takesFolder()) {
         line += " -x -a '(__fish_complete_directories)'";
-    } else if (takesFile(option)) {
+    } else if (option.takesFile()) {
         line += " -r -F";
-    } else if (takesValue(option)) {
+    } else if (option.takesValue()) {
         line += " -x";
     }
-    return line + " -d '" + escaped(option.get_description(), "'\\", "\\") + "'\n";
+    return line + " -d '" + escaped(option.description, "'\\", "\\") + "'\n";
 }
 
 }  // namespace
 
-std::string bashCompletion(const CLI::App& app) {
-    const std::vector<const CLI::Option*> all = optionsOfAllCommands(app);
-    const auto takesOther = [](const CLI::Option& option) {
-        return takesValue(option) && !takesFile(option) && !takesFolder(option);
+std::string bashCompletion(const DescribedProgram& program) {
+    const std::vector<DescribedOption> all = optionsOfAllCommands(program);
+    const auto takesOther = [](const DescribedOption& option) {
+        return option.takesValue() && !option.takesFile() && !option.takesFolder();
     };
     std::string optionCases;
-    for (const CLI::App* command : commandsOf(app)) {
+    for (const DescribedCommand& command : program.commands) {
         optionCases +=
-            "        " + command->get_name() + ") words+=' " + namesOfAll(*command) + "' ;;\n";
+            "        " + command.name + ") words+=' " + namesOfAll(command.options) + "' ;;\n";
     }
     return "# bash completion for serialization_host. Generated from its command line.\n"
            "_serialization_host() {\n"
@@ -134,13 +133,13 @@ std::string bashCompletion(const CLI::App& app) {
            "    COMPREPLY=()\n"
            "    case ${COMP_WORDS[COMP_CWORD-1]} in\n"
            "        " +
-           namesOfAll(all, takesFolder, "|") +
+           namesOfAll(all, &DescribedOption::takesFolder, "|") +
            ")\n"
            "            compopt -o filenames\n"
            "            mapfile -t COMPREPLY < <(compgen -d -- \"$current\")\n"
            "            return ;;\n"
            "        " +
-           namesOfAll(all, takesFile, "|") +
+           namesOfAll(all, &DescribedOption::takesFile, "|") +
            ")\n"
            "            compopt -o filenames\n"
            "            mapfile -t COMPREPLY < <(compgen -f -- \"$current\")\n"
@@ -153,15 +152,15 @@ std::string bashCompletion(const CLI::App& app) {
            "    for word in \"${COMP_WORDS[@]:1:COMP_CWORD-1}\"; do\n"
            "        case $word in\n"
            "            " +
-           commandNames(app, "|") +
+           commandNames(program, "|") +
            ") command=$word; break ;;\n"
            "        esac\n"
            "    done\n"
            "    local words='" +
-           namesOfAll(app) +
+           namesOfAll(program.options) +
            "'\n"
            "    case $command in\n" +
-           optionCases + "        *) words+=' " + commandNames(app, " ") +
+           optionCases + "        *) words+=' " + commandNames(program, " ") +
            "' ;;\n"
            "    esac\n"
            "    if [[ -z $command || $current == -* ]]; then\n"
@@ -174,15 +173,15 @@ std::string bashCompletion(const CLI::App& app) {
            "complete -F _serialization_host serialization_host\n";
 }
 
-std::string zshCompletion(const CLI::App& app) {
+std::string zshCompletion(const DescribedProgram& program) {
     std::string descriptions;
     std::string cases;
-    for (const CLI::App* command : commandsOf(app)) {
-        descriptions += "    '" + command->get_name() + ":" +
-                        escaped(command->get_description(), "'", "'\\'") + "'\n";
-        const bool takesFiles = !argumentsOf(*command).empty();
-        cases += "        " + command->get_name() + ")\n            _arguments" +
-                 zshArguments(app) + zshArguments(*command) +
+    for (const DescribedCommand& command : program.commands) {
+        descriptions +=
+            "    '" + command.name + ":" + escaped(command.description, "'", "'\\'") + "'\n";
+        const bool takesFiles = !command.arguments.empty();
+        cases += "        " + command.name + ")\n            _arguments" +
+                 zshArguments(program.options) + zshArguments(command.options) +
                  (takesFiles ? " \\\n        '*:FILE:_files'" : "") + " ;;\n";
     }
     return "#compdef serialization_host\n"
@@ -192,7 +191,7 @@ std::string zshCompletion(const CLI::App& app) {
            descriptions +
            ")\n"
            "_arguments -C" +
-           zshArguments(app) +
+           zshArguments(program.options) +
            " \\\n        '1:COMMAND:->command' '*::ARGUMENT:->argument' && return\n"
            "if [[ $state == command ]]; then\n"
            "    _describe COMMAND commands\n"
@@ -203,18 +202,18 @@ std::string zshCompletion(const CLI::App& app) {
            "fi\n";
 }
 
-std::string fishCompletion(const CLI::App& app) {
+std::string fishCompletion(const DescribedProgram& program) {
     std::string text =
         "# fish completion for serialization_host. Generated from its command line.\n";
-    for (const CLI::Option* option : optionsOf(app)) {
-        text += fishLine(*option, "");
+    for (const DescribedOption& option : program.options) {
+        text += fishLine(option, "");
     }
-    for (const CLI::App* command : commandsOf(app)) {
-        const std::string name = command->get_name();
+    for (const DescribedCommand& command : program.commands) {
+        const std::string name = command.name;
         text += std::string("complete -c ") + programName + " -n __fish_use_subcommand -f -a " +
-                name + " -d '" + escaped(command->get_description(), "'\\", "\\") + "'\n";
-        for (const CLI::Option* option : optionsOf(*command)) {
-            text += fishLine(*option, " -n '__fish_seen_subcommand_from " + name + "'");
+                name + " -d '" + escaped(command.description, "'\\", "\\") + "'\n";
+        for (const DescribedOption& option : command.options) {
+            text += fishLine(option, " -n '__fish_seen_subcommand_from " + name + "'");
         }
     }
     return text;

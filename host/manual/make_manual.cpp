@@ -11,7 +11,7 @@
 #include <string>
 #include <vector>
 
-#include "host/commands/command_line.h"
+#include "host/manual/described_program.h"
 #include "host/manual/manual.h"
 
 namespace {
@@ -31,13 +31,11 @@ int main(int argc, char** argv) {
     const std::vector<std::string> arguments(argv + 1, argv + argc);
     try {
         const std::filesystem::path folder = arguments.at(0);
-        CLI::App app;
-        host::CommandLine line;
-        host::describe(app, line);
-        save(folder / "serialization_host.1", host::manualPage(app));
-        save(folder / "serialization_host.bash", host::bashCompletion(app));
-        save(folder / "serialization_host.zsh", host::zshCompletion(app));
-        save(folder / "serialization_host.fish", host::fishCompletion(app));
+        const host::DescribedProgram program = host::describedProgram();
+        save(folder / "serialization_host.1", host::manualPage(program));
+        save(folder / "serialization_host.bash", host::bashCompletion(program));
+        save(folder / "serialization_host.zsh", host::zshCompletion(program));
+        save(folder / "serialization_host.fish", host::fishCompletion(program));
         return 0;
     } catch (const std::exception& error) {
         std::cerr << "make_manual: " << error.what() << "\n";

@@ -1,8 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
+#include <string>
 #include <string_view>
+#include <vector>
 
 #include "host/commands/command_line.h"
-#include "host/manual/described_options.h"
 #include "host/manual/manual.h"
 
 namespace host {
@@ -44,45 +45,41 @@ std::string italic(std::string_view text) {
     return "\\fI" + literal(text) + "\\fR";
 }
 
-std::string paragraphOf(const CLI::Option& option) {
+std::string paragraphOf(const DescribedOption& option) {
     std::string names;
-    for (const std::string& name : namesOf(option)) {
+    for (const std::string& name : option.names()) {
         names += (names.empty() ? "" : ", ") + bold(name);
     }
-    if (takesValue(option)) {
-        names += " " + italic(option.get_type_name());
+    if (option.takesValue()) {
+        names += " " + italic(option.value);
     }
-    return ".TP\n" + names + "\n" + literal(option.get_description()) + "\n";
+    return ".TP\n" + names + "\n" + literal(option.description) + "\n";
 }
 
-// The options of a command, all but those that every one has.
-std::string paragraphsOf(const CLI::App& app) {
-    std::string text;
-    for (const CLI::Option* option : optionsOf(app)) {
-        if (app.get_parent() == nullptr || option != app.get_help_ptr()) {
-            text += paragraphOf(*option);
+std::string sectionOf(const DescribedCommand& command) {
+    std::string heading = ".SS " + literal(command.name) + " [OPTION...]";
+    std::string paragraphs;
+    for (const DescribedArgument& argument : command.arguments) {
+        heading += " " + argument.name + (argument.isRepeated ? "..." : "");
+        paragraphs += ".TP\n" + italic(argument.name) + "\n" + literal(argument.description) + "\n";
+    }
+    for (const DescribedOption& option : command.options) {
+        if (!option.isHelp) {
+            paragraphs += paragraphOf(option);
         }
     }
-    return text;
-}
-
-std::string sectionOf(const CLI::App& command) {
-    std::string heading = ".SS " + literal(command.get_name()) + " [OPTION...]";
-    std::string arguments;
-    for (const CLI::Option* argument : argumentsOf(command)) {
-        heading += " " + argument->get_name(true) + (argument->get_expected_max() > 1 ? "..." : "");
-        arguments += ".TP\n" + italic(argument->get_name(true)) + "\n" +
-                     literal(argument->get_description()) + "\n";
-    }
-    return heading + "\n" + literal(command.get_description()) + ".\n" + arguments +
-           paragraphsOf(command);
+    return heading + "\n" + literal(command.description) + ".\n" + paragraphs;
 }
 
 }  // namespace
 
-std::string manualPage(const CLI::App& app) {
+std::string manualPage(const DescribedProgram& program) {
+    std::string options;
+    for (const DescribedOption& option : program.options) {
+        options += paragraphOf(option);
+    }
     // Without a date: the same sources make the same page.
-    std::string page = ".TH SERIALIZATION_HOST 1 \"\" \"" + app.version() +
+    std::string page = ".TH SERIALIZATION_HOST 1 \"\" \"" + program.version +
                        "\" \"User Commands\"\n"
                        ".SH NAME\n" +
                        literal(programName) +
@@ -90,11 +87,11 @@ std::string manualPage(const CLI::App& app) {
                        ".SH SYNOPSIS\n" +
                        bold(programName) + " [" + italic("OPTION") + "...] " + italic("COMMAND") +
                        " [" + italic("ARGUMENT") + "...]\n.SH DESCRIPTION\n" +
-                       literal(app.get_description()) +
+                       literal(program.description) +
                        "\n.SH OPTIONS\nThese may stand before and behind each command.\n" +
-                       paragraphsOf(app) + ".SH COMMANDS\n";
-    for (const CLI::App* command : commandsOf(app)) {
-        page += sectionOf(*command);
+                       options + ".SH COMMANDS\n";
+    for (const DescribedCommand& command : program.commands) {
+        page += sectionOf(command);
     }
     return page + ".SH EXIT STATUS\n" + literal(exitStatuses) +
            "\n.SH SEE ALSO\n.BR editor\\-serialization (7),\n.BR nats\\-server (8)\n";

@@ -4,10 +4,12 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <CLI/CLI.hpp>
 #include <string>
 #include <vector>
 
 #include "host/commands/command_line.h"
+#include "host/manual/described_program.h"
 
 namespace {
 
@@ -29,8 +31,10 @@ protected:
         return app.get_subcommands([](const CLI::App*) { return true; });
     }
 
+    // What the texts are compared with: each option as the parser knows it.
     CLI::App app;
     host::CommandLine line;
+    host::DescribedProgram program = host::describedProgram();
 };
 
 // Expects each option of each command in the command's part of the text, in the form that `written`
@@ -61,7 +65,7 @@ std::string roff(std::string name) {
 }
 
 TEST_F(Manual, PageHasEachOptionOfEachCommand) {
-    const std::string page = host::manualPage(app);
+    const std::string page = host::manualPage(program);
     const auto options = expectAllOptions(
         commands(),
         [&](const std::string& command) { return between(page, ".SS " + command + " ", "\n.S"); },
@@ -74,7 +78,7 @@ TEST_F(Manual, PageHasEachOptionOfEachCommand) {
 }
 
 TEST_F(Manual, PageNamesValuesArgumentsAndExitStatuses) {
-    const std::string page = host::manualPage(app);
+    const std::string page = host::manualPage(program);
     EXPECT_THAT(page, AllOf(HasSubstr("\n\\fB\\-\\-timeout\\fR \\fISECONDS\\fR\n"),
                             HasSubstr("\n.SS read [OPTION...] FILE...\n"),
                             HasSubstr("\n.SS history [OPTION...] FILE\n"),
@@ -82,13 +86,13 @@ TEST_F(Manual, PageNamesValuesArgumentsAndExitStatuses) {
 }
 
 TEST_F(Manual, PageHasTextsAsTheyStand) {
-    app.add_option("--odd", line.logLevel, ".like a request, or 'another\\\n'third");
-    EXPECT_THAT(host::manualPage(app),
+    program.options.push_back({{}, {"odd"}, "", ".like a request, or 'another\\\n'third"});
+    EXPECT_THAT(host::manualPage(program),
                 HasSubstr("\n\\&.like a request, or 'another\\e\n.br\n\\&'third\n"));
 }
 
 TEST_F(Manual, FishCompletesEachOptionOfEachCommand) {
-    const std::string text = host::fishCompletion(app);
+    const std::string text = host::fishCompletion(program);
     std::size_t options = 0;
     for (const CLI::App* command : commands()) {
         const std::string condition =
