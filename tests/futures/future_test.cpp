@@ -32,6 +32,9 @@ constexpr const char* cancelledText = "Future has been cancelled.";
 constexpr const char* resolvedText = "Promise already resolved.";
 constexpr const char* retrievedText = "Promise already returned a future.";
 
+// What is expected to throw, as one type: the matchers would be compiled anew for each lambda.
+using Call = std::function<void()>;
+
 auto failsWith(const char* text) {
     return ThrowsMessage<std::runtime_error>(StrEq(text));
 }
@@ -69,7 +72,7 @@ struct Counted {
 TEST(Promise, HandsOutItsFutureOnce) {
     Promise<int> promise;
     EXPECT_TRUE(promise.getFuture().valid());
-    EXPECT_THAT([&] { promise.getFuture(); }, failsWith(retrievedText));
+    EXPECT_THAT(Call([&] { promise.getFuture(); }), failsWith(retrievedText));
 }
 
 TEST(Promise, HandsOutItsFutureAfterItIsResolved) {
@@ -82,8 +85,8 @@ TEST(Promise, KeepsTheFirstOutcomeAndRefusesASecond) {
     Promise<int> promise;
     Future<int> future = promise.getFuture();
     promise.setValue(1);
-    EXPECT_THAT([&] { promise.setValue(2); }, failsWith(resolvedText));
-    EXPECT_THAT([&] { promise.setException(failure("late")); }, failsWith(resolvedText));
+    EXPECT_THAT(Call([&] { promise.setValue(2); }), failsWith(resolvedText));
+    EXPECT_THAT(Call([&] { promise.setException(failure("late")); }), failsWith(resolvedText));
     EXPECT_EQ(future.get(), 1);
 }
 
@@ -91,16 +94,16 @@ TEST(Promise, KeepsTheFirstExceptionAndRefusesASecondOutcome) {
     Promise<int> promise;
     Future<int> future = promise.getFuture();
     promise.setException(failure("first"));
-    EXPECT_THAT([&] { promise.setValue(2); }, failsWith(resolvedText));
-    EXPECT_THAT([&] { promise.setException(failure("late")); }, failsWith(resolvedText));
-    EXPECT_THAT([&] { future.get(); }, rethrows("first"));
+    EXPECT_THAT(Call([&] { promise.setValue(2); }), failsWith(resolvedText));
+    EXPECT_THAT(Call([&] { promise.setException(failure("late")); }), failsWith(resolvedText));
+    EXPECT_THAT(Call([&] { future.get(); }), rethrows("first"));
 }
 
 TEST(Promise, OfVoidRefusesASecondOutcome) {
     Promise<void> promise;
     promise.setValue();
-    EXPECT_THAT([&] { promise.setValue(); }, failsWith(resolvedText));
-    EXPECT_THAT([&] { promise.setException(failure("late")); }, failsWith(resolvedText));
+    EXPECT_THAT(Call([&] { promise.setValue(); }), failsWith(resolvedText));
+    EXPECT_THAT(Call([&] { promise.setException(failure("late")); }), failsWith(resolvedText));
     EXPECT_NO_THROW(promise.getFuture().get());
 }
 
@@ -110,7 +113,7 @@ TEST(Promise, DropsTheOutcomeOfACancelledStateSilently) {
     future.cancel();
     EXPECT_NO_THROW(promise.setValue(1));
     EXPECT_NO_THROW(promise.setException(failure("late")));
-    EXPECT_THAT([&] { future.get(); }, failsWith(cancelledText));
+    EXPECT_THAT(Call([&] { future.get(); }), failsWith(cancelledText));
 }
 
 TEST(Promise, CancelsItsStateWhenDestroyedPending) {
@@ -120,14 +123,14 @@ TEST(Promise, CancelsItsStateWhenDestroyedPending) {
         future = promise.getFuture();
     }
     EXPECT_TRUE(future.valid());
-    EXPECT_THAT([&] { future.get(); }, failsWith(cancelledText));
+    EXPECT_THAT(Call([&] { future.get(); }), failsWith(cancelledText));
 }
 
 TEST(Promise, WakesAWaiterWhenDestroyedPending) {
     auto promise = std::make_unique<Promise<int>>();
     Future<int> future = promise->getFuture();
     std::thread destroyer([&] { promise.reset(); });
-    EXPECT_THAT([&] { future.get(); }, failsWith(cancelledText));
+    EXPECT_THAT(Call([&] { future.get(); }), failsWith(cancelledText));
     destroyer.join();
 }
 
@@ -145,7 +148,7 @@ TEST(Promise, MovesItsState) {
     Promise<int> first;
     Future<int> future = first.getFuture();
     Promise<int> second(std::move(first));
-    EXPECT_THAT([&] { second.getFuture(); }, failsWith(retrievedText));
+    EXPECT_THAT(Call([&] { second.getFuture(); }), failsWith(retrievedText));
     second.setValue(3);
     EXPECT_EQ(future.get(), 3);
 }
@@ -156,7 +159,7 @@ TEST(Promise, CancelsTheStateThatAMoveReplaces) {
     Promise<int> source;
     Future<int> moved = source.getFuture();
     target = std::move(source);
-    EXPECT_THAT([&] { replaced.get(); }, failsWith(cancelledText));
+    EXPECT_THAT(Call([&] { replaced.get(); }), failsWith(cancelledText));
     target.setValue(4);
     EXPECT_EQ(moved.get(), 4);
 }
@@ -174,9 +177,11 @@ TEST(Promise, FailsWhenMovedFrom) {
     constexpr const char* text = "Promise state isn't valid!";
     Promise<int> promise;
     const Promise<int> target(std::move(promise));
-    EXPECT_THAT([&] { promise.getFuture(); }, failsWith(text));  // NOLINT(bugprone-use-after-move)
-    EXPECT_THAT([&] { promise.setValue(1); }, failsWith(text));  // NOLINT(bugprone-use-after-move)
-    EXPECT_THAT([&] { promise.setException(failure("")); }, failsWith(text));
+    EXPECT_THAT(Call([&] { promise.getFuture(); }),
+                failsWith(text));  // NOLINT(bugprone-use-after-move)
+    EXPECT_THAT(Call([&] { promise.setValue(1); }),
+                failsWith(text));  // NOLINT(bugprone-use-after-move)
+    EXPECT_THAT(Call([&] { promise.setException(failure("")); }), failsWith(text));
 }
 
 TEST(Promise, MayBeDestroyedByItsOwnContinuation) {
@@ -194,16 +199,16 @@ TEST(Promise, MayBeDestroyedByItsOwnContinuation) {
 TEST(Future, IsInvalidByDefault) {
     Future<int> future;
     EXPECT_FALSE(future.valid());
-    EXPECT_THAT([&] { future.get(); }, failsWith(invalidText));
-    EXPECT_THAT([&] { future.then([](Future<int>) {}); }, failsWith(invalidText));
-    EXPECT_THAT([&] { future.cancel(); }, failsWith(invalidText));
+    EXPECT_THAT(Call([&] { future.get(); }), failsWith(invalidText));
+    EXPECT_THAT(Call([&] { future.then([](Future<int>) {}); }), failsWith(invalidText));
+    EXPECT_THAT(Call([&] { future.cancel(); }), failsWith(invalidText));
 }
 
 TEST(Future, OfVoidIsInvalidByDefault) {
     Future<void> future;
     EXPECT_FALSE(future.valid());
-    EXPECT_THAT([&] { future.get(); }, failsWith(invalidText));
-    EXPECT_THAT([&] { future.then([](Future<void>) {}); }, failsWith(invalidText));
+    EXPECT_THAT(Call([&] { future.get(); }), failsWith(invalidText));
+    EXPECT_THAT(Call([&] { future.then([](Future<void>) {}); }), failsWith(invalidText));
 }
 
 TEST(Future, IsInvalidAfterGet) {
@@ -212,14 +217,14 @@ TEST(Future, IsInvalidAfterGet) {
     Future<int> future = promise.getFuture();
     future.get();
     EXPECT_FALSE(future.valid());
-    EXPECT_THAT([&] { future.get(); }, failsWith(invalidText));
+    EXPECT_THAT(Call([&] { future.get(); }), failsWith(invalidText));
 }
 
 TEST(Future, IsInvalidAfterAGetThatThrew) {
     Promise<int> promise;
     promise.setException(failure("no"));
     Future<int> future = promise.getFuture();
-    EXPECT_THAT([&] { future.get(); }, rethrows("no"));
+    EXPECT_THAT(Call([&] { future.get(); }), rethrows("no"));
     EXPECT_FALSE(future.valid());
 }
 
@@ -229,7 +234,7 @@ TEST(Future, IsInvalidWhenMovedFrom) {
     Future<int> source = promise.getFuture();
     Future<int> target(std::move(source));
     EXPECT_FALSE(source.valid());  // NOLINT(bugprone-use-after-move)
-    EXPECT_THAT([&] { source.get(); }, failsWith(invalidText));
+    EXPECT_THAT(Call([&] { source.get(); }), failsWith(invalidText));
     EXPECT_EQ(target.get(), 1);
 }
 
@@ -255,7 +260,7 @@ TEST(Future, WaitsForTheException) {
     Promise<void> promise;
     Future<void> future = promise.getFuture();
     std::thread resolver([&] { promise.setException(failure("far away")); });
-    EXPECT_THAT([&] { future.get(); }, rethrows("far away"));
+    EXPECT_THAT(Call([&] { future.get(); }), rethrows("far away"));
     resolver.join();
 }
 
@@ -263,7 +268,7 @@ TEST(Future, WaitsForTheCancellation) {
     const auto state = std::make_shared<detail::SharedFutureState<int>>();
     Future<int> future(state);
     std::thread canceller([&] { Future<int>(state).cancel(); });
-    EXPECT_THAT([&] { future.get(); }, failsWith(cancelledText));
+    EXPECT_THAT(Call([&] { future.get(); }), failsWith(cancelledText));
     canceller.join();
 }
 
@@ -285,33 +290,35 @@ TEST(Future, HoldsAnExceptionAsAValue) {
     Promise<std::exception_ptr> promise;
     promise.setValue(failure("a value"));
     const std::exception_ptr value = promise.getFuture().get();
-    EXPECT_THAT([&] { std::rethrow_exception(value); }, rethrows("a value"));
+    EXPECT_THAT(Call([&] { std::rethrow_exception(value); }), rethrows("a value"));
 }
 
 TEST(Future, GivesAnOutcomeToOneOfSeveralGets) {
     const auto state = std::make_shared<detail::SharedFutureState<int>>();
     state->setValue(1);
     EXPECT_EQ(Future<int>(state).get(), 1);
-    EXPECT_THAT([&] { Future<int>(state).get(); }, failsWith(getTakenText));
+    EXPECT_THAT(Call([&] { Future<int>(state).get(); }), failsWith(getTakenText));
 }
 
 TEST(Future, RefusesGetWhileAContinuationIsAttached) {
     const auto state = std::make_shared<detail::SharedFutureState<int>>();
     Future<int>(state).then([](Future<int>) {});
-    EXPECT_THAT([&] { Future<int>(state).get(); }, failsWith(getTakenText));
+    EXPECT_THAT(Call([&] { Future<int>(state).get(); }), failsWith(getTakenText));
 }
 
 TEST(Future, RefusesThenAfterGet) {
     const auto state = std::make_shared<detail::SharedFutureState<int>>();
     state->setValue(1);
     Future<int>(state).get();
-    EXPECT_THAT([&] { Future<int>(state).then([](Future<int>) {}); }, failsWith(thenTakenText));
+    EXPECT_THAT(Call([&] { Future<int>(state).then([](Future<int>) {}); }),
+                failsWith(thenTakenText));
 }
 
 TEST(Future, RefusesThenAfterThen) {
     const auto state = std::make_shared<detail::SharedFutureState<int>>();
     Future<int>(state).then([](Future<int>) {});
-    EXPECT_THAT([&] { Future<int>(state).then([](Future<int>) {}); }, failsWith(thenTakenText));
+    EXPECT_THAT(Call([&] { Future<int>(state).then([](Future<int>) {}); }),
+                failsWith(thenTakenText));
 }
 
 TEST(Future, StaysValidAndReadableWhenCancelledTooLate) {
@@ -328,7 +335,7 @@ TEST(Then, ConsumesTheFuture) {
     Future<int> future = promise.getFuture();
     future.then([](Future<int>) {});
     EXPECT_FALSE(future.valid());
-    EXPECT_THAT([&] { future.then([](Future<int>) {}); }, failsWith(invalidText));
+    EXPECT_THAT(Call([&] { future.then([](Future<int>) {}); }), failsWith(invalidText));
 }
 
 TEST(Then, ConsumesTheFutureButNotTheCallbackWhenItThrows) {
@@ -336,7 +343,7 @@ TEST(Then, ConsumesTheFutureButNotTheCallbackWhenItThrows) {
     Future<int>(state).then([](Future<int>) {});
     Future<int> future(state);
     auto callback = [kept = std::make_unique<int>(3)](Future<int>) { return kept ? *kept : 0; };
-    EXPECT_THAT([&] { future.then(std::move(callback)); }, failsWith(thenTakenText));
+    EXPECT_THAT(Call([&] { future.then(std::move(callback)); }), failsWith(thenTakenText));
     EXPECT_FALSE(future.valid());
     EXPECT_EQ(callback(Future<int>()), 3);  // NOLINT(bugprone-use-after-move)
 }
@@ -409,7 +416,7 @@ TEST(Then, DeliversTheExceptionOfTheCallback) {
     Future<int> value = promise.getFuture().then([](Future<int> future) { return future.get(); });
     Future<void> nothing = value.then([](Future<int> future) { future.get(); });
     EXPECT_NO_THROW(promise.setException(failure("all the way")));
-    EXPECT_THAT([&] { nothing.get(); }, rethrows("all the way"));
+    EXPECT_THAT(Call([&] { nothing.get(); }), rethrows("all the way"));
 }
 
 TEST(Then, DeliversExceptionsOfAnyType) {
@@ -529,7 +536,7 @@ TEST(Then, IsCancelledWithItsFuture) {
         Future<int>(state).then([&called, held = std::move(held)](Future<int>) { called = true; });
     state->cancel();
     EXPECT_TRUE(alive.expired());
-    EXPECT_THAT([&] { result.get(); }, failsWith(cancelledText));
+    EXPECT_THAT(Call([&] { result.get(); }), failsWith(cancelledText));
     EXPECT_FALSE(called);
 }
 
@@ -538,7 +545,7 @@ TEST(Then, IsCancelledWhenTheFutureAlreadyIs) {
     state->cancel();
     bool called = false;
     Future<void> result = Future<int>(state).then([&called](Future<int>) { called = true; });
-    EXPECT_THAT([&] { result.get(); }, failsWith(cancelledText));
+    EXPECT_THAT(Call([&] { result.get(); }), failsWith(cancelledText));
     EXPECT_FALSE(called);
 }
 
@@ -553,7 +560,7 @@ TEST(Then, IsCancelledAllAlongTheChainWhenThePromiseIsDestroyed) {
         });
     }
     promise.reset();
-    EXPECT_THAT([&] { last.get(); }, failsWith(cancelledText));
+    EXPECT_THAT(Call([&] { last.get(); }), failsWith(cancelledText));
     EXPECT_EQ(calls, 0);
 }
 
@@ -692,18 +699,18 @@ TEST(Unwrap, PassesTheExceptionOfTheOuterFutureOn) {
     Promise<Future<void>> outer;
     Future<void> result = unwrap(outer.getFuture());
     outer.setException(failure("outer"));
-    EXPECT_THAT([&] { result.get(); }, rethrows("outer"));
+    EXPECT_THAT(Call([&] { result.get(); }), rethrows("outer"));
 }
 
 TEST(Unwrap, IsCancelledWithTheOuterFuture) {
     auto outer = std::make_unique<Promise<Future<void>>>();
     Future<void> result = unwrap(outer->getFuture());
     outer.reset();
-    EXPECT_THAT([&] { result.get(); }, failsWith(cancelledText));
+    EXPECT_THAT(Call([&] { result.get(); }), failsWith(cancelledText));
 }
 
 TEST(Unwrap, RefusesAnInvalidOuterFuture) {
-    EXPECT_THAT([] { unwrap(Future<Future<void>>()); }, failsWith(invalidText));
+    EXPECT_THAT(Call([] { unwrap(Future<Future<void>>()); }), failsWith(invalidText));
 }
 
 TEST(Unwrap, PassesOnThatTheInnerOutcomeWasTaken) {
@@ -713,7 +720,7 @@ TEST(Unwrap, PassesOnThatTheInnerOutcomeWasTaken) {
     Promise<Future<void>> outer;
     Future<void> result = unwrap(outer.getFuture());
     outer.setValue(Future<void>(inner));
-    EXPECT_THAT([&] { result.get(); }, failsWith(thenTakenText));
+    EXPECT_THAT(Call([&] { result.get(); }), failsWith(thenTakenText));
 }
 
 }  // namespace
