@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // What is unsaved of an office document, and what becomes of it when somebody else has saved.
 import assert from "node:assert/strict";
+import { unlinkSync } from "node:fs";
 
 import { clientOf } from "./client.mjs";
 import { browserTest } from "./harness.mjs";
@@ -139,4 +140,37 @@ browserTest("a comparison that is left changes nothing", async (t) => {
   await page.locator(".mark.unsaved").waitFor();
   assert.equal(await page.locator(".cm-mergeView").count(), 0);
   assert.ok(session.read(NAME).equals(theirs));
+});
+
+browserTest("of a document that was removed, the changed parts alone are saved only after saying so", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const { page } = session;
+  await replace(page, "Annual report", "Budget");
+  await session.waitForDraft(page, "Budget");
+  unlinkSync(session.path(NAME));
+  await page.reload();
+  const reason = /has been removed.* only the parts that you have changed are left/;
+  await page.getByRole("alert").getByText(reason).waitFor();
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByText(/Office programs will not open/).waitFor();
+  await dialog(page).getByRole("button", { name: "Do not save" }).click();
+  assert.throws(() => session.read(NAME), { code: "ENOENT" });
+  await page.keyboard.press("Control+s"); // it is asked until it is answered
+  await dialog(page).getByRole("button", { name: "Save these parts" }).click();
+  await dialog(page).getByRole("button", { name: "Save as new" }).click();
+  await isSaved(page);
+  const parts = Object.keys(unpack(session.read(NAME))).filter((name) => /^word\/[^_]/.test(name));
+  assert.deepEqual(parts.sort(), ["word/document.xml", "word/header1.xml"]);
+});
+
+browserTest("of a document that was removed while it is shown, all parts are saved as new", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const { page } = session;
+  const before = Object.keys(unpack(session.read(NAME))).sort();
+  await replace(page, "Annual report", "Budget");
+  unlinkSync(session.path(NAME));
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Save as new" }).click();
+  await isSaved(page);
+  assert.deepEqual(Object.keys(unpack(session.read(NAME))).sort(), before);
 });

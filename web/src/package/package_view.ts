@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // A package in its tab: its text, its parts and its properties, one at a time, and a preview beside them.
 import type { Comparison, DocumentContent, DocumentView, LoadedDocument, Page } from "../document_view.js";
+import { nameOf } from "../files/paths.js";
 import { button, element, shortcutKey } from "../ui/dom.js";
 import { PackageComparison } from "./comparison.js";
 import { PackageModel, type PackageDraft, documentOf } from "./package_model.js";
@@ -43,6 +44,8 @@ export class PackageView implements DocumentView {
   #shown!: PanelName;
   #preview: Preview | undefined;
   #isClosed = false;
+  // The document was removed, and a draft holds its changed parts only. False again once a person knows, and saves them.
+  #lacksParts = false;
 
   #tabs = new Map<PanelName, HTMLButtonElement>();
   #stage = element("div", { className: "package-stage" });
@@ -63,12 +66,20 @@ export class PackageView implements DocumentView {
     this.element.append(this.#bar(), this.#stage);
     this.element.addEventListener("keydown", (event) => this.#undoByKey(event));
     this.#use(new PackageModel(documentOf(loaded), draft));
+    if (draft && loaded.version === "") {
+      this.#lacksParts = true;
+      page.tell(page.text("package.incomplete", { name: nameOf(loaded.path) }), "problem");
+    }
   }
 
   async content(): Promise<DocumentContent | undefined> {
     this.#commit();
+    if (this.#lacksParts && !(await this.#mayBeSaved("package.incomplete"))) {
+      return undefined;
+    }
+    this.#lacksParts = false;
     const broken = this.#brokenParts();
-    if (broken.length > 0 && !(await this.#askWhetherBrokenPartsMayBeSaved(broken))) {
+    if (broken.length > 0 && !(await this.#mayBeSaved("package.broken", broken))) {
       return undefined;
     }
     return { kind: "package", content: this.#model.document() };
@@ -76,6 +87,7 @@ export class PackageView implements DocumentView {
 
   saved(content: DocumentContent): void {
     if (content.kind === "package") {
+      this.#lacksParts = false; // also where they have been put together with those of another edition
       const changed = this.#model.changedParts();
       this.#model.saved(content.content);
       this.#panels.parts.refresh([...changed, ...this.#model.changedParts()]);
@@ -89,6 +101,7 @@ export class PackageView implements DocumentView {
 
   replace(loaded: LoadedDocument): void {
     const hadFocus = this.element.contains(document.activeElement);
+    this.#lacksParts = false;
     this.#use(new PackageModel(documentOf(loaded)));
     if (hadFocus) {
       this.focus();
@@ -260,14 +273,15 @@ export class PackageView implements DocumentView {
     return changed.filter(({ content }) => isBroken(content)).map(({ partUri }) => textOf(partUri));
   }
 
-  async #askWhetherBrokenPartsMayBeSaved(broken: string[]): Promise<boolean> {
+  // Asks with the texts of `key` whether to save all the same a document that office programs will not open.
+  async #mayBeSaved(key: string, parts: string[] = this.#model.changedParts().map(textOf)): Promise<boolean> {
     const { page } = this;
     const answer = await page.ask({
-      title: page.text("package.broken.title"),
-      message: page.text("package.broken.message", { parts: broken.join(", ") }),
+      title: page.text(`${key}.title`),
+      message: page.text(`${key}.message`, { parts: parts.join(", ") }),
       choices: [
-        { value: "save", label: page.text("package.broken.save") },
-        { value: "", label: page.text("package.broken.cancel"), isDefault: true },
+        { value: "save", label: page.text(`${key}.save`) },
+        { value: "", label: page.text(`${key}.cancel`), isDefault: true },
       ],
     });
     return answer === "save" && !this.#isClosed;

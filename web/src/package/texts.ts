@@ -17,6 +17,13 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
       "Office programs will not open the document, since this is not well-formed XML, or not in the charset that it declares: {parts}",
     "package.broken.save": "Save anyway",
     "package.broken.cancel": "Go on editing",
+    "package.incomplete":
+      "{name} has been removed, and only the parts that you have changed are left here. They can be looked at, copied and exported.",
+    "package.incomplete.title": "Save only a few parts?",
+    "package.incomplete.message":
+      "The document has been removed, and all parts that you had not changed with it. Office programs will not open what is left: {parts}",
+    "package.incomplete.save": "Save these parts",
+    "package.incomplete.cancel": "Do not save",
     "package.text.find": "Find",
     "package.text.replacement": "Replace with",
     "package.text.replace": "Replace",
@@ -109,6 +116,13 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
       "Office-Programme werden das Dokument nicht öffnen, denn dies ist kein wohlgeformtes XML oder nicht in dem Zeichensatz, den es angibt: {parts}",
     "package.broken.save": "Trotzdem speichern",
     "package.broken.cancel": "Weiter bearbeiten",
+    "package.incomplete":
+      "{name} wurde gelöscht; hier sind nur noch die Teile, die Sie geändert haben. Sie können angesehen, kopiert und exportiert werden.",
+    "package.incomplete.title": "Nur wenige Teile speichern?",
+    "package.incomplete.message":
+      "Das Dokument wurde gelöscht, und mit ihm alle Teile, die Sie nicht geändert hatten. Was übrig ist, öffnen Office-Programme nicht: {parts}",
+    "package.incomplete.save": "Diese Teile speichern",
+    "package.incomplete.cancel": "Nicht speichern",
     "package.text.find": "Suchen",
     "package.text.replacement": "Ersetzen durch",
     "package.text.replace": "Ersetzen",
