@@ -4,7 +4,7 @@ import { test } from "node:test";
 
 import { room } from "./room.mjs";
 
-const { completeSettings, fragmentOf, readFragment, remember } = await room("connection/settings.ts");
+const { completeSettings, fragmentOf, readFragment, remember, storeIn } = await room("connection/settings.ts", "storage.ts");
 
 function store(said = {}) {
   const items = new Map(Object.entries(said));
@@ -42,4 +42,24 @@ test("what is remembered completes an address of the same server and user only",
   assert.deepEqual(completeSettings({ server, user: "eve" }, session, lasting), { server, user: "eve" });
   assert.deepEqual(completeSettings({ server: "ws://other" }, session, lasting), { server: "ws://other" });
   assert.deepEqual(completeSettings({ ...ADA, password: "new" }, session, lasting), { ...ADA, password: "new" });
+});
+
+test("what a browser does not store is remembered by the page, and what it does by the browser", () => {
+  const stored = store();
+  let isBlocked = true;
+  const kept = storeIn(() => {
+    if (isBlocked) {
+      throw new Error("denied");
+    }
+    return stored;
+  });
+  assert.equal(kept.getItem("theme"), null);
+  kept.setItem("theme", "dark");
+  isBlocked = false;
+  assert.equal(stored.getItem("theme"), null);
+  assert.equal(kept.getItem("theme"), "dark");
+  kept.setItem("theme", "light");
+  assert.equal(stored.getItem("theme"), "light");
+  stored.setItem("theme", "system"); // by another page
+  assert.equal(kept.getItem("theme"), "system");
 });

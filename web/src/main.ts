@@ -4,6 +4,7 @@ import { ConnectionFailure, type ConnectionState, openConnection } from "./conne
 import { loginForm } from "./connection/login.js";
 import { type Settings, completeSettings, fragmentOf, readFragment, remember } from "./connection/settings.js";
 import { Drafts, ownWindow } from "./save/drafts.js";
+import { lastingStore, sessionStore } from "./storage.js";
 import { element } from "./ui/dom.js";
 import { Messages } from "./ui/messages.js";
 import { preferredLanguage, text, useLanguage } from "./ui/text.js";
@@ -16,7 +17,7 @@ import "./images/images.css";
 import "./text/text.css";
 import "./package/package.css";
 
-const language = preferredLanguage(localStorage.getItem("language"), navigator.languages);
+const language = preferredLanguage(lastingStore.getItem("language"), navigator.languages);
 useLanguage(language);
 document.documentElement.lang = language;
 useTheme(chosenTheme());
@@ -32,7 +33,7 @@ let attempts = 0; // to connect; nothing is heard any more of those before the l
 // Does what the address says: connects, or shows a document.
 function follow(): void {
   const address = readFragment(location.hash);
-  const known = completeSettings(address, sessionStorage, localStorage);
+  const known = completeSettings(address, sessionStore, lastingStore);
   // At once, so that the password is not seen, kept or passed on with the address.
   history.replaceState(null, "", location.pathname + location.search + fragmentOf(known, address.file));
   if (workspace && !address.password && known.server === connected?.server) {
@@ -55,7 +56,7 @@ async function start(settings: Settings, file?: string): Promise<void> {
       return void client.close();
     }
     connected = settings;
-    remember(settings, sessionStorage, localStorage);
+    remember(settings, sessionStore, lastingStore);
     if (workspace) {
       workspace.reconnected(client, settings);
       if (file) {

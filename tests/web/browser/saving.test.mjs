@@ -325,3 +325,25 @@ browserTest("a browser that stores nothing opens and saves documents all the sam
   await isSaved(page, "a.txt");
   assert.equal(session.read("a.txt").toString(), "zero one\n");
 });
+
+browserTest("a browser whose storage is blocked opens and saves documents all the same", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  await session.context.addInitScript(() => {
+    // As Chromium answers where cookies are blocked.
+    const denied = () => new DOMException("Access is denied for this document.", "SecurityError");
+    for (const storage of ["localStorage", "sessionStorage"]) {
+      Object.defineProperty(window, storage, { get: () => { throw denied(); } });
+    }
+    IDBFactory.prototype.open = () => { throw denied(); };
+    LockManager.prototype.request = LockManager.prototype.query = () => Promise.reject(denied());
+  });
+  const page = await session.newPage();
+  await page.getByLabel("Colours").selectOption("dark");
+  await page.locator('html[data-theme="dark"]').waitFor({ state: "attached" });
+  await open(page, "a.txt");
+  await page.getByText(/unsaved changes cannot be kept in this browser/).waitFor();
+  await type(page, "zero ");
+  await page.keyboard.press("Control+s");
+  await isSaved(page, "a.txt");
+  assert.equal(session.read("a.txt").toString(), "zero one\n");
+});

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Where to connect to: what the address says, and what was said before the page was loaded again.
+import type { Store } from "../storage.js";
 
 export interface Settings {
   server: string;
@@ -38,8 +39,6 @@ export function fragmentOf({ server, user }: Partial<Settings>, file?: string): 
 }
 
 const KEY = "connection";
-
-type Store = Pick<Storage, "getItem" | "setItem">;
 
 /**
  * What `address` says, completed by what is remembered of the same server and user. `session` ends with the

@@ -44,7 +44,7 @@ export class PackageView implements DocumentView {
   #shown!: PanelName;
   #preview: Preview | undefined;
   #isClosed = false;
-  // The document was removed, and a draft holds its changed parts only. False again once a person knows, and saves them.
+  // The document was removed, and a draft holds its changed parts only. Until a person knows, and saves them.
   #lacksParts = false;
 
   #tabs = new Map<PanelName, HTMLButtonElement>();

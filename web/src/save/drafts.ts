@@ -3,6 +3,7 @@
 //
 // A draft belongs to one window, by an id that is kept with the browser's tab; a window that lives holds a lock
 // of the id's name. So drafts of a window that is gone can be told from those that another one is working on.
+import { sessionStore } from "../storage.js";
 
 export interface Draft {
   window: string;
@@ -98,13 +99,13 @@ const PATIENCE = 1000; // ms that the page which was here before a reload may ne
 
 /** This window's id: the one that it had before the page was loaded again, unless a copy of it has that. */
 export async function ownWindow(): Promise<WindowId> {
-  let id = sessionStorage.getItem(KEY) ?? newId();
+  let id = sessionStore.getItem(KEY) ?? newId();
   const locks = navigator.locks as LockManager | undefined; // there is none without https or a loopback address
   if (locks && !(await hold(locks, id))) {
     id = newId(); // a copied tab, with all that was kept for it
     await hold(locks, id);
   }
-  sessionStorage.setItem(KEY, id);
+  sessionStore.setItem(KEY, id);
   return {
     id,
     isGone: async (other) => {

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // The line at the bottom: the connection, what has become of the last save, language and colours.
 import type { ConnectionState } from "../connection/connection.js";
+import { lastingStore } from "../storage.js";
 import { button, element } from "./dom.js";
 import { LANGUAGES, currentLanguage, text } from "./text.js";
 import { THEMES, type Theme, chosenTheme, useTheme } from "./theme.js";
@@ -46,7 +47,7 @@ export class StateLine {
   }
 
   async #speak(language: string): Promise<void> {
-    localStorage.setItem("language", language);
+    lastingStore.setItem("language", language);
     await this.keepDrafts();
     location.reload();
   }

@@ -5,6 +5,7 @@ import type { ConnectionState } from "../connection/connection.js";
 import { type Settings, fragmentOf } from "../connection/settings.js";
 import { FileTree } from "../files/tree.js";
 import type { Draft, Drafts } from "../save/drafts.js";
+import { sessionStore } from "../storage.js";
 import { ask } from "./dialog.js";
 import { button, element, shortcutKey } from "./dom.js";
 import type { Messages } from "./messages.js";
@@ -13,7 +14,7 @@ import { StateLine } from "./state_line.js";
 import { Tabs } from "./tabs.js";
 import { text } from "./text.js";
 
-const OPEN = "open"; // sessionStorage: which documents are open
+const OPEN = "open"; // sessionStore: which documents are open
 
 export interface WorkspaceOptions {
   client: Client;
@@ -76,7 +77,7 @@ export class Workspace {
 
   /** Opens what was open or unsaved before the page was loaded again, and `file`. */
   restore(drafts: Draft[], file?: string): void {
-    const { paths = [], active } = JSON.parse(sessionStorage.getItem(OPEN) ?? "{}") as { paths?: string[]; active?: string };
+    const { paths = [], active } = JSON.parse(sessionStore.getItem(OPEN) ?? "{}") as { paths?: string[]; active?: string };
     for (const path of new Set([...paths, ...drafts.map((draft) => draft.path)])) {
       this.open(
         path,
@@ -213,8 +214,8 @@ export class Workspace {
     }
     const paths = this.#documents.map((one) => one.path);
     const open = JSON.stringify({ paths, active: active?.path });
-    if (this.#isRestored && sessionStorage.getItem(OPEN) !== open) {
-      sessionStorage.setItem(OPEN, open);
+    if (this.#isRestored && sessionStore.getItem(OPEN) !== open) {
+      sessionStore.setItem(OPEN, open);
       history.replaceState(null, "", this.#address());
     }
   }
