@@ -71,6 +71,33 @@ browserTest("one paragraph's match is replaced alone, and that is undone and don
   assert.match(textIn(await save(session, "report.docx"), "word/header1.xml"), /Annual report, page/);
 });
 
+// A workbook whose shared string "Other" is the heading of a table's only column.
+function tableFiles() {
+  const files = workbookFiles();
+  const type = "application/vnd.openxmlformats-officedocument.spreadsheetml.table+xml";
+  files["[Content_Types].xml"] = files["[Content_Types].xml"].replace("</Types>", `<Override PartName="/xl/tables/table1.xml" ContentType="${type}"/></Types>`);
+  files["xl/worksheets/_rels/sheet1.xml.rels"] = relationships(["rId1", "table", "../tables/table1.xml"]);
+  files["xl/tables/table1.xml"] =
+    '<table xmlns="http://schemas.openxmlformats.org/spreadsheetml/2006/main" id="1" name="T" displayName="T" ref="A1:A2"><tableColumns count="1"><tableColumn id="1" name="Other"/></tableColumns></table>';
+  files["xl/sharedStrings.xml"] = files["xl/sharedStrings.xml"].replace("</sst>", "<si><t>Other text</t></si></sst>");
+  return files;
+}
+
+browserTest("the heading of a table's column is found, and not replaced", async (t) => {
+  const session = await open(t, "book.xlsx", tableFiles());
+  const { page } = session;
+  const heading = page.locator(".package-paragraphs p", { hasText: "Other (the name of a table's column" });
+  await page.getByLabel("Find", { exact: true }).fill("Other");
+  await page.getByLabel("Replace with").fill("New");
+  await page.getByText("2 found").waitFor();
+  assert.equal(await heading.getByRole("button").count(), 0);
+  assert.deepEqual(await faults(page), []);
+  await page.getByRole("button", { name: "Replace all" }).click();
+  await page.getByText("1 found").waitFor();
+  assert.equal(await page.getByRole("button", { name: "Replace all" }).isDisabled(), true);
+  assert.match(textIn(await save(session, "book.xlsx"), "xl/sharedStrings.xml"), /<t>Other<\/t>.*<t>New text<\/t>/s);
+});
+
 browserTest("Enter that ends an input method's composition replaces nothing", async (t) => {
   const session = await open(t, "report.docx", wordFiles());
   const { page } = session;

@@ -7,6 +7,7 @@ import type { PackageModel } from "./package_model.js";
 import type { Panel } from "./package_view.js";
 import { byName, kindOf, textOf } from "./part_kinds.js";
 import { decodePart, encodePart, type PartText } from "./part_text.js";
+import { columnNames, comparable, isTable } from "./table_columns.js";
 import { findMatches, mayHaveText, patternOf, replaceMatches, textBlocks, type TextBlock } from "./text_runs.js";
 
 interface TextPart {
@@ -21,6 +22,8 @@ interface Entry {
   part: Part;
   block: TextBlock;
   matches: Matches;
+  /** Whether it names a column of a table, and so cannot be replaced by itself. */
+  isHeading: boolean;
 }
 
 const SHOWN_AT_ONCE = 200; // entries; the next ones follow when the list is scrolled
@@ -58,6 +61,7 @@ export class TextPanel implements Panel {
   #replaceAll: HTMLButtonElement;
 
   #parts = new WeakMap<Part, TextPart>();
+  #columns = new WeakMap<Part, string[]>(); // of the parts that are tables
   #entries: Entry[] = [];
   #listed = 0;
   #heading = ""; // of the part whose entries are being listed
@@ -78,7 +82,7 @@ export class TextPanel implements Panel {
     private model: PackageModel,
     private page: Page,
   ) {
-    this.#replaceAll = button(page.text("package.text.replaceall"), () => this.#replace(this.#entries));
+    this.#replaceAll = button(page.text("package.text.replaceall"), () => this.#replace(this.#replaceable()));
     this.#list.setAttribute("aria-label", page.text("package.text.list"));
     this.element.append(this.#form(), this.#status, this.#list);
     this.#whenScrolled.observe(this.#more);
@@ -144,13 +148,15 @@ export class TextPanel implements Panel {
     this.#status.textContent = this.page.text("package.text.reading");
     const pattern = this.#pattern();
     const entries: Entry[] = [];
+    const headings = this.#headings();
     let since = performance.now();
     for (const part of this.#textParts()) {
       const read = this.#read(part);
+      const hasCells = /sharedStrings|worksheet/i.test(part.contentType);
       for (const block of read?.blocks ?? []) {
         const matches = pattern ? findMatches(block, pattern) : [];
         if (!pattern || matches.length > 0) {
-          entries.push({ part, block, matches });
+          entries.push({ part, block, matches, isHeading: hasCells && headings.has(comparable(block.text)) });
         }
       }
       if (performance.now() - since > 30) {
@@ -201,9 +207,32 @@ export class TextPanel implements Panel {
     return read;
   }
 
+  // What the columns of the document's tables are called.
+  #headings(): Set<string> {
+    const tables = [...this.model.parts].filter(({ contentType }) => isTable(contentType));
+    return new Set(tables.flatMap((table) => this.#columnNames(table)));
+  }
+
+  #columnNames(table: Part): string[] {
+    let names = this.#columns.get(table);
+    if (!names) {
+      try {
+        names = columnNames(decodePart(table.content)?.text ?? "");
+      } catch {
+        names = []; // not well-formed
+      }
+      this.#columns.set(table, names);
+    }
+    return names;
+  }
+
+  #replaceable(): Entry[] {
+    return this.#entries.filter(({ matches, isHeading }) => matches.length > 0 && !isHeading);
+  }
+
   #showEntries(isSearch: boolean): void {
     const count = this.#entries.reduce((sum, { matches }) => sum + matches.length, 0);
-    this.#replaceAll.disabled = count === 0;
+    this.#replaceAll.disabled = this.#replaceable().length === 0;
     const key = !isSearch ? "package.text.all" : count === 0 ? "package.text.none" : "package.text.found";
     this.#status.textContent = this.page.text(key, { count: isSearch ? count : this.#entries.length });
     this.#listed = 0;
@@ -231,7 +260,7 @@ export class TextPanel implements Panel {
   }
 
   #paragraph(entry: Entry): HTMLElement {
-    const { block, matches } = entry;
+    const { block, matches, isHeading } = entry;
     const paragraph = element("p", { dir: "auto" });
     let copied = 0;
     for (const { from, to } of matches) {
@@ -243,7 +272,9 @@ export class TextPanel implements Panel {
     }
     const end = Math.max(copied, LONGEST_SHOWN);
     paragraph.append(block.text.slice(copied, end), end < block.text.length ? " …" : "");
-    if (matches.length > 0) {
+    if (matches.length > 0 && isHeading) {
+      paragraph.append(" ", element("small", {}, this.page.text("package.text.heading")));
+    } else if (matches.length > 0) {
       const label = this.page.text("package.text.replace");
       paragraph.append(button(label, () => this.#replace([entry]), { className: "package-replace" }));
     }
