@@ -2,7 +2,7 @@
 // Saving: what is on disk afterwards, what becomes of what somebody else saved, and what outlives a reload, a
 // crash or a host that is killed.
 import assert from "node:assert/strict";
-import { chmodSync, unlinkSync } from "node:fs";
+import { appendFileSync, chmodSync, unlinkSync } from "node:fs";
 
 import { atEnd, waitFor } from "../../serve/processes.mjs";
 import { clientOf } from "./client.mjs";
@@ -346,4 +346,20 @@ browserTest("a browser whose storage is blocked opens and saves documents all th
   await page.keyboard.press("Control+s");
   await isSaved(page, "a.txt");
   assert.equal(session.read("a.txt").toString(), "zero one\n");
+});
+
+browserTest("a file that is written all the time is shown, as it was a moment ago", async (t) => {
+  const session = await Session.start(t, { "a.log": "one\n" });
+  const { page } = session;
+  const writing = setInterval(() => appendFileSync(session.path("a.log"), "more\n"), 1);
+  atEnd(t, () => clearInterval(writing));
+  await page.locator(".tree .row").getByText("a.log", { exact: true }).click();
+  await page.getByText("The file changes all the time").waitFor();
+  assert.match(await shownText(page), /^one\nmore/);
+  clearInterval(writing);
+  const written = session.read("a.log");
+  await type(page, "mine ");
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByText("somebody else has saved").waitFor();
+  assert.deepEqual(session.read("a.log"), written);
 });

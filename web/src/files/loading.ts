@@ -7,25 +7,27 @@ import { isPackage } from "./paths.js";
 /** There is no such document, or it cannot be read; the message says why. */
 export class UnreadableDocument extends Error {}
 
-type Reader = Pick<Client, "readVersioned" | "version" | "charset" | "readVersion">;
+type Reader = Pick<Client, "read" | "version" | "charset" | "readVersion">;
+
+const MOST_READINGS = 3; // of a file that changes all the time, as a log does
 
 /**
  * Reads the document at `path`. A text comes with the charset that it is in; when somebody saves meanwhile,
- * it is read again, so that content, charset and version belong together. Throws UnreadableDocument, and what
- * the client throws.
+ * it is read again, so that content, charset and version belong together. A document that changes during each
+ * reading is returned as changing, with a version that has passed. Throws UnreadableDocument, and what the
+ * client throws.
  */
 export async function load(client: Reader, path: string, options: RequestOptions = {}): Promise<LoadedDocument> {
-  if (isPackage(path)) {
-    const { answer, version } = await client.readVersioned(path, "text/xml", options);
-    return { path, version, answer: readable(answer) };
-  }
-  for (;;) {
-    const { answer, version } = await client.readVersioned(path, "text/plain", options);
-    readable(answer);
-    const { charset, byteOrderMark } = await client.charset(path, options);
-    if ((await client.version(path, options)) === version) {
-      return { path, version, answer, charset, byteOrderMark };
+  const contentType = isPackage(path) ? "text/xml" : "text/plain";
+  let version = await client.version(path, options);
+  for (let readings = 1; ; ++readings) {
+    const answer = readable(await client.read(path, contentType, options));
+    const form = isPackage(path) ? {} : await client.charset(path, options);
+    const after = await client.version(path, options);
+    if (after === version || readings === MOST_READINGS) {
+      return { path, version, answer, ...form, ...(after !== version && { isChanging: true }) };
     }
+    version = after;
   }
 }
 

@@ -221,7 +221,7 @@ export class OpenDocument {
     if (hasFocus) {
       this.#view.focus(); // which was there while the document was being read
     }
-    this.#setStatus("");
+    this.#setStatus(loaded.isChanging ? text("document.changing") : "");
     if (!draft) {
       void this.#keeper.clear();
       return;
@@ -250,6 +250,7 @@ export class OpenDocument {
         replace: (theirs) => {
           this.#loaded = theirs;
           this.#view!.replace(theirs);
+          this.#setStatus(theirs.isChanging ? text("document.changing") : "");
         },
         resolve: (theirs) => resolveConflict(this.name, this.#view!, theirs),
         update: () => {

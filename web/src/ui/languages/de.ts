@@ -55,6 +55,7 @@ export const de: Record<string, string> = {
   "document.reopen.title": "{name} neu lesen?",
   "document.reopen.message": "Ungespeicherte Änderungen gehen verloren.",
   "document.reopen.yes": "Neu lesen",
+  "document.changing": "Die Datei ändert sich ständig; so war sie vor einem Augenblick.",
   "document.reloaded": "{name} wurde von jemand anderem gespeichert und wird im jetzigen Stand gezeigt.",
   "document.theirs": "{name} wurde von jemand anderem gespeichert. Ihre Änderungen bleiben erhalten; beim Speichern können Sie beides vergleichen.",
   "image.problem": "{name} lässt sich nicht als Bild zeigen.",

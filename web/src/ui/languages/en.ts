@@ -55,6 +55,7 @@ export const en: Record<string, string> = {
   "document.reopen.title": "Read {name} again?",
   "document.reopen.message": "Changes that are not saved are lost.",
   "document.reopen.yes": "Read again",
+  "document.changing": "The file changes all the time; this is how it was a moment ago.",
   "document.reloaded": "{name} was saved by somebody else and is shown as it is now.",
   "document.theirs": "{name} was saved by somebody else. Your changes are kept; when you save, you can compare both.",
   "image.problem": "{name} cannot be shown as an image.",
