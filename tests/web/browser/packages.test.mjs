@@ -71,6 +71,26 @@ browserTest("one paragraph's match is replaced alone, and that is undone and don
   assert.match(textIn(await save(session, "report.docx"), "word/header1.xml"), /Annual report, page/);
 });
 
+browserTest("a single replacement leaves the list where it is scrolled to", async (t) => {
+  const body = Array.from({ length: 600 }, (_, index) => `<w:p><w:r><w:t>Annual report ${index}</w:t></w:r></w:p>`);
+  const { page } = await open(t, "report.docx", wordFiles(body.join("")));
+  await page.getByLabel("Find", { exact: true }).fill("Annual report");
+  await page.getByLabel("Replace with").fill("Budget");
+  const list = page.getByRole("region", { name: "Text of the document" });
+  const replace = (index) =>
+    list.locator("p", { hasText: new RegExp(`^Annual report ${index}(?!\\d)`) }).getByRole("button", { name: "Replace", exact: true });
+  for (const shown of [190, 390, 450]) {
+    await replace(shown).scrollIntoViewIfNeeded(); // more is listed as it comes near the end
+  }
+  const before = await replace(452).boundingBox();
+  await replace(451).click();
+  await page.getByText("601 found").waitFor();
+  const after = await replace(452).boundingBox();
+  assert.ok(Math.abs(after.y - before.y) <= 1.5 * before.height + 10, `${before.y} before, ${after.y} after`);
+  await page.getByLabel("Match case").check(); // another search, which begins at the top
+  await page.waitForFunction((one) => one.scrollTop === 0, await list.elementHandle());
+});
+
 // A workbook whose shared string "Other" is the heading of a table's only column.
 function tableFiles() {
   const files = workbookFiles();

@@ -89,7 +89,7 @@ export class TextPanel implements Panel {
     this.#stopListening = model.listen(() => {
       this.#isStale = true;
       if (this.#isShown) {
-        void this.#search();
+        void this.#search({ keepsPlace: true });
       }
     });
   }
@@ -141,7 +141,7 @@ export class TextPanel implements Panel {
   }
 
   // Part by part, letting the page do other things between them, until it is asked for again.
-  async #search(): Promise<void> {
+  async #search({ keepsPlace = false } = {}): Promise<void> {
     const reading = ++this.#reading;
     this.#isStale = false;
     this.#replaceAll.disabled = true;
@@ -168,7 +168,12 @@ export class TextPanel implements Panel {
       }
     }
     this.#entries = entries;
+    const place = keepsPlace ? { listed: this.#listed, scrollTop: this.#list.scrollTop } : { listed: 0, scrollTop: 0 };
     this.#showEntries(pattern !== undefined);
+    while (this.#listed < Math.min(place.listed, entries.length)) {
+      this.#listMore();
+    }
+    this.#list.scrollTop = place.scrollTop;
   }
 
   #pattern(): RegExp | undefined {
