@@ -183,6 +183,9 @@ browserTest("what is typed into XML that declares a charset nobody knows is save
   await page.locator(".mark.unsaved").waitFor({ state: "detached" });
   const saved = textIn(session.read("report.docx"), "word/document.xml");
   assert.match(saved, /^<\?xml version="1.0" encoding="UTF-98".*Cr\u00e8me br\u00fbl\u00e9e \u6e2f/s);
+  await page.reload();
+  await openPart(page, "document.xml"); // where the declaration can be mended
+  await page.getByRole("textbox", { name: "/word/document.xml" }).getByText('encoding="UTF-98"').waitFor();
 });
 
 browserTest("two replacements at once, in a long part that is read again after the first, leave its XML whole", async (t) => {

@@ -4,7 +4,7 @@ import { test } from "node:test";
 
 import { room } from "../room.mjs";
 
-const { decodePart, encodePart } = await room("package/part_text.ts");
+const { decodePart, encodePart, isAsDeclared } = await room("package/part_text.ts");
 const bytes = (...args) => Buffer.from(...args).toString("latin1");
 
 test("UTF-8 with and without a mark comes back", () => {
@@ -44,13 +44,31 @@ test("the charset follows the declaration as it is edited", () => {
   assert.ok(utf16.startsWith("\xff\xfe<\0?\0"));
 });
 
-test("what declares a charset that nobody writes is kept, and is no text any more", () => {
+test("what declares a charset that nobody writes is kept in UTF-8", () => {
   const decoded = decodePart(bytes(`<?xml version="1.0" encoding="UTF-8"?><a>ü 港</a>`));
+  assert.equal(isAsDeclared(decoded), true);
   for (const charset of ["UTF-9", "Shift_JIS"]) {
-    const text = decoded.text.replace("UTF-8", charset);
-    assert.equal(encodePart({ ...decoded, text }), bytes(text));
-    assert.equal(decodePart(bytes(text.replace("ü 港", ""))), undefined);
+    const edited = { ...decoded, text: decoded.text.replace("UTF-8", charset) };
+    assert.equal(encodePart(edited), bytes(edited.text));
+    assert.equal(isAsDeclared(edited), false);
   }
+});
+
+test("what declares a charset that nobody knows is a text in UTF-8, if it is in that, with and without a mark", () => {
+  const text = `<?xml version="1.0" encoding="UTF-9"?><a>ü 港</a>`;
+  for (const mark of ["", "\ufeff"]) {
+    const decoded = decodePart(bytes(mark + text));
+    assert.equal(decoded.text, text);
+    assert.equal(encodePart(decoded), bytes(mark + text));
+    assert.equal(isAsDeclared(decoded), false);
+  }
+  assert.equal(decodePart(bytes(text, "latin1")), undefined);
+});
+
+test("ASCII in a charset of several bytes is a text as it is declared", () => {
+  const content = '<?xml version="1.0" encoding="Shift_JIS"?><a>one</a>';
+  assert.equal(encodePart(decodePart(content)), content);
+  assert.equal(isAsDeclared(decodePart(content)), true);
 });
 
 test("what loses the declaration of its charset is UTF-8", () => {

@@ -6,7 +6,7 @@ import { button, element, shortcutKey } from "../ui/dom.js";
 import { PackageComparison } from "./comparison.js";
 import { PackageModel, type PackageDraft, documentOf } from "./package_model.js";
 import { kindOf, textOf } from "./part_kinds.js";
-import { decodePart } from "./part_text.js";
+import { decodePart, isAsDeclared } from "./part_text.js";
 import { PartsPanel } from "./parts_panel.js";
 import { Preview } from "./preview.js";
 import { PropertiesPanel } from "./properties_panel.js";
@@ -268,7 +268,7 @@ export class PackageView implements DocumentView {
     );
     const isBroken = (content: string) => {
       const decoded = decodePart(content);
-      return !decoded || findXmlError(decoded.text) !== undefined;
+      return !decoded || !isAsDeclared(decoded) || findXmlError(decoded.text) !== undefined;
     };
     return changed.filter(({ content }) => isBroken(content)).map(({ partUri }) => textOf(partUri));
   }

@@ -20,7 +20,7 @@ export function decodePart(content: string): PartText | undefined {
     const decoded = new TextDecoder(charset, { fatal: true, ignoreBOM: true }).decode(bytesOf(content));
     const mark = decoded.startsWith("\ufeff");
     const result = { text: mark ? decoded.slice(1) : decoded, charset, mark };
-    return encodeDeclared(result) === content ? result : undefined;
+    return encodePart(result) === content ? result : undefined;
   } catch {
     return undefined; // not in that charset, or in none that is known here
   }
@@ -29,13 +29,23 @@ export function decodePart(content: string): PartText | undefined {
 /**
  * The content for a part with that text, in the charset that its XML declaration names, or else in that
  * of `charset`. XML gets character references for what the charset lacks. Where the text cannot be written
- * like that, it is in UTF-8, so that nothing is lost; decodePart() tells it by its declaration, if it has one.
+ * like that, it is in UTF-8, so that nothing is lost; isAsDeclared() tells that.
  */
 export function encodePart(part: PartText): string {
   try {
     return encodeDeclared(part);
   } catch {
-    return stringOf(new TextEncoder().encode(part.text));
+    return stringOf(new TextEncoder().encode(part.mark ? `\ufeff${part.text}` : part.text));
+  }
+}
+
+/** Whether encodePart() writes that text in the charset that its XML declaration names, if it has one. */
+export function isAsDeclared(part: PartText): boolean {
+  try {
+    encodeDeclared(part);
+    return true;
+  } catch {
+    return false;
   }
 }
 
@@ -90,6 +100,9 @@ function encodeUtf16(text: string, isLittleEndian: boolean): string {
 
 // Throws RangeError for charsets with more than a byte to a character.
 function encodeSingleBytes(text: string, charset: string): string {
+  if (/^[\0-\x7f]*$/.test(text)) {
+    return text; // the same in all of them, also in those of several bytes
+  }
   const byteOf = new Map<string, string>();
   const decoder = new TextDecoder(charset);
   for (let byte = 0; byte < 256; ++byte) {
