@@ -353,8 +353,14 @@ browserTest("a file that is written all the time is shown, as it was a moment ag
   const { page } = session;
   const writing = setInterval(() => appendFileSync(session.path("a.log"), "more\n"), 1);
   atEnd(t, () => clearInterval(writing));
-  await page.locator(".tree .row").getByText("a.log", { exact: true }).click();
-  await page.getByText("The file changes all the time").waitFor();
+  await open(page, "a.log");
+  // On a busy machine, the file may rest for as long as a reading takes.
+  await waitFor("the line that says so", async () => {
+    await page.reload();
+    await text(page).waitFor();
+    await page.waitForTimeout(200);
+    return page.getByText("The file changes all the time").isVisible();
+  });
   assert.match(await shownText(page), /^one\nmore/);
   clearInterval(writing);
   const written = session.read("a.log");
