@@ -150,6 +150,16 @@ protected:
 
     void TearDown() override { platform::messaging::setTransport({}); }
 
+    // Has saves keep what they replace, in the history that is returned.
+    std::shared_ptr<host::History> keepHistory() {
+        const auto history = std::make_shared<host::History>(
+            host::HistoryOptions{state_ / "versions", {folder_.path()}});
+        bundle_.reset();
+        saves_ = std::make_shared<host::Saves>(state_ / "locks", history);
+        bundle_ = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
+        return history;
+    }
+
     std::string at(const std::string& name) const { return folder_ / name; }
 
     // A save of the new text, or with other members.
@@ -311,11 +321,7 @@ TEST_F(GuardedSaveFaults, AnswerTrueToARepetitionOnlyWhenItIsSafeOnDisk) {
 
 // The new text is there then, although the answer is false.
 TEST_F(GuardedSaveFaults, KeepWhatWasReplacedWhenTheFolderCannotBeSynced) {
-    const auto history = std::make_shared<host::History>(
-        host::HistoryOptions{state_ / "versions", {folder_.path()}});
-    bundle_.reset();
-    saves_ = std::make_shared<host::Saves>(state_ / "locks", history);
-    bundle_ = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
+    const auto history = keepHistory();
     for (const std::string type : {"text/plain", "text/xml"}) {
         const std::string path = at(type.substr(5));
         writeFile(path, "old");
@@ -336,11 +342,7 @@ TEST_F(GuardedSaveFaults, KeepWhatWasReplacedWhenTheFolderCannotBeSynced) {
 }
 
 TEST_F(GuardedSaveFaults, TellTheTruthWhicheverAllocationFails) {
-    const auto history = std::make_shared<host::History>(
-        host::HistoryOptions{state_ / "versions", {folder_.path()}});
-    bundle_.reset();
-    saves_ = std::make_shared<host::Saves>(state_ / "locks", history);
-    bundle_ = std::make_unique<framework::BundleRunner>(SERIALIZATION_BUNDLE);
+    const auto history = keepHistory();
     const auto save = saving(at("a.txt"));
     std::map<std::string, int> answers;
     for (long failing = 0, allocations = 1; failing < allocations; ++failing) {
