@@ -21,8 +21,8 @@
 #include "platform/i18n/charsets/charset.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/i18n/detection/escape_sequences.h"
+#include "platform/i18n/detection/evidence.h"
 #include "platform/i18n/detection/likeliest_charset.h"
-#include "platform/i18n/detection/sample.h"
 #include "platform/i18n/detection/text_counts.h"
 #include "platform/i18n/detection/unmarked_unicode.h"
 
@@ -67,22 +67,25 @@ std::string markedCharset(std::string_view bytes) {
     return {};
 }
 
-bool isAscii(std::string_view bytes) {
+// What is asked of the bytes of every file. Large files come from memory for each pass over them,
+// so it is asked in one.
+struct Survey {
+    bool isAscii;
+    bool hasStrayControls;
+    bool mayHaveEscapes;
+};
+
+Survey surveyOf(std::string_view bytes) {
     // Without an early exit, so that the compiler vectorizes the loop: many times faster.
     unsigned char all = 0;
+    unsigned char controls = 0;
+    unsigned char escapes = 0;
     for (const char byte : bytes) {
         all |= static_cast<unsigned char>(byte);
+        controls |= static_cast<unsigned char>(detail::isStrayControl(byte));
+        escapes |= static_cast<unsigned char>(detail::mayBeginEscape(byte));
     }
-    return all < 0x80;
-}
-
-bool hasStrayControls(std::string_view bytes) {
-    // Without an early exit, as above.
-    unsigned char found = 0;
-    for (const char byte : bytes) {
-        found |= static_cast<unsigned char>(detail::isStrayControl(byte));
-    }
-    return found != 0;
+    return {all < 0x80, controls != 0, escapes != 0};
 }
 
 // Whether so much of the sample is control codes that it is not text in any legacy charset.
@@ -117,23 +120,24 @@ bool isDamagedUtf8(std::string_view sample) {
 }
 
 std::string legacyCharset(std::string_view bytes) {
-    const std::string sample = detail::charsetSample(bytes);
+    const detail::Evidence evidence(bytes);
+    const std::string& sample = evidence.sample;
     const std::optional<detail::UnmarkedUnicode> unicode = detail::unmarkedUnicode(bytes);
     const std::string otherwise = unicode ? unicode->charset : "";
     if (isBinary(sample) || isDamagedUtf8(sample)) {
         return otherwise;
     }
     std::vector<const detail::LegacyCharset*> excluded;
-    while (const auto likely = detail::likeliestCharset(sample, bytes, excluded)) {
+    while (const auto likely = detail::likeliestCharset(evidence, excluded)) {
         if (unicode && unicode->bitsPerByte * static_cast<double>(sample.size()) <
                            static_cast<double>(likely->cost) / detail::bits(1)) {
             return otherwise;
         }
-        const detail::LegacyCharset::Fit fit = likely->charset->fit(bytes);
+        const detail::LegacyCharset::Fit fit = likely->charset->fit(evidence);
         if (fit.decodes) {
             // When the right charset would not give the bytes back, no other one is right either.
             return fit.name == likely->charset->name()
-                       ? detail::largestThatAgrees(*likely->charset, bytes).name()
+                       ? detail::largestThatAgrees(*likely->charset, evidence).name()
                        : fit.name;
         }
         excluded.push_back(likely->charset);
@@ -151,9 +155,10 @@ std::string asciiLookingEbcdic(std::string_view bytes) {
     if (head.find(' ') != std::string_view::npos || !detail::looksLikeEbcdic(head)) {
         return {};
     }
-    const auto likely = detail::likeliestCharset(detail::charsetSample(bytes), bytes, {});
+    const detail::Evidence evidence(bytes);
+    const auto likely = detail::likeliestCharset(evidence, {});
     return likely && likely->charset->kind() == detail::CharsetKind::ebcdic
-               ? likely->charset->fit(bytes).name
+               ? likely->charset->fit(evidence).name
                : std::string();
 }
 
@@ -161,22 +166,22 @@ std::string findCharset(std::string_view bytes) {
     if (std::string marked = markedCharset(bytes); !marked.empty()) {
         return marked;
     }
-    if (!simdjson::validate_utf8(bytes.data(), bytes.size())) {
+    const Survey survey = surveyOf(bytes);
+    if (!survey.isAscii && !simdjson::validate_utf8(bytes.data(), bytes.size())) {
         return legacyCharset(bytes);
     }
     // Valid UTF-8, but so are the bytes of escape sequences, and some of UTF-16 and EBCDIC.
-    const bool ascii = isAscii(bytes);
-    if (ascii) {
+    if (survey.isAscii && survey.mayHaveEscapes) {
         if (std::string escaped = detail::escapedCharset(bytes); !escaped.empty()) {
             return escaped;
         }
     }
-    if (hasStrayControls(bytes) &&
+    if (survey.hasStrayControls &&
         (bytes.find('\0') != std::string_view::npos || isBinary(bytes))) {
         const std::optional<detail::UnmarkedUnicode> unicode = detail::unmarkedUnicode(bytes);
         return unicode ? unicode->charset : "UTF-8";
     }
-    const std::string ebcdic = ascii ? asciiLookingEbcdic(bytes) : "";
+    const std::string ebcdic = survey.isAscii ? asciiLookingEbcdic(bytes) : "";
     return ebcdic.empty() ? "UTF-8" : ebcdic;
 }
 
@@ -188,6 +193,10 @@ void requireTextLength(std::uintmax_t length) {
                                  " bytes, at most " + std::to_string(maxTextLength) +
                                  " are accepted");
     }
+}
+
+bool hasEscapeSequences(std::string_view charset) {
+    return detail::isEscapedCharset(charset);
 }
 
 std::string detect_charset(const char* data, std::size_t length, std::ostream& diagnostics,

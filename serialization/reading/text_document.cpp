@@ -31,8 +31,8 @@ using platform::filesystem::exists;
 using platform::filesystem::make_native_access_form_with_cleanup;
 using platform::i18n::codecvt_string_to_ustring;
 using platform::i18n::codecvt_ustring_to_string;
-using platform::i18n::comesBackUnchanged;
 using platform::i18n::detect_charset;
+using platform::i18n::hasEscapeSequences;
 using platform::i18n::requireTextLength;
 using platform::i18n::restoreEndOfFileMarks;
 using platform::i18n::to_string;
@@ -151,8 +151,9 @@ json::Object Serialization::readTextDocument(std::u16string path, std::size_t lo
 std::string Serialization::readTextFileContent(std::u16string path) const {
     std::string bytes = readFileBytes(std::move(path));
     const std::string charset = detectedCharset(bytes);
-    if (comesBackUnchanged(bytes, charset)) {
-        // Nearly every file takes this path, so a large one is not held in UTF-16 too.
+    if (!hasEscapeSequences(charset)) {
+        // Bytes come back unchanged from what they were found to be in, so a large text is not held
+        // in UTF-16 too.
         return cleaned(std::move(bytes), charset);
     }
     const std::u16string text = decode(bytes, charset);

@@ -62,4 +62,11 @@ std::string escapedCharset(std::string_view bytes) {
     return bytes.find("~{") != std::string_view::npos ? bestOf(hzCharsets, bytes) : std::string();
 }
 
+bool isEscapedCharset(std::string_view charset) {
+    const auto holds = [charset](std::span<const char* const> charsets) {
+        return std::find(charsets.begin(), charsets.end(), charset) != charsets.end();
+    };
+    return holds(iso2022Charsets) || holds(hzCharsets);
+}
+
 }  // namespace platform::i18n::detail

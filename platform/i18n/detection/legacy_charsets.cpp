@@ -106,18 +106,6 @@ std::vector<std::string_view> spellings(std::string_view charset) {
 
 }  // namespace
 
-ByteSet bytesIn(std::string_view bytes) {
-    std::array<bool, 256> found{};
-    for (const char byte : bytes) {
-        found[static_cast<unsigned char>(byte)] = true;
-    }
-    ByteSet set;
-    for (std::size_t byte = 0; byte < found.size(); ++byte) {
-        set[byte] = found[byte];
-    }
-    return set;
-}
-
 LegacyCharset::LegacyCharset(const char* name, CharsetKind kind, double priorBits)
     : name_(name), kind_(kind), prior_(bits(priorBits)) {
     if (kind_ != CharsetKind::multiByte) {
@@ -164,11 +152,12 @@ std::optional<std::u16string> LegacyCharset::decode(std::string_view bytes) cons
     }
 }
 
-LegacyCharset::Fit LegacyCharset::fit(std::string_view bytes) const {
+LegacyCharset::Fit LegacyCharset::fit(const Evidence& evidence) const {
     if (kind_ != CharsetKind::multiByte) {
-        const bool fits = decodes(bytesIn(bytes));
+        const bool fits = decodes(evidence.values);
         return {fits, fits ? name_ : std::string()};
     }
+    const std::string_view bytes = evidence.bytes;
     if (openCharset(name_, true)->roundTrips(bytes)) {
         return {true, name_};
     }

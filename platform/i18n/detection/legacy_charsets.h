@@ -3,19 +3,15 @@
 #pragma once
 
 #include <array>
-#include <bitset>
 #include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
+#include "platform/i18n/detection/evidence.h"
 #include "platform/i18n/detection/language_model.h"
 
 namespace platform::i18n::detail {
-
-/// Which of the 256 byte values a text holds.
-using ByteSet = std::bitset<256>;
-ByteSet bytesIn(std::string_view bytes);
 
 enum class CharsetKind { singleByte, multiByte, ebcdic };
 
@@ -42,7 +38,7 @@ public:
         /// of a variant which decodes to the same text. Empty when there is none.
         std::string name;
     };
-    Fit fit(std::string_view bytes) const;
+    Fit fit(const Evidence& evidence) const;
 
     /// A language that the charset was made for, and what each byte is to its model.
     struct Language {

@@ -18,7 +18,6 @@
 #include <string>
 
 #include "platform/i18n/charsets/charset.h"
-#include "platform/i18n/detection/declared_charset.h"
 #include "platform/i18n/detection/text_counts.h"
 
 namespace platform::i18n::detail {
@@ -113,14 +112,12 @@ LanguagePriors::AsciiWords LanguagePriors::asciiWordsOf(std::string_view sample)
 // The search for the cheapest charset.
 class Search {
 public:
-    Search(std::string_view sample, std::string_view bytes,
-           const std::vector<const LegacyCharset*>& excluded)
-        : sample_(sample),
-          isCut_(sample.size() < bytes.size() && !sample.ends_with('\n')),
-          values_(bytesIn(bytes)),
-          declared_(declaredCharset(bytes)),
+    Search(const Evidence& evidence, const std::vector<const LegacyCharset*>& excluded)
+        : evidence_(evidence),
+          sample_(evidence.sample),
+          isCut_(sample_.size() < evidence.bytes.size() && !sample_.ends_with('\n')),
           excluded_(excluded),
-          priors_(sample) {}
+          priors_(sample_) {}
 
     std::optional<LikelyCharset> cheapest() {
         const bool mayBeEbcdic = looksLikeEbcdic(sample_);
@@ -148,7 +145,7 @@ private:
     }
 
     Cost priorOf(const LegacyCharset& charset) const {
-        return charset.prior() - hintFor(charset, declared_);
+        return charset.prior() - hintFor(charset, evidence_.declared);
     }
 
     void consider(const LegacyCharset& charset, Cost cost) {
@@ -225,7 +222,7 @@ private:
     std::vector<Reading> readingsOf(std::span<const UnitPair> pairs) const {
         std::vector<Reading> readings;
         for (const LegacyCharset& charset : legacyCharsets()) {
-            if (charset.kind() != CharsetKind::singleByte || !charset.decodes(values_) ||
+            if (charset.kind() != CharsetKind::singleByte || !charset.decodes(evidence_.values) ||
                 isExcluded(charset)) {
                 continue;
             }
@@ -256,10 +253,9 @@ private:
         return costOfWords(pairs, *reading.language->model, classOf, best_.cost - reading.cost);
     }
 
+    const Evidence& evidence_;
     std::string_view sample_;
     bool isCut_;  // the sample ends anywhere in the file
-    ByteSet values_;
-    std::string declared_;
     const std::vector<const LegacyCharset*>& excluded_;
     LanguagePriors priors_;
     LikelyCharset best_{nullptr, infinite};
@@ -273,21 +269,20 @@ bool looksLikeEbcdic(std::string_view sample) {
            static_cast<std::size_t>(blanks) > sample.size() / 20;
 }
 
-std::optional<LikelyCharset> likeliestCharset(std::string_view sample, std::string_view bytes,
+std::optional<LikelyCharset> likeliestCharset(const Evidence& evidence,
                                               const std::vector<const LegacyCharset*>& excluded) {
-    return Search(sample, bytes, excluded).cheapest();
+    return Search(evidence, excluded).cheapest();
 }
 
-const LegacyCharset& largestThatAgrees(const LegacyCharset& charset, std::string_view bytes) {
+const LegacyCharset& largestThatAgrees(const LegacyCharset& charset, const Evidence& evidence) {
     const LegacyCharset* largest = &charset;
     if (charset.kind() == CharsetKind::multiByte ||
-        isSameCharset(charset.name(), declaredCharset(bytes))) {
+        isSameCharset(charset.name(), evidence.declared)) {
         return charset;
     }
-    const ByteSet values = bytesIn(bytes);
     for (const LegacyCharset& other : legacyCharsets()) {
         if (other.prior() <= charset.prior() && other.repertoire() > largest->repertoire() &&
-            other.agreesWith(charset, values) && other.holdsLettersOf(charset)) {
+            other.agreesWith(charset, evidence.values) && other.holdsLettersOf(charset)) {
             largest = &other;
         }
     }

@@ -20,15 +20,15 @@ struct LikelyCharset {
 /// length.
 bool looksLikeEbcdic(std::string_view sample);
 
-/// The charset in which `sample` costs least, of those that can decode it and, as far as its byte
-/// values tell, the whole file `bytes` that it was taken from; nothing when there is none but those
-/// in `excluded`. Linear in the length of the sample.
-std::optional<LikelyCharset> likeliestCharset(std::string_view sample, std::string_view bytes,
+/// The charset in which the sample costs least, of those that can decode it and, as far as its byte
+/// values tell, the whole file; nothing when there is none but those in `excluded`. Linear in the
+/// length of the sample.
+std::optional<LikelyCharset> likeliestCharset(const Evidence& evidence,
                                               const std::vector<const LegacyCharset*>& excluded);
 
-/// Of the charsets that are no rarer than `charset`, read every byte of `bytes` as it does and hold
-/// all its letters, the one that holds most characters, so that people can add some (windows-1252
-/// rather than ISO-8859-1); but `charset` itself when the text names it.
-const LegacyCharset& largestThatAgrees(const LegacyCharset& charset, std::string_view bytes);
+/// Of the charsets that are no rarer than `charset`, read every byte of the file as it does and
+/// hold all its letters, the one that holds most characters, so that people can add some
+/// (windows-1252 rather than ISO-8859-1); but `charset` itself when the file names it.
+const LegacyCharset& largestThatAgrees(const LegacyCharset& charset, const Evidence& evidence);
 
 }  // namespace platform::i18n::detail

@@ -19,6 +19,8 @@
 namespace EditorServices {
 namespace {
 
+using platform::i18n::codecvt_ustring_to_string;
+using platform::i18n::to_string;
 using platform::i18n::to_ustring;
 using test::writeFile;
 
@@ -81,6 +83,16 @@ TEST_F(TextDocumentReading, KeepsUtf16InItsByteOrderWithoutTheMark) {
     EXPECT_EQ(service.readTextFileContent(file(little)), little.substr(2));
     const std::string big("\xFE\xFF\0h\0i", 6);
     EXPECT_EQ(service.readTextFileContent(file(big)), big.substr(2));
+}
+
+TEST_F(TextDocumentReading, KeepsCharactersOfTwoUnitsWithAndWithoutAMark) {
+    for (const char* charset : {"UTF-16LE", "UTF-16BE", "UTF-32LE", "UTF-32BE"}) {
+        codecvt_ustring_to_string converter(charset, true);
+        const std::string mark = to_string(u"\uFEFF", converter);
+        const std::string text = to_string(u"a smile: \U0001F600, and a line\n", converter);
+        EXPECT_EQ(service.readTextFileContent(file(mark + text)), text) << charset;
+        EXPECT_EQ(service.readTextFileContent(file(text)), text) << charset;
+    }
 }
 
 TEST_F(TextDocumentReading, KeepsTheBytesOfTheFilesOwnCharset) {

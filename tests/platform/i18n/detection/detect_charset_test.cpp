@@ -386,6 +386,18 @@ TEST(DetectCharset, AnyBytesComeBackFromWhatItReturns) {
     }
 }
 
+TEST(DetectCharset, FindsEscapeSequencesOnlyInCharsetsThatAreSaidToHaveThem) {
+    EXPECT_TRUE(hasEscapeSequences(detect("\x1B$B$\"\x1B(B")));
+    EXPECT_TRUE(hasEscapeSequences(detect("~{VPND~}")));
+    EXPECT_FALSE(hasEscapeSequences(detect("a")));
+    EXPECT_FALSE(
+        hasEscapeSequences(detect("\xFF\xFE"
+                                  "a\0"s)));
+    for (const detail::LegacyCharset& charset : detail::legacyCharsets()) {
+        EXPECT_FALSE(hasEscapeSequences(charset.name())) << charset.name();
+    }
+}
+
 TEST(DetectCharset, ReadsDuplicateCodesAndGivesThemBack) {
     struct Case {
         const char* language;

@@ -1,13 +1,16 @@
 // SPDX-License-Identifier: Apache-2.0
-// Takes a sample of a file that is enough to detect its charset.
+// What the charset of a file is detected from.
 //
-// Pieces from all over the file show its language. Added to them are the words around byte values
-// that these pieces lack: often two charsets differ in a single letter, and that letter may occur
-// once.
-#include "platform/i18n/detection/sample.h"
+// Pieces from all over a large file show its language. Added to them are the words around byte
+// values that these pieces lack: often two charsets differ in a single letter, and that letter may
+// occur once.
+#include "platform/i18n/detection/evidence.h"
 
 #include <algorithm>
 #include <array>
+#include <cstddef>
+
+#include "platform/i18n/detection/declared_charset.h"
 
 namespace platform::i18n::detail {
 
@@ -39,9 +42,26 @@ std::size_t findBeyondAscii(std::string_view bytes, std::size_t from) {
     return static_cast<std::size_t>(found - bytes.begin());
 }
 
+ByteSet valuesIn(std::string_view bytes) {
+    std::array<bool, 256> found{};
+    for (const char byte : bytes) {
+        found[static_cast<unsigned char>(byte)] = true;
+    }
+    ByteSet set;
+    for (std::size_t byte = 0; byte < found.size(); ++byte) {
+        set[byte] = found[byte];
+    }
+    return set;
+}
+
 class Sampler {
 public:
-    explicit Sampler(std::string_view bytes) : bytes_(bytes) {}
+    Sampler(std::string_view bytes, const ByteSet& values) : bytes_(bytes) {
+        for (std::size_t value = 0x80; value < values.size(); ++value) {
+            isRare_[value] = values[value];
+            rareCount_ += values[value] ? 1U : 0U;
+        }
+    }
 
     std::string sample() {
         for (std::size_t i = 0; i < pieceCount; ++i) {
@@ -63,7 +83,7 @@ public:
 private:
     void takeRareBytes() {
         done_ = 0;
-        for (std::size_t i = 0; i < bytes_.size(); ++i) {
+        for (std::size_t i = 0; rareCount_ > 0 && i < bytes_.size(); ++i) {
             if (isRare_[static_cast<unsigned char>(bytes_[i])] && i >= done_) {
                 take(i, i + 1, wordSearch);
             }
@@ -80,7 +100,10 @@ private:
         }
         for (const char byte : bytes_.substr(first, last - first)) {
             const auto value = static_cast<unsigned char>(byte);
-            isRare_[value] = isBeyondAscii(byte) && ++occurrences_[value] < wantedOccurrences;
+            if (isRare_[value] && ++occurrences_[value] == wantedOccurrences) {
+                isRare_[value] = false;
+                --rareCount_;
+            }
         }
         sample_ += bytes_.substr(first, last - first);
         sample_ += '\n';
@@ -110,20 +133,19 @@ private:
     std::string_view bytes_;
     std::string sample_;
     std::array<int, 256> occurrences_{};
-    // Whether the sample needs more of a byte. All bytes beyond ASCII are rare at first.
-    std::array<bool, 256> isRare_ = [] {
-        std::array<bool, 256> rare{};
-        std::fill(rare.begin() + 0x80, rare.end(), true);
-        return rare;
-    }();
+    // Whether the sample needs more of a byte. All beyond ASCII that occur are rare at first.
+    std::array<bool, 256> isRare_{};
+    std::size_t rareCount_ = 0;  // how many are
     // The end of the last piece taken, which is a boundary.
     std::size_t done_ = 0;
 };
 
 }  // namespace
 
-std::string charsetSample(std::string_view bytes) {
-    return bytes.size() <= wholeFileLimit ? std::string(bytes) : Sampler(bytes).sample();
-}
+Evidence::Evidence(std::string_view all)
+    : bytes(all),
+      values(valuesIn(all)),
+      declared(declaredCharset(all)),
+      sample(all.size() <= wholeFileLimit ? std::string(all) : Sampler(all, values).sample()) {}
 
 }  // namespace platform::i18n::detail
