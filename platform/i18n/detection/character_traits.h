@@ -30,6 +30,12 @@ inline const CharacterTraits& traitsOf(char16_t c) {
     return allTraits()[c];
 }
 
+/// Whether a letter beyond ASCII has no other such letter beside it where `neighbour` is. `all` is
+/// what allTraits() returns.
+inline bool isAloneBeside(const CharacterTraits* all, char16_t neighbour) {
+    return neighbour < 0x80 || !all[neighbour].isLetter;
+}
+
 /// The cost of the non-ASCII character `sign`, which is not a letter, between its neighbours; those
 /// are '\0' at the ends of the text. `all` is what allTraits() returns.
 Cost signCost(const CharacterTraits* all, char16_t before, char16_t sign, char16_t after);

@@ -157,9 +157,9 @@ Cost costOfWords(const TextCounts& counts, const UnigramModel& model, Cost limit
             }
         }
     }
-    const auto isAlone = [traits](char16_t c) { return c < 0x80 || !traits[c].isLetter; };
     for (const UnitTriple& triple : counts.triples) {
-        if (traits[triple.current].isLetter && isAlone(triple.before) && isAlone(triple.after)) {
+        if (traits[triple.current].isLetter && isAloneBeside(traits, triple.before) &&
+            isAloneBeside(traits, triple.after)) {
             cost += triple.count * model.loneCost(triple.current);
         }
     }

@@ -16,6 +16,7 @@
 #include <limits>
 #include <map>
 #include <string>
+#include <utility>
 
 #include "platform/i18n/charsets/charset.h"
 #include "platform/i18n/detection/text_counts.h"
@@ -168,13 +169,15 @@ private:
     }
 
     void tryDecoded(const LegacyCharset& charset) {
-        const std::optional<std::u16string> text = decodeSample(charset);
-        if (!text) {
+        std::optional<std::u16string> text = decodeSample(charset);
+        const bool isMultiByte = charset.kind() == CharsetKind::multiByte;
+        Cost prior = priorOf(charset);
+        if (!text || (isMultiByte && text == lastText_ && prior >= lastPrior_)) {
             return;
         }
-        const TextCounts counts(*text);
+        TextCounts counts(*text);
+        counts.countTriplesOfCharacters(*text);
         const auto itself = [](char16_t c) { return c; };
-        Cost prior = priorOf(charset);
         if (charset.kind() == CharsetKind::ebcdic) {
             // DEL costs as little as a sign, since its byte is one in EBCDIC. But there, DEL is the
             // byte of BEL, which is no more frequent in a text than other control codes.
@@ -182,11 +185,13 @@ private:
                 (strayControlBits - asciiBits) * std::count(text->begin(), text->end(), u'\x7F');
         }
         const Cost cost = prior + costBesideWords(counts, itself, allTraits(), best_.cost - prior);
-        if (charset.kind() == CharsetKind::multiByte) {
+        if (isMultiByte) {
             for (const UnigramModel& model : unigramModels()) {
                 const Cost before = cost + priors_.ofIdeographs();
                 consider(charset, before + costOfWords(counts, model, best_.cost - before));
             }
+            lastText_ = std::move(text);
+            lastPrior_ = prior;
             return;
         }
         for (const auto& [model, classes] : charset.languages()) {
@@ -200,13 +205,18 @@ private:
         std::u16string units(sample_.size(), u'\0');
         std::transform(sample_.begin(), sample_.end(), units.begin(),
                        [](char byte) { return static_cast<unsigned char>(byte); });
-        const TextCounts counts(units);
+        TextCounts counts(units);
         // The commonest pairs decide which candidates are worth pursuing, the rest which is best.
         const std::span<const UnitPair> pairs(counts.pairs);
-        const std::size_t few = std::min<std::size_t>(pairs.size(), 64);
+        const std::size_t few = std::min(pairs.size(), TextCounts::commonest);
+        std::vector<Reading> readings = readingsOf(pairs.first(few));
+        if (readings.empty()) {
+            return;
+        }
+        counts.countTriplesOfBytes(units);
         // Where one is above the limit that it was computed with, any value above that.
         std::map<const LegacyCharset*, Cost> besideWords;
-        for (Reading& reading : readingsOf(pairs.first(few))) {
+        for (Reading& reading : readings) {
             const auto [beside, isNew] = besideWords.try_emplace(reading.charset);
             if (isNew) {
                 beside->second = besideWordsIn(reading, counts);
@@ -218,7 +228,7 @@ private:
         }
     }
 
-    // The candidates with their costs without those beside words, the cheapest first.
+    // The candidates that may still win, with their costs in `pairs` alone, the cheapest first.
     std::vector<Reading> readingsOf(std::span<const UnitPair> pairs) const {
         std::vector<Reading> readings;
         for (const LegacyCharset& charset : legacyCharsets()) {
@@ -228,9 +238,11 @@ private:
             }
             const Cost prior = priorOf(charset);
             for (const LegacyCharset::Language& language : charset.languages()) {
-                Reading& reading = readings.emplace_back(
-                    Reading{&charset, &language, prior + priors_.of(*language.model)});
+                Reading reading{&charset, &language, prior + priors_.of(*language.model)};
                 reading.cost += costIn(reading, pairs);
+                if (reading.cost <= best_.cost) {
+                    readings.push_back(reading);
+                }
             }
         }
         std::stable_sort(readings.begin(), readings.end(),
@@ -259,6 +271,10 @@ private:
     const std::vector<const LegacyCharset*>& excluded_;
     LanguagePriors priors_;
     LikelyCharset best_{nullptr, infinite};
+    // The last text that was tried, in a charset of several bytes with this prior. Where another
+    // charset decodes to the same, as extensions of one do, it can only win by a better prior.
+    std::optional<std::u16string> lastText_;
+    Cost lastPrior_ = 0;
 };
 
 }  // namespace

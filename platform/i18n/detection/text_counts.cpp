@@ -32,10 +32,15 @@ public:
 
     const std::vector<Entry>& entries() const { return entries_; }
 
-    void sortByCount() {
-        std::sort(entries_.begin(), entries_.end(), [](const Entry& a, const Entry& b) {
-            return a.count != b.count ? a.count > b.count : a.key < b.key;
-        });
+    /// Puts the commonest first. Costs are summed up in this order until they are above a limit;
+    /// to sort the rest takes longer than it spares.
+    void putCommonestFirst() {
+        const auto middle = entries_.begin() + static_cast<std::ptrdiff_t>(std::min(
+                                                   entries_.size(), TextCounts::commonest));
+        std::partial_sort(entries_.begin(), middle, entries_.end(),
+                          [](const Entry& a, const Entry& b) {
+                              return a.count != b.count ? a.count > b.count : a.key < b.key;
+                          });
     }
 
 private:
@@ -72,11 +77,33 @@ std::uint64_t keyOf(char16_t first, char16_t second, char16_t third = 0) {
     return (std::uint64_t{first} << 32U) | (std::uint64_t{second} << 16U) | third;
 }
 
+// The triples of `units` around those from 0x80 on for which `isAskedFor` is true.
+template <class IsAskedFor>
+std::vector<UnitTriple> triplesOf(std::u16string_view units, IsAskedFor isAskedFor) {
+    Tally tally;
+    for (std::size_t i = 0; i < units.size(); ++i) {
+        if (units[i] >= 0x80) {
+            const char16_t before = i == 0 ? u'\0' : units[i - 1];
+            const char16_t after = i + 1 == units.size() ? u'\0' : units[i + 1];
+            if (isAskedFor(before, units[i], after)) {
+                tally.add(keyOf(before, units[i], after));
+            }
+        }
+    }
+    std::vector<UnitTriple> triples;
+    triples.reserve(tally.entries().size());
+    for (const Tally::Entry& entry : tally.entries()) {
+        triples.push_back({static_cast<char16_t>(entry.key >> 32U),
+                           static_cast<char16_t>(entry.key >> 16U),
+                           static_cast<char16_t>(entry.key), entry.count});
+    }
+    return triples;
+}
+
 }  // namespace
 
 TextCounts::TextCounts(std::u16string_view units, Runs runs) {
-    Tally pairTally;
-    Tally tripleTally;
+    Tally tally;
     for (std::size_t begin = 0; begin < units.size();) {
         if (!isWordUnit(units[begin])) {
             asciiCost += costOfAscii(units[begin++]);
@@ -92,27 +119,31 @@ TextCounts::TextCounts(std::u16string_view units, Runs runs) {
         } else {
             char16_t before = 0;
             for (std::size_t i = begin; i < end; ++i) {
-                pairTally.add(keyOf(before, units[i]));
+                tally.add(keyOf(before, units[i]));
                 before = units[i];
-                if (before >= 0x80) {
-                    tripleTally.add(keyOf(i == 0 ? u'\0' : units[i - 1], before,
-                                          i + 1 == units.size() ? u'\0' : units[i + 1]));
-                }
             }
-            pairTally.add(keyOf(before, 0));
+            tally.add(keyOf(before, 0));
         }
         begin = end;
     }
-    pairTally.sortByCount();
-    for (const Tally::Entry& entry : pairTally.entries()) {
+    tally.putCommonestFirst();
+    pairs.reserve(tally.entries().size());
+    for (const Tally::Entry& entry : tally.entries()) {
         pairs.push_back({static_cast<char16_t>(entry.key >> 32U),
                          static_cast<char16_t>(entry.key >> 16U), entry.count});
     }
-    for (const Tally::Entry& entry : tripleTally.entries()) {
-        triples.push_back({static_cast<char16_t>(entry.key >> 32U),
-                           static_cast<char16_t>(entry.key >> 16U),
-                           static_cast<char16_t>(entry.key), entry.count});
-    }
+}
+
+void TextCounts::countTriplesOfBytes(std::u16string_view units) {
+    triples = triplesOf(units, [](char16_t, char16_t, char16_t) { return true; });
+}
+
+void TextCounts::countTriplesOfCharacters(std::u16string_view units) {
+    const CharacterTraits* const traits = allTraits();
+    triples = triplesOf(units, [traits](char16_t before, char16_t current, char16_t after) {
+        return !traits[current].isLetter ||
+               (isAloneBeside(traits, before) && isAloneBeside(traits, after));
+    });
 }
 
 }  // namespace platform::i18n::detail

@@ -2,6 +2,7 @@
 // How often units of a text stand next to each other: all that the language models need.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <string_view>
 #include <vector>
@@ -47,13 +48,20 @@ struct UnitTriple {
 struct TextCounts {
     enum class Runs { beyondAscii, all };
 
-    /// Counts in these runs of `units`. Linear in their number.
+    /// Counts pairs in these runs of `units`. Linear in their number.
     explicit TextCounts(std::u16string_view units, Runs runs = Runs::beyondAscii);
 
-    /// The cost of the ASCII outside these runs.
+    /// Counts the triples of the same units, which are bytes or characters. Of characters, letters
+    /// next to letters are left out, as no model asks for them. Linear in the number of units.
+    void countTriplesOfBytes(std::u16string_view units);
+    void countTriplesOfCharacters(std::u16string_view units);
+
+    /// The cost of the ASCII outside the runs.
     Cost asciiCost = 0;
-    /// The neighbours in the runs, the commonest first; '\0' stands for what is beyond a run's end.
+    /// The neighbours in the runs; '\0' stands for what is beyond a run's end. The first
+    /// `commonest` of them are the commonest, in that order.
     std::vector<UnitPair> pairs;
+    static constexpr std::size_t commonest = 32;
     /// Each unit from 0x80 on between its neighbours, whatever they are; '\0' at the text's ends.
     std::vector<UnitTriple> triples;
 };

@@ -31,7 +31,9 @@ struct Form {
 // The cost of the beginning in this form, very high when it is malformed; any value above `limit`
 // when it is above that.
 Cost costIn(const Form& form, std::string_view sample, Cost limit) {
-    const TextCounts counts(openCharset(form.name, false)->decode(sample));
+    const std::u16string text = openCharset(form.name, false)->decode(sample);
+    TextCounts counts(text);
+    counts.countTriplesOfCharacters(text);
     const Cost cost = costBesideWords(
         counts, [](char16_t c) { return c; }, allTraits(), limit);
     if (cost > limit) {
