@@ -30,3 +30,24 @@ browserTest("in any charset, a letter typed and taken back leaves the bytes, and
     });
   }
 });
+
+browserTest("lines of scripts that run from right to left begin on the right, and the arrow keys follow them", async (t) => {
+  const hebrew = "\u05e9\u05dc\u05d5\u05dd \u05e2\u05d5\u05dc\u05dd";
+  const session = await Session.start(t, { "a.txt": `${hebrew}\nhello\n(${hebrew})` });
+  const { page } = session;
+  await open(session, "a.txt");
+  const directions = () =>
+    editor(page).locator(".cm-line").evaluateAll((lines) => lines.map((line) => getComputedStyle(line).direction));
+  assert.deepEqual(await directions(), ["rtl", "ltr", "rtl"]);
+  await editor(page).focus();
+  await page.keyboard.press("Control+End");
+  await page.keyboard.press("Home");
+  await page.keyboard.press("ArrowLeft"); // on, and not to the line before
+  await page.keyboard.insertText("\u05d0");
+  await page.keyboard.press("Control+End");
+  await page.keyboard.insertText(`\n${hebrew}`);
+  await page.locator(".tab.active .unsaved").waitFor();
+  assert.deepEqual(await directions(), ["rtl", "ltr", "rtl", "rtl"]);
+  await save(page);
+  assert.equal(session.read("a.txt").toString(), `${hebrew}\nhello\n(\u05d0${hebrew})\n${hebrew}`);
+});

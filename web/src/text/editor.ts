@@ -14,6 +14,7 @@ import {
 import type { Page } from "../document_view.js";
 import { type FileForm, fileForm } from "./file_form.js";
 import { lackingCharacters } from "./lacking_characters.js";
+import { lineDirections } from "./line_directions.js";
 import { PHRASES } from "./phrases.js";
 
 /** An editor called `label`, of a text whose file has `form`. */
@@ -24,6 +25,7 @@ export function textEditor(form: FileForm, page: Page, label: string): Extension
     highlightActiveLine(),
     highlightSpecialChars(),
     drawSelection(),
+    lineDirections,
     history(),
     search({ top: true }),
     lackingCharacters((charset) => page.text("text.lacks", { charset })),
