@@ -28,8 +28,8 @@ void requireTextLength(std::uintmax_t length);
 std::string detect_charset(const char* data, std::size_t length, std::ostream& diagnostics,
                            std::u16string_view sourceName);
 
-/// Whether `charset`, as detect_charset names it, switches between characters by escape sequences:
-/// only then may bytes that were found to be in it encode back to others.
+/// Whether `charset`, as detect_charset names it, switches between sets of characters by escape
+/// sequences: only then may text that was found to be in it encode back to other bytes.
 bool hasEscapeSequences(std::string_view charset);
 
 }  // namespace platform::i18n

@@ -152,8 +152,8 @@ std::string Serialization::readTextFileContent(std::u16string path) const {
     std::string bytes = readFileBytes(std::move(path));
     const std::string charset = detectedCharset(bytes);
     if (!hasEscapeSequences(charset)) {
-        // Bytes come back unchanged from what they were found to be in, so a large text is not held
-        // in UTF-16 too.
+        // Detection has made sure that decoding and encoding would give these bytes, so a large
+        // text is not held in UTF-16 too.
         return cleaned(std::move(bytes), charset);
     }
     const std::u16string text = decode(bytes, charset);

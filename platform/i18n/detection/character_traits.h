@@ -30,10 +30,9 @@ inline const CharacterTraits& traitsOf(char16_t c) {
     return allTraits()[c];
 }
 
-/// Whether a letter beyond ASCII has no other such letter beside it where `neighbour` is. `all` is
-/// what allTraits() returns.
-inline bool isAloneBeside(const CharacterTraits* all, char16_t neighbour) {
-    return neighbour < 0x80 || !all[neighbour].isLetter;
+/// `all` is what allTraits() returns.
+inline bool isLetterBeyondAscii(const CharacterTraits* all, char16_t c) {
+    return c >= 0x80 && all[c].isLetter;
 }
 
 /// The cost of the non-ASCII character `sign`, which is not a letter, between its neighbours; those

@@ -142,10 +142,10 @@ private:
 
 }  // namespace
 
-Evidence::Evidence(std::string_view all)
-    : bytes(all),
-      values(valuesIn(all)),
-      declared(declaredCharset(all)),
-      sample(all.size() <= wholeFileLimit ? std::string(all) : Sampler(all, values).sample()) {}
+Evidence::Evidence(std::string_view file)
+    : bytes(file),
+      values(valuesIn(file)),
+      declared(declaredCharset(file)),
+      sample(file.size() <= wholeFileLimit ? std::string(file) : Sampler(file, values).sample()) {}
 
 }  // namespace platform::i18n::detail

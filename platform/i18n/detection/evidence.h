@@ -12,8 +12,8 @@ namespace platform::i18n::detail {
 using ByteSet = std::bitset<256>;
 
 struct Evidence {
-    /// Collects the rest from `bytes`. Linear in their number.
-    explicit Evidence(std::string_view bytes);
+    /// Collects it from the bytes of a file. Linear in their number.
+    explicit Evidence(std::string_view file);
 
     /// The whole file, which must outlive the evidence.
     std::string_view bytes;

@@ -158,8 +158,8 @@ Cost costOfWords(const TextCounts& counts, const UnigramModel& model, Cost limit
         }
     }
     for (const UnitTriple& triple : counts.triples) {
-        if (traits[triple.current].isLetter && isAloneBeside(traits, triple.before) &&
-            isAloneBeside(traits, triple.after)) {
+        if (traits[triple.current].isLetter && !isLetterBeyondAscii(traits, triple.before) &&
+            !isLetterBeyondAscii(traits, triple.after)) {
             cost += triple.count * model.loneCost(triple.current);
         }
     }

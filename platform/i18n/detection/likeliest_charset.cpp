@@ -7,8 +7,8 @@
 // All are numbers of bits: the length of the text in a code made for the language. The charset with
 // the lowest cost is taken. README.md says where the figures come from.
 //
-// Costs only grow as more of a text is looked at, and words are looked at in the order of how
-// common they are, so candidates that cannot win are dropped early. Charsets of several bytes come
+// Costs only grow as more of a text is looked at, and the commonest pairs of letters are looked at
+// first, so candidates that cannot win are dropped early. Charsets of several bytes come
 // first: they fail at once on other text, and on their own no other charset comes near them.
 #include "platform/i18n/detection/likeliest_charset.h"
 
@@ -228,7 +228,8 @@ private:
         }
     }
 
-    // The candidates that may still win, with their costs in `pairs` alone, the cheapest first.
+    // The candidates that may still win, with their priors and what `pairs` cost, the cheapest
+    // first.
     std::vector<Reading> readingsOf(std::span<const UnitPair> pairs) const {
         std::vector<Reading> readings;
         for (const LegacyCharset& charset : legacyCharsets()) {
@@ -272,7 +273,8 @@ private:
     LanguagePriors priors_;
     LikelyCharset best_{nullptr, infinite};
     // The last text that was tried, in a charset of several bytes with this prior. Where another
-    // charset decodes to the same, as extensions of one do, it can only win by a better prior.
+    // charset decodes to the same, as extensions of one do, it can only win by a better prior: of
+    // two that cost the same, the first in the list is taken.
     std::optional<std::u16string> lastText_;
     Cost lastPrior_ = 0;
 };

@@ -6,6 +6,7 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/i18n/detection/evidence.h"
 #include "platform/i18n/detection/legacy_charsets.h"
 
 namespace platform::i18n::detail {

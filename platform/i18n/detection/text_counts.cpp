@@ -33,7 +33,7 @@ public:
     const std::vector<Entry>& entries() const { return entries_; }
 
     /// Puts the commonest first. Costs are summed up in this order until they are above a limit;
-    /// to sort the rest takes longer than it spares.
+    /// to sort the rest takes longer than it saves.
     void putCommonestFirst() {
         const auto middle = entries_.begin() + static_cast<std::ptrdiff_t>(std::min(
                                                    entries_.size(), TextCounts::commonest));
@@ -142,7 +142,7 @@ void TextCounts::countTriplesOfCharacters(std::u16string_view units) {
     const CharacterTraits* const traits = allTraits();
     triples = triplesOf(units, [traits](char16_t before, char16_t current, char16_t after) {
         return !traits[current].isLetter ||
-               (isAloneBeside(traits, before) && isAloneBeside(traits, after));
+               (!isLetterBeyondAscii(traits, before) && !isLetterBeyondAscii(traits, after));
     });
 }
 

@@ -52,7 +52,8 @@ struct TextCounts {
     explicit TextCounts(std::u16string_view units, Runs runs = Runs::beyondAscii);
 
     /// Counts the triples of the same units, which are bytes or characters. Of characters, letters
-    /// next to letters are left out, as no model asks for them. Linear in the number of units.
+    /// next to other letters beyond ASCII are left out, as no model asks for them. Linear in the
+    /// number of units.
     void countTriplesOfBytes(std::u16string_view units);
     void countTriplesOfCharacters(std::u16string_view units);
 
@@ -62,7 +63,8 @@ struct TextCounts {
     /// `commonest` of them are the commonest, in that order.
     std::vector<UnitPair> pairs;
     static constexpr std::size_t commonest = 32;
-    /// Each unit from 0x80 on between its neighbours, whatever they are; '\0' at the text's ends.
+    /// Units from 0x80 on between their neighbours, whatever these are; '\0' at the text's ends.
+    /// Empty until they are counted.
     std::vector<UnitTriple> triples;
 };
 

@@ -95,6 +95,10 @@ TEST_F(TextDocumentReading, KeepsCharactersOfTwoUnitsWithAndWithoutAMark) {
     }
 }
 
+TEST_F(TextDocumentReading, SpellsEscapeSequencesAsTheConverterDoes) {
+    EXPECT_EQ(service.readTextFileContent(file("\x1B$B$3$s")), "\x1B$B$3$s\x1B(B");
+}
+
 TEST_F(TextDocumentReading, KeepsTheBytesOfTheFilesOwnCharset) {
     std::string charset;
     const std::u16string text = service.readTextFile(file(shiftJisText), charset);

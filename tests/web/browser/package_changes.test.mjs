@@ -154,6 +154,7 @@ browserTest("of a document that was removed, the changed parts alone are saved o
   await page.keyboard.press("Control+s");
   await dialog(page).getByText(/Office programs will not open/).waitFor();
   await dialog(page).getByRole("button", { name: "Do not save" }).click();
+  await dialog(page).waitFor({ state: "detached" });
   assert.throws(() => session.read(NAME), { code: "ENOENT" });
   await page.keyboard.press("Control+s"); // it is asked until it is answered
   await dialog(page).getByRole("button", { name: "Save these parts" }).click();
