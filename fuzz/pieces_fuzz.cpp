@@ -70,7 +70,7 @@ void speak(std::string_view operation, nats::IncomingTransfers& incoming,
             break;
         }
         case 3:
-            outgoing.answer(address, platform::DataBuffer::copyOf(std::string(number / 4, 'y')),
+            outgoing.answer(address, platform::DataBuffer::copyOf(std::string(1 + number / 4, 'y')),
                             now);
             break;
         case 4:

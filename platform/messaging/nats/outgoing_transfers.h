@@ -35,10 +35,10 @@ public:
     OutgoingTransfers(std::string worker, Reserve reserve)
         : worker_(std::move(worker)), reserve_(std::move(reserve)) {}
 
-    /// Keeps `payload` for the client at `address` and announces it. When there is no memory for
-    /// it, others are given up: those that have stood still for too long, and then those of a user
-    /// who has more waiting than this one would. When that does not help, this client has to
-    /// ask again. A second answer for the same client's id is dropped.
+    /// Keeps `payload`, which is not empty, for the client at `address` and announces it. When
+    /// there is no memory for it, others are given up: those that have stood still for too long,
+    /// and then those of a user who has more waiting than this one would. When that does not help,
+    /// this client has to ask again. A second answer for the same client's id is dropped.
     Notes answer(const ReturnAddress& address, DataBuffer payload, Time now);
 
     /// The client `id` has room up to `end`. Sends at most `windowSize` bytes, so that a client
