@@ -106,10 +106,6 @@ BigramModel::BigramModel(const LetterTable& table) : table_(&table) {
     }
 }
 
-BigramModel::Class BigramModel::classBeyondAlphabets(char16_t c) const {
-    return traitsOf(c).isLetter ? foreignScript_ : Class{0};
-}
-
 bool BigramModel::isWritableWith(std::u16string_view repertoire) const {
     double missing = 0;
     for (std::size_t i = 0; i < table_->alphabet.size(); ++i) {

@@ -26,7 +26,7 @@ public:
     explicit BigramModel(const LetterTable& table);
 
     Class classOf(char16_t c) const {
-        return c < alphabetLimit ? classes_[c] : classBeyondAlphabets(c);
+        return c < alphabetLimit ? classes_[c] : traits_[c].isLetter ? foreignScript_ : Class{0};
     }
 
     /// The cost of a letter of class `current` after one of class `before`, in whole; 0 where
@@ -43,9 +43,8 @@ private:
     // The letters of alphabets lie below this, but for some presentation forms.
     static constexpr std::size_t alphabetLimit = 0x2000;
 
-    Class classBeyondAlphabets(char16_t c) const;
-
     const LetterTable* table_;
+    const CharacterTraits* traits_ = allTraits();
     std::size_t stride_;
     std::vector<std::uint8_t> costs_;
     std::array<Class, alphabetLimit> classes_{};

@@ -210,7 +210,10 @@ private:
         const std::span<const UnitPair> pairs(counts.pairs);
         const std::size_t few = std::min(pairs.size(), TextCounts::commonest);
         std::vector<Reading> readings = readingsOf(pairs.first(few));
-        if (readings.empty()) {
+        const auto mayWin = [&](const Reading& reading) {
+            return reading.cost + costIn(reading, pairs.subspan(few)) <= best_.cost;
+        };
+        if (std::none_of(readings.begin(), readings.end(), mayWin)) {
             return;
         }
         counts.countTriplesOfBytes(units);

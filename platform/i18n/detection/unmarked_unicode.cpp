@@ -69,10 +69,12 @@ std::optional<UnmarkedUnicode> unmarkedUnicode(std::string_view bytes) {
         {{"UTF-32LE", 4}, {"UTF-32BE", 4}, {"UTF-16LE", 2}, {"UTF-16BE", 2}}};
     const std::string_view sample = bytes.substr(0, sampleSize);
     const auto size = static_cast<double>(sample.size());
+    // All of UTF-32 has zeros.
+    const std::size_t longestUnit = bytes.find('\0') == std::string_view::npos ? 2 : 4;
     const Form* best = nullptr;
     Cost limit = bits(plausibleBitsPerByte * size);
     for (const Form& form : forms) {
-        if (bytes.size() % form.unitSize == 0) {
+        if (form.unitSize <= longestUnit && bytes.size() % form.unitSize == 0) {
             const Cost cost = costIn(form, sample, limit);
             if (cost < limit) {
                 best = &form;
