@@ -103,6 +103,14 @@ void removeIfAbandoned(const fs::path& path) {
     }
 }
 
+std::uint64_t sizeOf(const FileDescriptor& file) {
+    struct stat status {};
+    if (::fstat(file.get(), &status) != 0) {
+        platform::throwSystemError("its size is not known");
+    }
+    return static_cast<std::uint64_t>(status.st_size);
+}
+
 // Copies `from` to a new file at `path`, without its bytes being copied where the file system can
 // share them.
 FileDescriptor copyTo(const fs::path& path, int from) {
@@ -307,6 +315,7 @@ void History::makeCopy(const FileDescriptor& old, const std::string& document, S
     const std::string digest = digestOf(document);
     const fs::path folder = options_.folder / digestOf(root.string()) / digest.substr(0, 2);
     fs::create_directories(folder);
+    makeRoom(root, sizeOf(old));
     const fs::path unfinished =
         folder / (unfinishedName + std::to_string(::getpid()) + "." + std::to_string(now()));
     try {
@@ -326,7 +335,6 @@ void History::makeCopy(const FileDescriptor& old, const std::string& document, S
                        folder);
         }
         removeSurplus(document);
-        keepToShare(root, version.size);
     } catch (...) {
         removeFile(unfinished);
         throw;
@@ -340,26 +348,38 @@ void History::removeSurplus(const std::string& document) {
     }
 }
 
+// Makes room for another version of `size` bytes in the share of `root`. Throws std::runtime_error
+// when it exceeds the share alone: all other versions would go, and then the new one too.
+//
 // Surplus versions that were removed still count until everything is counted anew, each hour and
 // when the share is exceeded.
-void History::keepToShare(const fs::path& root, std::uint64_t added) {
+void History::makeRoom(const fs::path& root, std::uint64_t size) {
     Usage& usage = usage_[root];
-    usage.bytes += added;
     const auto time = std::chrono::steady_clock::now();
     const bool isCounted = usage.counted != std::chrono::steady_clock::time_point();
-    if (isCounted && usage.bytes <= usage.most && time - usage.counted < recount) {
-        return;
+    if (!isCounted || usage.bytes + size > usage.most || time - usage.counted >= recount) {
+        usage.most = shareOf(root);
+        if (size > usage.most) {
+            throw std::runtime_error("its " + std::to_string(size) + " bytes exceed the " +
+                                     std::to_string(usage.most) +
+                                     " that all earlier versions may take");
+        }
+        usage.bytes = removeOldest(root, usage.most - size);
+        usage.counted = time;
     }
+    usage.bytes += size;
+}
+
+// The bytes that versions of documents below `root` may take together.
+std::uint64_t History::shareOf(const fs::path& root) const {
     struct statvfs system {};
     if (::statvfs(root.c_str(), &system) != 0) {
         platform::throwSystemError(root.c_str());
     }
     const auto size = static_cast<double>(system.f_blocks) * static_cast<double>(system.f_frsize);
     // A file system that does not tell its size says that it has no blocks.
-    usage.most = system.f_blocks == 0 ? std::numeric_limits<std::uint64_t>::max()
-                                      : static_cast<std::uint64_t>(size * options_.share);
-    usage.counted = time;
-    usage.bytes = removeOldest(root, usage.most);
+    return system.f_blocks == 0 ? std::numeric_limits<std::uint64_t>::max()
+                                : static_cast<std::uint64_t>(size * options_.share);
 }
 
 // Removes what is too old, and the oldest versions until the others take no more than `most` bytes,

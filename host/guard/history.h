@@ -67,8 +67,8 @@ public:
 
     /// Copies the content of `old` as the newest version of `document`, without waiting for that.
     /// Versions that are too many, older than 30 days, or beyond the share of the disk are removed,
-    /// the oldest first. Failures are logged. When copies are much slower than saves, versions are
-    /// left out.
+    /// the oldest first. What is larger than the share is not kept. Failures are logged. When
+    /// copies are much slower than saves, versions are left out.
     void keep(platform::FileDescriptor old, std::string document);
 
     /// The same, but returns when the copy is made and safe on disk, or has failed.
@@ -104,7 +104,8 @@ private:
     void copy(const platform::FileDescriptor& old, const std::string& document, Sync sync) noexcept;
     void makeCopy(const platform::FileDescriptor& old, const std::string& document, Sync sync);
     void removeSurplus(const std::string& document);
-    void keepToShare(const std::filesystem::path& root, std::uint64_t added);
+    void makeRoom(const std::filesystem::path& root, std::uint64_t size);
+    std::uint64_t shareOf(const std::filesystem::path& root) const;
     std::uint64_t removeOldest(const std::filesystem::path& root, std::uint64_t most) const;
 
     HistoryOptions options_;

@@ -6,6 +6,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/mount.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cstdint>
@@ -36,9 +37,11 @@ protected:
         return file;
     }
 
-    static std::string contentOf(const FileDescriptor& file) {
-        return readFile("/proc/self/fd/" + std::to_string(file.get()));
+    static std::string pathOf(const FileDescriptor& file) {
+        return "/proc/self/fd/" + std::to_string(file.get());
     }
+
+    static std::string contentOf(const FileDescriptor& file) { return readFile(pathOf(file)); }
 
     std::string document(const std::string& name) const { return History::nameOf(root_ / name); }
 
@@ -98,6 +101,23 @@ TEST_F(HistoryTest, TakesNoMoreThanItsShareOfTheDiskAndRemovesTheOldestFirst) {
         }
         EXPECT_EQ(history.versionsOf(document("49")).size(), 1U);
         EXPECT_TRUE(history.versionsOf(document("0")).empty());
+    }
+    ::umount2(root_.path().c_str(), MNT_DETACH);
+}
+
+TEST_F(HistoryTest, LeavesOutWhatIsLargerThanTheShareAndRemovesNothingForIt) {
+    if (::mount("tmpfs", root_.path().c_str(), "tmpfs", 0, "size=1000k,mode=700") != 0) {
+        GTEST_SKIP() << "this user may not mount a file system";
+    }
+    {
+        History history({scratch_ / "versions", {root_.path()}});
+        history.keep(fileOf("old"), document("a.txt"));
+        const FileDescriptor large = fileOf("");
+        // No disk has room for a copy of it, though its holes take none.
+        ASSERT_EQ(::truncate(pathOf(large).c_str(), std::int64_t{1} << 42U), 0);
+        history.keepNow(large, document("b.txt"));
+        EXPECT_TRUE(history.versionsOf(document("b.txt")).empty());
+        EXPECT_EQ(history.versionsOf(document("a.txt")).size(), 1U);
     }
     ::umount2(root_.path().c_str(), MNT_DETACH);
 }
