@@ -3,7 +3,6 @@
 
 #include <simdjson.h>
 #include <spdlog/spdlog.h>
-#include <sys/mman.h>
 
 #include <algorithm>
 #include <cstddef>
@@ -24,8 +23,7 @@
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "json/value.h"
-#include "platform/posix/file_descriptor.h"
-#include "platform/posix/system_error.h"
+#include "platform/posix/file_in_memory.h"
 
 namespace host {
 
@@ -79,14 +77,14 @@ const T* find(const json::Object& object, const char* key) {
 }
 
 // A file in memory that holds what `input` does. The bundle finds it by its path as any other.
-platform::FileDescriptor copyInput(int input) {
-    platform::FileDescriptor copy(::memfd_create("standard input", MFD_CLOEXEC));
-    if (!copy) {
-        platform::throwSystemError("cannot keep the standard input");
-    }
+platform::FileInMemory copyInput(int input) {
+    platform::FileInMemory copy("standard input");
     std::string piece(std::size_t{1} << 20U, '\0');
+    std::size_t size = 0;
     while (const std::size_t count = readSome(input, piece.data(), piece.size())) {
-        writeAll(copy.get(), {std::string_view(piece).substr(0, count)});
+        size += count;
+        copy.reserve(size);
+        writeAll(copy.descriptor().get(), {std::string_view(piece).substr(0, count)});
     }
     return copy;
 }
@@ -130,8 +128,8 @@ public:
           output_(output),
           input_(std::find(options.files.begin(), options.files.end(), standardInput) !=
                          options.files.end()
-                     ? copyInput(input)
-                     : platform::FileDescriptor()),
+                     ? std::optional(copyInput(input))
+                     : std::nullopt),
           host_(options.bundle, largestRequest,
                 [this](const JsonMessage& message) { responses_.add(message); }) {}
 
@@ -157,7 +155,7 @@ private:
     static constexpr const char* standardInput = "-";
 
     std::string pathOf(const std::string& file) const {
-        return file == standardInput ? "/proc/self/fd/" + std::to_string(input_.get()) : file;
+        return file == standardInput ? input_->path() : file;
     }
 
     std::string requestFor(const std::string& file) const {
@@ -259,7 +257,7 @@ private:
 
     const ReadOptions& options_;
     int output_;
-    platform::FileDescriptor input_;  // none unless a file is the standard input
+    std::optional<platform::FileInMemory> input_;  // none unless a file is the standard input
     Responses responses_;
     BundleHost host_;
     Progress progress_{"reading"};

@@ -3,7 +3,6 @@
 
 #include <limits.h>
 #include <spdlog/spdlog.h>
-#include <sys/mman.h>
 #include <sys/stat.h>
 
 #include <cerrno>
@@ -32,6 +31,7 @@
 #include "platform/i18n/detect_charset.h"
 #include "platform/messaging/channels.h"
 #include "platform/posix/file_descriptor.h"
+#include "platform/posix/file_in_memory.h"
 #include "platform/posix/open_regular_file.h"
 #include "platform/posix/system_error.h"
 
@@ -41,6 +41,7 @@ namespace {
 
 using platform::DataBuffer;
 using platform::FileDescriptor;
+using platform::FileInMemory;
 using platform::messaging::JsonMessage;
 using platform::messaging::MessageService;
 
@@ -56,6 +57,14 @@ FileDescriptor openDocument(const std::string& path) {
         throw std::runtime_error("It is not a regular file");
     }
     return std::move(opened.descriptor);
+}
+
+std::size_t sizeOf(const FileDescriptor& file) {
+    struct stat status {};
+    if (::fstat(file.get(), &status) != 0) {
+        platform::throwSystemError("The file cannot be read");
+    }
+    return static_cast<std::size_t>(status.st_size);
 }
 
 bool hasMark(const std::string& bytes, const std::string& charset) {
@@ -174,14 +183,11 @@ private:
     // version in its folder, but it can open a copy in memory.
     std::string readVersion() {
         const FileDescriptor version = earlierVersion();
-        const FileDescriptor copy(::memfd_create("earlier version", MFD_CLOEXEC));
-        if (!copy) {
-            platform::throwSystemError("It cannot be read");
-        }
-        copyContent(version.get(), copy.get());
-        json::Object request{{"rtcId", ""},
-                             {"contentType", text("contentType")},
-                             {"filePath", "/proc/self/fd/" + std::to_string(copy.get())}};
+        FileInMemory copy("earlier version");
+        copy.reserve(sizeOf(version));
+        copyContent(version.get(), copy.descriptor().get());
+        json::Object request{
+            {"rtcId", ""}, {"contentType", text("contentType")}, {"filePath", copy.path()}};
         const auto payload =
             std::make_shared<const std::string>(json::serialize(json::Value(std::move(request))));
         const std::vector<Publication> publications = publicationsOf(
@@ -196,11 +202,7 @@ private:
 
     // Finding its charset takes up to three times a text's bytes beside them.
     std::string bytesOf(const FileDescriptor& file) {
-        struct stat status {};
-        if (::fstat(file.get(), &status) != 0) {
-            platform::throwSystemError("The file cannot be read");
-        }
-        const auto size = static_cast<std::size_t>(status.st_size);
+        const std::size_t size = sizeOf(file);
         platform::i18n::requireTextLength(size);
         client_.awaitMemory(4 * size);
         return readContent(file.get());

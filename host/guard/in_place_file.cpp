@@ -2,10 +2,10 @@
 #include "host/guard/in_place_file.h"
 
 #include <fcntl.h>
-#include <sys/mman.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cstddef>
 #include <stdexcept>
 
 #include "host/guard/file_content.h"
@@ -48,18 +48,15 @@ InPlaceFile::InPlaceFile(const std::string& path)
     if (!S_ISREG(status.st_mode)) {
         throw std::runtime_error("is not a regular file");
     }
-    copy_ = platform::FileDescriptor(::memfd_create("old content", MFD_CLOEXEC));
-    if (!copy_) {
-        throwSystemError("cannot be kept while it is written");
-    }
-    copyContent(file_.get(), copy_.get());
+    copy_.reserve(static_cast<std::size_t>(status.st_size));
+    copyContent(file_.get(), copy().get());
 }
 
 void InPlaceFile::replaceContent(int from) const {
     try {
         writeContentOf(from);
     } catch (...) {
-        writeContentOf(copy_.get());
+        writeContentOf(copy().get());
         throw;
     }
 }

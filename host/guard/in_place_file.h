@@ -5,6 +5,7 @@
 #include <string>
 
 #include "platform/posix/file_descriptor.h"
+#include "platform/posix/file_in_memory.h"
 
 namespace host {
 
@@ -12,14 +13,15 @@ namespace host {
 class InPlaceFile {
 public:
     /// Opens the file at `path`, links followed, for reading and writing, and copies its content. A
-    /// lease that another program holds is waited for. Throws std::system_error when that fails,
-    /// and std::runtime_error when it is not a regular file.
+    /// lease that another program holds is waited for. Throws std::system_error when that fails
+    /// or the process may not take so much memory, and std::runtime_error when it is not a regular
+    /// file.
     explicit InPlaceFile(const std::string& path);
 
     int descriptor() const noexcept { return file_.get(); }
 
     /// The copy of the old content.
-    const platform::FileDescriptor& copy() const noexcept { return copy_; }
+    const platform::FileDescriptor& copy() const noexcept { return copy_.descriptor(); }
 
     /// Writes the content of the open file `from` in place of the old, safe on disk. Throws
     /// std::system_error when that fails, after the old content has been put back.
@@ -29,7 +31,7 @@ private:
     void writeContentOf(int from) const;
 
     platform::FileDescriptor file_;
-    platform::FileDescriptor copy_;
+    platform::FileInMemory copy_{"old content"};
 };
 
 }  // namespace host

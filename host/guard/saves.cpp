@@ -3,7 +3,6 @@
 
 #include <fcntl.h>
 #include <spdlog/spdlog.h>
-#include <sys/mman.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -19,6 +18,7 @@
 #include "json/parser.h"
 #include "platform/i18n/codecvt.h"
 #include "platform/posix/atomic_file.h"
+#include "platform/posix/file_in_memory.h"
 #include "platform/posix/open_regular_file.h"
 #include "platform/posix/system_error.h"
 
@@ -28,6 +28,7 @@ namespace {
 
 using platform::AtomicFile;
 using platform::FileDescriptor;
+using platform::FileInMemory;
 
 // Whether a save in place may succeed after this failure: the disk is neither full nor broken.
 bool isForbidden(const std::error_code& error) {
@@ -47,15 +48,6 @@ bool isNowhere(const std::error_code& error) {
 // The regular file at `path`, opened for reading; none where there is none.
 FileDescriptor openRegular(const std::string& path) {
     return platform::openRegularFile(path).descriptor;
-}
-
-// A new file in memory.
-FileDescriptor makeFileInMemory() {
-    FileDescriptor file(::memfd_create("new content", MFD_CLOEXEC));
-    if (!file) {
-        platform::throwSystemError("cannot be kept in memory");
-    }
-    return file;
 }
 
 void sync(int file) {
@@ -216,17 +208,17 @@ private:
         if (!isBasedOn(file.copy(), true)) {
             return isRepetition(file.descriptor(), holdsTextOf(request_, file.copy().get()));
         }
-        const FileDescriptor text = makeFileInMemory();
-        const std::string path = "/proc/self/fd/" + std::to_string(text.get());
-        if (!askBundle_(path).isWritten || !holdsTextOf(request_, text.get())) {
+        FileInMemory text("new content");
+        text.reserve(request_.text.size());
+        if (!askBundle_(text.path()).isWritten || !holdsTextOf(request_, text.descriptor().get())) {
             throw std::runtime_error("the text is not valid in the charset");
         }
         // A process that is killed while it writes leaves a mixture, so the old text is kept first.
         if (history_ != nullptr) {
             history_->keepNow(file.copy(), document_);
         }
-        file.replaceContent(text.get());
-        noteVersion(text.get());
+        file.replaceContent(text.descriptor().get());
+        noteVersion(text.descriptor().get());
         return true;
     }
 

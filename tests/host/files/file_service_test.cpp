@@ -36,6 +36,7 @@
 #include "platform/messaging/channels.h"
 #include "platform/messaging/message_service.h"
 #include "tests/support/bundle_on_bus.h"
+#include "tests/support/more_memory.h"
 #include "tests/support/temporary_directory.h"
 
 namespace {
@@ -255,6 +256,26 @@ TEST_F(FileServiceTest, HoldsAnEarlierVersionToTheLengthOfItsOwnAnswers) {
     EXPECT_EQ(read()["exception"],
               json::Value("The document is too large: its message would be longer than the 100 "
                           "bytes that can be sent"));
+}
+
+// The copy that the bundle reads would otherwise take more than the process may.
+TEST_F(FileServiceTest, ReadsNoEarlierVersionForWhichThereIsNoMemory) {
+    write(root_ / "a.txt", "one");
+    write(root_ / "a.txt", "two");
+    const json::Value time = versionsOf(root_ / "a.txt").at(0).get<json::Object>()["time"];
+    fs::path version;
+    for (const auto& entry : fs::recursive_directory_iterator(state_ / "versions")) {
+        version = entry.path();  // the only file is the last
+    }
+    // Versions have their size at the end of their names.
+    const std::string name = version.string();
+    ASSERT_TRUE(name.ends_with("-3")) << name;
+    fs::resize_file(version, 10'000'000'000);
+    fs::rename(version, name.substr(0, name.size() - 1) + "10000000000");
+    const test::MoreMemory limited(1'000'000'000);
+    EXPECT_EQ(ask("readVersion", root_ / "a.txt", {{"time", time}, {"contentType", "text/plain"}}),
+              json::parse(R"({"exception":"cannot be kept in memory: Cannot allocate memory",)"
+                          R"("status":false})"));
 }
 
 TEST_F(FileServiceTest, AsksForTheMemoryThatATextTakesBeforeItFindsItsCharset) {

@@ -58,6 +58,26 @@ TEST_F(MemoryLimit, MakesAFileThatIsLargerAFailedRequest) {
               "{\"data\":\"text\",\"status\":true}\n");
 }
 
+TEST_F(MemoryLimit, HoldsForTheOldTextThatIsKeptWhileANewOneIsWrittenInPlace) {
+    const std::string file = sparse(gigabyte);
+    std::filesystem::create_hard_link(file, folder / "other name");  // so that it is in place
+    const Outcome outcome = test::run(
+        hostCommand({"--memory-limit", "500MB", "write", "--no-history", file}), "new text");
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_EQ(outcome.output, "false\n");
+    EXPECT_THAT(outcome.errors,
+                testing::HasSubstr("cannot be kept in memory: Cannot allocate memory"));
+    EXPECT_EQ(std::filesystem::file_size(file), gigabyte);
+}
+
+TEST_F(MemoryLimit, HoldsForTheStandardInputThatIsRead) {
+    const Outcome outcome = test::run(hostCommand({"--memory-limit", "100MB", "read", "-"}),
+                                      std::string(200'000'000, 'x'));
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_THAT(outcome.errors,
+                testing::HasSubstr("cannot be kept in memory: Cannot allocate memory"));
+}
+
 TEST_F(MemoryLimit, IsThereWithoutBeingAskedFor) {
     test::Subprocess program(hostCommand({"stdio"}));
     program.write(test::framedReadRequest("1", small));
