@@ -109,8 +109,8 @@ public:
     /// when the future is invalid or its outcome already taken.
     T get() { return takeState()->takeOutcome(); }
 
-    /// Has `callback` called with the resolved future, which it can `get` without blocking: on the
-    /// thread that resolves the promise, or at once on this one when it is resolved already.
+    /// Calls `callback` with the resolved future, which it can `get` without blocking: on the
+    /// thread that resolves the promise, or at once on this one if it is already resolved.
     /// Returns the future of the callback's result, or of the exception that it throws. When the
     /// state is cancelled instead, the callback is destroyed without being called and the returned
     /// future is cancelled too. Throws std::runtime_error when the future is invalid or its outcome

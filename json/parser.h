@@ -56,14 +56,14 @@ struct Input {
 
 // Each routine writes its target only when it succeeds.
 
-/// Skips white space, and comments if they are allowed. A comment that is not ended takes up the
-/// rest of the input: endOfInput.
+/// Skips white space, and comments if they are allowed. An unterminated comment takes up the rest
+/// of the input: endOfInput.
 Status skipWhitespace(Input& input);
 
 /// Parses a quoted string with its escapes.
 Status parseString(Input& input, std::string& target);
 
-/// Parses a number without a type; a number that the end of the input completes is one.
+/// Parses a number without a type; the end of the input may complete it.
 Status parseNumber(Input& input, double& target);
 
 /// Moves past `literal` if the input goes on with it, whatever comes after it. Otherwise stays, and

@@ -20,7 +20,7 @@ namespace json {
 /// Takes time linear in the size of the text, and no stack in proportion to the nesting.
 std::string serialize(const Value& value);
 
-/// Makes the memory of a text `size` bytes long, keeping what it holds, and returns its beginning.
+/// Resizes the memory of a text to `size` bytes, keeping its contents, and returns its beginning.
 using TextMemory = std::function<char*(std::size_t size)>;
 
 /// Writes the same text into memory from `resize`, which is called last with the length of the

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The loops of the string kernels, written once for every kind of block: 64 bytes of which one bit
-// mask each tells the backslashes, the quotes, and the bytes that need an escape.
+// The loops of the string kernels, written once for every kind of block: 64 bytes, with a bit mask
+// each for the backslashes, the quotes, and the bytes that need an escape.
 //
 // This header is for the files that define blocks. It has no external linkage and calls no library
 // function: a file compiled for some instructions must not bring versions of shared functions with

@@ -19,8 +19,8 @@ struct StringExtent {
 
 /// How far a copying loop has come.
 struct Copied {
-    const char* in;  // behind the last byte that was read
-    char* out;       // behind the last byte that was written
+    const char* in;  // one past the last byte that was read
+    char* out;       // one past the last byte that was written
 };
 
 struct StringKernels {

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The one in-memory JSON value: requests are parsed into it, documents and responses are built of
+// The one in-memory JSON value: requests are parsed into it, documents and responses are built from
 // it.
 #pragma once
 
@@ -119,7 +119,7 @@ public:
         return storage.emplace<T>();
     }
 
-    /// Whether kinds and contents are the same. Different kinds are never equal, also when both are
+    /// Whether kinds and contents are the same. Different kinds are never equal, even when both are
     /// numbers; numbers of one kind compare as C++ does (so NaN differs from itself).
     friend bool operator==(const Value& left, const Value& right);
 

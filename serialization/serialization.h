@@ -27,8 +27,8 @@ public:
     /// it. Throws what initializeMessageService throws.
     Serialization();
 
-    /// Releases the subscriptions, the write channel's first, and then the message service; which
-    /// is all there is to disconnecting.
+    /// Releases the subscriptions, the write channel's first, and then the message service;
+    /// disconnecting takes no more than that.
     ~Serialization() = default;
 
     Serialization(const Serialization&) = delete;
@@ -117,9 +117,9 @@ public:
     // Reading a text file. Paths are passed by value down the chain, so that each step owns its
     // own.
 
-    /// The result object of a read: "status" with "data", or with "exception", which is all that
-    /// there is of a file that is longer than `longestAnswer` bytes. Throws nothing that derives
-    /// from std::exception. Linear in the size of the file, which is held in memory whole.
+    /// The result object of a read: "status" with "data", or with "exception", as always for a file
+    /// that is longer than `longestAnswer` bytes. Throws nothing that derives from std::exception.
+    /// Linear in the size of the file, which is held in memory whole.
     json::Object readTextDocument(std::u16string path, std::size_t longestAnswer = anyLength) const;
 
     /// The text of the file at `path` in the file's own charset, without a byte-order mark.
@@ -139,9 +139,8 @@ public:
     // Reading a document package.
 
     /// The result object of a read: "status" with the package's parts and relationships, or with
-    /// "exception", which is all that there is of a package whose parts have more than
-    /// `longestAnswer` bytes; "status" alone when nothing is at `path`. Throws nothing that derives
-    /// from std::exception.
+    /// "exception", as always for a package whose parts have more than `longestAnswer` bytes;
+    /// "status" alone when nothing is at `path`. Throws nothing that derives from std::exception.
     json::Object readPackageDocument(std::u16string path,
                                      std::size_t longestAnswer = anyLength) const;
 

@@ -4,10 +4,10 @@
 // The bundle writes texts in place and reports only whether it could open the file. So it is given
 // another path, of a new file in the same folder, and what it wrote there is compared with what was
 // asked for, made safe on disk, and takes the old file's place by renaming. Where a new file cannot
-// stand for the old (it has other names, is a mount point, belongs to somebody else, or its folder
-// takes no new file) the bundle writes to memory, and that is copied over the old content, which is
-// kept to be put back and is an earlier version by then.
-// Packages are saved by renaming in any case.
+// replace the old one (which has other names, is a mount point or belongs to somebody else, or
+// whose folder takes no new file) the bundle writes to memory, and that is copied over the old
+// content, which is kept to be put back and is an earlier version by then. Packages are saved by
+// renaming in any case.
 #pragma once
 
 #include <exception>

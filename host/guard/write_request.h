@@ -23,7 +23,7 @@ struct WriteRequest {
 
 /// The request that `payload` holds, or nothing where it is none that the bundle would answer: it
 /// is not an object, or lacks a member or has one of another kind. The content of a package is
-/// passed over without a look at what is between its brackets. The result lasts no longer than
+/// skipped; what is between its brackets is not checked. The result lasts no longer than
 /// `payload`. Linear in the size of `payload`.
 std::optional<WriteRequest> readWriteRequest(std::string_view payload);
 
@@ -31,9 +31,9 @@ std::optional<WriteRequest> readWriteRequest(std::string_view payload);
 /// Of two members of one name the first counts.
 std::string withFilePath(std::string_view payload, const std::string& filePath);
 
-/// Another path in the text of a request, in place of its own: a large request is not copied for
-/// it, which would take as much memory again. The bytes of the request are overwritten, and
-/// restored by the destructor; they must be writable, and nothing else may read them in between.
+/// Replaces the path in the text of a request without copying it: copying a large request would
+/// take as much memory again. The bytes of the request are overwritten, and restored by the
+/// destructor; they must be writable, and nothing else may read them in between.
 class PathOverwrite {
 public:
     /// Writes `filePath` over `filePathText` of a request, where there is room for it.

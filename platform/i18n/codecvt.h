@@ -20,7 +20,7 @@ public:
     /// `charset` is an IANA name or a usual alias, compared without case. `strict` decides what
     /// malformed input does: true throws, false puts U+FFFD in its place. True also refuses what
     /// could be decoded but would not encode again: a save would lose it. In charsets in which a
-    /// text has one right spelling (BOCU-1, GSM 03.38) that is every other one.
+    /// text has one right spelling (BOCU-1, GSM 03.38), that means every other spelling.
     /// Throws std::runtime_error naming the charset when it is unknown or empty.
     codecvt_string_to_ustring(const std::string& charset, bool strict);
     codecvt_string_to_ustring(codecvt_string_to_ustring&&) noexcept;

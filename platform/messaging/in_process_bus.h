@@ -22,8 +22,8 @@ struct InProcessBusOptions {
     /// Channels whose subscriptions may run their handler several times at once, in any order.
     std::vector<std::string> concurrentChannels;
 
-    /// Threads of a subscription on a concurrent channel; 0: as many as the hardware's, at least
-    /// two.
+    /// Threads of a subscription on a concurrent channel; 0: as many as there are processors, at
+    /// least two.
     std::size_t concurrency = 0;
 };
 
@@ -38,7 +38,7 @@ using MessageObserver = std::function<void(std::string_view clientName, const Js
 /// holds an exception when the message would take the waiting bytes past their bound.
 ///
 /// The operations may be called from any thread, handlers and observers included (but see
-/// `waitUntilIdle`). Clients and subscriptions work on after this object is gone.
+/// `waitUntilIdle`). Clients and subscriptions keep working after this object is gone.
 ///
 /// Failures of handlers and observers are logged to spdlog's logger "messaging", which writes to
 /// standard error and follows spdlog's global level; a logger of that name that exists already is

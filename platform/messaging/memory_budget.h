@@ -14,8 +14,8 @@ namespace platform::messaging {
 
 /// A number of bytes from which reservations are taken. It allocates nothing itself.
 ///
-/// Reserve everything that a piece of work needs at once: two that hold a part of the budget while
-/// they wait for the rest would wait for each other.
+/// Reserve everything that a piece of work needs at once: two that each hold a part of the budget
+/// while they wait for the rest would deadlock.
 ///
 /// All operations may be called from any thread. Reservations may outlive the budget.
 class [[gnu::visibility("default")]] MemoryBudget {

@@ -34,7 +34,7 @@ struct LongMessageOptions {
 /// The servers of a bus, its credentials for them, and how it delivers.
 struct NatsOptions {
     /// URLs, such as "nats://127.0.0.1:4222"; tried in random order. One that begins with "tls://"
-    /// turns TLS on. Servers of the same cluster are learned from those that are reached.
+    /// turns TLS on. Other servers of the cluster are learned from those that are reached.
     std::vector<std::string> servers;
 
     /// What the servers ask for; empty: not used. The file holds a user's JWT and seed.
@@ -46,8 +46,8 @@ struct NatsOptions {
     struct Tls {
         bool enabled = false;
 
-        /// PEM files. Without authorities of one's own the system's count; certificate and key are
-        /// this client's own, for servers that ask for them.
+        /// PEM files. Without a file of authorities, the system's are trusted; certificate and key
+        /// are this client's own, for servers that ask for them.
         std::string caFile;
         std::string certificateFile;
         std::string keyFile;
@@ -113,7 +113,7 @@ public:
     NatsBus(const NatsBus&) = delete;
     NatsBus& operator=(const NatsBus&) = delete;
 
-    /// Clients and subscriptions work on.
+    /// Clients and subscriptions keep working.
     ~NatsBus();
 
     /// A client of the bus. The first call connects to a server, under the name `clientName`;
