@@ -213,6 +213,8 @@ private:
         const auto mayWin = [&](const Reading& reading) {
             return reading.cost + costIn(reading, pairs.subspan(few)) <= best_.cost;
         };
+        // As a rule none may in a text of a multi-byte charset, and counting the triples takes as
+        // long as all of the above.
         if (std::none_of(readings.begin(), readings.end(), mayWin)) {
             return;
         }
