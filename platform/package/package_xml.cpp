@@ -185,9 +185,9 @@ private:
         const bool isRight = isUtf16_ ? name == "utf-16" || name == "utf-16le" || name == "utf-16be"
                                       : name == "utf-8" || name == "utf8";
         if (!isRight) {
-            throw std::runtime_error("is in the encoding " + quoted(encoding) +
-                                     " by its declaration, but in " +
-                                     (isUtf16_ ? "UTF-16" : "no UTF-16") + " by its bytes");
+            throw std::runtime_error(
+                "declares the encoding " + quoted(encoding) +
+                (isUtf16_ ? ", but is in UTF-16" : ", but only UTF-8 and UTF-16 are allowed"));
         }
     }
 

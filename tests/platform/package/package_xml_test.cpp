@@ -89,7 +89,7 @@ TEST(ForEachElement, RefusesOtherEncodings) {
     }
     EXPECT_THAT(
         problemOf(inUtf16(u"<?xml version='1.0' encoding='UTF-8'?><r xmlns='urn:n'/>", false)),
-        HasSubstr("is in the encoding \"UTF-8\" by its declaration, but in UTF-16"));
+        HasSubstr("declares the encoding \"UTF-8\", but is in UTF-16"));
     const std::string ascii = root("<a/>");
     std::string utf32;
     for (const char c : ascii) {
