@@ -6,8 +6,9 @@
 #include <simdjson.h>
 #include <sys/stat.h>
 
-#include <algorithm>
+#include <iterator>
 #include <memory>
+#include <set>
 #include <string_view>
 #include <utility>
 
@@ -60,18 +61,22 @@ FolderEntry describe(int folder, std::string name) {
 
 FolderPage listFolder(const std::string& path, const std::string& after, std::size_t most) {
     const Folder folder = open(path);
-    std::vector<std::string> names;
+    FolderPage page;
+    // Only the names of the page are kept: those of a huge folder would take all memory.
+    std::set<std::string> names;
     while (const dirent* const entry = ::readdir(folder.get())) {
-        if (entry->d_name > after && isShown(entry->d_name)) {
-            names.emplace_back(entry->d_name);
+        if (entry->d_name <= after || !isShown(entry->d_name)) {
+            continue;
+        }
+        names.emplace(entry->d_name);
+        if (names.size() > most) {
+            names.erase(std::prev(names.end()));
+            page.isLast = false;
         }
     }
-    FolderPage page;
-    page.isLast = names.size() <= most;
-    const auto end = names.begin() + static_cast<std::ptrdiff_t>(std::min(most, names.size()));
-    std::partial_sort(names.begin(), end, names.end());
-    for (auto name = names.begin(); name != end; ++name) {
-        page.entries.push_back(describe(::dirfd(folder.get()), std::move(*name)));
+    while (!names.empty()) {
+        page.entries.push_back(
+            describe(::dirfd(folder.get()), std::move(names.extract(names.begin()).value())));
     }
     return page;
 }
