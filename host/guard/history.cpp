@@ -35,6 +35,7 @@ using platform::FileDescriptor;
 constexpr std::chrono::hours longestAge{30 * 24};
 constexpr std::chrono::hours recount{1};
 constexpr std::size_t mostPending = 256;
+constexpr std::uint64_t workersPerRoot = 8;  // more of them may exceed the share for a while
 constexpr const char* unfinishedName = "unfinished-";
 
 std::int64_t now() {
@@ -101,6 +102,12 @@ void removeIfAbandoned(const fs::path& path) {
     if (!error && changed + recount < fs::file_time_type::clock::now()) {
         removeFile(path);
     }
+}
+
+// What a file of `size` bytes takes on disk, about: whole blocks, and an entry in a table.
+std::uint64_t roomFor(std::uint64_t size) {
+    constexpr std::uint64_t block = 4096;
+    return (size / block + 2) * block;
 }
 
 std::uint64_t sizeOf(const FileDescriptor& file) {
@@ -315,7 +322,7 @@ void History::makeCopy(const FileDescriptor& old, const std::string& document, S
     const std::string digest = digestOf(document);
     const fs::path folder = options_.folder / digestOf(root.string()) / digest.substr(0, 2);
     fs::create_directories(folder);
-    makeRoom(root, sizeOf(old));
+    makeRoom(root, roomFor(sizeOf(old)));
     const fs::path unfinished =
         folder / (unfinishedName + std::to_string(::getpid()) + "." + std::to_string(now()));
     try {
@@ -351,35 +358,37 @@ void History::removeSurplus(const std::string& document) {
 // Makes room for another version of `size` bytes in the share of `root`. Throws std::runtime_error
 // when it exceeds the share alone: all other versions would go, and then the new one too.
 //
-// Surplus versions that were removed still count until everything is counted anew, each hour and
-// when the share is exceeded.
+// All versions are counted anew each hour, and when this process has added its part of what was
+// free at the last count: other workers add to them, too.
 void History::makeRoom(const fs::path& root, std::uint64_t size) {
     Usage& usage = usage_[root];
     const auto time = std::chrono::steady_clock::now();
-    const bool isCounted = usage.counted != std::chrono::steady_clock::time_point();
-    if (!isCounted || usage.bytes + size > usage.most || time - usage.counted >= recount) {
-        usage.most = shareOf(root);
-        if (size > usage.most) {
+    if (usage.added + size > usage.mayAdd || time - usage.counted >= recount) {
+        const std::uint64_t most = shareOf(root);
+        if (size > most) {
             throw std::runtime_error("its " + std::to_string(size) + " bytes exceed the " +
-                                     std::to_string(usage.most) +
-                                     " that all earlier versions may take");
+                                     std::to_string(most) + " that all earlier versions may take");
         }
-        usage.bytes = removeOldest(root, usage.most - size);
-        usage.counted = time;
+        usage = {0, (most - removeOldest(root, most - size)) / workersPerRoot, time};
     }
-    usage.bytes += size;
+    usage.added += size;
 }
 
 // The bytes that versions of documents below `root` may take together.
 std::uint64_t History::shareOf(const fs::path& root) const {
-    struct statvfs system {};
-    if (::statvfs(root.c_str(), &system) != 0) {
-        platform::throwSystemError(root.c_str());
-    }
-    const auto size = static_cast<double>(system.f_blocks) * static_cast<double>(system.f_frsize);
-    // A file system that does not tell its size says that it has no blocks.
-    return system.f_blocks == 0 ? std::numeric_limits<std::uint64_t>::max()
-                                : static_cast<std::uint64_t>(size * options_.share);
+    const auto shareOfDisk = [this](const fs::path& folder) {
+        struct statvfs system {};
+        if (::statvfs(folder.c_str(), &system) != 0) {
+            platform::throwSystemError(folder.c_str());
+        }
+        const auto size =
+            static_cast<double>(system.f_blocks) * static_cast<double>(system.f_frsize);
+        // A file system that does not tell its size says that it has no blocks.
+        return system.f_blocks == 0 ? std::numeric_limits<std::uint64_t>::max()
+                                    : static_cast<std::uint64_t>(size * options_.share);
+    };
+    // Versions must not fill a disk of their own that is smaller.
+    return std::min(shareOfDisk(root), shareOfDisk(options_.folder));
 }
 
 // Removes what is too old, and the oldest versions until the others take no more than `most` bytes,
@@ -391,7 +400,7 @@ std::uint64_t History::removeOldest(const fs::path& root, std::uint64_t most) co
         for (const fs::path& path : pathsIn(folder)) {
             if (const std::optional<NameParts> parts = partsOf(path.filename())) {
                 files.push_back({path, parts->document, parts->version});
-                bytes += parts->version.size;
+                bytes += roomFor(parts->version.size);
             } else {
                 removeIfAbandoned(path);
             }
@@ -403,7 +412,7 @@ std::uint64_t History::removeOldest(const fs::path& root, std::uint64_t most) co
     for (const File& file : files) {
         if (bytes > wanted || isTooOld(file.version)) {
             removeFile(file.path);
-            bytes -= file.version.size;
+            bytes -= roomFor(file.version.size);
         }
     }
     return bytes;

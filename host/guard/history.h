@@ -43,7 +43,8 @@ struct HistoryOptions {
 
     std::size_t versions = 20;  // of each document
 
-    /// The share of the root's file system that the versions of all its documents may take.
+    /// The share of the root's file system, or of that of `folder` if it is smaller, that the
+    /// versions of all documents below the root may take.
     double share = 0.1;
 };
 
@@ -110,10 +111,11 @@ private:
 
     HistoryOptions options_;
 
-    // What the versions of each root take and when that was counted; used by the thread alone.
+    // What was added to the versions of each root since they were counted, and how much may be
+    // until the next count; used by the thread alone.
     struct Usage {
-        std::uint64_t bytes = 0;
-        std::uint64_t most = 0;
+        std::uint64_t added = 0;
+        std::uint64_t mayAdd = 0;
         std::chrono::steady_clock::time_point counted;
     };
     std::map<std::filesystem::path, Usage> usage_;

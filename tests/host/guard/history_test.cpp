@@ -11,6 +11,8 @@
 #include <algorithm>
 #include <cstdint>
 #include <filesystem>
+#include <iterator>
+#include <list>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -101,6 +103,57 @@ TEST_F(HistoryTest, TakesNoMoreThanItsShareOfTheDiskAndRemovesTheOldestFirst) {
         }
         EXPECT_EQ(history.versionsOf(document("49")).size(), 1U);
         EXPECT_TRUE(history.versionsOf(document("0")).empty());
+    }
+    ::umount2(root_.path().c_str(), MNT_DETACH);
+}
+
+TEST_F(HistoryTest, TakesNoMoreThanTheShareOfItsOwnDiskIfThatIsSmaller) {
+    const fs::path folder = scratch_ / "versions";
+    fs::create_directory(folder);
+    if (::mount("tmpfs", folder.c_str(), "tmpfs", 0, "size=1000k,mode=700") != 0) {
+        GTEST_SKIP() << "this user may not mount a file system";
+    }
+    {
+        History history({folder, {root_.path()}});
+        for (int i = 0; i < 50; ++i) {
+            history.keep(fileOf(std::string(10'000, 'x')), document(std::to_string(i)));
+        }
+        EXPECT_EQ(history.versionsOf(document("49")).size(), 1U);
+        EXPECT_LE(files().size(), 10U);
+    }
+    ::umount2(folder.c_str(), MNT_DETACH);
+}
+
+TEST_F(HistoryTest, CountsTheRoomThatSmallVersionsTake) {
+    if (::mount("tmpfs", root_.path().c_str(), "tmpfs", 0, "size=1000k,mode=700") != 0) {
+        GTEST_SKIP() << "this user may not mount a file system";
+    }
+    {
+        History history({scratch_ / "versions", {root_.path()}});
+        for (int i = 0; i < 100; ++i) {
+            history.keep(fileOf("x"), document(std::to_string(i)));
+        }
+        EXPECT_EQ(history.versionsOf(document("99")).size(), 1U);
+        EXPECT_LE(files().size(), 1'000'000U / 10 / 4096);
+    }
+    ::umount2(root_.path().c_str(), MNT_DETACH);
+}
+
+TEST_F(HistoryTest, TakesNoMoreThanItsShareTogetherWithThatOfOtherProcesses) {
+    if (::mount("tmpfs", root_.path().c_str(), "tmpfs", 0, "size=10000k,mode=700") != 0) {
+        GTEST_SKIP() << "this user may not mount a file system";
+    }
+    {
+        std::list<History> histories;
+        for (int i = 0; i < 5; ++i) {
+            histories.emplace_back(host::HistoryOptions{scratch_ / "versions", {root_.path()}});
+        }
+        for (int i = 0; i < 300; ++i) {
+            History& history =
+                i % 2 == 0 ? histories.front() : *std::next(histories.begin(), i % 5);
+            history.keepNow(fileOf(std::string(10'000, 'x')), document(std::to_string(i)));
+            EXPECT_LE(files().size(), 1'024'000U / 10'000);
+        }
     }
     ::umount2(root_.path().c_str(), MNT_DETACH);
 }
