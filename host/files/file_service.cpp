@@ -184,7 +184,9 @@ private:
     std::string readVersion() {
         const FileDescriptor version = earlierVersion();
         FileInMemory copy("earlier version");
-        copy.reserve(sizeOf(version));
+        const std::size_t size = sizeOf(version);
+        client_.awaitMemory(size);
+        copy.reserve(size);
         copyContent(version.get(), copy.descriptor().get());
         json::Object request{
             {"rtcId", ""}, {"contentType", text("contentType")}, {"filePath", copy.path()}};

@@ -2,6 +2,7 @@
 #include "host/guard/document_version.h"
 
 #include <openssl/evp.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <array>
@@ -17,6 +18,10 @@
 namespace host {
 
 namespace {
+
+// As long as a package may be, with room for names. To compute the version of what is longer would
+// hold up everybody's saves for minutes.
+constexpr off_t longestDocument = off_t{2200} << 20U;
 
 class Sha256 {
 public:
@@ -50,9 +55,20 @@ private:
     std::unique_ptr<EVP_MD_CTX, void (*)(EVP_MD_CTX*)> context_;
 };
 
+void requireLength(off_t length) {
+    if (length > longestDocument) {
+        throw std::runtime_error("is too large for a document: " + std::to_string(length) +
+                                 " bytes");
+    }
+}
+
 }  // namespace
 
 std::string versionOf(int file) {
+    struct stat status {};
+    if (::fstat(file, &status) == 0) {
+        requireLength(status.st_size);
+    }
     constexpr std::size_t blockSize = std::size_t{256} * 1024;
     std::vector<char> block(blockSize);
     Sha256 sum;
@@ -64,6 +80,7 @@ std::string versionOf(int file) {
         if (count > 0) {
             sum.add(block.data(), static_cast<std::size_t>(count));
             offset += count;
+            requireLength(offset);  // The file may grow.
         } else if (errno != EINTR) {
             platform::throwSystemError("cannot be read");
         }

@@ -149,6 +149,10 @@ bool hasContentOf(int file, std::string_view literal) {
 }
 
 bool haveSameContent(int one, int other) {
+    struct stat status {};
+    if (::fstat(one, &status) == 0 && !hasSize(other, static_cast<std::size_t>(status.st_size))) {
+        return false;
+    }
     std::vector<char> block;
     std::vector<char> otherBlock;
     for (off_t offset = 0;; offset += static_cast<off_t>(block.size())) {

@@ -122,7 +122,9 @@ private:
                            : withPayload(message, withFilePath(message.payload(), otherPath)));
         };
         try {
-            publishResult(client, *request, saves.save(*request, askBundle));
+            publishResult(client, *request, saves.save(*request, askBundle, [&](std::size_t bytes) {
+                client.awaitMemory(bytes);
+            }));
         } catch (const BundleFailure& failure) {
             std::rethrow_exception(failure.exception);
         }

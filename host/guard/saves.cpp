@@ -117,10 +117,11 @@ bool areOneFile(const FileDescriptor& one, const FileDescriptor& other) {
 class Save {
 public:
     Save(const WriteRequest& request, const std::string& document, const AskBundle& askBundle,
-         SaveLocks& locks, History* history)
+         const AwaitMemory& awaitMemory, SaveLocks& locks, History* history)
         : request_(request),
           document_(document),
           askBundle_(askBundle),
+          awaitMemory_(awaitMemory),
           locks_(locks),
           history_(history) {}
 
@@ -182,8 +183,9 @@ private:
         }
         const SaveLocks::Held lock = locks_.hold(document_);
         FileDescriptor old = file.openTarget();
-        if (!isBasedOn(old, file.hasTarget())) {
-            return isRepetition(old.get(), old && haveSameContent(old.get(), file.content()));
+        const bool isSame = old && haveSameContent(old.get(), file.content());
+        if (isSame || !isBasedOn(old, file.hasTarget())) {
+            return isThereAlready(old.get(), isSame);
         }
         noteVersion(file.content());
         commit(file, [&] { keep(std::move(old)); });
@@ -191,6 +193,9 @@ private:
     }
 
     bool saveTextInPlace() {
+        std::error_code ignored;
+        const std::uintmax_t oldSize = std::filesystem::file_size(request_.filePath, ignored);
+        awaitMemory_((ignored ? 0 : oldSize) + request_.text.size());
         const SaveLocks::Held lock = locks_.hold(document_);
         std::optional<InPlaceFile> opened;
         try {
@@ -206,12 +211,15 @@ private:
 
     bool saveTextOver(const InPlaceFile& file) {
         if (!isBasedOn(file.copy(), true)) {
-            return isRepetition(file.descriptor(), holdsTextOf(request_, file.copy().get()));
+            return isThereAlready(file.descriptor(), holdsTextOf(request_, file.copy().get()));
         }
         FileInMemory text("new content");
         text.reserve(request_.text.size());
         if (!askBundle_(text.path()).isWritten || !holdsTextOf(request_, text.descriptor().get())) {
             throw std::runtime_error("the text is not valid in the charset");
+        }
+        if (haveSameContent(file.copy().get(), text.descriptor().get())) {
+            return isThereAlready(file.descriptor(), true);
         }
         // A process that is killed while it writes leaves a mixture, so the old text is kept first.
         if (history_ != nullptr) {
@@ -237,7 +245,7 @@ private:
         const SaveLocks::Held lock = locks_.hold(document_);
         FileDescriptor old = openRegular(request_.filePath);
         if (!isBasedOn(old, existed_)) {
-            return isRepetition(old.get(), old && packageComesOutAs(old));
+            return isThereAlready(old.get(), old && packageComesOutAs(old));
         }
         const BundleAnswer answer = askBundle_({});
         existed_ = answer.existed;
@@ -245,7 +253,7 @@ private:
         if (answer.isWritten) {
             noteVersion(current.get());
         }
-        if (!areOneFile(old, current)) {
+        if (!areOneFile(old, current) && !haveSameContent(old.get(), current.get())) {
             keep(std::move(old));
         }
         return answer.isWritten;
@@ -277,9 +285,11 @@ private:
         return expected == (current ? versionOf(current.get()) : std::string());
     }
 
-    // Whether the save was made before, by a client that got no answer and asks again: its own save
-    // must not look like another's. That one may have failed at its last step, so it is synced.
-    bool isRepetition(int current, bool isSame) {
+    // Whether the document holds already what is to be saved. Then nothing is written, and no
+    // earlier version is kept: saves that change nothing would soon drive out all others. Nor is it
+    // a conflict: the save was made before, by a client that got no answer and asks again. That one
+    // may have failed at its last step, so the document is synced.
+    bool isThereAlready(int current, bool isSame) {
         if (isSame) {
             syncWithFolder(current, document_);
             noteVersion(current);
@@ -317,6 +327,7 @@ private:
     const WriteRequest& request_;
     const std::string& document_;
     const AskBundle& askBundle_;
+    const AwaitMemory& awaitMemory_;
     SaveLocks& locks_;
     History* const history_;
     bool existed_ = false;
@@ -329,9 +340,11 @@ private:
 Saves::Saves(const std::filesystem::path& lockFile, std::shared_ptr<History> history)
     : locks_(lockFile), history_(std::move(history)) {}
 
-SaveResult Saves::save(const WriteRequest& request, const AskBundle& askBundle) {
+SaveResult Saves::save(const WriteRequest& request, const AskBundle& askBundle,
+                       const AwaitMemory& awaitMemory) {
     const std::string document = History::nameOf(request.filePath);
-    SaveResult result = Save(request, document, askBundle, locks_, history_.get()).make();
+    SaveResult result =
+        Save(request, document, askBundle, awaitMemory, locks_, history_.get()).make();
     leftovers_.removeBeside(document);
     return result;
 }
@@ -351,14 +364,14 @@ void Saves::restore(const std::string& path, int version) {
         FileDescriptor old = file->openTarget();
         copyContent(version, file->content());
         commit(*file, [&] {
-            if (history_ && old) {
+            if (history_ && old && !haveSameContent(old.get(), version)) {
                 history_->keep(std::move(old), document);
             }
         });
         return;
     }
     const InPlaceFile inPlace(path);
-    if (history_) {
+    if (history_ && !haveSameContent(inPlace.copy().get(), version)) {
         history_->keepNow(inPlace.copy(), document);
     }
     inPlace.replaceContent(version);

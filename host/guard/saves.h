@@ -10,6 +10,7 @@
 // renaming in any case.
 #pragma once
 
+#include <cstddef>
 #include <exception>
 #include <filesystem>
 #include <functional>
@@ -33,6 +34,9 @@ struct BundleAnswer {
 /// Makes the bundle handle the request, with `otherPath` in place of its path unless that is empty.
 /// Throws BundleFailure.
 using AskBundle = std::function<BundleAnswer(const std::string& otherPath)>;
+
+/// Waits until there is memory for so many bytes (MessageService::awaitMemory).
+using AwaitMemory = std::function<void(std::size_t bytes)>;
 
 /// The bundle ended a request with an exception, and so without an answer. It is not a
 /// std::exception, which would be a failed save with an answer.
@@ -59,7 +63,8 @@ public:
     /// Saves what `request` holds. When isSaved is false, the document is as it was (unless only
     /// its folder could not be made safe on disk), and the log has the reason. Throws BundleFailure
     /// where the bundle gives no answer; the document is as it was then.
-    SaveResult save(const WriteRequest& request, const AskBundle& askBundle);
+    SaveResult save(const WriteRequest& request, const AskBundle& askBundle,
+                    const AwaitMemory& awaitMemory);
 
     /// Makes the content of the open file `version` that of the document at `path`, which it
     /// replaces as a save does. Throws std::runtime_error when that fails; the document is then as

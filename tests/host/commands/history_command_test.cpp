@@ -87,8 +87,9 @@ TEST_F(HistoryCommand, HasWhatStdioReplacesWhenItSavesSafely) {
     writeFile(file_, "old");
     writeByStdio({});
     EXPECT_EQ(history({}).output, "");
+    writeFile(file_, "old");
     writeByStdio({"--safe-saves"});
-    EXPECT_TRUE(history({}).output.ends_with("\t1\n"));
+    EXPECT_TRUE(history({}).output.ends_with("\t3\n"));
 }
 
 TEST_F(HistoryCommand, CannotKeepVersionsWhereClientsCanReachThem) {

@@ -278,6 +278,33 @@ TEST_F(FileServiceTest, ReadsNoEarlierVersionForWhichThereIsNoMemory) {
                           R"("status":false})"));
 }
 
+TEST_F(FileServiceTest, AsksForTheMemoryThatCopiesOfFilesTake) {
+    writeFile(root_ / "a.txt", std::string(100'000, 'x'));
+    fs::create_hard_link(root_ / "a.txt", root_ / "b.txt");  // so that it is written in place
+    EXPECT_EQ(write(root_ / "a.txt", std::string(50'000, 'y')), "true");
+    EXPECT_GE(limits_.awaited, 150'000U);
+    EXPECT_LT(limits_.awaited, 160'000U);
+    const json::Value time = versionsOf(root_ / "a.txt").at(0).get<json::Object>()["time"];
+    limits_.awaited = 0;
+    ask("readVersion", root_ / "a.txt", {{"time", time}, {"contentType", "text/xml"}});
+    EXPECT_EQ(limits_.awaited, 100'000U);  // It is no package, so that the bundle asks for none.
+}
+
+TEST_F(FileServiceTest, ComputesNoVersionOfWhatIsTooLongForADocument) {
+    writeFile(root_ / "a.txt", "");
+    fs::resize_file(root_ / "a.txt", 10'000'000'000'000);
+    EXPECT_EQ(ask("version", root_ / "a.txt")["exception"],
+              json::Value("is too large for a document: 10000000000000 bytes"));
+    EXPECT_EQ(send(platform::messaging::writeRequestChannel,
+                   {{"filePath", (root_ / "a.txt").string()},
+                    {"contentType", "text/plain"},
+                    {"encoding", "UTF-8"},
+                    {"content", "text"},
+                    {"baseVersion", "another"}},
+                   platform::messaging::writeResponsePrefix),
+              "false");
+}
+
 TEST_F(FileServiceTest, AsksForTheMemoryThatATextTakesBeforeItFindsItsCharset) {
     writeFile(root_ / "a.txt", std::string(100'000, 'x'));
     ask("charset", root_ / "a.txt");

@@ -9,6 +9,7 @@
 #include <sys/xattr.h>
 #include <unistd.h>
 #include <algorithm>
+#include <array>
 
 #include <chrono>
 #include <filesystem>
@@ -392,6 +393,38 @@ TEST_F(GuardedBundle, KeepsWhatSavesReplace) {
     ASSERT_EQ(versions.size(), 2U);
     const FileDescriptor newest = history_->open(document, versions[0].time);
     EXPECT_EQ(readFile("/proc/self/fd/" + std::to_string(newest.get())), "two");
+}
+
+TEST_F(GuardedBundle, KeepsNoVersionForSavesThatChangeNothing) {
+    writeFile(at("linked.txt"), "old");
+    fs::create_hard_link(at("linked.txt"), at("other.txt"));  // so that it is written in place
+    const std::pair<std::string, std::array<json::Value, 2>> documents[] = {
+        {"a.txt", {"old", "new"}},
+        {"linked.txt", {"old", "new"}},
+        {"a.docx", {package("old"), package("new")}}};
+    for (const auto& [name, contents] : documents) {
+        for (const json::Value& content : contents) {
+            for (int i = 0; i < 30; ++i) {
+                EXPECT_EQ(write(at(name), content).back(), "true");
+                expectSaved(at(name), content, version(at(name)), true);
+            }
+        }
+        history_->waitUntilIdle();
+        EXPECT_EQ(history_->versionsOf(host::History::nameOf(at(name))).size(), 1U) << name;
+    }
+}
+
+TEST_F(GuardedBundle, LeavesATextAloneThatIsThereAlready) {
+    for (const bool hasTwoNames : {false, true}) {
+        write(at("a.txt"), "text");
+        if (hasTwoNames) {
+            fs::create_hard_link(at("a.txt"), at("b.txt"));
+        }
+        const fs::file_time_type longAgo{std::chrono::hours(1)};
+        fs::last_write_time(at("a.txt"), longAgo);
+        EXPECT_EQ(write(at("a.txt"), "text"), outcome(at("a.txt"), true, true));
+        EXPECT_EQ(fs::last_write_time(at("a.txt")), longAgo);
+    }
 }
 
 // To delete a large file takes time, for which no client should wait.
