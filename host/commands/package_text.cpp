@@ -7,7 +7,9 @@
 #include <utility>
 
 #include "json/parser.h"
+#include "json/serialize.h"
 #include "json/value.h"
+#include "platform/i18n/codecvt.h"
 #include "platform/text/ascii.h"
 
 namespace host {
@@ -31,9 +33,28 @@ std::string faultOf(json::Object& object) {
     return "it lacks the arrays \"parts\" and \"relationships\"";
 }
 
-// Why `package` cannot be written, naming the part: the bundle takes only text as the body of a
-// part of an application/ type. Empty when it can.
+// Whether writing changes `c` in the text of a part of an application/ type.
+bool isReplaced(char16_t c) {
+    const bool isControl = c < 0x20 || (c >= 0x7F && c < 0xA0);
+    return (isControl && c != '\t' && c != '\n' && c != '\r') || c == 0x200B || c >= 0xFFFE;
+}
+
+// Whether `content` comes back byte for byte as that of a part of an application/ type. Binary
+// parts may well be valid UTF-8: English in UTF-16 is, with a zero after each letter.
+bool isPlainText(const std::string& content) {
+    if (!simdjson::validate_utf8(content.data(), content.size())) {
+        return false;
+    }
+    const std::u16string text = platform::i18n::to_ustring(content);
+    return std::none_of(text.begin(), text.end(), isReplaced);
+}
+
+// Why `package` cannot be written as it is, naming the part. Empty when it can.
 std::string refusalOf(json::Object& package) {
+    if (const json::Value& broken = package[brokenPartsKey]; broken.is<json::Array>()) {
+        return "the bytes of " + json::serialize(broken) +
+               " were replaced where they are no UTF-8; read the document without --utf8";
+    }
     for (json::Value& part : package["parts"].get<json::Array>()) {
         if (!part.is<json::Object>()) {
             return "a part is no JSON object";
@@ -46,11 +67,10 @@ std::string refusalOf(json::Object& package) {
         }
         const auto& content = members["content"].get<std::string>();
         if (members["contentType"].get<std::string>().starts_with("application/") &&
-            !simdjson::validate_utf8(content.data(), content.size())) {
+            !isPlainText(content)) {
             return "the part " + members["partUri"].get<std::string>() +
-                   " is not text, as that of a part of an application/ type has to be; spell its "
-                   "type "
-                   "\"Application/...\" to have its bytes stored as they are";
+                   " is not plain text, as that of a part of an application/ type has to be; spell "
+                   "its type \"Application/...\" to have its bytes stored as they are";
         }
     }
     return "";

@@ -7,11 +7,15 @@
 
 namespace host {
 
+/// The member with the names of the parts that were not printed as they are, since they are no
+/// UTF-8; absent where there are none.
+inline constexpr const char* brokenPartsKey = "brokenParts";
+
 /// A package that was found in a text, or why there is none.
 struct PackageText {
     std::string_view json;  ///< The JSON object of the package, within the text.
     std::string fault;      ///< Why there is no package, for people; empty when there is one.
-    std::string refusal;    ///< Why it cannot be written, as far as is known; for people.
+    std::string refusal;    ///< Why it cannot be written as it is; for people, empty when it can.
 };
 
 /// Looks for one JSON object with the arrays "parts" and "relationships" in `text`, with nothing

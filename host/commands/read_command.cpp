@@ -16,6 +16,7 @@
 #include "host/bus/bundle_host.h"
 #include "host/commands/document_kind.h"
 #include "host/commands/file_faults.h"
+#include "host/commands/package_text.h"
 #include "host/commands/progress.h"
 #include "host/commands/text_file.h"
 #include "host/exit_status.h"
@@ -231,8 +232,26 @@ private:
     void printObject(const std::string& file, json::Object result) {
         if (options_.form == ReadOptions::Form::utf8) {
             result["filePath"] = file;
+            noteBrokenParts(result);
         }
         writeAll(output_, {json::serialize(inUtf8(json::Value(std::move(result)))), "\n"});
+    }
+
+    // Names the parts of a package whose bytes will not be printed as they are. Who wrote them back
+    // would destroy them, so they are refused then.
+    static void noteBrokenParts(json::Object& package) {
+        json::Array broken;
+        if (const auto* const parts = find<json::Array>(package, "parts")) {
+            for (const json::Value& part : *parts) {
+                const auto& members = part.get<json::Object>();
+                if (!isUtf8(members.at("content").get<std::string>())) {
+                    broken.push_back(members.at("partUri"));
+                }
+            }
+        }
+        if (!broken.empty()) {
+            package[brokenPartsKey] = std::move(broken);
+        }
     }
 
     // What is wrong with the response; nothing when it reports success. Warns of a text that is

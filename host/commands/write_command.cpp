@@ -136,10 +136,13 @@ struct Request {
 };
 
 Request makePackageRequest(const WriteOptions& options, PackageText package) {
+    if (!package.refusal.empty()) {
+        return {platform::DataBuffer(), std::move(package.refusal)};
+    }
     return {withContent(
                 {{"rtcId", "0"}, {"filePath", options.file}, {"contentType", packageContentType}},
                 package.json),
-            std::move(package.refusal)};
+            ""};
 }
 
 // A request for a text of `bytes` in `encoding`.
@@ -165,13 +168,17 @@ Request makeUtf8TextRequest(const WriteOptions& options, std::string_view conten
     codecvt_string_to_ustring utf8("UTF-8", true);
     std::u16string text = platform::i18n::to_ustring(content, utf8);
     TextFile file = readTextFile(options.file);
+    constexpr std::u16string_view mark = u"\uFEFF";
+    // Some programs put a mark before what they print. Whether the file has one is its own affair.
+    if (!file.bytes.empty() && text.starts_with(mark) && !file.withoutMark().starts_with(mark)) {
+        text.erase(0, 1);
+    }
     const std::string& charset = options.encoding.empty() ? file.charset : options.encoding;
     if (charset == file.charset && text == file.withoutMark()) {
         // Some charsets have several spellings of one text. ISO-8859-1 stores bytes as they are, so
         // the file keeps its own spelling.
         return makeTextRequest(options, std::move(file.bytes), "ISO-8859-1");
     }
-    constexpr std::u16string_view mark = u"\uFEFF";
     if (file.hasMark() && (charset == file.charset || canHold(mark, charset))) {
         text.insert(0, mark);
     }

@@ -5,7 +5,7 @@ import { test } from "node:test";
 
 import { room } from "./room.mjs";
 
-const { bytesOf, stringOf } = await room("../client/src/bytes.ts");
+const { bytesOf, isPlainText, stringOf, utf8 } = await room("../client/src/bytes.ts");
 
 const LONG = 100_000; // more than is made in one piece
 
@@ -18,6 +18,19 @@ test("each byte is the character of its number, whatever stands around it", () =
       assert.ok(bytes.equals(bytesOf(characters)), `${byte} in ${around.length} bytes`);
     }
   }
+});
+
+test("text is plain unless it has what hosts replace in parts of \"application/\" types", () => {
+  const replaced = (code) =>
+    (code < 0x20 && ![0x09, 0x0a, 0x0d].includes(code)) ||
+    (code >= 0x7f && code < 0xa0) ||
+    [0x200b, 0xfffe, 0xffff].includes(code);
+  for (let code = 0; code <= 0xffff; code += code === 0xd7ff ? 0x801 : 1) {
+    const content = utf8(`a${String.fromCharCode(code)}b`);
+    assert.equal(isPlainText(content), !replaced(code), `U+${code.toString(16)}`);
+  }
+  assert.equal(isPlainText("\xff"), false);
+  assert.equal(isPlainText(utf8("\u{1f600}")), true);
 });
 
 test("a byte-order mark stays", () => {

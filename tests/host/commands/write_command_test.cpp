@@ -5,12 +5,16 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <filesystem>
 #include <optional>
 #include <set>
 #include <string>
 #include <vector>
 
+#include "json/parser.h"
+#include "json/serialize.h"
+#include "json/value.h"
 #include "tests/host/host_program.h"
 #include "tests/platform/i18n/detection/corpus.h"
 #include "tests/support/source_root.h"
@@ -192,13 +196,37 @@ TEST_F(WriteCommand, SaysThatAFileMayNotBeWritten) {
     EXPECT_EQ(readFile(folder_ / "file"), "KEEP");
 }
 
-TEST_F(WriteCommand, NamesThePartThatItCannotWrite) {
-    const std::string json =
-        "{\"parts\":[{\"partUri\":\"/macros.bin\",\"contentType\":\"application/x-macros\","
-        "\"content\":\"\xFF\",\"relationship\":null}],\"relationships\":[]}";
-    const Outcome outcome = write(folder_ / "file.docx", json);
+TEST_F(WriteCommand, NamesThePartThatItCannotWriteAsItIs) {
+    for (const char* content :
+         {"\xFF", "a\\u0000", "\x7F", "\xC2\x80", "\xE2\x80\x8B", "\xEF\xBF\xBE", "\xEF\xBF\xBF"}) {
+        const Outcome outcome = write(
+            folder_ / "file.docx",
+            R"({"parts":[{"partUri":"/macros.bin","contentType":"application/x-macros","content":")" +
+                std::string(content) + R"(","relationship":null}],"relationships":[]})");
+        EXPECT_EQ(outcome.output, "false\n") << content;
+        EXPECT_THAT(outcome.errors, HasSubstr("the part /macros.bin is not plain text"));
+        EXPECT_FALSE(std::filesystem::exists(folder_ / "file.docx"));
+    }
+}
+
+TEST_F(WriteCommand, WritesNoPackageThatWasPrintedWithOtherBytes) {
+    const std::string report = readFile(test::sourceRoot() + "/examples/report.docx");
+    const std::filesystem::path file = folder_ / "file.docx";
+    writeFile(file, report);
+    json::Object package = json::parse(test::run(hostCommand({"read", file.string()})).output);
+    package["parts"].get<json::Array>().push_back(
+        json::Object{{"partUri", "/notes.txt"},
+                     {"contentType", "text/plain"},
+                     {"content", "caf\xE9"},
+                     {"relationship", json::Value(json::Null())}});
+    EXPECT_EQ(write(file, json::serialize(json::Value(package))).output, "true\n");
+    const std::string written = readFile(file);
+    const std::string printed = test::run(hostCommand({"read", "--utf8", file.string()})).output;
+    EXPECT_THAT(printed, HasSubstr(R"("brokenParts":["/notes.txt"])"));
+    const Outcome outcome = write(file, printed);
     EXPECT_EQ(outcome.output, "false\n");
-    EXPECT_THAT(outcome.errors, HasSubstr("the part /macros.bin is not text"));
+    EXPECT_THAT(outcome.errors, HasSubstr(R"(the bytes of ["/notes.txt"] were replaced)"));
+    EXPECT_TRUE(readFile(file) == written);
 }
 
 TEST_F(WriteCommand, StoresUtf8TextInTheFilesOwnCharsetWithItsMark) {
@@ -214,6 +242,20 @@ TEST_F(WriteCommand, StoresUtf8TextInTheFilesOwnCharsetWithItsMark) {
     EXPECT_EQ(readFile(folder_ / "file"), "\xE8");
     EXPECT_EQ(write(folder_ / "new", "\xC3\xA9", {"--text"}).output, "true\n");
     EXPECT_EQ(readFile(folder_ / "new"), "\xC3\xA9");
+}
+
+TEST_F(WriteCommand, LeavesItToTheFileWhetherItHasAMark) {
+    const std::string mark = "\xEF\xBB\xBF";
+    for (const auto& [before, input, after] :
+         {std::array{mark + "one", mark + "two", mark + "two"},
+          std::array{std::string("one"), mark + "two", std::string("two")},
+          std::array{mark + "one", std::string("two"), mark + "two"},
+          std::array{mark + mark + "one", mark + "two", mark + mark + "two"},
+          std::array{std::string(), mark + "two", mark + "two"}}) {
+        writeFile(folder_ / "file", before);
+        EXPECT_EQ(write(folder_ / "file", input, {"--text"}).output, "true\n");
+        EXPECT_EQ(readFile(folder_ / "file"), after);
+    }
 }
 
 TEST_F(WriteCommand, NamesTheCharactersThatDoNotFitAndKeepsTheFile) {

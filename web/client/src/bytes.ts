@@ -50,7 +50,7 @@ export function textOf(characters: string): string {
 }
 
 // What the text rule for parts of "application/" types would change, besides what is no UTF-8.
-const CHANGED = /[\u0000-\u0008\u000b\u000c\u000e-\u001f\u200b\ufffe\uffff]/;
+const CHANGED = /[\u0000-\u0008\u000b\u000c\u000e-\u001f\u007f-\u009f\u200b\ufffe\uffff]/;
 
 /** Whether `content` comes back byte for byte as the content of a part of an "application/" type. */
 export function isPlainText(content: string): boolean {
