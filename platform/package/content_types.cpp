@@ -18,6 +18,14 @@ namespace {
 constexpr std::string_view relationshipsExtension = "rels";
 constexpr std::string_view xmlMediaType = "application/xml";
 
+// The types of images where a package gives them none. Some producers forget them, and office
+// programs show the images all the same.
+constexpr std::pair<std::string_view, std::string_view> imageTypes[] = {
+    {"bmp", "image/bmp"},     {"emf", "image/x-emf"}, {"gif", "image/gif"},
+    {"jpeg", "image/jpeg"},   {"jpg", "image/jpeg"},  {"png", "image/png"},
+    {"svg", "image/svg+xml"}, {"tif", "image/tiff"},  {"tiff", "image/tiff"},
+    {"wmf", "image/x-wmf"}};
+
 // Enters a type under `key`. Repeating a type is harmless, two different types are an error. Media
 // types compare without case.
 template <class Map>
@@ -58,6 +66,9 @@ ContentTypes ContentTypes::parse(std::span<const std::uint8_t> xml) {
                   element.requiredAttribute("ContentType"));
         }
     });
+    for (const auto& [extension, mediaType] : imageTypes) {
+        types.byExtension_.try_emplace(std::string(extension), mediaType);
+    }
     return types;
 }
 

@@ -19,8 +19,8 @@ public:
     /// gives one part or one extension two types.
     static ContentTypes parse(std::span<const std::uint8_t> xml);
 
-    /// The media type of the part `name`, compared without case; null if it has none. Valid as long
-    /// as this object.
+    /// The media type of the part `name`, compared without case: that of the package, or else the
+    /// usual one of an image of that extension; null if it has none. Valid as long as this object.
     const std::string* find(std::string_view name) const;
 
 private:

@@ -182,13 +182,15 @@ private:
     // Some producers write "utf8", which is not a registered name but can mean nothing else.
     void checkEncoding(const std::string& encoding) const {
         const std::string name = text::toLowerAscii(encoding);
-        const bool isRight = isUtf16_ ? name == "utf-16" || name == "utf-16le" || name == "utf-16be"
-                                      : name == "utf-8" || name == "utf8";
-        if (!isRight) {
-            throw std::runtime_error(
-                "declares the encoding " + quoted(encoding) +
-                (isUtf16_ ? ", but is in UTF-16" : ", but only UTF-8 and UTF-16 are allowed"));
+        const bool saysUtf16 = name == "utf-16" || name == "utf-16le" || name == "utf-16be";
+        const bool saysUtf8 = name == "utf-8" || name == "utf8";
+        if (isUtf16_ ? saysUtf16 : saysUtf8) {
+            return;
         }
+        throw std::runtime_error("declares the encoding " + quoted(encoding) +
+                                 (saysUtf16 || saysUtf8
+                                      ? ", but its bytes are not in it"
+                                      : ", but only UTF-8 and UTF-16 are allowed"));
     }
 
     std::string_view root_;

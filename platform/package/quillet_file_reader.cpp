@@ -6,10 +6,12 @@
 #include <cstdint>
 #include <initializer_list>
 #include <memory>
+#include <optional>
 #include <span>
 #include <stdexcept>
 #include <string_view>
 #include <unordered_map>
+#include <unordered_set>
 #include <utility>
 #include <vector>
 
@@ -84,7 +86,12 @@ public:
         relationships_ = find(relationshipsPartName(packageRoot));
         for (const Item& item : items_) {
             const std::string* mediaType = types_.find(item.name);
-            if (mediaType != nullptr && &item != &typesItem && !relationshipsSource(item.name)) {
+            if (&item == &typesItem || relationshipsSource(item.name)) {
+                continue;
+            }
+            if (mediaType == nullptr) {
+                untyped_.insert(partNameKey(item.name));
+            } else {
                 parts_.push_back({item, *mediaType, find(relationshipsPartName(item.name))});
             }
         }
@@ -99,7 +106,7 @@ public:
         for (const TypedItem& part : parts_) {
             parts.push_back(readPart(part));
         }
-        std::vector<Relationship> relationships = readRelationships(relationships_);
+        std::vector<Relationship> relationships = readRelationships(relationships_, packageRoot);
         return {parts, relationships};
     }
 
@@ -207,18 +214,39 @@ private:
             part.content = contentOf(item, zip::maxEntryBytes);
             part.contentType = i18n::to_ustring(typed.mediaType);
             part.partUri = i18n::to_ustring(item.name);
-            part.relationships = readRelationships(typed.relationships);
+            part.relationships = readRelationships(typed.relationships, item.name);
             return part;
         });
     }
 
-    // The relationships in `item`; none if it is null.
-    std::vector<Relationship> readRelationships(const Item* item) {
+    // The relationships of `source`, which are in `item`; none if it is null.
+    std::vector<Relationship> readRelationships(const Item* item, std::string_view source) {
         if (item == nullptr) {
             return {};
         }
-        return about("has a broken relationships part: " + quoted(item->name),
-                     [&] { return parseRelationships(contentOf(*item, maxPackageXmlBytes)); });
+        return about("has a broken relationships part: " + quoted(item->name), [&] {
+            std::vector<Relationship> relationships =
+                parseRelationships(contentOf(*item, maxPackageXmlBytes));
+            requireTypedTargets(relationships, source);
+            return relationships;
+        });
+    }
+
+    // What has no content type is left out, and so would be gone after a save. Strays may be; what
+    // the document refers to may not.
+    void requireTypedTargets(const std::vector<Relationship>& relationships,
+                             std::string_view source) const {
+        if (untyped_.empty()) {
+            return;
+        }
+        for (const Relationship& relationship : relationships) {
+            const std::string target = i18n::to_string(relationship.target);
+            const std::optional<std::string> key = targetPartKey(source, target);
+            if (relationship.targetMode != 0 && key && untyped_.contains(*key)) {
+                throw std::runtime_error("refers to " + quoted(target) +
+                                         ", which has no content type");
+            }
+        }
     }
 
     zip::Archive archive_;
@@ -226,7 +254,8 @@ private:
     std::unordered_map<std::string, std::size_t> byKey_;
     ContentTypes types_;
     std::vector<TypedItem> parts_;
-    const Item* relationships_ = nullptr;  // the package's own
+    std::unordered_set<std::string> untyped_;  // keys of the items that are left out
+    const Item* relationships_ = nullptr;      // the package's own
     PackageSize size_;
 };
 

@@ -5,10 +5,12 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <exception>
 #include <optional>
 #include <span>
 #include <stdexcept>
 #include <string_view>
+#include <unordered_map>
 #include <unordered_set>
 #include <vector>
 
@@ -87,6 +89,39 @@ Part corePropertiesPart(const std::string& creator, const std::string& title) {
     return part;
 }
 
+// Whether a reference has no path, as "#Sheet2!A1" has none. Some programs call it a link to their
+// own part, others an external one, and each drops what the other writes.
+bool hasNoPath(std::string_view target) {
+    return target.empty() || target.front() == '#' || target.front() == '?';
+}
+
+using RelationshipsById = std::unordered_map<std::u16string, Relationship>;
+
+// The external relationships of `source` in the package that is replaced; none if there is no such
+// package.
+RelationshipsById externalIn(zip::ReusableEntries& previous, std::string_view source) {
+    RelationshipsById external;
+    try {
+        const std::string name = relationshipsPartName(source).substr(1);
+        for (const Relationship& relationship :
+             parseRelationships(previous.read(name, maxPackageXmlBytes))) {
+            if (relationship.targetMode == 0) {
+                external.emplace(relationship.relationshipId, relationship);
+            }
+        }
+    } catch (const std::exception&) {
+        external.clear();
+    }
+    return external;
+}
+
+bool isAmong(const RelationshipsById& relationships, const Relationship& relationship) {
+    const auto found = relationships.find(relationship.relationshipId);
+    return found != relationships.end() &&
+           found->second.relationshipType == relationship.relationshipType &&
+           found->second.target == relationship.target;
+}
+
 // Writes one package into one archive.
 class PackageWriter {
 public:
@@ -122,11 +157,11 @@ public:
     void write(AtomicFile& file, zip::ReusableEntries& previous) {
         zip::Writer archive(file, previous);
         addXml(archive, contentTypesName, contentTypes());
-        addRelationships(archive, packageRoot, relationships_);
+        addRelationships(archive, previous, packageRoot, relationships_);
         for (const Item& item : items_) {
             about("part " + quoted(item.name), [&] {
                 addEntry(archive, item.name, item.part->content, !isCompressed(item.mediaType));
-                addRelationships(archive, item.name, item.part->relationships);
+                addRelationships(archive, previous, item.name, item.part->relationships);
             });
         }
         archive.finish();
@@ -171,14 +206,22 @@ private:
         return builder.xml();
     }
 
-    void addRelationships(zip::Writer& archive, std::string_view source,
-                          const std::vector<Relationship>& relationships) {
+    void addRelationships(zip::Writer& archive, zip::ReusableEntries& previous,
+                          std::string_view source, const std::vector<Relationship>& relationships) {
         if (relationships.empty()) {
             return;
         }
+        std::optional<RelationshipsById> external;  // read where it is needed
+        const auto wasExternal = [&](const Relationship& relationship) {
+            if (!external) {
+                external = externalIn(previous, source);
+            }
+            return isAmong(*external, relationship);
+        };
         const auto isExternal = [&](const Relationship& relationship, std::string_view target) {
             const std::optional<std::string> key = targetPartKey(source, target);
-            return relationship.targetMode == 0 || !key || !keys_.contains(*key);
+            return relationship.targetMode == 0 || !key || !keys_.contains(*key) ||
+                   (hasNoPath(target) && wasExternal(relationship));
         };
         addXml(archive, relationshipsPartName(source), relationshipsXml(relationships, isExternal));
     }

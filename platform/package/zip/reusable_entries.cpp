@@ -3,6 +3,7 @@
 
 #include <chrono>
 #include <exception>
+#include <stdexcept>
 
 #include "platform/package/zip/limits.h"
 
@@ -39,6 +40,16 @@ std::span<const std::uint8_t> ReusableEntries::find(std::string_view name,
         // The file is damaged or was changed, or there is no memory to look at it.
         return {};
     }
+}
+
+std::vector<std::uint8_t> ReusableEntries::read(std::string_view name, std::uint64_t maxSize) {
+    const auto found = byName_.find(name);
+    if (found == byName_.end() || found->second->size > maxSize) {
+        throw std::runtime_error("is not there, or is too large");
+    }
+    std::vector<std::uint8_t> content(found->second->size);
+    archive_->read(*found->second, content);
+    return content;
 }
 
 // Room for `size` bytes.

@@ -11,12 +11,13 @@
 #include <string>
 #include <string_view>
 #include <unordered_map>
+#include <vector>
 
 #include "platform/package/zip/archive.h"
 
 namespace platform::package::zip {
 
-/// The deflated entries of an archive that is about to be replaced, whichever program wrote it. The
+/// The entries of an archive that is about to be replaced, whichever program wrote it. The
 /// file may be anything, and may vanish, be cut short or written to at any time: what cannot be
 /// read from it counts as absent.
 class ReusableEntries {
@@ -32,6 +33,10 @@ public:
     /// for the largest content once more.
     std::span<const std::uint8_t> find(std::string_view name, std::span<const std::uint8_t> content,
                                        std::uint32_t checksum) noexcept;
+
+    /// The content of the entry `name`. Throws std::runtime_error when there is none, it is longer
+    /// than `maxSize` bytes, or it cannot be read.
+    std::vector<std::uint8_t> read(std::string_view name, std::uint64_t maxSize);
 
 private:
     std::span<std::uint8_t> scratch(std::size_t size);

@@ -101,6 +101,32 @@ TEST_F(QuilletFileReaderTest, LeavesOutWhatHasNoContentType) {
     EXPECT_THAT(namesOf(package), ElementsAre(u"/c.xml"));
 }
 
+TEST_F(QuilletFileReaderTest, RefusesAReferenceToWhatHasNoContentType) {
+    const auto linked = [](const std::string& attributes) {
+        return usualPackage(
+            {{"a.xml", "<a/>"},
+             {"b.bin", "x"},
+             {"_rels/a.xml.rels",
+              relationshipsXmlOf("<Relationship Id='a' Type='t' " + attributes + "/>")}});
+    };
+    expectRefused(linked("Target='B.bin#x'"), "refers to \"B.bin#x\", which has no content type");
+    expectRefused(
+        usualPackage({{"b.bin", "x"},
+                      {"_rels/.rels",
+                       relationshipsXmlOf("<Relationship Id='a' Type='t' Target='b.bin'/>")}}),
+        "refers to \"b.bin\", which has no content type");
+    EXPECT_EQ(read(linked("Target='b.bin' TargetMode='External'")).parts().size(), 1U);
+    EXPECT_EQ(read(linked("Target='c.bin'")).parts().size(), 1U);
+}
+
+TEST_F(QuilletFileReaderTest, KnowsTheTypesOfImagesWithoutOne) {
+    const auto package = readUsual({{"a.PNG", "x"}, {"b.jpeg", "x"}, {"c.emf", "x"}});
+    ASSERT_THAT(namesOf(package), ElementsAre(u"/a.PNG", u"/b.jpeg", u"/c.emf"));
+    EXPECT_EQ(package.parts()[0].contentType, u"image/png");
+    EXPECT_EQ(package.parts()[1].contentType, u"image/jpeg");
+    EXPECT_EQ(package.parts()[2].contentType, u"image/x-emf");
+}
+
 TEST_F(QuilletFileReaderTest, DoesNotReadWhatItLeavesOut) {
     ZipEntry broken{"a.bin", "x"};
     broken.checksum = 0;

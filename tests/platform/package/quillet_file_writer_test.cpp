@@ -365,6 +365,37 @@ TEST_F(QuilletFileWriterTest, WritesARelationshipAsExternalWhenItsFlagOrItsTarge
     }
 }
 
+// Which of both a link without a path is, nothing but the file says.
+TEST_F(QuilletFileWriterTest, KeepsLinksWithoutAPathExternalWhereTheyAre) {
+    const auto saved = [&](std::vector<Relationship> links) {
+        const auto package = saveAndRead(
+            packageOf({part(u"/w/a.txt", "", u"text/plain", std::move(links)), part(u"/w/b.txt")}));
+        std::vector<int> modes;
+        for (const Relationship& link : package.parts().at(0).relationships) {
+            modes.push_back(link.targetMode);
+        }
+        return modes;
+    };
+    EXPECT_THAT(saved({{u"t", u"#x", u"r1", 0},
+                       {u"t", u"", u"r2", 0},
+                       {u"t", u"?q", u"r3", 0},
+                       {u"t", u"#x", u"r4", 1},
+                       {u"t", u"b.txt", u"r5", 0}}),
+                ElementsAre(0, 0, 0, 1, 0));
+    EXPECT_THAT(saved({{u"t", u"#x", u"r1", 1},
+                       {u"t", u"", u"r2", 1},
+                       {u"t", u"?q", u"r3", 1},
+                       {u"t", u"#x", u"r4", 1},
+                       {u"t", u"b.txt", u"r5", 1}}),
+                ElementsAre(0, 0, 0, 1, 1));
+    EXPECT_THAT(
+        saved(
+            {{u"other", u"#x", u"r1", 1}, {u"t", u"#other", u"r2", 1}, {u"t", u"?q", u"other", 1}}),
+        ElementsAre(1, 1, 1));
+    std::filesystem::remove(pathOf("a.docx"));
+    EXPECT_THAT(saved({{u"t", u"#x", u"r1", 1}}), ElementsAre(1));
+}
+
 TEST_F(QuilletFileWriterTest, WritesPackageRelationshipsToNoPartAsExternal) {
     const auto package = saveAndRead(packageOf(
         {part(u"/a.txt")},
