@@ -92,7 +92,7 @@ install(FILES "${PROJECT_SOURCE_DIR}/packaging/systemd/nats-server-editor.conf"
 install(FILES "${PROJECT_SOURCE_DIR}/packaging/systemd/sysusers.conf" RENAME editor-serialization.conf
   DESTINATION lib/sysusers.d)
 install(DIRECTORY "${PROJECT_SOURCE_DIR}/docs/" DESTINATION "${documentation_folder}")
-install(FILES "${PROJECT_SOURCE_DIR}/README.md" "${PROJECT_SOURCE_DIR}/NOTICE" DESTINATION "${documentation_folder}")
+install(FILES "${PROJECT_SOURCE_DIR}/NOTICE" DESTINATION "${documentation_folder}")
 install(DIRECTORY "${PROJECT_SOURCE_DIR}/examples/embedding" DESTINATION "${documentation_folder}/examples"
   COMPONENT development)
 

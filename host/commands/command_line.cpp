@@ -146,7 +146,8 @@ void declareRead(CLI::App& command, ReadOptions& options) {
     CLI::Option* const utf8 = command.add_flag_callback(
         "--utf8", [&options] { options.form = ReadOptions::Form::utf8; },
         "Print each response as valid UTF-8, with \"filePath\" and, of a text, \"encoding\", the "
-        "file's charset, added");
+        "file's charset, added; \"brokenParts\" names the parts of a document whose bytes are not "
+        "UTF-8 and so printed as others");
     command
         .add_flag_callback(
             "--text", [&options] { options.form = ReadOptions::Form::text; },
@@ -245,9 +246,10 @@ void declareWeb(CLI::App& command, WebOptions& options) {
     CLI::Option* const none =
         declareNegation(command, "--no-web", options.isServed, "Serve no web page");
     command
-        .add_option("--web", options.folder,
-                    "The folder to serve to browsers (default: a page that reads documents; none "
-                    "with --nats)")
+        .add_option(
+            "--web", options.folder,
+            "The folder to serve to browsers (default: the editor's page; with --nats none, "
+            "unless --listen is given)")
         ->type_name("DIR")
         ->check(withoutHelpText(CLI::ExistingDirectory))
         ->excludes(none);
@@ -451,8 +453,8 @@ void describe(CLI::App& app, CommandLine& line) {
     declareRead(*app.add_subcommand("read", "Read files and print the response for each on a line"),
                 line.read);
     declareHistory(*app.add_subcommand("history",
-                                       "List earlier versions of a document, or show or "
-                                       "restore one"),
+                                       "List (with times in UTC), show or restore earlier versions "
+                                       "of a document"),
                    line.history);
     declareServe(*app.add_subcommand("serve", "Serve browsers and other programs, over NATS"),
                  line.serve);

@@ -26,7 +26,7 @@ inline constexpr const char* programName = "serialization_host";
 
 /// What the program's exit statuses mean.
 inline constexpr const char* exitStatuses =
-    "0 when all is done, 1 when a request failed, 2 when the command line is wrong.";
+    "0 when all is done, 1 when a request failed, 2 for wrong options or framing.";
 
 /// What a command line says.
 struct CommandLine {
