@@ -117,6 +117,12 @@ test("no match goes over a tab, a picture, a field or mathematics", () => {
   assert.equal(replaceAll(xml, "ab", "-"), xml);
 });
 
+test("a match that begins with an emoji and cannot be replaced does not end the search, or keep it going for ever", () => {
+  const xml = (last) => word(`<w:p>${run("😀")}<w:r><w:drawing/></w:r>${run(`😀${last}😀`)}</w:p>`);
+  assert.equal(replaceAll(xml("😀"), "😀😀", "-"), xml("😀").replace("😀😀😀", "-😀"));
+  assert.equal(replaceAll(xml(""), "😀😀😀", "-"), xml(""));
+});
+
 test("case and whole words are as asked for", () => {
   const xml = word(`<w:p>${run("Straße STRASSE straße Nebenstraße Äpfel")}</w:p>`);
   const count = (text, options) =>

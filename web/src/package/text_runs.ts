@@ -237,7 +237,8 @@ export function findMatches(block: TextBlock, pattern: RegExp): Place[] {
     if (isReplaceable(block, match)) {
       matches.push(match);
     } else {
-      pattern.lastIndex = match.from + 1;
+      // Behind a whole character: from within one, such a pattern would find the same match for ever.
+      pattern.lastIndex = match.from + (block.text.codePointAt(match.from)! > 0xffff ? 2 : 1);
     }
   }
   return matches;
