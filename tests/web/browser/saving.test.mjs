@@ -63,6 +63,27 @@ browserTest("Ctrl+S saves on a keyboard whose letters are not Latin", async (t) 
   await isSaved(page, "a.txt");
 });
 
+browserTest("Ctrl+S saves once however long it is held", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page } = session;
+  await open(page, "a.txt");
+  await type(page, "zero ");
+  await page.keyboard.down("Control");
+  await page.keyboard.down("s");
+  await isSaved(page, "a.txt");
+  await page.keyboard.insertText("more ");
+  await isUnsaved(page, "a.txt");
+  await page.keyboard.down("s"); // without having been let go: the key repeats
+  await page.waitForTimeout(300);
+  await isUnsaved(page, "a.txt");
+  assert.equal(session.read("a.txt").toString(), "zero one\n");
+  await page.keyboard.up("s");
+  await page.keyboard.press("s");
+  await page.keyboard.up("Control");
+  await isSaved(page, "a.txt");
+  assert.equal(session.read("a.txt").toString(), "zero more one\n");
+});
+
 browserTest("what somebody else saves is shown at once where nothing is unsaved", async (t) => {
   const session = await Session.start(t, { "a.txt": "one\n" });
   const { page } = session;

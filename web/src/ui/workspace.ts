@@ -244,7 +244,10 @@ export class Workspace {
     const isCommand = (event.ctrlKey || event.metaKey) && !event.altKey && !event.shiftKey;
     const key = shortcutKey(event);
     if (isCommand && key === "s") {
-      void this.#active?.save();
+      // Not again and again while it is held: each save makes an earlier version.
+      if (!event.repeat) {
+        void this.#active?.save();
+      }
     } else if (isCommand && key === "p") {
       this.element.classList.add("with-files");
       this.#tree.focusFilter();
