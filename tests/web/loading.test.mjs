@@ -4,7 +4,7 @@ import { test } from "node:test";
 
 import { room } from "./room.mjs";
 
-const { load } = await room("files/loading.ts");
+const { load, UnreadableDocument } = await room("files/loading.ts");
 
 // A client of a file that changes with each of its first `changes` readings: its content is their number.
 function changingFile(changes) {
@@ -48,4 +48,14 @@ test("what does not change is read once, with its charset", async () => {
     byteOrderMark: false,
   });
   assert.equal(client.readings(), 1);
+});
+
+test("what cannot be read is told with the version that it had before, which a later one differs from", async () => {
+  const versions = ["broken", "mended"];
+  const client = { version: async () => versions.shift(), read: async () => ({ status: false, exception: "no archive" }) };
+  await assert.rejects(load(client, "a.docx"), (error) => {
+    assert.ok(error instanceof UnreadableDocument);
+    assert.deepEqual([error.message, error.version], ["no archive", "broken"]);
+    return true;
+  });
 });

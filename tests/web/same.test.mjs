@@ -28,3 +28,10 @@ test("what looks like a byte-order mark may be text, too", () => {
   assert.equal(isSameText("\xef\xbb\xbfa", true, "\xef\xbb\xbf\xef\xbb\xbfa"), true);
   assert.equal(isSameText("\xef\xbb\xbfa", true, "\xef\xbb\xbfa"), false);
 });
+
+test("a file that cannot be read is not the same as an empty text", () => {
+  const file = { path: "/t", version: "v", answer: { status: true, data: "" } };
+  const sent = { kind: "text", content: "", encoding: "UTF-8" };
+  assert.equal(isSame(file, sent), true);
+  assert.equal(isSame({ ...file, unreadable: "it is a folder" }, sent), false);
+});

@@ -371,6 +371,28 @@ test("a document that was removed is saved again when the person says so", async
   assert.deepEqual([desk.conflicts, desk.disk], [[undefined], "two"]);
 });
 
+test("a file that cannot be read is saved over only as it was when the person was asked", async () => {
+  const desk = new Desk().open();
+  desk.load = async () => ({ ...desk.loaded(), ...(desk.disk.startsWith("broken") && { unreadable: "no archive" }) });
+  desk.disk = "broken";
+  assert.equal(await desk.saver.followTheirs(), "same");
+  assert.equal(desk.view, "one");
+  desk.type("two");
+  desk.decide = () => {
+    if (desk.disk === "broken") {
+      desk.disk = "mended"; // while the person is asked
+      return "mine";
+    }
+    return undefined;
+  };
+  assert.equal(await desk.saver.save(), false);
+  assert.deepEqual([desk.conflicts, desk.disk], [["broken", "mended"], "mended"]);
+  desk.disk = "broken again";
+  desk.decide = () => "mine";
+  assert.equal(await desk.saver.save(), true);
+  assert.equal(desk.disk, "two");
+});
+
 test("what somebody else saved is shown where nothing is unsaved, and told of where something is", async () => {
   const desk = new Desk().open();
   assert.equal(await desk.saver.followTheirs(), "same");

@@ -16,6 +16,8 @@ export interface LoadedDocument {
   byteOrderMark?: boolean;
   /** Texts: the charset in which a person wants to read it instead. */
   readAs?: string;
+  /** Why the file cannot be read, where that is so: then there is a version, and no content. */
+  unreadable?: string;
   /** Whether it changed during every attempt to read it: it is a state that has passed, and may be a torn one. */
   isChanging?: boolean;
   /** Whether it is an earlier version, and not what is saved now. */

@@ -175,3 +175,52 @@ browserTest("of a document that was removed while it is shown, all parts are sav
   await isSaved(page);
   assert.deepEqual(Object.keys(unpack(session.read(NAME))).sort(), before);
 });
+
+browserTest("a document that somebody has damaged is saved over after asking, with all its parts", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const { page } = session;
+  const before = session.read(NAME);
+  await replace(page, "Annual report", "Budget");
+  session.write(NAME, before.subarray(0, 500));
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByText("cannot be read any more").waitFor();
+  await dialog(page).getByRole("button", { name: "Decide later" }).click();
+  await dialog(page).waitFor({ state: "detached" });
+  assert.equal(session.read(NAME).length, 500);
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Save over it" }).click();
+  await isSaved(page);
+  assert.deepEqual(Object.keys(unpack(session.read(NAME))).sort(), Object.keys(unpack(before)).sort());
+  assert.match(textIn(session.read(NAME), "word/header1.xml"), /Budget, page/);
+});
+
+browserTest("unsaved changes to a document that cannot be read any more are shown, and an earlier version completes them", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const { page } = session;
+  const before = session.read(NAME);
+  await replace(page, "A link", "Budget");
+  await save(session, NAME);
+  await isSaved(page);
+  await replace(page, "Annual report", "Precious");
+  await session.waitForDraft(page, "Precious");
+  session.write(NAME, "\u00d0\u00cf\u0011\u00e0 encrypted");
+  await page.reload();
+  await page.getByText(/report.docx cannot be read: /).waitFor();
+  await page.getByRole("alert").getByText(/only the parts that you have changed are left/).waitFor();
+  await page.getByLabel("Find", { exact: true }).fill("Precious");
+  await page.getByText("2 found").waitFor();
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Do not save" }).click();
+  await dialog(page).waitFor({ state: "detached" });
+  await page.getByRole("button", { name: "Versions" }).click();
+  await dialog(page).getByRole("button", { name: "Restore" }).click();
+  await page.getByText(/was saved by somebody else. Your changes are kept/).waitFor();
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Save these parts" }).click();
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  await dialog(page).getByRole("button", { name: "Save put together" }).click();
+  await isSaved(page);
+  const saved = session.read(NAME);
+  assert.deepEqual(Object.keys(unpack(saved)).sort(), Object.keys(unpack(before)).sort());
+  assert.match(textIn(saved, "word/header1.xml"), /Precious/);
+});

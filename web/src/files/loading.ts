@@ -4,8 +4,16 @@ import { type Client, type ReadAnswer, type RequestOptions, textOf } from "../..
 import type { LoadedDocument } from "../document_view.js";
 import { isPackage } from "./paths.js";
 
-/** There is no such document, or it cannot be read; the message says why. */
-export class UnreadableDocument extends Error {}
+/** There is no such document (the version is "" then), or it cannot be read; the message says why. */
+export class UnreadableDocument extends Error {
+  constructor(
+    message: string,
+    /** The version that it had before it was tried, so that what is saved meanwhile is not taken for that. */
+    readonly version = "",
+  ) {
+    super(message);
+  }
+}
 
 type Reader = Pick<Client, "read" | "version" | "charset" | "readVersion">;
 
@@ -21,7 +29,7 @@ export async function load(client: Reader, path: string, options: RequestOptions
   const contentType = isPackage(path) ? "text/xml" : "text/plain";
   let version = await client.version(path, options);
   for (let readings = 1; ; ++readings) {
-    const answer = readable(await client.read(path, contentType, options));
+    const answer = readable(await client.read(path, contentType, options), version);
     const form = isPackage(path) ? {} : await client.charset(path, options);
     const after = await client.version(path, options);
     if (after === version || readings === MOST_READINGS) {
@@ -43,9 +51,9 @@ export async function loadEarlier(client: Reader, present: LoadedDocument, time:
   return { path, version: "", isEarlier: true, answer, charset, byteOrderMark, ...(readAs && { readAs }) };
 }
 
-function readable(answer: ReadAnswer): ReadAnswer {
+function readable(answer: ReadAnswer, version?: string): ReadAnswer {
   if (!answer.status) {
-    throw new UnreadableDocument(answer.exception ? textOf(answer.exception) : "File does not exist");
+    throw new UnreadableDocument(answer.exception ? textOf(answer.exception) : "File does not exist", version);
   }
   return answer;
 }

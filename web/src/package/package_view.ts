@@ -44,7 +44,7 @@ export class PackageView implements DocumentView {
   #shown!: PanelName;
   #preview: Preview | undefined;
   #isClosed = false;
-  // The document was removed, and a draft holds its changed parts only. Until a person knows, and saves them.
+  // The document was removed or cannot be read, and a draft holds its changed parts only. Until a person knows, and saves them.
   #lacksParts = false;
 
   #tabs = new Map<PanelName, HTMLButtonElement>();
@@ -66,7 +66,7 @@ export class PackageView implements DocumentView {
     this.element.append(this.#bar(), this.#stage);
     this.element.addEventListener("keydown", (event) => this.#undoByKey(event));
     this.#use(new PackageModel(documentOf(loaded), draft));
-    if (draft && loaded.version === "") {
+    if (draft && (loaded.version === "" || loaded.unreadable !== undefined)) {
       this.#lacksParts = true;
       page.tell(page.text("package.incomplete", { name: nameOf(loaded.path) }), "problem");
     }

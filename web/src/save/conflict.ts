@@ -8,7 +8,7 @@ import { askComparing } from "./comparing.js";
 /**
  * Asks whose version stays. "mine": what the view holds, in which both may have been put together; it is to be
  * saved on the base of `theirs`. Nothing: the person wants to decide later. `theirs` is nothing where the
- * document was removed.
+ * document was removed. What cannot be read can be saved over, too.
  */
 export async function resolveConflict(
   name: string,
@@ -20,6 +20,13 @@ export async function resolveConflict(
       title: text("conflict.removed.title", { name }),
       message: text("conflict.removed.message"),
       choices: [later(), { value: "mine", label: text("conflict.removed.save"), isDefault: true }],
+    })) as "mine" | undefined;
+  }
+  if (theirs.unreadable !== undefined) {
+    return (await ask({
+      title: text("conflict.unreadable.title", { name }),
+      message: text("conflict.unreadable.message", { reason: theirs.unreadable }),
+      choices: [{ ...later(), isDefault: true }, { value: "mine", label: text("conflict.unreadable.save") }],
     })) as "mine" | undefined;
   }
   for (;;) {

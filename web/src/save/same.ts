@@ -8,7 +8,10 @@ const MARKS = ["\xff\xfe\0\0", "\0\0\xfe\xff", "\xef\xbb\xbf", "\xff\xfe", "\xfe
 
 /** Whether `loaded` has the content `sent`. False also in rare cases in which the host stored it otherwise. */
 export function isSame(loaded: LoadedDocument, sent: DocumentContent): boolean {
-  const { answer } = loaded;
+  const { answer, unreadable } = loaded;
+  if (unreadable !== undefined) {
+    return false;
+  }
   if (sent.kind === "text") {
     const mark = loaded.byteOrderMark ? MARKS.find((one) => sent.content.startsWith(one)) : "";
     return mark !== undefined && answer.data === sent.content.slice(mark.length);

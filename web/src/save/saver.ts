@@ -20,7 +20,7 @@ export interface SaveTarget {
   write(content: DocumentContent, base: string): Promise<SaveResult>;
   /** `content` is on disk now. */
   saved(content: DocumentContent): void;
-  /** What is saved now; nothing where there is no such file any more. */
+  /** What is saved now, also where that cannot be read; nothing where there is no such file any more. */
   load(): Promise<LoadedDocument | undefined>;
   /** Shows what somebody else saved instead of what is unsaved. */
   replace(theirs: LoadedDocument): void;
@@ -122,7 +122,7 @@ export class Saver {
     await this.#running?.catch(() => undefined);
     const theirs = await this.target.load();
     await this.#running?.catch(() => undefined);
-    return theirs ? this.noticed(theirs) : "same";
+    return theirs && theirs.unreadable === undefined ? this.noticed(theirs) : "same"; // or there is nothing to show
   }
 
   /** To be called when `theirs` was found to be saved now, while no save was under way. */

@@ -195,19 +195,24 @@ export class OpenDocument {
     this.panel.remove();
   }
 
-  // With a draft, a document that was removed can still be shown, and saved anew.
+  // With a draft, a document that was removed, or cannot be read any more, can still be shown, and saved anew.
   async #load(signal: AbortSignal, draft?: Draft): Promise<LoadedDocument> {
     const { client } = this.around;
     try {
       return await load(client, this.path, { signal, onProgress: (progress) => this.#readProgress(progress) });
     } catch (error) {
-      if (draft && error instanceof UnreadableDocument && (await client.version(this.path)) === "") {
-        const answer = { status: true, ...(isPackage(this.path) ? { parts: [], relationships: [] } : { data: "" }) };
+      // What could be read once, and has not changed, can be read again later.
+      if (draft && error instanceof UnreadableDocument && error.version !== draft.version) {
         const { charset = "UTF-8", byteOrderMark = false } = draft;
-        return { path: this.path, version: "", answer, charset, byteOrderMark };
+        return { ...this.#withoutContent(error), charset, byteOrderMark };
       }
       throw error;
     }
+  }
+
+  #withoutContent({ version, message }: UnreadableDocument): LoadedDocument {
+    const answer = { status: true, ...(isPackage(this.path) ? { parts: [], relationships: [] } : { data: "" }) };
+    return { path: this.path, version, answer, ...(version !== "" && { unreadable: message }) };
   }
 
   async #show(loaded: LoadedDocument, room: Room, draft?: Draft): Promise<void> {
@@ -228,8 +233,12 @@ export class OpenDocument {
     }
     const outcome = await saver.noticed(loaded);
     if (saver.isUnsaved) {
-      const key = outcome === "kept" ? "document.restored.theirs" : "document.restored";
+      const { unreadable: reason } = loaded;
+      const key = outcome === "kept" && reason === undefined ? "document.restored.theirs" : "document.restored";
       this.around.tell(text(key, { name: this.name }));
+      if (reason !== undefined) {
+        this.around.tell(text("document.failed", { name: this.name, reason }), "problem");
+      }
     }
   }
 
@@ -312,8 +321,8 @@ export class OpenDocument {
     try {
       return this.#asChosen(await load(this.around.client, this.path));
     } catch (error) {
-      if (error instanceof UnreadableDocument && (await this.around.client.version(this.path)) === "") {
-        return undefined;
+      if (error instanceof UnreadableDocument) {
+        return error.version === "" ? undefined : this.#withoutContent(error);
       }
       throw error;
     }
