@@ -62,6 +62,8 @@ export interface DocumentView {
 
 export interface Comparison {
   readonly element: HTMLElement;
+  /** Whether a person has put something together in it. */
+  readonly isEdited: boolean;
   /** The view's content becomes what the comparison shows as the result. Throws where it has changed meanwhile. */
   apply(): void;
   /** Lets go of what the comparison holds, applied or not. */

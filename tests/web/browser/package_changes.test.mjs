@@ -135,7 +135,13 @@ browserTest("a comparison that is left changes nothing", async (t) => {
   await dialog(page).getByRole("button", { name: "Compare" }).click();
   await dialog(page).getByRole("button", { name: "/word/document.xml" }).click();
   await dialog(page).locator(".cm-mergeView").waitFor();
+  await choiceOf(page, "/word/document.xml").selectOption("theirs");
   await dialog(page).getByRole("button", { name: "Back" }).click();
+  await dialog(page).getByRole("button", { name: "Go on comparing" }).click();
+  assert.equal(await choiceOf(page, "/word/document.xml").inputValue(), "theirs");
+  await dialog(page).locator(".cm-mergeView").waitFor();
+  await dialog(page).getByRole("button", { name: "Back" }).click();
+  await dialog(page).getByRole("button", { name: "Leave it" }).click();
   await dialog(page).getByRole("button", { name: "Decide later" }).click();
   await page.locator(".mark.unsaved").waitFor();
   assert.equal(await page.locator(".cm-mergeView").count(), 0);

@@ -167,6 +167,36 @@ browserTest("both are put together by keys alone, and Escape in an editor does n
   assert.equal(session.read("a.txt").toString(), "mine one\ntwo\nthree\ntheirs");
 });
 
+browserTest("what was put together in a comparison is given up only after asking", async (t) => {
+  const { session, mine } = await conflict(t);
+  await session.waitForDraft(mine, "mine ");
+  await dialog(mine).getByRole("button", { name: "Compare" }).click();
+  const result = dialog(mine).getByRole("textbox", { name: "Yours: the result" });
+  await result.focus();
+  await mine.keyboard.press("Control+End");
+  await mine.keyboard.insertText("put together");
+  await dialog(mine).getByRole("button", { name: /^Take this change over/ }).first().focus();
+  await mine.keyboard.press("Escape");
+  await dialog(mine).getByText(/is lost when you leave it/).waitFor();
+  await mine.keyboard.press("Escape");
+  assert.match(await result.innerText(), /put together/);
+  await dialog(mine).getByRole("button", { name: "Take theirs" }).click();
+  await dialog(mine).getByRole("button", { name: "Go on comparing" }).click();
+  assert.match(await result.innerText(), /put together/);
+  const asked = mine.waitForEvent("dialog");
+  await mine.close({ runBeforeUnload: true });
+  assert.equal((await asked).type(), "beforeunload");
+  await (await asked).dismiss();
+  await dialog(mine).getByRole("button", { name: "Back" }).click();
+  await dialog(mine).getByRole("button", { name: "Leave it" }).click();
+  await dialog(mine).getByRole("button", { name: "Compare" }).click();
+  assert.match(await result.innerText(), /^mine one/);
+  assert.doesNotMatch(await result.innerText(), /put together/);
+  await dialog(mine).getByRole("button", { name: "Back" }).click(); // without asking, since nothing is lost
+  await dialog(mine).getByRole("button", { name: "Keep mine" }).click();
+  await isSaved(mine, "a.txt");
+});
+
 browserTest("what cannot be compared is told, and the question is asked again", async (t) => {
   const session = await Session.start(t, { "a.txt": "one\n" }, { expectedProblems: [/ERR_FAILED/] });
   const { page } = session;

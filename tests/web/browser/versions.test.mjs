@@ -51,6 +51,22 @@ browserTest("an earlier version is compared with what is there, and nothing chan
   assert.equal(session.read("a.txt").toString(), "three\n");
 });
 
+browserTest("Ctrl+S beside a comparison with an earlier version does not save the document behind it", async (t) => {
+  const { session, page } = await start(t);
+  await page.keyboard.press("Escape");
+  await dialog(page).waitFor({ state: "detached" });
+  await text(page).focus();
+  await page.keyboard.insertText("unsaved ");
+  await page.locator(".mark.unsaved").waitFor();
+  await page.getByRole("button", { name: "Versions" }).click();
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  await dialog(page).locator(".cm-content").last().click();
+  await page.keyboard.press("Control+s");
+  await page.waitForTimeout(300);
+  assert.equal(session.read("a.txt").toString(), "three\n");
+  await page.locator(".mark.unsaved").waitFor();
+});
+
 browserTest("an earlier version is shown in its own charset", async (t) => {
   const session = await Session.start(t, { "a.txt": Buffer.from("caf\xe9\n", "latin1") });
   const { page } = session;

@@ -73,6 +73,10 @@ export class PackageComparison implements Comparison {
     }
   }
 
+  get isEdited(): boolean {
+    return this.#rows.some((row) => row.isEdited);
+  }
+
   apply(): void {
     const parts = new Map(this.#rows.map((row) => [row.uri, row.result ?? null]));
     this.use({ parts, ...(this.#relationshipsBy === "theirs" && { relationships: this.theirs.relationships }) });
@@ -121,6 +125,11 @@ class ComparedPart {
     this.#choice.addEventListener("change", () => select(this));
     const by = element("small", {}, page.text(`package.differences.${difference.changedBy}`));
     this.element = element("li", {}, open, by, this.#choice);
+  }
+
+  /** Whether something else was chosen, or put together, than the comparison begins with. */
+  get isEdited(): boolean {
+    return this.#choice.value !== (this.difference.changedBy === "theirs" ? "theirs" : "mine");
   }
 
   /** What becomes of the part; nothing when it is taken out. */

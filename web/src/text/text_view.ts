@@ -116,6 +116,9 @@ export class TextView implements DocumentView {
     const comparison = this.#comparisonOf(source, view.state);
     return {
       element: comparison.element,
+      get isEdited() {
+        return !comparison.changes.empty;
+      },
       apply: () => {
         if (this.#view !== view || view.state.doc !== start) {
           throw new Error(this.page.text("text.changedMeanwhile"));

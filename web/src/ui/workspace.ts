@@ -244,8 +244,8 @@ export class Workspace {
     const isCommand = (event.ctrlKey || event.metaKey) && !event.altKey && !event.shiftKey;
     const key = shortcutKey(event);
     if (isCommand && key === "s") {
-      // Not again and again while it is held: each save makes an earlier version.
-      if (!event.repeat) {
+      // Not again and again while it is held: each save makes an earlier version. Nor what is behind a dialog.
+      if (!event.repeat && !document.querySelector("dialog")) {
         void this.#active?.save();
       }
     } else if (isCommand && key === "p") {
