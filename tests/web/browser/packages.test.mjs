@@ -118,6 +118,31 @@ browserTest("the heading of a table's column is found, and not replaced", async 
   assert.match(textIn(await save(session, "book.xlsx"), "xl/sharedStrings.xml"), /<t>Other<\/t>.*<t>New text<\/t>/s);
 });
 
+browserTest("where cells are replaced, the workbook asks for its formulas to be calculated anew, until that is undone", async (t) => {
+  const files = workbookFiles();
+  const before = files["xl/workbook.xml"];
+  files["xl/worksheets/sheet1.xml"] = files["xl/worksheets/sheet1.xml"].replace(
+    "</row>",
+    '<c r="D1" t="str"><f>A1</f><v>Other</v></c></row>',
+  );
+  const session = await open(t, "book.xlsx", files);
+  const { page } = session;
+  await page.getByLabel("Find", { exact: true }).fill("Other");
+  await page.getByLabel("Replace with").fill("New");
+  await page.getByText("1 found").waitFor();
+  await page.getByRole("button", { name: "Replace all" }).click();
+  const replaced = await save(session, "book.xlsx");
+  assert.match(textIn(replaced, "xl/sharedStrings.xml"), /<t>New</);
+  assert.equal(
+    textIn(replaced, "xl/workbook.xml"),
+    before.replace("</sheets>", '</sheets><calcPr fullCalcOnLoad="1"/>'),
+  );
+  await page.getByRole("button", { name: "Undo" }).click();
+  const undone = await save(session, "book.xlsx");
+  assert.match(textIn(undone, "xl/sharedStrings.xml"), /<t>Other</);
+  assert.equal(textIn(undone, "xl/workbook.xml"), before);
+});
+
 browserTest("Enter that ends an input method's composition replaces nothing", async (t) => {
   const session = await open(t, "report.docx", wordFiles());
   const { page } = session;

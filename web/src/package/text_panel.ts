@@ -7,6 +7,7 @@ import type { PackageModel } from "./package_model.js";
 import type { Panel } from "./package_view.js";
 import { byName, kindOf, textOf } from "./part_kinds.js";
 import { decodePart, encodePart, type PartText } from "./part_text.js";
+import { hasFormulas, withRecalculation } from "./recalculation.js";
 import { columnNames, comparable, isTable } from "./table_columns.js";
 import { findMatches, mayHaveText, patternOf, replaceMatches, textBlocks, type TextBlock } from "./text_runs.js";
 
@@ -152,11 +153,11 @@ export class TextPanel implements Panel {
     let since = performance.now();
     for (const part of this.#textParts()) {
       const read = this.#read(part);
-      const hasCells = /sharedStrings|worksheet/i.test(part.contentType);
+      const areCells = hasCells(part);
       for (const block of read?.blocks ?? []) {
         const matches = pattern ? findMatches(block, pattern) : [];
         if (!pattern || matches.length > 0) {
-          entries.push({ part, block, matches, isHeading: hasCells && headings.has(comparable(block.text)) });
+          entries.push({ part, block, matches, isHeading: areCells && headings.has(comparable(block.text)) });
         }
       }
       if (performance.now() - since > 30) {
@@ -303,11 +304,32 @@ export class TextPanel implements Panel {
       const text = replaceMatches(decoded.text, replacements, this.#replacement.value);
       parts.set(part.partUri, { ...part, content: encodePart({ ...decoded, text }) });
     }
+    if ([...parts.values()].some(hasCells)) {
+      this.#askToRecalculate(parts);
+    }
     this.model.edit({ parts });
     const count = entries.reduce((sum, { matches }) => sum + matches.length, 0);
     this.page.tell(this.page.text("package.text.replaced", { count }));
     this.#find.focus();
   }
+
+  // Puts the workbook among `parts`, where it has formulas.
+  #askToRecalculate(parts: Map<string, Part>): void {
+    const workbook = this.model.mainPart;
+    const decoded = workbook && this.#read(workbook)?.decoded;
+    if (decoded && this.#textParts().some((part) => hasCells(part) && hasFormulas(this.#read(part)?.decoded.text ?? ""))) {
+      try {
+        const content = encodePart({ ...decoded, text: withRecalculation(decoded.text) });
+        parts.set(workbook.partUri, { ...workbook, content });
+      } catch {
+        // Not well-formed, which is told where it is edited.
+      }
+    }
+  }
+}
+
+function hasCells({ contentType }: Part): boolean {
+  return /sharedStrings|worksheet/i.test(contentType);
 }
 
 function nameOf(part: Part, page: Page): string {
