@@ -173,6 +173,41 @@ browserTest("XML is laid out for reading, and saved without its layout", async (
   assert.equal(textIn(after, "word/document.xml").replace("<!-- here -->", ""), textIn(before, "word/document.xml"));
 });
 
+browserTest("lines of parts that end in carriage return and line feed keep doing so, wherever something is typed", async (t) => {
+  const files = wordFiles("", {
+    "customXml/item1.xml": '<?xml version="1.0"?>\r\n<root>\r\n  <a>one</a>\r\n</root>\r\n',
+    "word/lines.txt": "one\r\ntwo\r\n",
+    "word/mixed.txt": "one\r\ntwo\n",
+  });
+  const insert = (name, before, text) => (files[name] = files[name].replace(before, `${text}${before}`));
+  insert("[Content_Types].xml", "<Default ", '<Default Extension="txt" ContentType="text/plain"/>');
+  const targets = ["../customXml/item1.xml", "lines.txt", "mixed.txt"];
+  const related = targets.map((target, index) => `<Relationship Id="t${index}" Type="urn:test" Target="${target}"/>`);
+  insert("word/_rels/document.xml.rels", "</Relationships>", related.join(""));
+  const session = await open(t, "report.docm", files);
+  const { page } = session;
+  // Types at the end of a line of a part, and then another line.
+  const type = async (part, line, typed) => {
+    await openPart(page, part);
+    await page.locator(".package-pane .cm-line").nth(line).click();
+    await page.keyboard.press("End");
+    await page.keyboard.insertText(typed);
+    await page.keyboard.press("Enter");
+    await page.keyboard.insertText("<!--new-->");
+  };
+  await type("item1.xml", 2, "<b/>");
+  assert.equal(await page.getByRole("button", { name: "Save with line breaks" }).count(), 0); // it has its own
+  await type("lines.txt", 0, " and a half");
+  await type("mixed.txt", 1, " and a half");
+  const saved = await save(session, "report.docm");
+  assert.equal(
+    textIn(saved, "customXml/item1.xml").replace(/\r\n +<!--/, "\r\n<!--"),
+    '<?xml version="1.0"?>\r\n<root>\r\n  <a>one</a><b/>\r\n<!--new-->\r\n</root>\r\n',
+  );
+  assert.equal(textIn(saved, "word/lines.txt"), "one and a half\r\n<!--new-->\r\ntwo\r\n");
+  assert.equal(textIn(saved, "word/mixed.txt"), "one\r\ntwo and a half\n<!--new-->\n");
+});
+
 browserTest("XML that is not well-formed is told, and saved only after asking", async (t) => {
   const session = await open(t, "report.docx", wordFiles(), { expectedProblems: [/XML Parsing Error/] });
   const { page } = session;

@@ -12,7 +12,7 @@ import { bytesText } from "../ui/text.js";
 import { areSame, isSame, type Edit, type PackageModel } from "./package_model.js";
 import { byName, kindOf, partBytes, sizeOf, textOf } from "./part_kinds.js";
 import { decodePart, encodePart, type PartText } from "./part_text.js";
-import { editorBasics, laidOut } from "./xml_editor.js";
+import { editorBasics, laidOut, lineEndOf } from "./xml_editor.js";
 import { copiedLayout, withoutLayout } from "./xml_formatting.js";
 
 export type Side = "mine" | "theirs";
@@ -161,8 +161,9 @@ class ComparedPart {
     const [mine, theirs] = [this.difference.mine!, this.difference.theirs!];
     const [my, its] = [decodePart(mine.content)!, decodePart(theirs.content)!];
     const isXml = kindOf(mine) === "xml";
+    const lineEnd = lineEndOf(my.text, its.text);
     const side = (text: string, label: string) => {
-      const { doc, extension } = laidOut(text, isXml);
+      const { doc, extension } = laidOut(text, isXml, lineEnd);
       const labelled = EditorView.contentAttributes.of({ "aria-label": label });
       return { doc, extensions: [editorBasics(isXml, doc.length), extension, labelled] };
     };

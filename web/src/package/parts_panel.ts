@@ -153,7 +153,7 @@ export class PartsPanel implements Panel {
     const view = new PartEditor(decoded.text, isXml, textOf(part.partUri), () => this.#edited());
     // A new key each time: what is typed now is undone apart from what was typed before.
     this.#editor = { view, decoded, key: `editor ${++editors}`, isDirty: false };
-    if (isXml && view.view.state.doc.length !== decoded.text.length) {
+    if (view.isLaidOut) {
       commands.append(
         button(this.page.text("package.layout.keep"), () => view.keepLayout(), {
           title: this.page.text("package.layout.hint"),

@@ -8,7 +8,7 @@ import { EditorState, type Extension } from "@codemirror/state";
 import { drawSelection, EditorView, keymap, lineNumbers } from "@codemirror/view";
 import { tags } from "@lezer/highlight";
 
-import { formatXml, keepLayout, layout, withoutLayout } from "./xml_formatting.js";
+import { formatXml, keepLayout, layout, lineEnd, withoutLayout } from "./xml_formatting.js";
 import { findXmlError, XmlError } from "./xml_scanner.js";
 
 const COLOURS = HighlightStyle.define([
@@ -23,7 +23,7 @@ const LONGEST_COLOURED = 20_000_000; // characters
 /** What every editor of a part is made of. */
 export function editorBasics(isXml: boolean, length: number): Extension[] {
   return [
-    // Only these end lines: others stay as they are, characters in a line.
+    // Only these end lines; carriage returns, where not all lines have them, stay characters in a line.
     EditorState.lineSeparator.of("\n"),
     lineNumbers(),
     drawSelection(),
@@ -35,29 +35,47 @@ export function editorBasics(isXml: boolean, length: number): Extension[] {
   ];
 }
 
-/** The text of `text` laid out, where it is well-formed XML, and what keeps account of the layout. */
-export function laidOut(text: string, isXml: boolean): { doc: string; extension: Extension } {
+/** What ends the lines of all `texts`: "\r\n" where nothing else does, or else "\n". */
+export function lineEndOf(...texts: string[]): string {
+  const hasOther = texts.some((text) => /(?<!\r)\n|\r(?!\n)/.test(text));
+  return !hasOther && texts.some((text) => text.includes("\r\n")) ? "\r\n" : "\n";
+}
+
+interface LaidOut {
+  doc: string;
+  /** What keeps account of the layout and of the line ends. */
+  extension: Extension;
+  isLaidOut: boolean;
+}
+
+/** `text`, whose lines end in `end`, for an editor: laid out, where it is well-formed XML. */
+export function laidOut(text: string, isXml: boolean, end = lineEndOf(text)): LaidOut {
+  const lines = text.replaceAll(end, "\n");
+  let formatted = { text: lines, gaps: [] as number[] };
   if (isXml) {
     try {
-      const formatted = formatXml(text);
-      return { doc: formatted.text, extension: layout(formatted) };
+      formatted = formatXml(lines);
     } catch (error) {
       if (!(error instanceof XmlError)) {
         throw error;
       }
     }
   }
-  return { doc: text, extension: layout({ text, gaps: [] }) };
+  const extension = [layout(formatted), lineEnd.of(end)];
+  return { doc: formatted.text, extension, isLaidOut: formatted.gaps.length > 0 };
 }
 
 export class PartEditor {
   readonly view: EditorView;
+  /** Whether line breaks and indentation were put in for reading. */
+  readonly isLaidOut: boolean;
   #isXml: boolean;
 
   /** Calls `changed` on every edit by the person. `label` is what screen readers call the editor. */
   constructor(text: string, isXml: boolean, label: string, changed: () => void) {
     this.#isXml = isXml;
-    const { doc, extension } = laidOut(text, isXml);
+    const { doc, extension, isLaidOut } = laidOut(text, isXml);
+    this.isLaidOut = isLaidOut;
     this.view = new EditorView({
       state: EditorState.create({
         doc,

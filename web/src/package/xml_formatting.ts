@@ -4,6 +4,7 @@
 // when it is saved.
 import { invertedEffects } from "@codemirror/commands";
 import {
+  Facet,
   RangeSet,
   RangeSetBuilder,
   RangeValue,
@@ -198,7 +199,10 @@ export function layout({ gaps }: FormattedXml): Extension {
   return [gapsField.init(() => builder.finish()), restoreGaps];
 }
 
-/** The text of an editor without what `layout` put in. */
+/** What a text's lines end in when it is saved. In its editor they end in line feeds. */
+export const lineEnd = Facet.define<string, string>({ combine: ([one = "\n"]) => one });
+
+/** The text of an editor without what `layout` put in, as it is to be saved. */
 export function withoutLayout(state: EditorState): string {
   const text = state.sliceDoc();
   const pieces: string[] = [];
@@ -208,7 +212,9 @@ export function withoutLayout(state: EditorState): string {
     copied = cursor.to;
   }
   pieces.push(text.slice(copied));
-  return pieces.join("");
+  const saved = pieces.join("");
+  const end = state.facet(lineEnd);
+  return end === "\n" ? saved : saved.replace(/\r?\n/g, end); // what was pasted may have brought its own
 }
 
 /** Keeps the layout what it is in text that is copied: from a place in `source` to `target`, in another editor. */
