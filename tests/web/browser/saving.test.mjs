@@ -321,6 +321,24 @@ browserTest("a save of a file that was removed asks first", async (t) => {
   assert.equal(session.read("a.txt").toString(), "still one\n");
 });
 
+browserTest("Ctrl+S that follows an answer at once is not lost", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page } = session;
+  await open(page, "a.txt");
+  await type(page, "still ");
+  unlinkSync(session.path("a.txt"));
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Decide later" }).evaluate(async (later) => {
+    later.click();
+    for (let turn = 0; turn < 100; ++turn) {
+      await undefined; // what follows from the answer, but no further event
+    }
+    document.body.dispatchEvent(new KeyboardEvent("keydown", { key: "s", ctrlKey: true, bubbles: true }));
+  });
+  await dialog(page).getByRole("button", { name: "Save as new" }).click();
+  await isSaved(page, "a.txt");
+});
+
 browserTest("a save that cannot be made says what may be the matter, and keeps the text", { skip: process.getuid() === 0 && "root may write everywhere" }, async (t) => {
   const session = await Session.start(t, { "a.txt": "one\n" });
   const { page } = session;

@@ -41,16 +41,18 @@ export function ask({ title, message, choices, body }: Question): Promise<string
       event.preventDefault();
     }
   });
-  // The policy of the page lets no form be sent, not even to a dialog.
-  form.addEventListener("submit", (event) => {
-    event.preventDefault();
-    dialog.close((event.submitter as HTMLButtonElement | null)?.value ?? "");
-  });
   document.body.append(dialog);
   return new Promise((resolve) => {
-    dialog.addEventListener("close", () => {
+    const end = () => {
       dialog.remove();
       resolve(dialog.returnValue === "" ? undefined : dialog.returnValue);
+    };
+    dialog.addEventListener("close", end);
+    // The policy of the page lets no form be sent, not even to a dialog.
+    form.addEventListener("submit", (event) => {
+      event.preventDefault();
+      dialog.close((event.submitter as HTMLButtonElement | null)?.value ?? "");
+      end(); // the event comes later, and a key that is pressed before it would meet a question that is over
     });
     dialog.showModal();
   });
