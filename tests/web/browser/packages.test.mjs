@@ -6,6 +6,7 @@ import { join } from "node:path";
 
 import { temporaryFolder } from "../../serve/processes.mjs";
 import { faults, outOfReach } from "./accessibility.mjs";
+import { clientOf } from "./client.mjs";
 import { browserTest, lackedByFirefox } from "./harness.mjs";
 import {
   BINARY,
@@ -69,6 +70,27 @@ browserTest("one paragraph's match is replaced alone, and that is undone and don
   await page.getByRole("button", { name: "Redo" }).click();
   await page.getByText("1 found").waitFor();
   assert.match(textIn(await save(session, "report.docx"), "word/header1.xml"), /Annual report, page/);
+});
+
+browserTest("what is looked for in a document is there still when somebody else saves, to be typed on", async (t) => {
+  const session = await open(t, "report.docx", wordFiles());
+  const { page } = session;
+  await page.getByLabel("Find", { exact: true }).fill("annual report");
+  await page.getByLabel("Whole words").check();
+  await page.getByLabel("Replace with").focus();
+  await page.keyboard.insertText("Bud");
+  const other = await clientOf(t, session);
+  const document = await other.read(session.path("report.docx"), "text/xml");
+  const main = document.parts.find(({ partUri }) => partUri === "/word/document.xml");
+  main.content = main.content.replace("</w:body>", "<w:p><w:r><w:t>The annual report is theirs</w:t></w:r></w:p></w:body>");
+  assert.equal(await other.write(session.path("report.docx"), document), true);
+  await page.getByText(/saved by somebody else/).waitFor();
+  await page.getByText("3 found").waitFor();
+  await page.keyboard.insertText("get");
+  assert.equal(await page.getByLabel("Whole words").isChecked(), true);
+  await page.getByRole("button", { name: "Replace all" }).click();
+  await page.getByText("Nothing found").waitFor();
+  assert.match(textIn(await save(session, "report.docx"), "word/document.xml"), /The Budget is theirs/);
 });
 
 browserTest("a single replacement leaves the list where it is scrolled to", async (t) => {

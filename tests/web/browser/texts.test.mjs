@@ -2,6 +2,7 @@
 // Texts: opened, edited and saved in any charset, with every byte that was not touched as it was.
 import assert from "node:assert/strict";
 
+import { clientOf } from "./client.mjs";
 import { browserTest, Session } from "./harness.mjs";
 import { samples } from "./samples.mjs";
 import { charset, editor, open, readAs, save, shown, typeAtTheEnd } from "./text_page.mjs";
@@ -29,6 +30,41 @@ browserTest("in any charset, a letter typed and taken back leaves the bytes, and
       assert.deepEqual(session.read(`${name}.txt`), Buffer.concat([bytes, letterBytes]));
     });
   }
+});
+
+browserTest("what is looked for in a text is there still when somebody else saves, to be typed on", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one foo\ntwo foo\n" });
+  const { page } = session;
+  const other = await clientOf(t, session);
+  const theirs = async (content) => {
+    await other.write(session.path("a.txt"), content);
+    await editor(page).getByText(content.trim()).waitFor();
+  };
+  const field = (name) => page.locator(`.cm-search [name="${name}"]`).first();
+  await open(session, "a.txt");
+  await editor(page).click();
+  await page.keyboard.press("Control+f");
+  await field("re").check();
+  await field("search").focus();
+  await page.keyboard.type("fo+");
+  await theirs("three foo\n");
+  await page.keyboard.type("(o)");
+  assert.equal(await field("search").inputValue(), "fo+(o)");
+  assert.equal(await field("re").isChecked(), true);
+  await field("replace").focus();
+  await page.keyboard.type("b");
+  await theirs("four foo\n");
+  await page.keyboard.type("ar");
+  await field("replaceAll").click();
+  await editor(page).getByText("four bar").waitFor();
+  await page.keyboard.press("Control+s");
+  await page.locator(".mark").waitFor({ state: "detached" });
+  await editor(page).focus();
+  await theirs("five\n");
+  await page.keyboard.press("Control+End");
+  await page.keyboard.insertText("typed");
+  assert.match(await editor(page).innerText(), /typed/);
+  assert.equal(await field("search").inputValue(), "fo+(o)");
 });
 
 browserTest("lines of scripts that run from right to left begin on the right, and the arrow keys follow them", async (t) => {

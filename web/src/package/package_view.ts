@@ -140,7 +140,7 @@ export class PackageView implements DocumentView {
     }
     this.#model = model;
     this.#panels = {
-      text: new TextPanel(model, page),
+      text: new TextPanel(model, page, this.#panels?.text),
       parts: new PartsPanel(model, page),
       properties: new PropertiesPanel(model, page),
     };

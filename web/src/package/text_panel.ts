@@ -60,6 +60,7 @@ export class TextPanel implements Panel {
   #list = element("div", { className: "package-paragraphs", tabIndex: 0, role: "region" });
   #more = element("div", { className: "package-more" });
   #replaceAll: HTMLButtonElement;
+  #lastUsed = this.#find; // of the two fields
 
   #parts = new WeakMap<Part, TextPart>();
   #columns = new WeakMap<Part, string[]>(); // of the parts that are tables
@@ -79,14 +80,23 @@ export class TextPanel implements Panel {
   );
   #stopListening: () => void;
 
+  /** Goes on with what is typed in `earlier`, whose place it takes. */
   constructor(
     private model: PackageModel,
     private page: Page,
+    earlier?: TextPanel,
   ) {
     this.#replaceAll = button(page.text("package.text.replaceall"), () => this.#replace(this.#replaceable()));
     this.#list.setAttribute("aria-label", page.text("package.text.list"));
     this.element.append(this.#form(), this.#status, this.#list);
     this.#whenScrolled.observe(this.#more);
+    if (earlier) {
+      this.#find.value = earlier.#find.value;
+      this.#replacement.value = earlier.#replacement.value;
+      this.#matchCase.checked = earlier.#matchCase.checked;
+      this.#wholeWords.checked = earlier.#wholeWords.checked;
+      this.#lastUsed = earlier.#lastUsed === earlier.#find ? this.#find : this.#replacement;
+    }
     this.#stopListening = model.listen(() => {
       this.#isStale = true;
       if (this.#isShown) {
@@ -109,7 +119,7 @@ export class TextPanel implements Panel {
   }
 
   focus(): void {
-    this.#find.focus();
+    this.#lastUsed.focus();
   }
 
   close(): void {
@@ -132,6 +142,9 @@ export class TextPanel implements Panel {
     form.addEventListener("submit", (event) => event.preventDefault());
     for (const input of [this.#find, this.#matchCase, this.#wholeWords]) {
       input.addEventListener("input", () => void this.#search());
+    }
+    for (const field of [this.#find, this.#replacement]) {
+      field.addEventListener("focus", () => (this.#lastUsed = field));
     }
     this.#replacement.addEventListener("keydown", (event) => {
       if (event.key === "Enter" && !event.isComposing) {

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // A text in its tab: the editor and the status bar below it. Decoding needs the table of the charset, so
 // the editor appears when that is loaded.
+import { type SearchQuery, getSearchQuery, openSearchPanel, searchPanelOpen, setSearchQuery } from "@codemirror/search";
 import { ChangeSet, Compartment, EditorSelection, EditorState, type StateEffect, type Text } from "@codemirror/state";
 import { EditorView, type ViewUpdate } from "@codemirror/view";
 import { bytesOf, stringOf } from "../../client/src/index.js";
@@ -32,6 +33,8 @@ interface Place {
   column: number;
   scroll: StateEffect<unknown>;
   hasFocus: boolean;
+  /** What is looked for, where that is open, and which of its fields has the focus. */
+  search?: { query: SearchQuery; field: string | null | undefined };
 }
 
 export class TextView implements DocumentView {
@@ -223,6 +226,9 @@ export class TextView implements DocumentView {
       this.#status.element,
     );
     this.#status.show(this.#view.state);
+    if (place?.search) {
+      searchOn(this.#view, place.search);
+    }
     if (place?.hasFocus ?? this.#wantsFocus) {
       this.#view.focus();
     }
@@ -381,7 +387,22 @@ export class TextView implements DocumentView {
 function placeIn(view: EditorView): Place {
   const { head } = view.state.selection.main;
   const { number, from } = view.state.doc.lineAt(head);
-  return { line: number, column: head - from, scroll: view.scrollSnapshot(), hasFocus: view.hasFocus };
+  const field = view.dom.querySelector(".cm-search :focus")?.getAttribute("name");
+  const search = searchPanelOpen(view.state) ? { query: getSearchQuery(view.state), field } : undefined;
+  const place = { line: number, column: head - from, scroll: view.scrollSnapshot(), hasFocus: view.hasFocus };
+  return { ...place, ...(search && { search }) };
+}
+
+// Opens the search again, which takes the focus, and gives that back.
+function searchOn(view: EditorView, { query, field }: NonNullable<Place["search"]>): void {
+  const focused = document.activeElement as HTMLElement | null;
+  openSearchPanel(view);
+  view.dispatch({ effects: setSearchQuery.of(query) });
+  const found = view.dom.querySelector<HTMLInputElement>(`.cm-search [name="${field}"]`);
+  (found ?? focused)?.focus();
+  if (found?.type === "text") {
+    found.setSelectionRange(found.value.length, found.value.length); // to type on
+  }
 }
 
 function cursorAt(doc: Text, { line, column }: Place): EditorSelection {
