@@ -3,6 +3,7 @@
 import assert from "node:assert/strict";
 import { unlinkSync } from "node:fs";
 
+import { waitFor } from "../../serve/processes.mjs";
 import { clientOf } from "./client.mjs";
 import { browserTest } from "./harness.mjs";
 import { png, relationships, textIn, unpack, wordFiles } from "./office_files.mjs";
@@ -229,4 +230,26 @@ browserTest("unsaved changes to a document that cannot be read any more are show
   const saved = session.read(NAME);
   assert.deepEqual(Object.keys(unpack(saved)).sort(), Object.keys(unpack(before)).sort());
   assert.match(textIn(saved, "word/header1.xml"), /Precious/);
+});
+
+browserTest("unsaved changes are shown also where they are based on what cannot be read", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const { page, host } = session;
+  await replace(page, "Annual report", "Budget");
+  const broken = session.read(NAME).subarray(0, 500);
+  session.write(NAME, broken);
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByText("cannot be read any more").waitFor();
+  const version = await (await clientOf(t, session)).version(session.path(NAME));
+  host.signal("SIGSTOP"); // so that the page does not hear of its save
+  await dialog(page).getByRole("button", { name: "Save over it" }).click();
+  await session.waitForDraft(page, version);
+  await page.close();
+  host.signal("SIGCONT");
+  await waitFor("the save", () => !session.read(NAME).equals(broken));
+  session.write(NAME, broken);
+  const next = await session.newPage();
+  await next.getByText(/only the parts that you have changed are left/).waitFor();
+  await next.getByLabel("Find", { exact: true }).fill("Budget");
+  await next.getByText("2 found").waitFor();
 });

@@ -44,7 +44,8 @@ export class PackageView implements DocumentView {
   #shown!: PanelName;
   #preview: Preview | undefined;
   #isClosed = false;
-  // The document was removed or cannot be read, and a draft holds its changed parts only. Until a person knows, and saves them.
+  // The document was removed, or cannot be read, and a draft holds its changed parts only. Until a person knows, and
+  // saves them.
   #lacksParts = false;
 
   #tabs = new Map<PanelName, HTMLButtonElement>();

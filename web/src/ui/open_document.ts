@@ -201,8 +201,7 @@ export class OpenDocument {
     try {
       return await load(client, this.path, { signal, onProgress: (progress) => this.#readProgress(progress) });
     } catch (error) {
-      // What could be read once, and has not changed, can be read again later.
-      if (draft && error instanceof UnreadableDocument && error.version !== draft.version) {
+      if (draft && error instanceof UnreadableDocument) {
         const { charset = "UTF-8", byteOrderMark = false } = draft;
         return { ...this.#withoutContent(error), charset, byteOrderMark };
       }
