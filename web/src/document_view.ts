@@ -40,7 +40,8 @@ export interface DocumentView {
   content(): Promise<DocumentContent | undefined>;
 
   /**
-   * What is unsaved, as a value that IndexedDB can store; given to the factory after a reload. `sent` is the draft that
+   * What is unsaved, as a value that IndexedDB can store; given to the factory after a reload. A Blob in its member
+   * `original` is stored apart, once for all drafts that have it, and may be missing after a crash. `sent` is the draft that
    * it was when it was sent to be saved, where that may have been done: what was undone since then belongs to it, too.
    */
   draft(sent?: unknown): unknown;
@@ -95,7 +96,7 @@ export interface Page {
 /** What shows documents of one kind. Drafts are what their views said was unsaved. */
 export interface Room {
   /** Makes the view of a document, with the edits of `draft`. */
-  open(loaded: LoadedDocument, page: Page, draft?: unknown): DocumentView;
+  open(loaded: LoadedDocument, page: Page, draft?: unknown): DocumentView | Promise<DocumentView>;
 
   /**
    * What a save sent when the view held `draft`; `later` is the view's draft by now. Parts that neither of them changes

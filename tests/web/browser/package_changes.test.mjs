@@ -6,8 +6,8 @@ import { unlinkSync } from "node:fs";
 import { waitFor } from "../../serve/processes.mjs";
 import { clientOf } from "./client.mjs";
 import { browserTest } from "./harness.mjs";
-import { png, relationships, textIn, unpack, wordFiles } from "./office_files.mjs";
-import { open, save, tab } from "./package_page.mjs";
+import { archive, png, relationships, textIn, unpack, wordFiles } from "./office_files.mjs";
+import { assertSameBut, open, save, tab } from "./package_page.mjs";
 
 const NAME = "report.docx";
 const dialog = (page) => page.getByRole("dialog");
@@ -40,8 +40,19 @@ browserTest("the outline marks what is unsaved, until it is saved", async (t) =>
 // The page has changed the header and the main part; somebody else saves the main part, the image and a title.
 async function conflict(t) {
   const session = await open(t, NAME, wordFiles());
-  const { page } = session;
-  await replace(page, "Annual report", "Budget");
+  await replace(session.page, "Annual report", "Budget");
+  await saveTheirs(t, session);
+  return { session, page: await askConflict(session) };
+}
+
+async function askConflict({ page }) {
+  await page.locator(".mark.theirs").waitFor();
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByText("somebody else has saved").waitFor();
+  return page;
+}
+
+async function saveTheirs(t, session) {
   const other = await clientOf(t, session);
   const path = session.path(NAME);
   const document = await other.read(path, "text/xml");
@@ -54,10 +65,30 @@ async function conflict(t) {
   changed("/docProps/core.xml", (xml) => xml.replace(/<dc:title>.*?<\/dc:title>/, "<dc:title>Their title</dc:title>"));
   changed("/word/media/image1.png", () => `data:image/png;base64,${Buffer.from(png(40, 10, [0, 0, 200])).toString("base64")}`);
   assert.equal(await other.write(path, document), true);
-  await page.locator(".mark.theirs").waitFor();
-  await page.keyboard.press("Control+s");
-  await dialog(page).getByText("somebody else has saved").waitFor();
-  return { session, page };
+}
+
+// The page is gone, and another one shows what it left.
+async function reopen(session, whileGone) {
+  await session.page.close();
+  await whileGone?.();
+  session.page = await session.newPage();
+  await session.page.locator(".package").waitFor();
+  return session.page;
+}
+
+// What drafts were made from, as the page of the browser has it stored: their ids. With `forgets`, it is removed.
+function storedOriginals(page, forgets = false) {
+  return page.evaluate(async (forgets) => {
+    const result = (request) => new Promise((resolve) => (request.onsuccess = () => resolve(request.result)));
+    const database = await result(indexedDB.open("editor originals"));
+    const store = database.transaction("originals", "readwrite").objectStore("originals");
+    const ids = await result(store.getAllKeys());
+    if (forgets) {
+      await result(store.clear());
+    }
+    database.close();
+    return ids;
+  }, forgets);
 }
 
 const isSaved = (page) => page.waitForFunction(() => document.querySelector(".mark") === null);
@@ -120,6 +151,82 @@ browserTest("of two editions of a document, mine can be kept", async (t) => {
   assert.doesNotMatch(textIn(saved, "docProps/core.xml"), /Their title/);
 });
 
+browserTest("mine that is kept after a reload is the whole of it", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const before = session.read(NAME);
+  await replace(session.page, "Annual report", "Budget");
+  await session.waitForDraft(session.page, "Budget");
+  await reopen(session, () => saveTheirs(t, session));
+  const page = await askConflict(session);
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  assert.equal(await choiceOf(page, "/word/header1.xml").inputValue(), "mine");
+  assert.equal(await choiceOf(page, "/docProps/core.xml").inputValue(), "theirs");
+  await dialog(page).getByRole("button", { name: "Back" }).click();
+  await dialog(page).getByRole("button", { name: "Keep mine" }).click();
+  await isSaved(page);
+  assertSameBut(["word/document.xml", "word/header1.xml"], before, session.read(NAME));
+  assert.match(textIn(session.read(NAME), "word/document.xml"), /The Budget</);
+});
+
+browserTest("mine that was to be kept, by a save that was not made, is the whole of it after a reload", async (t) => {
+  const { session, page } = await conflict(t);
+  await page.evaluate(() => {
+    const { send } = WebSocket.prototype;
+    WebSocket.prototype.send = function (data) {
+      const text = typeof data === "string" ? data : new TextDecoder("latin1").decode(data);
+      return text.includes("writeRequest") ? undefined : send.call(this, data);
+    };
+  });
+  await dialog(page).getByRole("button", { name: "Keep mine" }).click();
+  await page.getByText(/Saving/).waitFor();
+  await session.waitForDraft(page, "sent");
+  const restored = await reopen(session);
+  await restored.getByText(/have been restored/).waitFor();
+  await restored.keyboard.press("Control+s");
+  await isSaved(restored);
+  const saved = session.read(NAME);
+  assert.match(textIn(saved, "word/document.xml"), /The Budget</);
+  assert.doesNotMatch(textIn(saved, "docProps/core.xml"), /Their title/);
+});
+
+browserTest("what changes are made from is stored once, and not after they are saved", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const { page } = session;
+  await replace(page, "Annual report", "Budget");
+  await session.waitForDraft(page, "Budget");
+  const [id, ...others] = await storedOriginals(page);
+  assert.ok(id && others.length === 0);
+  await replace(page, "Budget", "Plan");
+  await session.waitForDraft(page, "Plan");
+  assert.deepEqual(await storedOriginals(page), [id]);
+  const restored = await reopen(session);
+  await replace(restored, "Plan", "Outlook");
+  await session.waitForDraft(restored, "Outlook");
+  assert.deepEqual(await storedOriginals(restored), [id]);
+  await save(session, NAME);
+  await isSaved(restored);
+  assert.deepEqual(await storedOriginals(restored), []);
+});
+
+browserTest("where only changed parts could be restored, that is told, and a save asks first", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  await replace(session.page, "Annual report", "Budget");
+  await session.waitForDraft(session.page, "Budget");
+  assert.equal((await storedOriginals(session.page, true)).length, 1);
+  const page = await reopen(session, () => saveTheirs(t, session));
+  const theirs = session.read(NAME);
+  await page.getByRole("alert").getByText(/only the parts that you have changed could be restored/).waitFor();
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByText(/the document may be damaged: .*\/word\/document.xml/).waitFor();
+  await dialog(page).getByRole("button", { name: "Do not save" }).click();
+  await dialog(page).waitFor({ state: "detached" });
+  assert.ok(session.read(NAME).equals(theirs));
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Save anyway" }).click();
+  await dialog(page).getByRole("button", { name: "Take theirs" }).click();
+  await isSaved(page);
+});
+
 browserTest("of two editions of a document, theirs can be taken", async (t) => {
   const { session, page } = await conflict(t);
   const theirs = session.read(NAME);
@@ -149,15 +256,31 @@ browserTest("a comparison that is left changes nothing", async (t) => {
   assert.ok(session.read(NAME).equals(theirs));
 });
 
-browserTest("of a document that was removed, the changed parts alone are saved only after saying so", async (t) => {
+browserTest("a document that was removed is saved as new after a reload, with all its parts", async (t) => {
   const session = await open(t, NAME, wordFiles());
-  const { page } = session;
-  await replace(page, "Annual report", "Budget");
-  await session.waitForDraft(page, "Budget");
-  unlinkSync(session.path(NAME));
-  await page.reload();
-  const reason = /has been removed.* only the parts that you have changed are left/;
-  await page.getByRole("alert").getByText(reason).waitFor();
+  const before = session.read(NAME);
+  await replace(session.page, "Annual report", "Budget");
+  await session.waitForDraft(session.page, "Budget");
+  const page = await reopen(session, () => unlinkSync(session.path(NAME)));
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Save as new" }).click();
+  await isSaved(page);
+  assertSameBut(["word/document.xml", "word/header1.xml"], before, session.read(NAME));
+});
+
+// The document was removed, and only its changed parts are left.
+async function loseParts(t) {
+  const session = await open(t, NAME, wordFiles());
+  await replace(session.page, "Annual report", "Budget");
+  await session.waitForDraft(session.page, "Budget");
+  await storedOriginals(session.page, true);
+  const page = await reopen(session, () => unlinkSync(session.path(NAME)));
+  await page.getByRole("alert").getByText(/has been removed.* only the parts that you have changed are left/).waitFor();
+  return { session, page };
+}
+
+browserTest("of a document that was removed, the changed parts alone are saved only after saying so", async (t) => {
+  const { session, page } = await loseParts(t);
   await page.keyboard.press("Control+s");
   await dialog(page).getByText(/Office programs will not open/).waitFor();
   await dialog(page).getByRole("button", { name: "Do not save" }).click();

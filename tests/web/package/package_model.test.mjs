@@ -4,7 +4,7 @@ import { test } from "node:test";
 
 import { room } from "../room.mjs";
 
-const { PackageModel, documentSent, findDifferences, kindOf, partBytes, propertyEdit, readProperties, sizeOf, withImage } =
+const { PackageModel, documentSent, findDifferences, kindOf, originalOf, partBytes, propertyEdit, readProperties, sizeOf, withImage } =
   await room("package/comparison.ts", "package/package_model.ts", "package/part_kinds.ts", "package/properties.ts");
 
 const part = (partUri, content, contentType = "application/xml", relationship = []) => ({
@@ -82,7 +82,45 @@ test("a draft holds what is changed, and brings it back", () => {
   const draft = structuredClone(model.draft());
   assert.deepEqual(Object.keys(draft.parts), ["/a.xml", "/b.bin"]);
   assert.deepEqual(new PackageModel(read(), draft).document(), model.document());
-  assert.deepEqual(new PackageModel(read()).draft(), { kind: "package", parts: {} });
+  assert.deepEqual(new PackageModel(read()).draft().parts, {});
+});
+
+test("a draft brings back the whole document that it was made from, whatever is saved now", async () => {
+  const relationships = [{ relationshipId: "r\xc3\xa9\n", relationshipType: "t", target: "a.xml" }];
+  const loaded = { parts: [...read().parts, part("/\xc3\xa9.xml", "\n\xc3\xa9", "text/xml", relationships)], relationships };
+  const model = new PackageModel(loaded);
+  model.edit(setting("/a.xml", "mine"));
+  const draft = structuredClone(model.draft());
+  const theirs = { parts: [part("/a.xml", "theirs"), part("/b.bin", "also theirs"), structuredClone(loaded.parts[2])], relationships: [] };
+  const original = await originalOf(draft, theirs);
+  assert.deepEqual(original, loaded);
+  assert.equal(original.parts[2], theirs.parts[2]); // which is not held twice
+  const restored = new PackageModel(original, draft);
+  assert.deepEqual(restored.document(), model.document());
+  assert.equal(restored.draft().original, draft.original);
+  assert.equal(await originalOf({ ...draft, original: undefined }, theirs), undefined);
+});
+
+test("what a draft was made from is made once, until a save", async () => {
+  const model = new PackageModel(read());
+  model.edit(setting("/a.xml", "1"));
+  const { original } = model.draft();
+  model.edit(setting("/a.xml", "2"));
+  assert.equal(model.draft().original, original);
+  const saved = model.document();
+  model.saved(saved);
+  model.edit(setting("/a.xml", "3"));
+  assert.deepEqual(await originalOf(model.draft(), read()), saved);
+});
+
+test("what was made from parts of two editions is not told to be what a draft was made from, until it is saved", () => {
+  const model = new PackageModel(read());
+  model.edit(setting("/a.xml", "mine"));
+  const restored = new PackageModel(read(), { ...model.draft(), original: undefined });
+  restored.edit(setting("/b.bin", "mine"));
+  assert.equal(restored.draft().original, undefined);
+  restored.saved(restored.document());
+  assert.ok(restored.draft().original);
 });
 
 test("a draft of an earlier edition keeps what others have changed, and tells what both have", () => {

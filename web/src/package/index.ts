@@ -1,14 +1,21 @@
 // SPDX-License-Identifier: Apache-2.0
 // The view in which a document package is edited.
 import type { Room } from "../document_view.js";
-import { type PackageDraft, documentOf, documentSent } from "./package_model.js";
+import { type PackageDraft, documentOf, documentSent, originalOf } from "./package_model.js";
 import { PackageView } from "./package_view.js";
 
 export const packages: Room = {
-  open: (loaded, page, draft) => new PackageView(loaded, page, isDraft(draft) ? draft : undefined),
+  open: async (loaded, page, draft) => {
+    const original = isDraft(draft) ? await originalOf(draft, documentOf(loaded)) : undefined;
+    return new PackageView(loaded, page, isDraft(draft) ? draft : undefined, original);
+  },
   contentOf: async (draft, later, loaded) => {
-    const content = isDraft(draft) && isDraft(later) && documentSent(documentOf(loaded), draft, later);
-    return content ? { kind: "package", content } : undefined;
+    if (!isDraft(draft) || !isDraft(later)) {
+      return undefined;
+    }
+    const present = documentOf(loaded);
+    const content = documentSent((await originalOf(later, present)) ?? present, draft, later);
+    return content && { kind: "package", content };
   },
 };
 

@@ -1,12 +1,15 @@
 // SPDX-License-Identifier: Apache-2.0
 // A package in memory: what was read, what was changed since, and the way back. Parts are values; an edit puts
 // another one in the place of a part, so what is not edited is sent back as it came.
+import { bytesOf, stringOf } from "../../client/src/bytes.js";
 import type { Document, Part, Relationship } from "../../client/src/index.js";
 import type { LoadedDocument } from "../document_view.js";
 
 /** What is unsaved, as IndexedDB stores it. */
 export interface PackageDraft {
   kind: "package";
+  /** The whole document before the changes; not in drafts of an earlier release, nor where it could not be stored. */
+  original?: Blob;
   /** Changed parts by name, and what they were before; null for what is, or was, not there. */
   parts: Record<string, { part: Part | null; base: Part | null }>;
   relationships?: Relationship[];
@@ -21,6 +24,12 @@ export interface Edit {
   joins?: string;
 }
 
+// The first line of an original: all but the contents.
+interface StoredHead {
+  relationships: Relationship[];
+  parts: (Omit<Part, "content"> & { length: number })[];
+}
+
 interface Step {
   before: Edit;
   after: Edit;
@@ -33,12 +42,16 @@ export class PackageModel {
   #original = new Map<string, Part>();
   #relationships: Relationship[];
   #originalRelationships: Relationship[];
+  #isWhole: boolean; // and not what a draft has, among the parts of what may be another edition
+  #storable: Blob | undefined; // the original, made when a draft first needs it
   #undone: Step[] = [];
   #done: Step[] = [];
   #listeners = new Set<Listener>();
 
-  /** The document as it was read, with the edits of `draft`, which may have been made to an earlier edition. */
+  /** The document as it was read; with a draft that has an original, that original. */
   constructor({ parts, relationships }: Document, draft?: PackageDraft) {
+    this.#isWhole = !draft || draft.original !== undefined;
+    this.#storable = draft?.original;
     for (const part of parts) {
       this.#parts.set(part.partUri, part);
       this.#original.set(part.partUri, part);
@@ -105,6 +118,8 @@ export class PackageModel {
 
   /** `document` is on disk now: what differs from it is unsaved. */
   saved({ parts, relationships }: Document): void {
+    this.#isWhole = true;
+    this.#storable = undefined;
     this.#original = new Map(parts.map((part) => [part.partUri, part]));
     this.#originalRelationships = relationships;
     for (const part of parts) {
@@ -121,8 +136,12 @@ export class PackageModel {
   draft(sent?: PackageDraft): PackageDraft {
     const uris = new Set([...Object.keys(sent?.parts ?? {}), ...this.changedParts()]);
     const hasRelationships = sent?.relationships || this.areRelationshipsChanged;
+    if (this.#isWhole) {
+      this.#storable ??= blobOf({ parts: [...this.#original.values()], relationships: this.#originalRelationships });
+    }
     return {
       kind: "package",
+      ...(this.#storable && { original: this.#storable }),
       parts: Object.fromEntries(
         [...uris].map((uri) => [uri, { part: this.#parts.get(uri) ?? null, base: this.#original.get(uri) ?? null }]),
       ),
@@ -197,6 +216,31 @@ export class PackageModel {
 
 export function documentOf({ answer }: LoadedDocument): Document {
   return { parts: answer.parts ?? [], relationships: answer.relationships ?? [] };
+}
+
+/** A document as a Blob, which browsers store without copying it through the page: a line of JSON, then all contents. */
+function blobOf({ parts, relationships }: Document): Blob {
+  const head = { relationships, parts: parts.map(({ content, ...rest }) => ({ ...rest, length: content.length })) };
+  return new Blob([`${JSON.stringify(head)}\n`, ...parts.map(({ content }) => new Blob([bytesOf(content) as Uint8Array<ArrayBuffer>]))]);
+}
+
+/** What `draft` was made from. Parts that are as in `present` are the same objects. Nothing where it is not stored. */
+export async function originalOf({ original }: PackageDraft, present: Document): Promise<Document | undefined> {
+  const bytes = new Uint8Array((await original?.arrayBuffer().catch(() => undefined)) ?? []);
+  if (bytes.length === 0) {
+    return undefined;
+  }
+  let begin = bytes.indexOf("\n".charCodeAt(0)) + 1;
+  const { relationships, parts } = JSON.parse(new TextDecoder().decode(bytes.subarray(0, begin))) as StoredHead;
+  const there = new Map(present.parts.map((part) => [part.partUri, part]));
+  return {
+    relationships,
+    parts: parts.map(({ length, ...rest }) => {
+      const part = { ...rest, content: stringOf(bytes.subarray(begin, (begin += length))) };
+      const same = there.get(part.partUri);
+      return isSame(same, part) ? same! : part;
+    }),
+  };
 }
 
 /**

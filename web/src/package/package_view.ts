@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // A package in its tab: its text, its parts and its properties, one at a time, and a preview beside them.
+import type { Document } from "../../client/src/index.js";
 import type { Comparison, DocumentContent, DocumentView, LoadedDocument, Page } from "../document_view.js";
 import { nameOf } from "../files/paths.js";
 import { button, element, shortcutKey } from "../ui/dom.js";
@@ -44,9 +45,8 @@ export class PackageView implements DocumentView {
   #shown!: PanelName;
   #preview: Preview | undefined;
   #isClosed = false;
-  // The document was removed, or cannot be read, and a draft holds its changed parts only. Until a person knows, and
-  // saves them.
-  #lacksParts = false;
+  // A draft without its original holds changed parts only. What to ask for that reason before a save.
+  #lacking: "package.incomplete" | "package.mixed" | undefined;
 
   #tabs = new Map<PanelName, HTMLButtonElement>();
   #stage = element("div", { className: "package-stage" });
@@ -58,6 +58,7 @@ export class PackageView implements DocumentView {
     loaded: LoadedDocument,
     private page: Page,
     draft?: PackageDraft,
+    original?: Document,
   ) {
     this.#undo = this.#command("package.undo", () => this.#model.undo());
     this.#redo = this.#command("package.redo", () => this.#model.redo());
@@ -66,19 +67,19 @@ export class PackageView implements DocumentView {
     });
     this.element.append(this.#bar(), this.#stage);
     this.element.addEventListener("keydown", (event) => this.#undoByKey(event));
-    this.#use(new PackageModel(documentOf(loaded), draft));
-    if (draft && (loaded.version === "" || loaded.unreadable !== undefined)) {
-      this.#lacksParts = true;
-      page.tell(page.text("package.incomplete", { name: nameOf(loaded.path) }), "problem");
+    this.#use(new PackageModel(original ?? documentOf(loaded), draft && { ...draft, original: original && draft.original }));
+    if (draft && !original) {
+      this.#lacking = loaded.version === "" || loaded.unreadable !== undefined ? "package.incomplete" : "package.mixed";
+      page.tell(page.text(this.#lacking, { name: nameOf(loaded.path) }), "problem");
     }
   }
 
   async content(): Promise<DocumentContent | undefined> {
     this.#commit();
-    if (this.#lacksParts && !(await this.#mayBeSaved("package.incomplete"))) {
+    if (this.#lacking && !(await this.#mayBeSaved(this.#lacking))) {
       return undefined;
     }
-    this.#lacksParts = false;
+    this.#lacking = undefined;
     const broken = this.#brokenParts();
     if (broken.length > 0 && !(await this.#mayBeSaved("package.broken", broken))) {
       return undefined;
@@ -88,7 +89,7 @@ export class PackageView implements DocumentView {
 
   saved(content: DocumentContent): void {
     if (content.kind === "package") {
-      this.#lacksParts = false; // also where they have been put together with those of another edition
+      this.#lacking = undefined; // also where they have been put together with those of another edition
       const changed = this.#model.changedParts();
       this.#model.saved(content.content);
       this.#panels.parts.refresh([...changed, ...this.#model.changedParts()]);
@@ -102,7 +103,7 @@ export class PackageView implements DocumentView {
 
   replace(loaded: LoadedDocument): void {
     const hadFocus = this.element.contains(document.activeElement);
-    this.#lacksParts = false;
+    this.#lacking = undefined;
     this.#use(new PackageModel(documentOf(loaded)));
     if (hadFocus) {
       this.focus();

@@ -24,6 +24,13 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
       "The document has been removed or is not readable any more, and with it all parts that you had not changed. Office programs will not open what is left: {parts}",
     "package.incomplete.save": "Save these parts",
     "package.incomplete.cancel": "Do not save",
+    "package.mixed":
+      "{name}: only the parts that you have changed could be restored. All others are as they are saved now, and may not fit.",
+    "package.mixed.title": "Save parts of two versions?",
+    "package.mixed.message":
+      "All other parts are as they are saved now. If somebody else has saved meanwhile, they may not fit these, and the document may be damaged: {parts}",
+    "package.mixed.save": "Save anyway",
+    "package.mixed.cancel": "Do not save",
     "package.text.find": "Find",
     "package.text.replacement": "Replace with",
     "package.text.replace": "Replace",
@@ -124,6 +131,13 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
       "Das Dokument wurde gelöscht oder ist nicht mehr lesbar, und mit ihm alle Teile, die Sie nicht geändert hatten. Was übrig ist, öffnen Office-Programme nicht: {parts}",
     "package.incomplete.save": "Diese Teile speichern",
     "package.incomplete.cancel": "Nicht speichern",
+    "package.mixed":
+      "{name}: Nur die Teile, die Sie geändert haben, konnten wiederhergestellt werden. Alle anderen sind so, wie sie jetzt gespeichert sind, und passen vielleicht nicht dazu.",
+    "package.mixed.title": "Teile zweier Fassungen speichern?",
+    "package.mixed.message":
+      "Alle anderen Teile sind so, wie sie jetzt gespeichert sind. Hat inzwischen jemand anderes gespeichert, passen sie vielleicht nicht zu diesen, und das Dokument kann beschädigt sein: {parts}",
+    "package.mixed.save": "Trotzdem speichern",
+    "package.mixed.cancel": "Nicht speichern",
     "package.text.find": "Suchen",
     "package.text.replacement": "Ersetzen durch",
     "package.text.replace": "Ersetzen",

@@ -3,6 +3,9 @@
 //
 // A draft belongs to one window, by an id that is kept with the browser's tab; a window that lives holds a lock
 // of the id's name. So drafts of a window that is gone can be told from those that another one is working on.
+//
+// What a draft was made from may be large, and stays as it is from edit to edit. It is stored once, in a database of its
+// own, since an older page that is open would not let this one change the first.
 import { sessionStore } from "../storage.js";
 
 export interface Draft {
@@ -14,36 +17,57 @@ export interface Draft {
   charset?: string;
   byteOrderMark?: boolean;
   readAs?: string;
-  /** What the view needs to show it again. */
+  /** What the view needs to show it again. In the store, an id stands for the Blob `original` in it and in `sent`. */
   content: unknown;
   /** The same when the last save was sent, where it is not known what became of that save. */
   sent?: unknown;
 }
 
-const STORE = "drafts";
+/** What a draft was made from, by an id. */
+interface Original {
+  id: string;
+  window: string;
+  original: Blob;
+}
+
+interface Content {
+  original?: Blob | string | undefined;
+}
 
 export class Drafts {
+  // By path. A failure is told with every draft that needs it.
+  #originals = new Map<string, { id: string; original: Blob; stored: Promise<unknown> }>();
+
   /** Where the browser stores nothing, as when the disk is full, all that is asked of the drafts rejects. */
   static async open(window: WindowId): Promise<Drafts> {
-    return new Drafts(await openDatabase().catch((reason: Error) => reason), window);
+    const drafts = Store.open("editor", "drafts", ["window", "path"]);
+    return new Drafts(await drafts, await Store.open("editor originals", "originals", "id"), window);
   }
 
   private constructor(
-    private database: IDBDatabase | Error,
+    private drafts: Store,
+    private originals: Store,
     private window: WindowId,
   ) {}
 
   async put(draft: Omit<Draft, "window">): Promise<void> {
-    await this.#ask("readwrite", (store) => store.put({ ...draft, window: this.window.id }));
+    const { content, sent } = draft as { content: Content; sent?: Content };
+    const id = this.#idOf(draft.path, content?.original);
+    const apart = (one: Content) => (id && one.original === content.original ? { ...one, original: id } : one);
+    const stored = { ...draft, content: content && apart(content), ...(sent && { sent: apart(sent) }) };
+    // Asked for at once, also while the original is being stored: the page may be about to go.
+    const put = this.drafts.ask("readwrite", (store) => store.put({ ...stored, window: this.window.id }));
+    await Promise.all([put, this.#originals.get(draft.path)?.stored]);
   }
 
   async remove(path: string): Promise<void> {
-    await this.#ask("readwrite", (store) => store.delete([this.window.id, path]));
+    this.#idOf(path, undefined);
+    await this.drafts.ask("readwrite", (store) => store.delete([this.window.id, path]));
   }
 
   /** This window's drafts, and those of windows that are gone, which become this one's. */
   async take(): Promise<Draft[]> {
-    const all = (await this.#ask("readonly", (store) => store.getAll())) as Draft[];
+    const all = (await this.drafts.ask("readonly", (store) => store.getAll())) as Draft[];
     const taken = new Map<string, Draft>();
     for (const draft of all) {
       const isOwn = draft.window === this.window.id;
@@ -51,22 +75,86 @@ export class Drafts {
         taken.set(draft.path, draft);
       }
     }
+    await this.#takeOriginals(all, taken);
     for (const draft of [...taken.values()].filter(({ window }) => window !== this.window.id)) {
       await this.put(draft);
-      await this.#ask("readwrite", (store) => store.delete([draft.window, draft.path]));
+      await this.drafts.ask("readwrite", (store) => store.delete([draft.window, draft.path]));
     }
     return [...taken.values()];
   }
 
-  async #ask<Result>(
+  // Puts the Blobs of `taken` in the places of their ids, and removes those that are left of windows that are gone.
+  async #takeOriginals(all: Draft[], taken: Map<string, Draft>): Promise<void> {
+    const stored = (await this.originals.ask("readonly", (store) => store.getAll()).catch(() => [])) as Original[];
+    const originals = new Map(stored.map((one) => [one.id, one]));
+    const idOf = ({ content }: Draft) => (content as Content | undefined)?.original;
+    for (const { id, window } of stored) {
+      const isLeft = !all.some((draft) => idOf(draft) === id);
+      if (isLeft && (window === this.window.id || (await this.window.isGone(window)))) {
+        this.#removeOriginal(id);
+      }
+    }
+    for (const draft of taken.values()) {
+      const id = idOf(draft);
+      if (typeof id === "string") {
+        const original = originals.get(id)?.original;
+        for (const one of [draft.content, draft.sent] as (Content | undefined)[]) {
+          if (one?.original === id) {
+            one.original = original;
+          }
+        }
+        if (original) {
+          this.#originals.set(draft.path, { id, original, stored: Promise.resolve() });
+        }
+      }
+    }
+  }
+
+  // The id by which `original` is stored, or is being stored, for the draft at `path`. Another one is removed.
+  #idOf(path: string, original: Blob | string | undefined): string | undefined {
+    const known = this.#originals.get(path);
+    if (known?.original === original) {
+      return known?.id;
+    }
+    if (known) {
+      this.#originals.delete(path);
+      this.#removeOriginal(known.id);
+    }
+    if (!(original instanceof Blob)) {
+      return undefined;
+    }
+    const id = newId();
+    const stored = this.originals.ask("readwrite", (store) => store.put({ id, window: this.window.id, original }));
+    stored.catch(() => {}); // it is looked at with the draft
+    this.#originals.set(path, { id, original, stored });
+    return id;
+  }
+
+  // One that remains is removed when the drafts are taken.
+  #removeOriginal(id: string): void {
+    this.originals.ask("readwrite", (store) => store.delete(id)).catch(() => {});
+  }
+}
+
+class Store {
+  static async open(database: string, name: string, keyPath: string | string[]): Promise<Store> {
+    return new Store(await openDatabase(database, name, keyPath).catch((reason: Error) => reason), name);
+  }
+
+  private constructor(
+    private database: IDBDatabase | Error,
+    private name: string,
+  ) {}
+
+  async ask<Result>(
     mode: IDBTransactionMode,
     question: (store: IDBObjectStore) => IDBRequest<Result>,
   ): Promise<Result> {
     if (this.database instanceof Error) {
       throw this.database;
     }
-    const transaction = this.database.transaction(STORE, mode);
-    const request = question(transaction.objectStore(STORE));
+    const transaction = this.database.transaction(this.name, mode);
+    const request = question(transaction.objectStore(this.name));
     transaction.commit(); // not only when the request is done, and the page perhaps gone
     return new Promise((resolve, reject) => {
       transaction.oncomplete = () => resolve(request.result);
@@ -75,9 +163,9 @@ export class Drafts {
   }
 }
 
-async function openDatabase(): Promise<IDBDatabase> {
-  const opening = indexedDB.open("editor", 1);
-  opening.onupgradeneeded = () => opening.result.createObjectStore(STORE, { keyPath: ["window", "path"] });
+async function openDatabase(database: string, store: string, keyPath: string | string[]): Promise<IDBDatabase> {
+  const opening = indexedDB.open(database, 1);
+  opening.onupgradeneeded = () => opening.result.createObjectStore(store, { keyPath });
   return resultOf(opening);
 }
 

@@ -98,7 +98,13 @@ export class OpenDocument {
       reading.signal.throwIfAborted();
       const readAs = charset ?? draft?.readAs;
       this.#chosenCharset = readAs === undefined ? undefined : { found: loaded.charset, readAs };
-      await this.#show(this.#asChosen(loaded), room, draft);
+      const chosen = this.#asChosen(loaded);
+      const view = await room.open(chosen, this.#page(), draft?.content);
+      if (reading.signal.aborted) {
+        view.close();
+      }
+      reading.signal.throwIfAborted();
+      await this.#show(view, chosen, room, draft);
     } catch (error) {
       if (this.#reading === reading) {
         const again = () => void this.read({ ...(charset && { charset }), ...(draft && { draft }) });
@@ -214,16 +220,16 @@ export class OpenDocument {
     return { path: this.path, version, answer, ...(version !== "" && { unreadable: message }) };
   }
 
-  async #show(loaded: LoadedDocument, room: Room, draft?: Draft): Promise<void> {
+  async #show(view: DocumentView, loaded: LoadedDocument, room: Room, draft?: Draft): Promise<void> {
     this.#view?.close();
+    this.#view = view;
     this.#loaded = loaded;
     const saver = (this.#saver = this.#makeSaver(draft?.version ?? loaded.version, draft && unsavedOf(draft, loaded, room)));
-    this.#view = room.open(this.#loaded, this.#page(), draft?.content);
     this.draft = undefined;
     const hasFocus = this.panel.contains(document.activeElement);
-    this.panel.replaceChildren(this.#view.element);
+    this.panel.replaceChildren(view.element);
     if (hasFocus) {
-      this.#view.focus(); // which was there while the document was being read
+      view.focus(); // which was there while the document was being read
     }
     this.#setStatus(loaded.isChanging ? text("document.changing") : "");
     if (!draft) {
