@@ -33,6 +33,9 @@ export type DocumentContent =
 export interface DocumentView {
   readonly element: HTMLElement;
 
+  /** Whether it holds only some parts of a document that was removed, and that they must not replace where it is back. */
+  readonly isRemnant?: boolean;
+
   /**
    * The document as it stands, for a save. Asks the person first where something must be decided, such as
    * what becomes of characters that the charset lacks. Nothing when the person thinks better of it.

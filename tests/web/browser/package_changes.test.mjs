@@ -288,10 +288,24 @@ browserTest("of a document that was removed, the changed parts alone are saved o
   assert.throws(() => session.read(NAME), { code: "ENOENT" });
   await page.keyboard.press("Control+s"); // it is asked until it is answered
   await dialog(page).getByRole("button", { name: "Save these parts" }).click();
-  await dialog(page).getByRole("button", { name: "Save as new" }).click();
   await isSaved(page);
   const parts = Object.keys(unpack(session.read(NAME))).filter((name) => /^word\/[^_]/.test(name));
   assert.deepEqual(parts.sort(), ["word/document.xml", "word/header1.xml"]);
+});
+
+browserTest("the changed parts alone do not replace the document that is back again", async (t) => {
+  const { session, page } = await loseParts(t);
+  session.write(NAME, archive(wordFiles()));
+  const before = session.read(NAME);
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Save these parts" }).click();
+  await dialog(page).getByText("somebody else has saved").waitFor();
+  assert.ok(session.read(NAME).equals(before));
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  await dialog(page).getByRole("button", { name: "Save put together" }).click();
+  await isSaved(page);
+  assertSameBut(["word/document.xml", "word/header1.xml"], before, session.read(NAME));
+  assert.match(textIn(session.read(NAME), "word/document.xml"), /The Budget</);
 });
 
 browserTest("of a document that was removed while it is shown, all parts are saved as new", async (t) => {

@@ -74,6 +74,10 @@ export class PackageView implements DocumentView {
     }
   }
 
+  get isRemnant(): boolean {
+    return this.#lacking === "package.incomplete";
+  }
+
   async content(): Promise<DocumentContent | undefined> {
     this.#commit();
     if (this.#lacking && !(await this.#mayBeSaved(this.#lacking))) {

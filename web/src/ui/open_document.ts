@@ -224,7 +224,8 @@ export class OpenDocument {
     this.#view?.close();
     this.#view = view;
     this.#loaded = loaded;
-    const saver = (this.#saver = this.#makeSaver(draft?.version ?? loaded.version, draft && unsavedOf(draft, loaded, room)));
+    const version = draft && !view.isRemnant ? draft.version : loaded.version;
+    const saver = (this.#saver = this.#makeSaver(version, draft && unsavedOf(draft, loaded, room)));
     this.draft = undefined;
     const hasFocus = this.panel.contains(document.activeElement);
     this.panel.replaceChildren(view.element);
