@@ -120,6 +120,28 @@ browserTest("two editions of a document are compared part by part, and put toget
   assert.ok(Buffer.from(unpack(saved)["word/media/image1.png"]).equals(png(40, 10, [0, 0, 200])));
 });
 
+browserTest("undo after two editions were put together takes back what was changed here, and nothing else", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const { page } = session;
+  const before = session.read(NAME);
+  await tab(page, "Parts").click();
+  await page.getByRole("treeitem", { name: /^header1.xml/ }).click();
+  await page.locator(".package-pane .cm-content").click();
+  await page.keyboard.press("Control+End");
+  await page.keyboard.type("<!-- mine -->");
+  await saveTheirs(t, session);
+  await askConflict(session);
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  await dialog(page).getByRole("button", { name: "Save put together" }).click();
+  await isSaved(page);
+  assert.match(textIn(session.read(NAME), "word/header1.xml"), /mine/);
+  await page.getByRole("button", { name: "Undo" }).click();
+  const saved = await save(session, NAME);
+  assert.equal(textIn(saved, "word/header1.xml"), textIn(before, "word/header1.xml"));
+  assert.match(textIn(saved, "docProps/core.xml"), /Their title/);
+  assert.match(textIn(saved, "word/document.xml"), /Theirs at the end/);
+});
+
 browserTest("relationships that only somebody else has changed are kept when two editions are put together", async (t) => {
   const { "docProps/core.xml": core, ...files } = wordFiles();
   files["_rels/.rels"] = relationships(["rId1", "officeDocument", "word/document.xml"]);

@@ -177,6 +177,46 @@ test("of what somebody else saved, what both have is not unsaved, and what was c
   assert.deepEqual(model.changedParts(), ["/c"]);
 });
 
+test("what only somebody else has changed is taken over, and not undone with what was changed here", () => {
+  const relationships = [{ relationshipId: "rId1" }];
+  const model = new PackageModel({ parts: ["/a", "/b", "/c", "/d"].map((uri) => part(uri, "0")), relationships: [] });
+  model.edit({ parts: new Map([["/a", part("/a", "1")], ["/c", part("/c", "1")]]) });
+  model.edit(setting("/c", "0"));
+  model.edit(setting("/d", "1"));
+  const theirs = { parts: [part("/b", "2"), part("/c", "2"), part("/d", "2"), part("/e", "2")], relationships };
+  theirs.parts.push(part("/a", "0"));
+  const heard = [];
+  model.listen((parts) => heard.push(...parts));
+  model.adopt(theirs);
+  const contents = () => Object.fromEntries([...model.parts].map(({ partUri, content }) => [partUri, content]));
+  assert.deepEqual(heard.sort(), ["/b", "/c", "/e"]);
+  assert.deepEqual(contents(), { "/a": "1", "/b": "2", "/c": "2", "/d": "1", "/e": "2" });
+  assert.deepEqual([model.changedParts(), model.areRelationshipsChanged], [["/a", "/d"], false]);
+  model.choose({ parts: new Map([["/a", part("/a", "1")], ["/b", part("/b", "2")], ["/d", part("/d", "12")]]), relationships });
+  assert.equal(contents()["/d"], "12");
+  model.undo(); // what was chosen
+  assert.equal(contents()["/d"], "1");
+  model.undo();
+  assert.equal(contents()["/d"], "0");
+  model.undo(); // not a step of what has been taken over
+  assert.deepEqual([contents(), model.canUndo], [{ "/a": "0", "/b": "2", "/c": "2", "/d": "0", "/e": "2" }, false]);
+  assert.deepEqual(model.relationships, relationships);
+  model.redo();
+  assert.deepEqual([contents()["/a"], contents()["/c"]], ["1", "2"]);
+});
+
+test("what is chosen of what somebody else alone has changed, or changes nothing, is undone and not a step", () => {
+  const model = new PackageModel({ parts: [part("/a", "0")], relationships: [] });
+  const mine = model.document();
+  model.adopt({ parts: [part("/a", "2")], relationships: [{ relationshipId: "theirs" }] });
+  model.choose({ parts: new Map([["/a", part("/a", "2")]]), relationships: [{ relationshipId: "theirs" }] });
+  assert.equal(model.canUndo, false);
+  model.choose({ parts: new Map([["/a", mine.parts[0]]]), relationships: mine.relationships });
+  assert.deepEqual(model.document(), mine);
+  model.undo();
+  assert.deepEqual([model.part("/a").content, model.relationships.length], ["2", 1]);
+});
+
 test("what was saved is what both have from then on", () => {
   const model = new PackageModel({ parts: ["/a", "/b"].map((uri) => part(uri, "0")), relationships: [] });
   model.edit(setting("/a", "1"));

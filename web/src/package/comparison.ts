@@ -40,7 +40,7 @@ export function findDifferences(mine: PackageModel, theirs: Document): Differenc
   });
 }
 
-/** Shows the differences; `use` gets what is chosen, as an edit of mine. */
+/** Shows the differences; `use` gets what is chosen of all of them. */
 export class PackageComparison implements Comparison {
   readonly element = element("div", { className: "package-comparison" });
 
@@ -49,7 +49,7 @@ export class PackageComparison implements Comparison {
   #detail = element("div", { className: "package-difference" });
 
   constructor(
-    mine: PackageModel,
+    private mine: PackageModel,
     private theirs: Document,
     private page: Page,
     private use: (chosen: Edit) => void,
@@ -79,7 +79,8 @@ export class PackageComparison implements Comparison {
 
   apply(): void {
     const parts = new Map(this.#rows.map((row) => [row.uri, row.result ?? null]));
-    this.use({ parts, ...(this.#relationshipsBy === "theirs" && { relationships: this.theirs.relationships }) });
+    const { relationships } = this.#relationshipsBy === "theirs" ? this.theirs : this.mine;
+    this.use({ parts, relationships: [...relationships] });
   }
 
   close(): void {

@@ -168,6 +168,44 @@ export class PackageModel {
     this.#tell(edit, editor);
   }
 
+  /**
+   * Takes over from `theirs`, which is saved now, what is not changed here. That cannot be undone, and undoing what was
+   * done before does not undo it either.
+   */
+  adopt(theirs: Document): void {
+    const their = new Map(theirs.parts.map((part) => [part.partUri, part]));
+    const isAdopted = (uri: string) => !this.isChanged(uri) && !isSame(this.#parts.get(uri), their.get(uri));
+    const uris = [...new Set([...this.#parts.keys(), ...their.keys()])].filter(isAdopted);
+    const hasRelationships = !this.areRelationshipsChanged && !areSame(this.#relationships, theirs.relationships);
+    for (const uri of uris) {
+      putInto(this.#parts, uri, their.get(uri) ?? null);
+      putInto(this.#original, uri, their.get(uri) ?? null);
+    }
+    if (hasRelationships) {
+      this.#relationships = this.#originalRelationships = theirs.relationships;
+    }
+    const without = ({ parts, relationships, ...rest }: Edit): Edit => ({
+      ...rest,
+      parts: new Map([...(parts ?? [])].filter(([uri]) => !uris.includes(uri))),
+      ...(relationships && !hasRelationships && { relationships }),
+    });
+    const isLeft = ({ after }: Step) => after.parts!.size > 0 || after.relationships !== undefined;
+    const left = (steps: Step[]) =>
+      steps.map(({ before, after }) => ({ before: without(before), after: without(after) })).filter(isLeft);
+    [this.#done, this.#undone] = [left(this.#done), left(this.#undone)];
+    this.saved(theirs);
+    this.#tell({ parts: new Map(uris.map((uri) => [uri, null])) });
+  }
+
+  /** As edit(), but what changes nothing is left out, and is no step to undo. */
+  choose({ parts, relationships }: Edit): void {
+    const changes = [...(parts ?? [])].filter(([uri, part]) => !isSame(this.#parts.get(uri), part ?? undefined));
+    const isOther = relationships && !areSame(relationships, this.#relationships);
+    if (changes.length > 0 || isOther) {
+      this.edit({ parts: new Map(changes), ...(isOther && { relationships }) });
+    }
+  }
+
   get canUndo(): boolean {
     return this.#done.length > 0;
   }

@@ -93,10 +93,9 @@ export class PackageView implements DocumentView {
 
   saved(content: DocumentContent): void {
     if (content.kind === "package") {
-      this.#lacking = undefined; // also where they have been put together with those of another edition
       const changed = this.#model.changedParts();
       this.#model.saved(content.content);
-      this.#panels.parts.refresh([...changed, ...this.#model.changedParts()]);
+      this.#isSaved(changed);
     }
   }
 
@@ -123,9 +122,11 @@ export class PackageView implements DocumentView {
         throw new Error(this.page.text("package.differences.meanwhile"));
       }
       if (!theirs.isEarlier) {
-        this.saved({ kind: "package", content: document });
+        const changed = mine.changedParts();
+        mine.adopt(document);
+        this.#isSaved(changed);
       }
-      mine.edit(chosen);
+      mine.choose(chosen);
     });
   }
 
@@ -168,6 +169,12 @@ export class PackageView implements DocumentView {
     if (isWordDocument(model) && matchMedia("(min-width: 1100px)").matches) {
       this.#togglePreview();
     }
+  }
+
+  // Or put together with what somebody else has saved. `changed` are the parts that were unsaved before.
+  #isSaved(changed: string[]): void {
+    this.#lacking = undefined;
+    this.#panels.parts.refresh([...changed, ...this.#model.changedParts()]);
   }
 
   #closePanels(): void {
