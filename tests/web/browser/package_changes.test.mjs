@@ -6,7 +6,7 @@ import { unlinkSync } from "node:fs";
 import { waitFor } from "../../serve/processes.mjs";
 import { clientOf } from "./client.mjs";
 import { browserTest } from "./harness.mjs";
-import { archive, png, relationships, textIn, unpack, wordFiles } from "./office_files.mjs";
+import { archive, png, relationships, textIn, unpack, wordFiles, workbookFiles } from "./office_files.mjs";
 import { assertSameBut, open, save, tab } from "./package_page.mjs";
 
 const NAME = "report.docx";
@@ -140,6 +140,55 @@ browserTest("undo after two editions were put together takes back what was chang
   assert.equal(textIn(saved, "word/header1.xml"), textIn(before, "word/header1.xml"));
   assert.match(textIn(saved, "docProps/core.xml"), /Their title/);
   assert.match(textIn(saved, "word/document.xml"), /Theirs at the end/);
+});
+
+// A workbook whose cells show `texts`, which is what theirs adds a row to.
+function bookOf(...texts) {
+  const files = workbookFiles();
+  const inside = (name, tag, xml) => (files[name] = files[name].replace(new RegExp(`(<${tag}[^>]*>).*(</${tag}>)`, "s"), `$1${xml}$2`));
+  inside("xl/sharedStrings.xml", "sst", texts.map((text) => `<si><t>${text}</t></si>`).join(""));
+  const cell = (_, index) => `<row r="${index + 1}"><c r="A${index + 1}" t="s"><v>${index}</v></c><c r="B${index + 1}"><v>${texts.length - index}</v></c></row>`;
+  inside("xl/worksheets/sheet1.xml", "sheetData", texts.map(cell).join(""));
+  return files;
+}
+
+// What a spreadsheet program shows.
+function cellsOf(book) {
+  const texts = [...textIn(book, "xl/sharedStrings.xml").matchAll(/<si><t>(.*?)<\/t>/g)].map(([, text]) => text);
+  const cells = textIn(book, "xl/worksheets/sheet1.xml").matchAll(/<v>(\d+)<\/v><\/c><c[^>]*><v>(\d+)/g);
+  return [...cells].map(([, index, value]) => `${texts[index]} ${value}`);
+}
+
+browserTest("two editions of a workbook are put together without mixing up their texts, and undo does not mix them either", async (t) => {
+  const name = "book.xlsx";
+  const session = await open(t, name, bookOf("Rent", "Food"));
+  const { page } = session;
+  const mine = ["Housing 2", "Food 1"];
+  const theirs = ["Advance 3", "Rent 2", "Food 1"];
+  await replace(page, "Rent", "Housing");
+  const putTogether = async (choose) => {
+    session.write(name, archive({ ...bookOf("Advance", "Rent", "Food"), "docProps/core.xml": wordFiles()["docProps/core.xml"].replace("Old", "Their") }));
+    await page.keyboard.press("Control+s");
+    await dialog(page).getByRole("button", { name: "Compare" }).click();
+    await dialog(page).getByText("are taken from the same version").waitFor();
+    await choose?.();
+    await dialog(page).getByRole("button", { name: "Save put together" }).click();
+    await isSaved(page);
+    assert.match(textIn(session.read(name), "docProps/core.xml"), /Their title/);
+    return cellsOf(session.read(name));
+  };
+  assert.deepEqual(await putTogether(), mine);
+  await replace(page, "Housing", "Home");
+  const chooseTheirs = async () => {
+    await choiceOf(page, "/xl/sharedStrings.xml").selectOption("theirs");
+    assert.equal(await choiceOf(page, "/xl/worksheets/sheet1.xml").inputValue(), "theirs");
+    assert.equal(await choiceOf(page, "/xl/worksheets/sheet1.xml").locator("option").count(), 2);
+  };
+  assert.deepEqual(await putTogether(chooseTheirs), theirs);
+  await page.getByRole("button", { name: "Undo" }).click();
+  assert.deepEqual(cellsOf(await save(session, name)), ["Home 2", "Food 1"]);
+  await page.getByRole("button", { name: "Undo" }).click();
+  assert.deepEqual(cellsOf(await save(session, name)), mine);
 });
 
 browserTest("relationships that only somebody else has changed are kept when two editions are put together", async (t) => {

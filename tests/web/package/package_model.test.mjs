@@ -165,6 +165,27 @@ test("parts that differ are told, with who has changed them", () => {
   );
 });
 
+test("the parts of a workbook that differ are chosen together, unless there is one alone", () => {
+  const type = (name) => `application/vnd.openxmlformats-officedocument.spreadsheetml.${name}+xml`;
+  const parts = (main, ...contents) => [
+    part("/xl/workbook.xml", "0", main),
+    ...["worksheet", "sharedStrings"].map((name, index) => part(`/xl/${name}.xml`, contents[index], type(name))),
+    part("/xl/media/image1.png", contents[2], "image/png"),
+  ];
+  const joints = (changed, theirs, main = type("sheet.main")) => {
+    const model = new PackageModel({ parts: parts(main, "0", "0", "0"), relationships: [{ relationshipType: "t/officeDocument", target: "xl/workbook.xml" }] });
+    changed.forEach((name) => model.edit({ parts: new Map([[`/xl/${name}.xml`, { ...model.part(`/xl/${name}.xml`), content: "1" }]]) }));
+    return findDifferences(model, { parts: parts(main, ...theirs), relationships: [] }).map(({ uri, joint }) => [uri, joint]);
+  };
+  const [image, strings, sheet] = ["/xl/media/image1.png", "/xl/sharedStrings.xml", "/xl/worksheet.xml"];
+  assert.deepEqual(joints(["sharedStrings"], ["2", "2", "2"]), [[image, undefined], [strings, "both"], [sheet, "both"]]);
+  assert.deepEqual(joints(["sharedStrings"], ["2", "0", "0"]), [[strings, "both"], [sheet, "both"]]);
+  assert.deepEqual(joints([], ["2", "2", "0"]), [[strings, "theirs"], [sheet, "theirs"]]);
+  assert.deepEqual(joints(["sharedStrings", "worksheet"], ["0", "0", "2"]), [[image, undefined], [strings, "mine"], [sheet, "mine"]]);
+  assert.deepEqual(joints(["sharedStrings"], ["0", "2", "0"]), [[strings, undefined]]);
+  assert.deepEqual(joints(["sharedStrings"], ["2", "2", "0"], "text/xml"), [[strings, undefined], [sheet, undefined]]);
+});
+
 test("of what somebody else saved, what both have is not unsaved, and what was changed is", () => {
   const model = new PackageModel({ parts: ["/a", "/b", "/c"].map((uri) => part(uri, "0")), relationships: [] });
   model.edit(setting("/a", "1"));
@@ -187,7 +208,7 @@ test("what only somebody else has changed is taken over, and not undone with wha
   theirs.parts.push(part("/a", "0"));
   const heard = [];
   model.listen((parts) => heard.push(...parts));
-  model.adopt(theirs);
+  model.adopt(theirs, ["/b", "/c", "/e"]);
   const contents = () => Object.fromEntries([...model.parts].map(({ partUri, content }) => [partUri, content]));
   assert.deepEqual(heard.sort(), ["/b", "/c", "/e"]);
   assert.deepEqual(contents(), { "/a": "1", "/b": "2", "/c": "2", "/d": "1", "/e": "2" });
@@ -208,7 +229,7 @@ test("what only somebody else has changed is taken over, and not undone with wha
 test("what is chosen of what somebody else alone has changed, or changes nothing, is undone and not a step", () => {
   const model = new PackageModel({ parts: [part("/a", "0")], relationships: [] });
   const mine = model.document();
-  model.adopt({ parts: [part("/a", "2")], relationships: [{ relationshipId: "theirs" }] });
+  model.adopt({ parts: [part("/a", "2")], relationships: [{ relationshipId: "theirs" }] }, ["/a"]);
   model.choose({ parts: new Map([["/a", part("/a", "2")]]), relationships: [{ relationshipId: "theirs" }] });
   assert.equal(model.canUndo, false);
   model.choose({ parts: new Map([["/a", mine.parts[0]]]), relationships: mine.relationships });

@@ -24,13 +24,18 @@ export interface Difference {
   theirs: Part | undefined;
   /** Who has changed it since both had the same. */
   changedBy: Side | "both";
+  /** Where it is chosen together with others: who has changed any of them. */
+  joint?: Side | "both";
 }
 
-/** The parts that differ, and whether the relationships of the package do. */
+/**
+ * The parts that differ. Those of a workbook are chosen together, since its cells have the numbers of their texts and
+ * styles: with those of another edition they would show something else.
+ */
 export function findDifferences(mine: PackageModel, theirs: Document): Difference[] {
   const their = new Map(theirs.parts.map((part) => [part.partUri, part]));
   const uris = new Set([...[...mine.parts].map(({ partUri }) => partUri), ...their.keys()]);
-  return [...uris].sort(byName).flatMap((uri): Difference[] => {
+  const differences = [...uris].sort(byName).flatMap((uri): Difference[] => {
     const [my, its, original] = [mine.part(uri), their.get(uri), mine.originalPart(uri)];
     if (isSame(my, its)) {
       return [];
@@ -38,9 +43,21 @@ export function findDifferences(mine: PackageModel, theirs: Document): Differenc
     const changedBy = isSame(its, original) ? "mine" : isSame(my, original) ? "theirs" : "both";
     return [{ uri, mine: my, theirs: its, changedBy }];
   });
+  const ofWorkbook = isWorkbookPart(mine.mainPart)
+    ? differences.filter(({ mine, theirs }) => isWorkbookPart(mine ?? theirs))
+    : [];
+  if (ofWorkbook.length > 1) {
+    const [first, ...others] = new Set(ofWorkbook.map(({ changedBy }) => changedBy));
+    ofWorkbook.forEach((one) => (one.joint = others.length > 0 ? "both" : first!));
+  }
+  return differences;
 }
 
-/** Shows the differences; `use` gets what is chosen of all of them. */
+function isWorkbookPart(part: Part | undefined): boolean {
+  return part !== undefined && /spreadsheetml|ms-excel/i.test(part.contentType);
+}
+
+/** Shows the differences; `use` gets what is chosen of all of them, and the parts that only they have changed. */
 export class PackageComparison implements Comparison {
   readonly element = element("div", { className: "package-comparison" });
 
@@ -52,7 +69,7 @@ export class PackageComparison implements Comparison {
     private mine: PackageModel,
     private theirs: Document,
     private page: Page,
-    private use: (chosen: Edit) => void,
+    private use: (chosen: Edit, adopted: string[]) => void,
   ) {
     this.#relationshipsBy = mine.areRelationshipsChanged ? "mine" : "theirs";
     this.#rows = findDifferences(mine, theirs).map(
@@ -67,6 +84,9 @@ export class PackageComparison implements Comparison {
       list.append(this.#relationships());
     }
     const nothing = element("p", {}, page.text("package.differences.none"));
+    if (this.#rows.some(({ isJoint }) => isJoint)) {
+      this.element.append(element("p", {}, page.text("package.differences.joint")));
+    }
     this.element.append(list.children.length > 0 ? list : nothing, this.#detail);
     if (this.#rows[0]) {
       this.#show(this.#rows[0]);
@@ -80,7 +100,8 @@ export class PackageComparison implements Comparison {
   apply(): void {
     const parts = new Map(this.#rows.map((row) => [row.uri, row.result ?? null]));
     const { relationships } = this.#relationshipsBy === "theirs" ? this.theirs : this.mine;
-    this.use({ parts, relationships: [...relationships] });
+    const adopted = this.#rows.filter(({ isAdopted }) => isAdopted).map(({ uri }) => uri);
+    this.use({ parts, relationships: [...relationships] }, adopted);
   }
 
   close(): void {
@@ -92,6 +113,9 @@ export class PackageComparison implements Comparison {
   #show(row: ComparedPart): void {
     for (const other of this.#rows) {
       other.element.classList.toggle("active", other === row);
+      if (other.isJoint && row.isJoint) {
+        other.side = row.side;
+      }
     }
     this.#detail.replaceChildren(row.detail);
   }
@@ -119,8 +143,9 @@ class ComparedPart {
   ) {
     this.uri = difference.uri;
     const name = textOf(this.uri);
-    this.#choice = sideChoice(page, name, this.#isText() ? ["mine", "theirs", "together"] : ["mine", "theirs"]);
-    this.#choice.value = difference.changedBy === "theirs" ? "theirs" : "mine";
+    const isMerged = this.#isText() && !this.isJoint;
+    this.#choice = sideChoice(page, name, isMerged ? ["mine", "theirs", "together"] : ["mine", "theirs"]);
+    this.#choice.value = this.#changedBy === "theirs" ? "theirs" : "mine";
     const open = element("button", { type: "button", className: "package-link" }, name);
     open.addEventListener("click", () => select(this));
     this.#choice.addEventListener("change", () => select(this));
@@ -130,7 +155,24 @@ class ComparedPart {
 
   /** Whether something else was chosen, or put together, than the comparison begins with. */
   get isEdited(): boolean {
-    return this.#choice.value !== (this.difference.changedBy === "theirs" ? "theirs" : "mine");
+    return this.#choice.value !== (this.#changedBy === "theirs" ? "theirs" : "mine");
+  }
+
+  get isJoint(): boolean {
+    return this.difference.joint !== undefined;
+  }
+
+  /** Whether it is taken from theirs, or put together with it, and is not changed in mine. */
+  get isAdopted(): boolean {
+    return this.#changedBy === "theirs" && this.side !== "mine";
+  }
+
+  get side(): string {
+    return this.#choice.value;
+  }
+
+  set side(side: string) {
+    this.#choice.value = side;
   }
 
   /** What becomes of the part; nothing when it is taken out. */
@@ -150,6 +192,10 @@ class ComparedPart {
 
   close(): void {
     this.#merge?.view.destroy();
+  }
+
+  get #changedBy(): Side | "both" {
+    return this.difference.joint ?? this.difference.changedBy;
   }
 
   #isText(): boolean {
@@ -190,11 +236,13 @@ class ComparedPart {
         }
       }),
     );
-    a.extensions.push(EditorState.readOnly.of(true), EditorView.editable.of(false));
+    for (const { extensions } of this.isJoint ? [a, b] : [a]) {
+      extensions.push(EditorState.readOnly.of(true), EditorView.editable.of(false));
+    }
     const view: MergeView = new MergeView({
       a,
       b,
-      revertControls: "a-to-b",
+      ...(!this.isJoint && { revertControls: "a-to-b" }),
       renderRevertControl: () => mergeArrow(this.page.text("comparison.take")),
       collapseUnchanged: { margin: 3, minSize: 6 },
     });
@@ -204,7 +252,8 @@ class ComparedPart {
       element("h3", {}, this.page.text("package.theirs")),
       element("h3", {}, this.page.text("package.mine")),
     );
-    return element("div", {}, titles, element("p", {}, this.page.text("package.differences.hint")), view.dom);
+    const hint = this.isJoint ? [] : [element("p", {}, this.page.text("package.differences.hint"))];
+    return element("div", {}, titles, ...hint, view.dom);
   }
 
   #sides(): HTMLElement {

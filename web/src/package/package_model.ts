@@ -169,13 +169,11 @@ export class PackageModel {
   }
 
   /**
-   * Takes over from `theirs`, which is saved now, what is not changed here. That cannot be undone, and undoing what was
-   * done before does not undo it either.
+   * Takes over from `theirs`, which is saved now, the parts `uris`, which are not changed here, and the relationships
+   * unless they are. That cannot be undone, and undoing what was done before does not undo it either.
    */
-  adopt(theirs: Document): void {
+  adopt(theirs: Document, uris: string[]): void {
     const their = new Map(theirs.parts.map((part) => [part.partUri, part]));
-    const isAdopted = (uri: string) => !this.isChanged(uri) && !isSame(this.#parts.get(uri), their.get(uri));
-    const uris = [...new Set([...this.#parts.keys(), ...their.keys()])].filter(isAdopted);
     const hasRelationships = !this.areRelationshipsChanged && !areSame(this.#relationships, theirs.relationships);
     for (const uri of uris) {
       putInto(this.#parts, uri, their.get(uri) ?? null);

@@ -117,13 +117,13 @@ export class PackageView implements DocumentView {
     this.#commit();
     const mine = this.#model;
     const document = documentOf(theirs);
-    return new PackageComparison(mine, document, this.page, (chosen) => {
+    return new PackageComparison(mine, document, this.page, (chosen, adopted) => {
       if (this.#model !== mine) {
         throw new Error(this.page.text("package.differences.meanwhile"));
       }
       if (!theirs.isEarlier) {
         const changed = mine.changedParts();
-        mine.adopt(document);
+        mine.adopt(document, adopted);
         this.#isSaved(changed);
       }
       mine.choose(chosen);
