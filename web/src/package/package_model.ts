@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // A package in memory: what was read, what was changed since, and the way back. Parts are values; an edit puts
 // another one in the place of a part, so what is not edited is sent back as it came.
-import { bytesOf, stringOf } from "../../client/src/bytes.js";
 import type { Document, Part, Relationship } from "../../client/src/index.js";
 import type { LoadedDocument } from "../document_view.js";
 
@@ -27,7 +26,7 @@ export interface Edit {
 // The first line of an original: all but the contents.
 interface StoredHead {
   relationships: Relationship[];
-  parts: (Omit<Part, "content"> & { length: number })[];
+  parts: (Omit<Part, "content"> & { size: number })[];
 }
 
 interface Step {
@@ -254,10 +253,20 @@ export function documentOf({ answer }: LoadedDocument): Document {
   return { parts: answer.parts ?? [], relationships: answer.relationships ?? [] };
 }
 
-/** A document as a Blob, which browsers store without copying it through the page: a line of JSON, then all contents. */
+const blobs = new WeakMap<Part, Blob>(); // so that after a save only what was changed is made again
+
+/** A document as browsers store it without copying it through the page: a line of JSON, then all contents, in UTF-8. */
 function blobOf({ parts, relationships }: Document): Blob {
-  const head = { relationships, parts: parts.map(({ content, ...rest }) => ({ ...rest, length: content.length })) };
-  return new Blob([`${JSON.stringify(head)}\n`, ...parts.map(({ content }) => new Blob([bytesOf(content) as Uint8Array<ArrayBuffer>]))]);
+  const contents = parts.map((part) => {
+    const blob = blobs.get(part) ?? new Blob([part.content]);
+    blobs.set(part, blob);
+    return blob;
+  });
+  const head: StoredHead = {
+    relationships,
+    parts: parts.map(({ content, ...rest }, index) => ({ ...rest, size: contents[index]!.size })),
+  };
+  return new Blob([`${JSON.stringify(head)}\n`, ...contents]);
 }
 
 /** What `draft` was made from. Parts that are as in `present` are the same objects. Nothing where it is not stored. */
@@ -267,12 +276,13 @@ export async function originalOf({ original }: PackageDraft, present: Document):
     return undefined;
   }
   let begin = bytes.indexOf("\n".charCodeAt(0)) + 1;
-  const { relationships, parts } = JSON.parse(new TextDecoder().decode(bytes.subarray(0, begin))) as StoredHead;
+  const decode = (from: number, to: number) => new TextDecoder("utf-8", { ignoreBOM: true }).decode(bytes.subarray(from, to));
+  const { relationships, parts } = JSON.parse(decode(0, begin)) as StoredHead;
   const there = new Map(present.parts.map((part) => [part.partUri, part]));
   return {
     relationships,
-    parts: parts.map(({ length, ...rest }) => {
-      const part = { ...rest, content: stringOf(bytes.subarray(begin, (begin += length))) };
+    parts: parts.map(({ size, ...rest }) => {
+      const part = { ...rest, content: decode(begin, (begin += size)) };
       const same = there.get(part.partUri);
       return isSame(same, part) ? same! : part;
     }),

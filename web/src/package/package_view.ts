@@ -67,7 +67,8 @@ export class PackageView implements DocumentView {
     });
     this.element.append(this.#bar(), this.#stage);
     this.element.addEventListener("keydown", (event) => this.#undoByKey(event));
-    this.#use(new PackageModel(original ?? documentOf(loaded), draft && { ...draft, original: original && draft.original }));
+    const isStored = draft && { ...draft, original: original && draft.original };
+    this.#use(new PackageModel(original ?? documentOf(loaded), isStored));
     if (draft && !original) {
       this.#lacking = loaded.version === "" || loaded.unreadable !== undefined ? "package.incomplete" : "package.mixed";
       page.tell(page.text(this.#lacking, { name: nameOf(loaded.path) }), "problem");

@@ -4,8 +4,8 @@
 // A draft belongs to one window, by an id that is kept with the browser's tab; a window that lives holds a lock
 // of the id's name. So drafts of a window that is gone can be told from those that another one is working on.
 //
-// What a draft was made from may be large, and stays as it is from edit to edit. It is stored once, in a database of its
-// own, since an older page that is open would not let this one change the first.
+// What a draft was made from may be large, and stays as it is from edit to edit. It is stored once, in a database of
+// its own: an older page that is still open would not let this one change the first.
 import { sessionStore } from "../storage.js";
 
 export interface Draft {
