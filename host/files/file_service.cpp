@@ -3,7 +3,6 @@
 
 #include <limits.h>
 #include <spdlog/spdlog.h>
-#include <sys/stat.h>
 
 #include <cerrno>
 #include <cmath>
@@ -57,14 +56,6 @@ FileDescriptor openDocument(const std::string& path) {
         throw std::runtime_error("It is not a regular file");
     }
     return std::move(opened.descriptor);
-}
-
-std::size_t sizeOf(const FileDescriptor& file) {
-    struct stat status {};
-    if (::fstat(file.get(), &status) != 0) {
-        platform::throwSystemError("The file cannot be read");
-    }
-    return static_cast<std::size_t>(status.st_size);
 }
 
 bool hasMark(const std::string& bytes, const std::string& charset) {
@@ -184,7 +175,7 @@ private:
     std::string readVersion() {
         const FileDescriptor version = earlierVersion();
         FileInMemory copy("earlier version");
-        const std::size_t size = sizeOf(version);
+        const std::size_t size = sizeOf(version.get());
         client_.awaitMemory(size);
         copy.reserve(size);
         copyContent(version.get(), copy.descriptor().get());
@@ -204,7 +195,7 @@ private:
 
     // Finding its charset takes up to three times a text's bytes beside them.
     std::string bytesOf(const FileDescriptor& file) {
-        const std::size_t size = sizeOf(file);
+        const std::size_t size = sizeOf(file.get());
         platform::i18n::requireTextLength(size);
         client_.awaitMemory(4 * size);
         return readContent(file.get());

@@ -114,6 +114,14 @@ const char* unescapeBlock(const char* in, const char* end, std::string& text) {
 
 }  // namespace
 
+std::size_t sizeOf(int file) {
+    struct stat status {};
+    if (::fstat(file, &status) != 0) {
+        platform::throwSystemError("cannot be examined");
+    }
+    return static_cast<std::size_t>(status.st_size);
+}
+
 bool hasContent(int file, std::string_view bytes) {
     std::vector<char> block;
     off_t offset = 0;

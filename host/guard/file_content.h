@@ -2,10 +2,14 @@
 // The content of open files, compared and copied.
 #pragma once
 
+#include <cstddef>
 #include <string>
 #include <string_view>
 
 namespace host {
+
+/// The size of `file` in bytes. Throws std::system_error.
+std::size_t sizeOf(int file);
 
 /// Whether `file` holds just `bytes`. False if it cannot be read.
 bool hasContent(int file, std::string_view bytes);

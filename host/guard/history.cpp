@@ -5,7 +5,6 @@
 #include <linux/fs.h>
 #include <spdlog/spdlog.h>
 #include <sys/ioctl.h>
-#include <sys/stat.h>
 #include <sys/statvfs.h>
 #include <unistd.h>
 
@@ -108,14 +107,6 @@ void removeIfAbandoned(const fs::path& path) {
 std::uint64_t roomFor(std::uint64_t size) {
     constexpr std::uint64_t block = 4096;
     return (size / block + 2) * block;
-}
-
-std::uint64_t sizeOf(const FileDescriptor& file) {
-    struct stat status {};
-    if (::fstat(file.get(), &status) != 0) {
-        platform::throwSystemError("its size is not known");
-    }
-    return static_cast<std::uint64_t>(status.st_size);
 }
 
 // Copies `from` to a new file at `path`, without its bytes being copied where the file system can
@@ -322,7 +313,7 @@ void History::makeCopy(const FileDescriptor& old, const std::string& document, S
     const std::string digest = digestOf(document);
     const fs::path folder = options_.folder / digestOf(root.string()) / digest.substr(0, 2);
     fs::create_directories(folder);
-    makeRoom(root, roomFor(sizeOf(old)));
+    makeRoom(root, roomFor(sizeOf(old.get())));
     const fs::path unfinished =
         folder / (unfinishedName + std::to_string(::getpid()) + "." + std::to_string(now()));
     try {

@@ -18,14 +18,6 @@ namespace {
 
 using platform::throwSystemError;
 
-off_t sizeOf(int file) {
-    struct stat status {};
-    if (::fstat(file, &status) != 0) {
-        throwSystemError("cannot be examined");
-    }
-    return status.st_size;
-}
-
 // Has the disk set aside room for `size` bytes of `file`, where it can do that.
 void reserveRoom(int file, off_t size) {
     int result = -1;
@@ -62,7 +54,7 @@ void InPlaceFile::replaceContent(int from) const {
 }
 
 void InPlaceFile::writeContentOf(int from) const {
-    const off_t size = sizeOf(from);
+    const auto size = static_cast<off_t>(sizeOf(from));
     reserveRoom(file_.get(), size);
     copyContent(from, file_.get());
     if (::ftruncate(file_.get(), size) != 0) {
