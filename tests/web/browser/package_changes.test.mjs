@@ -409,31 +409,20 @@ browserTest("a document that somebody has damaged is saved over after asking, wi
   assert.match(textIn(session.read(NAME), "word/header1.xml"), /Budget, page/);
 });
 
-browserTest("unsaved changes to a document that cannot be read any more are shown, and an earlier version completes them", async (t) => {
+browserTest("unsaved changes to a document that cannot be read any more are there after a reload, and can be saved over it", async (t) => {
   const session = await open(t, NAME, wordFiles());
   const { page } = session;
   const before = session.read(NAME);
-  await replace(page, "A link", "Budget");
-  await save(session, NAME);
-  await isSaved(page);
   await replace(page, "Annual report", "Precious");
   await session.waitForDraft(page, "Precious");
   session.write(NAME, "\u00d0\u00cf\u0011\u00e0 encrypted");
   await page.reload();
   await page.getByText(/report.docx cannot be read: /).waitFor();
-  await page.getByRole("alert").getByText(/only the parts that you have changed are left/).waitFor();
   await page.getByLabel("Find", { exact: true }).fill("Precious");
   await page.getByText("2 found").waitFor();
   await page.keyboard.press("Control+s");
-  await dialog(page).getByRole("button", { name: "Do not save" }).click();
-  await dialog(page).waitFor({ state: "detached" });
-  await page.getByRole("button", { name: "Versions" }).click();
-  await dialog(page).getByRole("button", { name: "Restore" }).click();
-  await page.getByText(/was saved by somebody else. Your changes are kept/).waitFor();
-  await page.keyboard.press("Control+s");
-  await dialog(page).getByRole("button", { name: "Save these parts" }).click();
-  await dialog(page).getByRole("button", { name: "Compare" }).click();
-  await dialog(page).getByRole("button", { name: "Save put together" }).click();
+  await dialog(page).getByText("cannot be read any more").waitFor();
+  await dialog(page).getByRole("button", { name: "Save over it" }).click();
   await isSaved(page);
   const saved = session.read(NAME);
   assert.deepEqual(Object.keys(unpack(saved)).sort(), Object.keys(unpack(before)).sort());
@@ -457,7 +446,7 @@ browserTest("unsaved changes are shown also where they are based on what cannot 
   await waitFor("the save", () => !session.read(NAME).equals(broken));
   session.write(NAME, broken);
   const next = await session.newPage();
-  await next.getByText(/only the parts that you have changed are left/).waitFor();
+  await next.getByText(/report.docx cannot be read: /).waitFor();
   await next.getByLabel("Find", { exact: true }).fill("Budget");
   await next.getByText("2 found").waitFor();
 });
