@@ -9,6 +9,7 @@
 #include <stdexcept>
 #include <system_error>
 #include <thread>
+#include <utility>
 
 #include "host/guard/document_version.h"
 #include "platform/posix/system_error.h"
@@ -17,8 +18,8 @@ namespace host {
 
 namespace {
 
-// Longer than a save waits for a lease on its file.
-constexpr std::chrono::seconds longestWait{90};
+using namespace std::chrono_literals;
+
 constexpr std::chrono::milliseconds pause{2};
 
 int setLock(int file, short type, std::size_t number) {
@@ -30,9 +31,27 @@ int setLock(int file, short type, std::size_t number) {
     return ::fcntl(file, F_OFD_SETLK, &lock);
 }
 
+// Returns whether the lock could be had in that time. It is tried again and again: there is no
+// other way to wait for a lock with a time limit.
+bool waitFor(int file, std::size_t number, std::chrono::milliseconds longest) {
+    const auto end = std::chrono::steady_clock::now() + longest;
+    while (setLock(file, F_WRLCK, number) != 0) {
+        const bool isHeld = errno == EAGAIN || errno == EACCES || errno == EINTR;
+        if (!isHeld) {
+            platform::throwSystemError("cannot be locked");
+        }
+        if (std::chrono::steady_clock::now() >= end) {
+            return false;
+        }
+        std::this_thread::sleep_for(pause);
+    }
+    return true;
+}
+
 }  // namespace
 
-SaveLocks::SaveLocks(const std::filesystem::path& file) {
+SaveLocks::SaveLocks(const std::filesystem::path& file, std::chrono::milliseconds longestWait)
+    : longestWait_(longestWait) {
     if (!file.empty()) {
         file_ = platform::FileDescriptor(::open(file.c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600));
     }
@@ -42,24 +61,8 @@ SaveLocks::SaveLocks(const std::filesystem::path& file) {
     }
 }
 
-SaveLocks::Held::Held(int file, std::size_t number, std::mutex& mutex)
-    : file_(file), number_(number), lock_(mutex) {
-    if (file_ < 0) {
-        return;
-    }
-    // Tried again and again: there is no other way to wait for a lock with a time limit.
-    const auto end = std::chrono::steady_clock::now() + longestWait;
-    while (setLock(file_, F_WRLCK, number_) != 0) {
-        const bool isHeld = errno == EAGAIN || errno == EACCES || errno == EINTR;
-        if (!isHeld) {
-            platform::throwSystemError("cannot be locked");
-        }
-        if (std::chrono::steady_clock::now() > end) {
-            throw std::runtime_error("is locked by the save of another worker");
-        }
-        std::this_thread::sleep_for(pause);
-    }
-}
+SaveLocks::Held::Held(int file, std::size_t number, std::unique_lock<std::mutex> lock)
+    : file_(file), number_(number), lock_(std::move(lock)) {}
 
 SaveLocks::Held::~Held() {
     if (lock_ && file_ >= 0) {
@@ -69,7 +72,15 @@ SaveLocks::Held::~Held() {
 
 SaveLocks::Held SaveLocks::hold(const std::string& path) {
     const std::size_t number = std::stoul(digestOf(path).substr(0, 8), nullptr, 16) % count;
-    return {file_.get(), number, mutexes_.at(number)};
+    Lock& lock = locks_.at(number);
+    std::unique_lock held(lock.mutex);
+    if (file_) {
+        lock.isStuck = !waitFor(file_.get(), number, lock.isStuck ? 0ms : longestWait_);
+        if (lock.isStuck) {
+            throw std::runtime_error("is locked by the save of another worker");
+        }
+    }
+    return {file_.get(), number, std::move(held)};
 }
 
 }  // namespace host

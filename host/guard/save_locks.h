@@ -3,6 +3,7 @@
 #pragma once
 
 #include <array>
+#include <chrono>
 #include <cstddef>
 #include <filesystem>
 #include <mutex>
@@ -19,8 +20,10 @@ namespace host {
 class SaveLocks {
 public:
     /// Without a `file`, or where it cannot be opened, the locks work within this process only; the
-    /// log says so.
-    explicit SaveLocks(const std::filesystem::path& file);
+    /// log says so. Another process is waited for up to `longestWait`: longer than a save waits for
+    /// a lease on its file.
+    explicit SaveLocks(const std::filesystem::path& file,
+                       std::chrono::milliseconds longestWait = std::chrono::seconds(90));
 
     /// A lock, until the end of its life.
     class Held {
@@ -33,7 +36,7 @@ public:
 
     private:
         friend class SaveLocks;
-        Held(int file, std::size_t number, std::mutex& mutex);
+        Held(int file, std::size_t number, std::unique_lock<std::mutex> lock);
 
         int file_;
         std::size_t number_;
@@ -41,14 +44,21 @@ public:
     };
 
     /// Waits for the lock of the document at `path`. Throws std::runtime_error when another process
-    /// has held it for a minute and a half.
+    /// holds it for too long. Then nobody waits for it again until it has been free: that process
+    /// has stopped, perhaps, and everybody's saves would wait with those of this document.
     Held hold(const std::string& path);
 
 private:
     static constexpr std::size_t count = 1024;
 
+    struct Lock {
+        std::mutex mutex;
+        bool isStuck = false;  // guarded by mutex: another process has held it for too long
+    };
+
     platform::FileDescriptor file_;
-    std::array<std::mutex, count> mutexes_;
+    const std::chrono::milliseconds longestWait_;
+    std::array<Lock, count> locks_;
 };
 
 }  // namespace host

@@ -1,0 +1,61 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "host/guard/save_locks.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <chrono>
+#include <optional>
+#include <stdexcept>
+#include <thread>
+
+#include "tests/support/temporary_directory.h"
+
+namespace {
+
+using host::SaveLocks;
+using namespace std::chrono_literals;
+
+// Two of them are as those of two processes.
+class SaveLocksTest : public testing::Test {
+protected:
+    // Expects that ours is waited for while theirs is held for a moment.
+    void expectWait() {
+        std::optional<SaveLocks::Held> held(theirs_.hold("/a.txt"));
+        std::atomic<bool> isFree = false;
+        std::thread other([&] {
+            std::this_thread::sleep_for(20ms);
+            isFree = true;
+            held.reset();
+        });
+        {
+            const SaveLocks::Held document = ours_.hold("/a.txt");
+            EXPECT_TRUE(isFree);
+        }
+        other.join();
+    }
+
+    const test::TemporaryDirectory folder_;
+    SaveLocks ours_{folder_ / "locks", 5s};
+    SaveLocks theirs_{folder_ / "locks"};
+};
+
+TEST_F(SaveLocksTest, LetTheSavesOfOneDocumentWaitForThoseOfAnotherProcess) {
+    expectWait();
+}
+
+TEST_F(SaveLocksTest, WaitOnceForAProcessThatHasStoppedUntilItGoesOn) {
+    {
+        const SaveLocks::Held held = theirs_.hold("/a.txt");
+        const auto begin = std::chrono::steady_clock::now();
+        for (int i = 0; i < 1000; ++i) {
+            EXPECT_THROW(ours_.hold("/a.txt"), std::runtime_error);
+        }
+        EXPECT_LT(std::chrono::steady_clock::now() - begin, 100s);  // of a thousand waits, 5000 s
+        const SaveLocks::Held another = ours_.hold("/b.txt");
+    }
+    static_cast<void>(ours_.hold("/a.txt"));
+    expectWait();
+}
+
+}  // namespace
