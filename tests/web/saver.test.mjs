@@ -405,6 +405,28 @@ test("what somebody else saved is shown where nothing is unsaved, and told of wh
   assert.deepEqual([desk.view, desk.saver.hasTheirs], ["mine", true]);
 });
 
+test("what was read before a save is not shown after it", async () => {
+  const desk = new Desk().open();
+  desk.disk = "theirs";
+  const { load } = desk;
+  let endReading;
+  const isRead = new Promise((resolve) => (endReading = resolve));
+  desk.load = async () => {
+    desk.load = load;
+    const read = desk.loaded();
+    await isRead;
+    return read;
+  };
+  const followed = desk.saver.followTheirs();
+  desk.decide = () => "mine";
+  desk.type("mine");
+  assert.equal(await desk.saver.save(), true);
+  endReading();
+  assert.equal(await followed, "same");
+  assert.equal(desk.view, "mine");
+  assert.equal(desk.saver.baseVersion, desk.versionOf("mine"));
+});
+
 test("of two people who save in turn or at once, nobody loses anything unseen", async () => {
   const disk = { text: "start" };
   const people = ["a", "b"].map((name) => {

@@ -119,9 +119,13 @@ export class Saver {
 
   /** To be called when the file may have changed: shows what is saved now where nothing is unsaved. */
   async followTheirs(): Promise<"same" | "shown" | "kept"> {
-    await this.#running?.catch(() => undefined);
-    const theirs = await this.target.load();
-    await this.#running?.catch(() => undefined);
+    let base: string;
+    let theirs: LoadedDocument | undefined;
+    do {
+      await this.#running?.catch(() => undefined);
+      base = this.version;
+      theirs = await this.target.load();
+    } while (this.#running || this.version !== base); // What a save has replaced meanwhile is not shown again.
     return theirs && theirs.unreadable === undefined ? this.noticed(theirs) : "same"; // or there is nothing to show
   }
 
