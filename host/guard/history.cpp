@@ -378,8 +378,9 @@ std::uint64_t History::shareOf(const fs::path& root) const {
         return system.f_blocks == 0 ? std::numeric_limits<std::uint64_t>::max()
                                     : static_cast<std::uint64_t>(size * options_.share);
     };
-    // Versions must not fill a disk of their own that is smaller.
-    return std::min(shareOfDisk(root), shareOfDisk(options_.folder));
+    // The versions of all roots together must not fill their own disk either.
+    const std::size_t roots = std::max<std::size_t>(options_.roots.size(), 1);
+    return std::min(shareOfDisk(root), shareOfDisk(options_.folder) / roots);
 }
 
 // Removes what is too old, and the oldest versions until the others take no more than `most` bytes,

@@ -43,8 +43,8 @@ struct HistoryOptions {
 
     std::size_t versions = 20;  // of each document
 
-    /// The share of the root's file system, or of that of `folder` if it is smaller, that the
-    /// versions of all documents below the root may take.
+    /// The share of the root's file system that the versions of all documents below the root may
+    /// take, and of that of `folder` that those of all roots together may.
     double share = 0.1;
 };
 

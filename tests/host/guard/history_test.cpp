@@ -124,6 +124,27 @@ TEST_F(HistoryTest, TakesNoMoreThanTheShareOfItsOwnDiskIfThatIsSmaller) {
     ::umount2(folder.c_str(), MNT_DETACH);
 }
 
+TEST_F(HistoryTest, SharesItsOwnDiskOutToAllRoots) {
+    const fs::path folder = scratch_ / "versions";
+    fs::create_directory(folder);
+    if (::mount("tmpfs", folder.c_str(), "tmpfs", 0, "size=2000k,mode=700") != 0) {
+        GTEST_SKIP() << "this user may not mount a file system";
+    }
+    {
+        const test::TemporaryDirectory other;
+        History history({folder, {root_.path(), other.path()}});
+        for (int i = 0; i < 50; ++i) {
+            const std::string name = std::to_string(i);
+            history.keep(fileOf(std::string(10'000, 'x')), document(name));
+            history.keep(fileOf(std::string(10'000, 'x')), (other / name).string());
+        }
+        EXPECT_EQ(history.versionsOf(document("49")).size(), 1U);
+        EXPECT_EQ(history.versionsOf((other / "49").string()).size(), 1U);
+        EXPECT_LE(files().size(), 20U);
+    }
+    ::umount2(folder.c_str(), MNT_DETACH);
+}
+
 TEST_F(HistoryTest, CountsTheRoomThatSmallVersionsTake) {
     if (::mount("tmpfs", root_.path().c_str(), "tmpfs", 0, "size=1000k,mode=700") != 0) {
         GTEST_SKIP() << "this user may not mount a file system";
