@@ -4,6 +4,7 @@
 #include <fcntl.h>
 #include <spdlog/spdlog.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <chrono>
 #include <stdexcept>
@@ -21,6 +22,7 @@ namespace {
 using namespace std::chrono_literals;
 
 constexpr std::chrono::milliseconds pause{2};
+constexpr std::chrono::milliseconds stuckWait{100};  // longer than most saves take
 
 int setLock(int file, short type, std::size_t number) {
     struct flock lock {};
@@ -75,7 +77,8 @@ SaveLocks::Held SaveLocks::hold(const std::string& path) {
     Lock& lock = locks_.at(number);
     std::unique_lock held(lock.mutex);
     if (file_) {
-        lock.isStuck = !waitFor(file_.get(), number, lock.isStuck ? 0ms : longestWait_);
+        const auto longest = lock.isStuck ? std::min(longestWait_, stuckWait) : longestWait_;
+        lock.isStuck = !waitFor(file_.get(), number, longest);
         if (lock.isStuck) {
             throw std::runtime_error("is locked by the save of another worker");
         }

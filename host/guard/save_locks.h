@@ -44,8 +44,8 @@ public:
     };
 
     /// Waits for the lock of the document at `path`. Throws std::runtime_error when another process
-    /// holds it for too long. Then nobody waits for it again until it has been free: that process
-    /// has stopped, perhaps, and everybody's saves would wait with those of this document.
+    /// holds it for too long. Then nobody waits long for it until it could be had again: that
+    /// process has stopped, perhaps, and everybody's saves would wait with those of this document.
     Held hold(const std::string& path);
 
 private:
