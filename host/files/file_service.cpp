@@ -11,6 +11,7 @@
 #include <exception>
 #include <filesystem>
 #include <map>
+#include <mutex>
 #include <sstream>
 #include <stdexcept>
 #include <string>
@@ -162,7 +163,9 @@ private:
 
     json::Object restore() {
         const std::string file = path();
-        const bool existed = static_cast<bool>(openDocument(file));
+        const FileDescriptor current = openDocument(file);
+        const bool existed = static_cast<bool>(current);
+        client_.awaitMemory(existed ? sizeOf(current.get()) : 0);  // for a copy, if done in place
         guard_.saves->restore(file, earlierVersion().get());
         json::Object notification{{"filePath", file}, {"isExistingFile", existed}};
         client_.publish(platform::messaging::notificationChannel,
@@ -171,8 +174,11 @@ private:
     }
 
     // The bundle's answer to a read request for the version. The bundle's thread may not open the
-    // version in its folder, but it can open a copy in memory.
+    // version in its folder, but it can open a copy in memory. There is one copy at a time: what is
+    // reserved for it is given back when the bundle waits for memory of its own.
     std::string readVersion() {
+        static std::mutex oneAtATime;
+        const std::lock_guard lock(oneAtATime);
         const FileDescriptor version = earlierVersion();
         FileInMemory copy("earlier version");
         const std::size_t size = sizeOf(version.get());

@@ -97,6 +97,7 @@ protected:
         bundle_.emplace(
             [](const JsonMessage&) {},  // the file service's messages are wanted as well
             test::BundleOnBus<framework::BundleRunner>::Setup{
+                .bus = {.concurrentChannels = {platform::messaging::filesRequestChannel}},
                 .wrapClient =
                     [this](std::shared_ptr<platform::messaging::MessageService> client) {
                         return host::savingSafely(
@@ -288,6 +289,45 @@ TEST_F(FileServiceTest, AsksForTheMemoryThatCopiesOfFilesTake) {
     limits_.awaited = 0;
     ask("readVersion", root_ / "a.txt", {{"time", time}, {"contentType", "text/xml"}});
     EXPECT_EQ(limits_.awaited, 100'000U);  // It is no package, so that the bundle asks for none.
+}
+
+TEST_F(FileServiceTest, AsksForTheMemoryThatRestoringInPlaceTakes) {
+    writeFile(root_ / "a.txt", "one");
+    EXPECT_EQ(write(root_ / "a.txt", std::string(100'000, 'x')), "true");
+    const json::Value time = versionsOf(root_ / "a.txt").at(0).get<json::Object>()["time"];
+    fs::create_hard_link(root_ / "a.txt", root_ / "b.txt");
+    limits_.awaited = 0;
+    EXPECT_EQ(ask("restore", root_ / "a.txt", {{"time", time}}), json::parse(R"({"status":true})"));
+    EXPECT_EQ(readFile(root_ / "b.txt"), "one");
+    EXPECT_EQ(limits_.awaited, 100'000U);
+}
+
+TEST_F(FileServiceTest, HasOneCopyOfAnEarlierVersionAtATime) {
+    write(root_ / "a.txt", "one");
+    write(root_ / "a.txt", "two");
+    const json::Value time = versionsOf(root_ / "a.txt").at(0).get<json::Object>()["time"];
+    std::atomic<int> begun = 0;
+    std::atomic<int> copies = 0;
+    std::atomic<bool> hadSeveral = false;
+    *guard_.read = [&](const JsonMessage&) {
+        ++begun;
+        hadSeveral = hadSeveral || ++copies > 1;
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+        --copies;
+    };
+    const std::string request =
+        json::serialize(json::Value(json::Object{{"rtcId", "1"},
+                                                 {"operation", "readVersion"},
+                                                 {"filePath", (root_ / "a.txt").string()},
+                                                 {"contentType", "text/plain"},
+                                                 {"time", time}}));
+    for (int i = 0; i < 4; ++i) {
+        bundle_->send(platform::messaging::filesRequestChannel,
+                      platform::DataBuffer::copyOf(request));
+    }
+    bundle_->bus().waitUntilIdle();
+    EXPECT_EQ(begun, 4);
+    EXPECT_FALSE(hadSeveral);
 }
 
 TEST_F(FileServiceTest, ComputesNoVersionOfWhatIsTooLongForADocument) {
