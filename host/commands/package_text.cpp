@@ -9,7 +9,6 @@
 #include "json/parser.h"
 #include "json/serialize.h"
 #include "json/value.h"
-#include "platform/i18n/codecvt.h"
 #include "platform/text/ascii.h"
 
 namespace host {
@@ -33,10 +32,14 @@ std::string faultOf(json::Object& object) {
     return "it lacks the arrays \"parts\" and \"relationships\"";
 }
 
-// Whether writing changes `c` in the text of a part of an application/ type.
-bool isReplaced(char16_t c) {
-    const bool isControl = c < 0x20 || (c >= 0x7F && c < 0xA0);
-    return (isControl && c != '\t' && c != '\n' && c != '\r') || c == 0x200B || c >= 0xFFFE;
+// Whether `text`, valid UTF-8 from some byte on, begins with a character that writing changes in
+// the text of a part of an application/ type.
+bool beginsWithReplaced(std::string_view text) {
+    const auto first = static_cast<unsigned char>(text.front());
+    const bool isAsciiControl = first < 0x20 || first == 0x7F;
+    const bool isOtherControl = first == 0xC2 && static_cast<unsigned char>(text[1]) < 0xA0;
+    return (isAsciiControl && first != '\t' && first != '\n' && first != '\r') || isOtherControl ||
+           text.starts_with("\u200B") || text.starts_with("\uFFFE") || text.starts_with("\uFFFF");
 }
 
 // Whether `content` comes back byte for byte as that of a part of an application/ type. Binary
@@ -45,8 +48,12 @@ bool isPlainText(const std::string& content) {
     if (!simdjson::validate_utf8(content.data(), content.size())) {
         return false;
     }
-    const std::u16string text = platform::i18n::to_ustring(content);
-    return std::none_of(text.begin(), text.end(), isReplaced);
+    for (std::string_view rest = content; !rest.empty(); rest.remove_prefix(1)) {
+        if (beginsWithReplaced(rest)) {
+            return false;
+        }
+    }
+    return true;
 }
 
 // Why `package` cannot be written as it is, naming the part. Empty when it can.

@@ -36,6 +36,25 @@ TEST(FindPackage, TellsWhatIsWrong) {
                 HasSubstr("not a zip archive"));
 }
 
+TEST(FindPackage, RefusesPartsThatWritingWouldChange) {
+    const auto refusal = [](const std::string& content) {
+        return findPackage(
+                   R"({"parts":[{"partUri":"/a.xml","contentType":"application/xml","content":")" +
+                   content + R"("}],"relationships":[],"status":true})")
+            .refusal;
+    };
+    for (const std::string text : {"", "a\\t\\r\\nz", "~\u00A0\u00C2\u00E2\u00EF",
+                                   "\u200A\u200C\uFFFD", "\U0001F3FE\U0010FFFF"}) {
+        EXPECT_THAT(refusal(text), IsEmpty()) << text;
+        EXPECT_THAT(refusal("a" + text + "z"), IsEmpty()) << text;
+    }
+    for (const std::string text : {"\\u0000", "\\u001F", "\x7F", "\u0080", "\u009F", "\u200B",
+                                   "\uFFFE", "\uFFFF", "\xFF", "\xC2"}) {
+        EXPECT_THAT(refusal(text), HasSubstr("/a.xml")) << text;
+        EXPECT_THAT(refusal("a" + text + "z"), HasSubstr("/a.xml")) << text;
+    }
+}
+
 TEST(FindPackage, FindsNoneInThePartOfOne) {
     for (std::size_t length = 0; length < package.size(); ++length) {
         EXPECT_FALSE(findPackage(package.substr(0, length)).fault.empty()) << length;
