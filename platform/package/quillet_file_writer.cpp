@@ -109,7 +109,7 @@ RelationshipsById externalIn(zip::ReusableEntries& previous, std::string_view so
                 external.emplace(relationship.relationshipId, relationship);
             }
         }
-    } catch (const std::exception&) {
+    } catch (const std::runtime_error&) {
         external.clear();
     }
     return external;
