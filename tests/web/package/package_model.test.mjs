@@ -135,7 +135,7 @@ test("a draft of an earlier edition keeps what others have changed, and tells wh
     ["mine", "also theirs"],
   );
   assert.deepEqual(
-    findDifferences(restored, theirs).map(({ uri, changedBy }) => [uri, changedBy]),
+    findDifferences(restored, new PackageModel(theirs)).map(({ uri, changedBy }) => [uri, changedBy]),
     [["/a.xml", "both"]],
   );
 });
@@ -154,7 +154,7 @@ test("parts that differ are told, with who has changed them", () => {
     relationships: [],
   };
   assert.deepEqual(
-    findDifferences(model, theirs).map(({ uri, changedBy }) => [uri, changedBy]),
+    findDifferences(model, new PackageModel(theirs)).map(({ uri, changedBy }) => [uri, changedBy]),
     [
       ["/a", "mine"],
       ["/b", "both"],
@@ -163,27 +163,6 @@ test("parts that differ are told, with who has changed them", () => {
       ["/e", "theirs"],
     ],
   );
-});
-
-test("the parts of a workbook that differ are chosen together, unless there is one alone", () => {
-  const type = (name) => `application/vnd.openxmlformats-officedocument.spreadsheetml.${name}+xml`;
-  const parts = (main, ...contents) => [
-    part("/xl/workbook.xml", "0", main),
-    ...["worksheet", "sharedStrings"].map((name, index) => part(`/xl/${name}.xml`, contents[index], type(name))),
-    part("/xl/media/image1.png", contents[2], "image/png"),
-  ];
-  const joints = (changed, theirs, main = type("sheet.main")) => {
-    const model = new PackageModel({ parts: parts(main, "0", "0", "0"), relationships: [{ relationshipType: "t/officeDocument", target: "xl/workbook.xml" }] });
-    changed.forEach((name) => model.edit({ parts: new Map([[`/xl/${name}.xml`, { ...model.part(`/xl/${name}.xml`), content: "1" }]]) }));
-    return findDifferences(model, { parts: parts(main, ...theirs), relationships: [] }).map(({ uri, joint }) => [uri, joint]);
-  };
-  const [image, strings, sheet] = ["/xl/media/image1.png", "/xl/sharedStrings.xml", "/xl/worksheet.xml"];
-  assert.deepEqual(joints(["sharedStrings"], ["2", "2", "2"]), [[image, undefined], [strings, "both"], [sheet, "both"]]);
-  assert.deepEqual(joints(["sharedStrings"], ["2", "0", "0"]), [[strings, "both"], [sheet, "both"]]);
-  assert.deepEqual(joints([], ["2", "2", "0"]), [[strings, "theirs"], [sheet, "theirs"]]);
-  assert.deepEqual(joints(["sharedStrings", "worksheet"], ["0", "0", "2"]), [[image, undefined], [strings, "mine"], [sheet, "mine"]]);
-  assert.deepEqual(joints(["sharedStrings"], ["0", "2", "0"]), [[strings, undefined]]);
-  assert.deepEqual(joints(["sharedStrings"], ["2", "2", "0"], "text/xml"), [[strings, undefined], [sheet, undefined]]);
 });
 
 test("of what somebody else saved, what both have is not unsaved, and what was changed is", () => {
@@ -248,7 +227,7 @@ test("what was saved is what both have from then on", () => {
   assert.deepEqual(Object.keys(model.draft().parts), ["/b"]);
   const theirs = { parts: [part("/a", "2"), part("/b", "0")], relationships: [] };
   assert.deepEqual(
-    findDifferences(model, theirs).map(({ uri, changedBy }) => [uri, changedBy]),
+    findDifferences(model, new PackageModel(theirs)).map(({ uri, changedBy }) => [uri, changedBy]),
     [
       ["/a", "theirs"],
       ["/b", "mine"],

@@ -9,9 +9,10 @@ import type { Document, Part } from "../../client/src/index.js";
 import type { Comparison, Page } from "../document_view.js";
 import { element, mergeArrow } from "../ui/dom.js";
 import { bytesText } from "../ui/text.js";
-import { areSame, isSame, type Edit, type PackageModel } from "./package_model.js";
+import { areSame, isSame, type Edit, PackageModel } from "./package_model.js";
 import { byName, kindOf, partBytes, sizeOf, textOf } from "./part_kinds.js";
 import { decodePart, encodePart, type PartText } from "./part_text.js";
+import { partKey, partsByKey, reachable } from "./relationships.js";
 import { editorBasics, laidOut, lineEndOf } from "./xml_editor.js";
 import { copiedLayout, withoutLayout } from "./xml_formatting.js";
 
@@ -29,32 +30,62 @@ export interface Difference {
 }
 
 /**
- * The parts that differ. Those of a workbook are chosen together, since its cells have the numbers of their texts and
- * styles: with those of another edition they would show something else.
+ * The parts that differ. Those of a workbook are chosen together, since they refer to each other, its cells by the
+ * numbers of their texts and styles: with those of another edition they would show something else.
  */
-export function findDifferences(mine: PackageModel, theirs: Document): Difference[] {
-  const their = new Map(theirs.parts.map((part) => [part.partUri, part]));
-  const uris = new Set([...[...mine.parts].map(({ partUri }) => partUri), ...their.keys()]);
+export function findDifferences(mine: PackageModel, theirs: PackageModel): Difference[] {
+  const uris = new Set([...mine.parts, ...theirs.parts].map(({ partUri }) => partUri));
   const differences = [...uris].sort(byName).flatMap((uri): Difference[] => {
-    const [my, its, original] = [mine.part(uri), their.get(uri), mine.originalPart(uri)];
+    const [my, its, original] = [mine.part(uri), theirs.part(uri), mine.originalPart(uri)];
     if (isSame(my, its)) {
       return [];
     }
     const changedBy = isSame(its, original) ? "mine" : isSame(my, original) ? "theirs" : "both";
     return [{ uri, mine: my, theirs: its, changedBy }];
   });
-  const ofWorkbook = isWorkbookPart(mine.mainPart)
-    ? differences.filter(({ mine, theirs }) => isWorkbookPart(mine ?? theirs))
-    : [];
-  if (ofWorkbook.length > 1) {
-    const [first, ...others] = new Set(ofWorkbook.map(({ changedBy }) => changedBy));
-    ofWorkbook.forEach((one) => (one.joint = others.length > 0 ? "both" : first!));
+  const workbook = workbookParts(mine, theirs);
+  const ofWorkbook = differences.filter(({ uri }) => workbook.has(uri));
+  const [first, ...others] = new Set(ofWorkbook.map(({ changedBy }) => changedBy));
+  const isRemnant = mine.mainPart === undefined;
+  // What is left of mine alone fits theirs where that has all of it as it was before.
+  if (isRemnant ? [first, ...others].includes("both") : ofWorkbook.length > 1) {
+    const joint = isRemnant ? "theirs" : others.length > 0 ? "both" : first!;
+    ofWorkbook.forEach((one) => (one.joint = joint));
   }
   return differences;
 }
 
-function isWorkbookPart(part: Part | undefined): boolean {
-  return part !== undefined && /spreadsheetml|ms-excel/i.test(part.contentType);
+/** The names of the parts that a workbook is made of in any of its editions; none where it is no workbook. */
+export function workbookParts(...editions: PackageModel[]): Set<string> {
+  const isWorkbook = editions.some(({ mainPart }) => /spreadsheetml|ms-excel/i.test(mainPart?.contentType ?? ""));
+  const partsOf = ({ parts, mainPart }: PackageModel) =>
+    isWorkbook && mainPart
+      ? [mainPart, ...reachable(partsByKey(parts), mainPart.partUri, mainPart.relationship)]
+      : [];
+  return new Set(editions.flatMap(partsOf).map(({ partUri }) => partUri));
+}
+
+/**
+ * What was chosen of all differences, made whole: a part stays as long as something in the outcome refers to it, and
+ * one that they have added is not added where nothing does.
+ */
+export function madeWhole(mine: PackageModel, theirs: PackageModel, chosen: Required<Pick<Edit, "parts" | "relationships">>): Edit {
+  const parts = new Map(chosen.parts);
+  const kept = [...mine.parts].filter(({ partUri }) => !parts.has(partUri));
+  const outcome = partsByKey([...kept, ...[...parts.values()].filter((part) => part !== null)]);
+  const all = new Map([...partsByKey(theirs.parts), ...partsByKey(mine.parts), ...outcome]);
+  const needed = reachable(all, "/", chosen.relationships);
+  for (const part of needed) {
+    if (!outcome.has(partKey(part.partUri))) {
+      parts.set(part.partUri, part);
+    }
+  }
+  for (const part of reachable(partsByKey(theirs.parts), "/", theirs.relationships)) {
+    if (parts.get(part.partUri) === part && !mine.part(part.partUri) && !needed.has(part)) {
+      parts.set(part.partUri, null);
+    }
+  }
+  return { ...chosen, parts };
 }
 
 /** Shows the differences; `use` gets what is chosen of all of them, and the parts that only they have changed. */
@@ -62,17 +93,19 @@ export class PackageComparison implements Comparison {
   readonly element = element("div", { className: "package-comparison" });
 
   #rows: ComparedPart[];
+  #theirs: PackageModel;
   #relationshipsBy: Side;
   #detail = element("div", { className: "package-difference" });
 
   constructor(
     private mine: PackageModel,
-    private theirs: Document,
+    theirs: Document,
     private page: Page,
     private use: (chosen: Edit, adopted: string[]) => void,
   ) {
+    this.#theirs = new PackageModel(theirs);
     this.#relationshipsBy = mine.areRelationshipsChanged ? "mine" : "theirs";
-    this.#rows = findDifferences(mine, theirs).map(
+    this.#rows = findDifferences(mine, this.#theirs).map(
       (difference) => new ComparedPart(difference, page, (row) => this.#show(row)),
     );
     const list = element(
@@ -99,9 +132,10 @@ export class PackageComparison implements Comparison {
 
   apply(): void {
     const parts = new Map(this.#rows.map((row) => [row.uri, row.result ?? null]));
-    const { relationships } = this.#relationshipsBy === "theirs" ? this.theirs : this.mine;
-    const adopted = this.#rows.filter(({ isAdopted }) => isAdopted).map(({ uri }) => uri);
-    this.use({ parts, relationships: [...relationships] }, adopted);
+    const { relationships } = this.#relationshipsBy === "theirs" ? this.#theirs : this.mine;
+    const outcome = madeWhole(this.mine, this.#theirs, { parts, relationships: [...relationships] });
+    const adopted = this.#rows.filter((row) => row.isAdopted && outcome.parts!.get(row.uri) === (row.result ?? null));
+    this.use(outcome, adopted.map(({ uri }) => uri));
   }
 
   close(): void {

@@ -107,7 +107,7 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.differences.absent": "There is no such part.",
     "package.differences.relationships": "Relationships of the package",
     "package.differences.joint":
-      "The sheets, texts and styles of a workbook refer to each other by number, so all that differ are taken from the same version.",
+      "The parts of a workbook refer to each other, its cells by number, so all that differ are taken from the same version.",
     "package.differences.hint": "Mine can be edited here; the arrows bring changes over from the other version.",
   },
   de: {
@@ -216,7 +216,7 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.differences.absent": "Es gibt diesen Teil nicht.",
     "package.differences.relationships": "Beziehungen des Pakets",
     "package.differences.joint":
-      "Tabellen, Texte und Formate einer Arbeitsmappe verweisen mit Nummern aufeinander; alle, die sich unterscheiden, kommen deshalb aus derselben Fassung.",
+      "Die Teile einer Arbeitsmappe verweisen aufeinander, ihre Zellen mit Nummern; alle, die sich unterscheiden, kommen deshalb aus derselben Fassung.",
     "package.differences.hint":
       "Meine Fassung kann hier bearbeitet werden; die Pfeile holen Änderungen aus der anderen herüber.",
   },
