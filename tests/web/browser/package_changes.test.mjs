@@ -6,7 +6,7 @@ import { unlinkSync } from "node:fs";
 import { waitFor } from "../../serve/processes.mjs";
 import { clientOf } from "./client.mjs";
 import { browserTest } from "./harness.mjs";
-import { archive, png, relationships, textIn, unpack, wordFiles, workbookFiles } from "./office_files.mjs";
+import { archive, png, relationships, textIn, unpack, wordFiles, wordPicture, workbookFiles } from "./office_files.mjs";
 import { assertSameBut, open, save, tab } from "./package_page.mjs";
 
 const NAME = "report.docx";
@@ -118,6 +118,46 @@ browserTest("two editions of a document are compared part by part, and put toget
   assert.match(textIn(saved, "word/header1.xml"), /Budget/);
   assert.match(textIn(saved, "docProps/core.xml"), /Their title/);
   assert.ok(Buffer.from(unpack(saved)["word/media/image1.png"]).equals(png(40, 10, [0, 0, 200])));
+});
+
+browserTest("a picture that is taken over from the other version comes with it", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const { page } = session;
+  await page.setViewportSize({ width: 1280, height: 3000 }); // in which all arrows are seen
+  await replace(page, "Annual report", "Budget");
+  const files = wordFiles(wordPicture("rId5"), { "word/media/image2.png": png(40, 10, [0, 0, 200]) });
+  files["word/_rels/document.xml.rels"] = files["word/_rels/document.xml.rels"].replace(/(<Relationship Id="rId1"[^>]*)\/>/, (one) => one + one.replace("rId1", "rId5").replace("image1", "image2"));
+  session.write(NAME, archive(files));
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  await dialog(page).getByRole("button", { name: "/word/document.xml" }).click();
+  const arrows = dialog(page).getByRole("button", { name: "Take this change over from the other version" });
+  await arrows.nth(1).waitFor();
+  const heights = await Promise.all((await arrows.all()).map(async (arrow) => (await arrow.boundingBox()).y));
+  await arrows.nth(heights.indexOf(Math.max(...heights))).click();
+  await dialog(page).getByRole("button", { name: "Save put together" }).click();
+  await isSaved(page);
+  const saved = session.read(NAME);
+  assert.match(textIn(saved, "word/document.xml"), /The Budget<.*"rId5"/);
+  assert.match(textIn(saved, "word/_rels/document.xml.rels"), /<Relationship [^>]*(Id="rId5"[^>]*image2\.png|image2\.png[^>]*Id="rId5")/);
+  assert.ok(Buffer.from(unpack(saved)["word/media/image2.png"]).equals(png(40, 10, [0, 0, 200])));
+});
+
+browserTest("a picture that somebody else has removed stays with the text of mine that shows it", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const { page } = session;
+  const before = session.read(NAME);
+  await replace(page, "Annual report", "Budget");
+  const files = wordFiles();
+  delete files["word/media/image1.png"];
+  files["word/document.xml"] = files["word/document.xml"].replace(wordPicture("rId1"), "");
+  files["word/_rels/document.xml.rels"] = files["word/_rels/document.xml.rels"].replace(/<Relationship Id="rId1"[^>]*>/, "");
+  session.write(NAME, archive(files));
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Compare" }).click();
+  await dialog(page).getByRole("button", { name: "Save put together" }).click();
+  await isSaved(page);
+  assertSameBut(["word/document.xml", "word/header1.xml"], before, session.read(NAME));
 });
 
 browserTest("undo after two editions were put together takes back what was changed here, and nothing else", async (t) => {

@@ -5,7 +5,9 @@ import { test } from "node:test";
 
 import { room } from "../room.mjs";
 
-const { PackageModel, findDifferences, madeWhole } = await room("package/comparison.ts", "package/package_model.ts");
+const { PackageModel, findDifferences, fittingText, madeWhole } = await room(
+  ...["package/comparison.ts", "package/package_model.ts", "package/relationships.ts"],
+);
 
 const WORKBOOK = "application/vnd.openxmlformats-officedocument.spreadsheetml.sheet.main+xml";
 
@@ -106,4 +108,69 @@ test("a part that somebody else has added is added where something kept refers t
   assert.deepEqual(putTogether(mine(), theirs), { "/xl/workbook.xml": "1" });
   const choices = { "/xl/workbook.xml": "theirs", "/xl/a.png": "mine" };
   assert.deepEqual(putTogether(mine(), theirs, choices), { "/xl/workbook.xml": "2", "/xl/a.png": "2" });
+});
+
+// A main part with references to what its relationships lead to.
+const HEAD = '<d xmlns:q="http://example.org/relationships">';
+const paragraph = (id) => `<p q:embed="${id}" w:val="${id}"/>`;
+const written = (ids, list, ...parts) => edition(part("/xl/workbook.xml", `${HEAD}${ids.map(paragraph).join("")}</d>`, ...list), ...parts);
+
+// What becomes of mine when all of their paragraphs are taken over after mine.
+function takenOver(before, now, theirs) {
+  const mine = changed(before, now);
+  const their = new PackageModel(theirs);
+  const uri = "/xl/workbook.xml";
+  const fitting = fittingText(uri, their.part(uri).content, mine, their);
+  const content = mine.part(uri).content.replace("</d>", "") + fitting.text.slice(HEAD.length);
+  const together = { ...mine.part(uri), content, relationship: fitting.relationshipsOf(content) };
+  const parts = new Map(findDifferences(mine, their).map(({ uri, changedBy, ...sides }) => [uri, sides[changedBy === "theirs" ? "theirs" : "mine"] ?? null]));
+  mine.choose(madeWhole(mine, their, { parts: parts.set(uri, together), relationships: theirs.relationships }, fitting.copies));
+  // By what they are in the text, and by what they lead to.
+  const leadTo = new Map(mine.part(uri).relationship.map(({ relationshipId, target }) => [relationshipId, target]));
+  const contents = named(mine.document().parts);
+  const shown = [...mine.part(uri).content.matchAll(/embed="(.*?)"/g)].map(([, id]) => leadTo.get(id)).map((target) => contents[`/xl/${target}`] ?? contents[target] ?? target);
+  return { shown, model: mine, text: fitting.text };
+}
+
+test("what is taken over from the other version refers to what it referred to there", () => {
+  const before = written([], []);
+  const mine = written(["rId1"], ["rId1 t/image a.png", "rId2 t/image c.png"], part("/xl/a.png", "mine"), part("/xl/c.png", "also mine"));
+  const theirs = written(
+    ["rId1", "rId2", "rId9"],
+    ["rId1 t/link https://example.org/", "rId2 t/image b.png", "rId9 t/image b.png"],
+    part("/xl/b.png", "theirs"),
+  );
+  const { shown, model } = takenOver(before, mine, theirs);
+  assert.deepEqual(shown, ["mine", "https://example.org/", "theirs", "theirs"]);
+  assert.equal(model.part("/xl/workbook.xml").relationship.length, 5);
+  assert.match(model.part("/xl/workbook.xml").content, /w:val="rId2"/); // which only looks like one
+});
+
+test("what leads to the same in both has one id, and what is not taken over is not referred to", () => {
+  const before = written(["rId1"], ["rId1 t/image a.png"], part("/xl/a.png", "0"));
+  const theirs = written(["rId7", "rId2"], ["rId7 t/image /xl/a.png", "rId2 t/image b.png"], part("/xl/a.png", "0"), part("/xl/b.png", "2"));
+  const mine = new PackageModel(before);
+  const their = new PackageModel(theirs);
+  const fitting = fittingText("/xl/workbook.xml", their.part("/xl/workbook.xml").content, mine, their);
+  assert.equal(fitting.text, `${HEAD}${paragraph("rId1").replace('w:val="rId1"', 'w:val="rId7"')}${paragraph("rId2")}</d>`);
+  assert.deepEqual(fitting.relationshipsOf(mine.part("/xl/workbook.xml").content), mine.part("/xl/workbook.xml").relationship);
+});
+
+test("a part that both have added by one name, with what it leads to, comes over by another name", () => {
+  const drawn = (who) =>
+    written(["rId1"], ["rId1 t/chart chart1.xml"], part("/xl/chart1.xml", `chart of ${who}`, "rId1 t/data data1.bin", "rId2 t/back workbook.xml"), part("/xl/data1.bin", `data of ${who}`));
+  const { shown, model } = takenOver(written([], []), drawn("me"), drawn("them"));
+  assert.deepEqual(shown, ["chart of me", "chart of them"]);
+  const copy = [...model.parts].find(({ content }) => content === "chart of them");
+  assert.equal(model.part(copy.relationship[0].target).content, "data of them");
+});
+
+test("what the whole text refers to without an id comes over where mine has none of its kind", () => {
+  const theirs = written([], ["rId1 t/comments comments.xml", "rId2 t/styles styles2.xml"], part("/xl/comments.xml", "theirs"), part("/xl/styles2.xml", "theirs"));
+  const mine = written([], ["rId1 t/styles styles.xml"], part("/xl/styles.xml", "mine"));
+  const { model } = takenOver(mine, mine, theirs);
+  const targets = model.part("/xl/workbook.xml").relationship.map(({ relationshipId, target }) => `${relationshipId} ${target}`);
+  assert.deepEqual(targets, ["rId1 styles.xml", "rId3 comments.xml"]);
+  assert.equal(model.part("/xl/comments.xml").content, "theirs");
+  assert.equal(model.part("/xl/styles2.xml"), undefined);
 });

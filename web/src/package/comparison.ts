@@ -12,7 +12,7 @@ import { bytesText } from "../ui/text.js";
 import { areSame, isSame, type Edit, PackageModel } from "./package_model.js";
 import { byName, kindOf, partBytes, sizeOf, textOf } from "./part_kinds.js";
 import { decodePart, encodePart, type PartText } from "./part_text.js";
-import { partKey, partsByKey, reachable } from "./relationships.js";
+import { type FittingText, fittingText, partKey, partsByKey, reachable } from "./relationships.js";
 import { editorBasics, laidOut, lineEndOf } from "./xml_editor.js";
 import { copiedLayout, withoutLayout } from "./xml_formatting.js";
 
@@ -67,13 +67,18 @@ export function workbookParts(...editions: PackageModel[]): Set<string> {
 
 /**
  * What was chosen of all differences, made whole: a part stays as long as something in the outcome refers to it, and
- * one that they have added is not added where nothing does.
+ * one that they have added is not added where nothing does. `copies` are further parts that may be referred to.
  */
-export function madeWhole(mine: PackageModel, theirs: PackageModel, chosen: Required<Pick<Edit, "parts" | "relationships">>): Edit {
+export function madeWhole(
+  mine: PackageModel,
+  theirs: PackageModel,
+  chosen: Required<Pick<Edit, "parts" | "relationships">>,
+  copies: Part[] = [],
+): Edit {
   const parts = new Map(chosen.parts);
   const kept = [...mine.parts].filter(({ partUri }) => !parts.has(partUri));
   const outcome = partsByKey([...kept, ...[...parts.values()].filter((part) => part !== null)]);
-  const all = new Map([...partsByKey(theirs.parts), ...partsByKey(mine.parts), ...outcome]);
+  const all = new Map([...partsByKey([...copies, ...theirs.parts, ...mine.parts]), ...outcome]);
   const needed = reachable(all, "/", chosen.relationships);
   for (const part of needed) {
     if (!outcome.has(partKey(part.partUri))) {
@@ -106,7 +111,7 @@ export class PackageComparison implements Comparison {
     this.#theirs = new PackageModel(theirs);
     this.#relationshipsBy = mine.areRelationshipsChanged ? "mine" : "theirs";
     this.#rows = findDifferences(mine, this.#theirs).map(
-      (difference) => new ComparedPart(difference, page, (row) => this.#show(row)),
+      (difference) => new ComparedPart(difference, [mine, this.#theirs], page, (row) => this.#show(row)),
     );
     const list = element(
       "ul",
@@ -133,7 +138,8 @@ export class PackageComparison implements Comparison {
   apply(): void {
     const parts = new Map(this.#rows.map((row) => [row.uri, row.result ?? null]));
     const { relationships } = this.#relationshipsBy === "theirs" ? this.#theirs : this.mine;
-    const outcome = madeWhole(this.mine, this.#theirs, { parts, relationships: [...relationships] });
+    const copies = this.#rows.flatMap((row) => row.copies);
+    const outcome = madeWhole(this.mine, this.#theirs, { parts, relationships: [...relationships] }, copies);
     const adopted = this.#rows.filter((row) => row.isAdopted && outcome.parts!.get(row.uri) === (row.result ?? null));
     this.use(outcome, adopted.map(({ uri }) => uri));
   }
@@ -168,10 +174,11 @@ class ComparedPart {
 
   #choice: HTMLSelectElement;
   #detail: HTMLElement | undefined;
-  #merge: { view: MergeView; decoded: PartText; part: Part } | undefined;
+  #merge: { view: MergeView; decoded: PartText; part: Part; fitting: FittingText } | undefined;
 
   constructor(
     private difference: Difference,
+    private editions: [PackageModel, PackageModel],
     private page: Page,
     select: (row: ComparedPart) => void,
   ) {
@@ -213,10 +220,16 @@ class ComparedPart {
   get result(): Part | undefined {
     const { mine, theirs } = this.difference;
     if (this.#choice.value === "together" && this.#merge) {
-      const { view, decoded, part } = this.#merge;
-      return { ...part, content: encodePart({ ...decoded, text: withoutLayout(view.b.state) }) };
+      const { view, decoded, part, fitting } = this.#merge;
+      const text = withoutLayout(view.b.state);
+      return { ...part, relationship: fitting.relationshipsOf(text), content: encodePart({ ...decoded, text }) };
     }
     return this.#choice.value === "theirs" ? theirs : mine;
+  }
+
+  /** What may be referred to by what was put together, by names that no part has. */
+  get copies(): Part[] {
+    return this.#merge?.fitting.copies ?? [];
   }
 
   /** Both editions of it, made when it is first looked at. */
@@ -248,7 +261,8 @@ class ComparedPart {
       const labelled = EditorView.contentAttributes.of({ "aria-label": label });
       return { doc, extensions: [editorBasics(isXml, doc.length), extension, labelled] };
     };
-    const a = side(its.text, this.page.text("package.theirs"));
+    const fitting = fittingText(this.uri, its.text, ...this.editions);
+    const a = side(fitting.text, this.page.text("package.theirs"));
     const b = side(my.text, this.page.text("package.mine"));
     b.extensions.push(
       history(),
@@ -280,7 +294,7 @@ class ComparedPart {
       renderRevertControl: () => mergeArrow(this.page.text("comparison.take")),
       collapseUnchanged: { margin: 3, minSize: 6 },
     });
-    this.#merge = { view, decoded: my, part: mine };
+    this.#merge = { view, decoded: my, part: mine, fitting };
     const titles = element("div", { className: "package-sides" });
     titles.append(
       element("h3", {}, this.page.text("package.theirs")),
