@@ -34,9 +34,15 @@ interface Content {
   original?: Blob | string | undefined;
 }
 
+/** An original that is stored, or is being stored. */
+interface Stored {
+  id: string;
+  original: Blob;
+  stored: Promise<unknown>;
+}
+
 export class Drafts {
-  // By path. A failure is told with every draft that needs it.
-  #originals = new Map<string, { id: string; original: Blob; stored: Promise<unknown> }>();
+  #originals = new Map<string, Stored>(); // by path
 
   /** Where the browser stores nothing, as when the disk is full, all that is asked of the drafts rejects. */
   static async open(window: WindowId): Promise<Drafts> {
@@ -52,16 +58,16 @@ export class Drafts {
 
   async put(draft: Omit<Draft, "window">): Promise<void> {
     const { content, sent } = draft as { content: Content; sent?: Content };
-    const id = this.#idOf(draft.path, content?.original);
-    const apart = (one: Content) => (id && one.original === content.original ? { ...one, original: id } : one);
+    const known = this.#store(draft.path, content?.original);
+    const apart = (one: Content) => (known && one.original === content.original ? { ...one, original: known.id } : one);
     const stored = { ...draft, content: content && apart(content), ...(sent && { sent: apart(sent) }) };
     // Asked for at once, also while the original is being stored: the page may be about to go.
     const put = this.drafts.ask("readwrite", (store) => store.put({ ...stored, window: this.window.id }));
-    await Promise.all([put, this.#originals.get(draft.path)?.stored]);
+    await Promise.all([put, known?.stored]);
   }
 
   async remove(path: string): Promise<void> {
-    this.#idOf(path, undefined);
+    this.#store(path, undefined);
     await this.drafts.ask("readwrite", (store) => store.delete([this.window.id, path]));
   }
 
@@ -110,11 +116,11 @@ export class Drafts {
     }
   }
 
-  // The id by which `original` is stored, or is being stored, for the draft at `path`. Another one is removed.
-  #idOf(path: string, original: Blob | string | undefined): string | undefined {
+  // Stores `original` for the draft at `path`, unless it is stored, or being stored, already. Another one is removed.
+  #store(path: string, original: Blob | string | undefined): Stored | undefined {
     const known = this.#originals.get(path);
     if (known?.original === original) {
-      return known?.id;
+      return known;
     }
     if (known) {
       this.#originals.delete(path);
@@ -125,9 +131,14 @@ export class Drafts {
     }
     const id = newId();
     const stored = this.originals.ask("readwrite", (store) => store.put({ id, window: this.window.id, original }));
-    stored.catch(() => {}); // it is looked at with the draft
-    this.#originals.set(path, { id, original, stored });
-    return id;
+    const made = { id, original, stored };
+    this.#originals.set(path, made);
+    stored.catch(() => {
+      if (this.#originals.get(path) === made) {
+        this.#originals.delete(path); // so that the next draft tries again
+      }
+    });
+    return made;
   }
 
   // One that remains is removed when the drafts are taken.
