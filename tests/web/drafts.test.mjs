@@ -46,6 +46,62 @@ test("a draft, with what it was made from, is there in the next window", async (
   assert.deepEqual(browser.held, { drafts: [], originals: [] });
 });
 
+test("drafts are shown also where they cannot be stored for this window, and stay where they are", async () => {
+  const browser = new Browser();
+  await (await browser.open("gone")).put(draft("a", "theirs"));
+  await (await browser.open("own")).put(draft("b", "mine"));
+  browser.close("gone");
+  const before = browser.held;
+  for (const store of ["drafts", "originals"]) {
+    browser.store.fails = (name, question) => (question === "put" && name === store ? FULL : undefined);
+    const drafts = await browser.open("own");
+    assert.deepEqual((await shown(await drafts.take())).sort(), ["a: theirs in original of a", "b: mine in original of b"]);
+    assert.deepEqual(browser.held, before);
+  }
+});
+
+test("a draft that could not be stored for this window is gone with its save, and with its next draft", async () => {
+  for (const end of [(drafts) => drafts.remove("a"), (drafts) => drafts.put(draft("a", "more"))]) {
+    const browser = new Browser();
+    await (await browser.open("gone")).put(draft("a", "theirs"));
+    browser.close("gone");
+    browser.store.fails = (_, question) => (question === "put" ? FULL : undefined);
+    const drafts = await browser.open("own");
+    await drafts.take();
+    browser.store.fails = () => undefined;
+    await end(drafts);
+    assert.equal(browser.held.drafts.includes("gone a"), false);
+    assert.equal(browser.held.originals.length, browser.held.drafts.length);
+  }
+});
+
+test("where the drafts cannot be read, none is removed or replaced", async () => {
+  for (const store of ["drafts", "originals"]) {
+    const browser = new Browser();
+    await (await browser.open("own")).put(draft("a", "mine"));
+    browser.store.fails = (name, question) => (question === "getAll" && name === store ? FULL : undefined);
+    const drafts = await browser.open("own");
+    await assert.rejects(drafts.take(), FULL);
+    await assert.rejects(drafts.remove("a"), FULL);
+    await assert.rejects(drafts.put(draft("a", "other")), FULL);
+    browser.store.fails = () => undefined;
+    assert.deepEqual(await shown(await (await browser.open("own")).take()), ["a: mine in original of a"]);
+  }
+});
+
+test("a window that takes a draft has what it was made from for itself", async () => {
+  const browser = new Browser();
+  const slow = await browser.open("slow");
+  await slow.put(draft("a", "mine"));
+  browser.close("slow"); // as it seems, while it waits
+  const [, own] = await Promise.all([(await browser.open("quick")).take(), slow.take()]);
+  assert.deepEqual(await shown(own), ["a: mine in original of a"]);
+  await slow.put({ ...own[0], content: { ...own[0].content, typed: "more" } });
+  await slow.remove("a");
+  browser.close("quick");
+  assert.deepEqual(await shown(await (await browser.open("next")).take()), ["a: mine in original of a"]);
+});
+
 test("what a draft was made from is stored with the next draft where it could not be stored before", async () => {
   const browser = new Browser();
   const drafts = await browser.open("own");

@@ -3,11 +3,11 @@
 import { ConnectionFailure, type ConnectionState, openConnection } from "./connection/connection.js";
 import { loginForm } from "./connection/login.js";
 import { type Settings, completeSettings, fragmentOf, readFragment, remember } from "./connection/settings.js";
-import { Drafts, ownWindow } from "./save/drafts.js";
+import { type Draft, Drafts, ownWindow } from "./save/drafts.js";
 import { lastingStore, sessionStore } from "./storage.js";
 import { element } from "./ui/dom.js";
 import { Messages } from "./ui/messages.js";
-import { preferredLanguage, text, useLanguage } from "./ui/text.js";
+import { preferredLanguage, reasonText, text, useLanguage } from "./ui/text.js";
 import { chosenTheme, useTheme } from "./ui/theme.js";
 import { Workspace } from "./ui/workspace.js";
 // Here, since nothing would load the style sheets of chunks.
@@ -28,6 +28,7 @@ document.body.append(stage, messages.element);
 document.title = text("page.title");
 let workspace: Workspace | undefined;
 let connected: Settings | undefined;
+const ownId = ownWindow(); // before it is connected, so that no other window takes its drafts meanwhile
 let attempts = 0; // to connect; nothing is heard any more of those before the last one
 
 // Does what the address says: connects, or shows a document.
@@ -63,9 +64,9 @@ async function start(settings: Settings, file?: string): Promise<void> {
         workspace.open(file);
       }
     } else {
-      const drafts = await Drafts.open(await ownWindow());
+      const drafts = await Drafts.open(await ownId);
       workspace = new Workspace({ client, settings, drafts, messages });
-      workspace.restore(await drafts.take().catch(() => []), file); // told when there is one to be stored
+      workspace.restore(await drafts.take().catch(untaken), file);
     }
     stage.replaceChildren(workspace.element);
   } catch (error) {
@@ -74,6 +75,11 @@ async function start(settings: Settings, file?: string): Promise<void> {
     }
     askToConnect(settings, text(`connection.${error.state}`, { server: settings.server }), file);
   }
+}
+
+function untaken(reason: unknown): Draft[] {
+  messages.tell(text("drafts.failed", { reason: reasonText(reason) }), "problem");
+  return [];
 }
 
 function connectionChanged(state: ConnectionState, settings: Settings): void {

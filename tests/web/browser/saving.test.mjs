@@ -414,6 +414,31 @@ browserTest("a browser whose storage is blocked opens and saves documents all th
   assert.equal(session.read("a.txt").toString(), "zero one\n");
 });
 
+browserTest("unsaved changes that the browser cannot read are told of, and stay", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  await session.context.addInitScript(() => {
+    const { getAll } = IDBObjectStore.prototype;
+    IDBObjectStore.prototype.getAll = function () {
+      if (sessionStorage.getItem("fails")) {
+        throw new DOMException("internal error", "UnknownError");
+      }
+      return getAll.call(this);
+    };
+  });
+  const page = await session.newPage();
+  await open(page, "a.txt");
+  await type(page, "mine ");
+  await session.waitForDraft(page, "mine ");
+  await page.evaluate(() => sessionStorage.setItem("fails", "yes"));
+  await page.reload();
+  await page.getByText(/was unsaved before cannot be read from this browser \(internal error\)/).waitFor();
+  await page.waitForFunction(() => document.querySelector(".cm-content")?.textContent.startsWith("one"));
+  await page.evaluate(() => sessionStorage.removeItem("fails"));
+  await page.reload();
+  await page.getByText(/have been restored/).waitFor();
+  assert.match(await shownText(page), /^mine one/);
+});
+
 browserTest("a file that is written all the time is shown, as it was a moment ago", async (t) => {
   const session = await Session.start(t, { "a.log": "one\n" });
   const { page } = session;

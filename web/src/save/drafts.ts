@@ -43,6 +43,9 @@ interface Stored {
 
 export class Drafts {
   #originals = new Map<string, Stored>(); // by path
+  // Drafts of windows that are gone, by path, until this one has stored them, or does not need them any more.
+  #left = new Map<string, { window: string; original: unknown }>();
+  #failure: unknown; // why the drafts could not be taken, so that none may be replaced or removed
 
   /** Where the browser stores nothing, as when the disk is full, all that is asked of the drafts rejects. */
   static async open(window: WindowId): Promise<Drafts> {
@@ -57,6 +60,7 @@ export class Drafts {
   ) {}
 
   async put(draft: Omit<Draft, "window">): Promise<void> {
+    this.#requireTaken();
     const { content, sent } = draft as { content: Content; sent?: Content };
     const known = this.#store(draft.path, content?.original);
     const apart = (one: Content) => (known && one.original === content.original ? { ...one, original: known.id } : one);
@@ -64,15 +68,28 @@ export class Drafts {
     // Asked for at once, also while the original is being stored: the page may be about to go.
     const put = this.drafts.ask("readwrite", (store) => store.put({ ...stored, window: this.window.id }));
     await Promise.all([put, known?.stored]);
+    await this.#letGo(draft.path);
   }
 
   async remove(path: string): Promise<void> {
-    this.#store(path, undefined);
-    await this.drafts.ask("readwrite", (store) => store.delete([this.window.id, path]));
+    this.#requireTaken();
+    await Promise.all([this.#removeOwn(path), this.#letGo(path)]);
   }
 
-  /** This window's drafts, and those of windows that are gone, which become this one's. */
+  /**
+   * This window's drafts, and those of windows that are gone, which become this one's. Those that cannot be stored for
+   * it stay where they are. Where this rejects, so does all that is asked later.
+   */
   async take(): Promise<Draft[]> {
+    try {
+      return await this.#take();
+    } catch (reason) {
+      this.#failure = reason;
+      throw reason;
+    }
+  }
+
+  async #take(): Promise<Draft[]> {
     const all = (await this.drafts.ask("readonly", (store) => store.getAll())) as Draft[];
     const taken = new Map<string, Draft>();
     for (const draft of all) {
@@ -82,16 +99,44 @@ export class Drafts {
       }
     }
     await this.#takeOriginals(all, taken);
-    for (const draft of [...taken.values()].filter(({ window }) => window !== this.window.id)) {
-      await this.put(draft);
-      await this.drafts.ask("readwrite", (store) => store.delete([draft.window, draft.path]));
+    for (const draft of taken.values()) {
+      if (this.#left.has(draft.path)) {
+        // Half of it stored would hide the whole of it.
+        await this.put(draft).catch(() => this.#removeOwn(draft.path).catch(() => {}));
+      }
     }
     return [...taken.values()];
   }
 
+  #requireTaken(): void {
+    if (this.#failure !== undefined) {
+      throw this.#failure;
+    }
+  }
+
+  async #removeOwn(path: string): Promise<void> {
+    this.#store(path, undefined);
+    await this.#delete(this.window.id, path);
+  }
+
+  async #letGo(path: string): Promise<void> {
+    const left = this.#left.get(path);
+    if (left) {
+      await this.#delete(left.window, path);
+      this.#left.delete(path);
+      if (typeof left.original === "string") {
+        this.#removeOriginal(left.original);
+      }
+    }
+  }
+
+  async #delete(window: string, path: string): Promise<void> {
+    await this.drafts.ask("readwrite", (store) => store.delete([window, path]));
+  }
+
   // Puts the Blobs of `taken` in the places of their ids, and removes those that are left of windows that are gone.
   async #takeOriginals(all: Draft[], taken: Map<string, Draft>): Promise<void> {
-    const stored = (await this.originals.ask("readonly", (store) => store.getAll()).catch(() => [])) as Original[];
+    const stored = (await this.originals.ask("readonly", (store) => store.getAll())) as Original[];
     const originals = new Map(stored.map((one) => [one.id, one]));
     const idOf = ({ content }: Draft) => (content as Content | undefined)?.original;
     for (const { id, window } of stored) {
@@ -102,6 +147,10 @@ export class Drafts {
     }
     for (const draft of taken.values()) {
       const id = idOf(draft);
+      const isOwn = draft.window === this.window.id;
+      if (!isOwn) {
+        this.#left.set(draft.path, { window: draft.window, original: id });
+      }
       if (typeof id === "string") {
         const original = originals.get(id)?.original;
         for (const one of [draft.content, draft.sent] as (Content | undefined)[]) {
@@ -109,7 +158,7 @@ export class Drafts {
             one.original = original;
           }
         }
-        if (original) {
+        if (original && isOwn) {
           this.#originals.set(draft.path, { id, original, stored: Promise.resolve() });
         }
       }

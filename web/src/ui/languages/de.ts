@@ -79,6 +79,7 @@ export const de: Record<string, string> = {
   "save.failed.name": "{name} wurde nicht gespeichert; Ihr Text bleibt erhalten.",
   "save.refused": "Vielleicht ist der Datenträger voll, die Datei oder ihr Ordner schreibgeschützt oder der Ordner verschwunden; oder der Text enthält Zeichen, die der Zeichensatz nicht kennt.",
   "draft.failed": "{name}: Ungespeicherte Änderungen können in diesem Browser nicht aufbewahrt werden ({reason}). Speichern Sie bald.",
+  "drafts.failed": "Was vorher ungespeichert war, kann nicht aus diesem Browser gelesen werden ({reason}). Es bleibt dort: Laden Sie die Seite neu.",
   "conflict.title": "{name}: Jemand anderes hat gespeichert",
   "conflict.message": "Die Datei hat sich geändert, seit Sie sie geöffnet haben. Nichts wird überschrieben, bevor Sie entscheiden.",
   "conflict.compare": "Vergleichen",

@@ -79,6 +79,7 @@ export const en: Record<string, string> = {
   "save.failed.name": "{name} was not saved; your text is kept.",
   "save.refused": "The disk may be full, the file or its folder write-protected, or the folder gone; or the text holds characters that the charset lacks.",
   "draft.failed": "{name}: unsaved changes cannot be kept in this browser ({reason}). Save soon.",
+  "drafts.failed": "What was unsaved before cannot be read from this browser ({reason}). It stays there: load the page again.",
   "conflict.title": "{name}: somebody else has saved",
   "conflict.message": "The file has changed since you opened it. Nothing is overwritten before you decide.",
   "conflict.compare": "Compare",
