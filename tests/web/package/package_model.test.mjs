@@ -177,44 +177,57 @@ test("of what somebody else saved, what both have is not unsaved, and what was c
   assert.deepEqual(model.changedParts(), ["/c"]);
 });
 
-test("what only somebody else has changed is taken over, and not undone with what was changed here", () => {
+test("what is taken over from somebody else is not undone with what was changed here", () => {
   const relationships = [{ relationshipId: "rId1" }];
   const model = new PackageModel({ parts: ["/a", "/b", "/c", "/d"].map((uri) => part(uri, "0")), relationships: [] });
   model.edit({ parts: new Map([["/a", part("/a", "1")], ["/c", part("/c", "1")]]) });
   model.edit(setting("/c", "0"));
   model.edit(setting("/d", "1"));
-  const theirs = { parts: [part("/b", "2"), part("/c", "2"), part("/d", "2"), part("/e", "2")], relationships };
-  theirs.parts.push(part("/a", "0"));
+  const theirs = { parts: ["/a", "/b", "/c", "/d", "/e"].map((uri) => part(uri, uri === "/a" ? "0" : "2")), relationships };
   const heard = [];
   model.listen((parts) => heard.push(...parts));
-  model.adopt(theirs, ["/b", "/c", "/e"]);
+  const together = new Map([["/a", model.part("/a")], ["/d", part("/d", "12")]]);
+  theirs.parts.forEach((one) => together.has(one.partUri) || together.set(one.partUri, one));
+  model.adopt(theirs, { parts: together, relationships }, new Set());
   const contents = () => Object.fromEntries([...model.parts].map(({ partUri, content }) => [partUri, content]));
-  assert.deepEqual(heard.sort(), ["/b", "/c", "/e"]);
-  assert.deepEqual(contents(), { "/a": "1", "/b": "2", "/c": "2", "/d": "1", "/e": "2" });
+  assert.deepEqual(heard.sort(), ["/b", "/c", "/d", "/e"]);
+  const adopted = { "/a": "1", "/b": "2", "/c": "2", "/d": "12", "/e": "2" };
+  assert.deepEqual([contents(), model.relationships], [adopted, relationships]);
   assert.deepEqual([model.changedParts(), model.areRelationshipsChanged], [["/a", "/d"], false]);
-  model.choose({ parts: new Map([["/a", part("/a", "1")], ["/b", part("/b", "2")], ["/d", part("/d", "12")]]), relationships });
-  assert.equal(contents()["/d"], "12");
-  model.undo(); // what was chosen
-  assert.equal(contents()["/d"], "1");
-  model.undo();
-  assert.equal(contents()["/d"], "0");
-  model.undo(); // not a step of what has been taken over
-  assert.deepEqual([contents(), model.canUndo], [{ "/a": "0", "/b": "2", "/c": "2", "/d": "0", "/e": "2" }, false]);
+  model.undo(); // not a step of what has been put together, in which theirs is
+  assert.deepEqual([contents(), model.canUndo], [{ ...adopted, "/a": "0" }, false]);
   assert.deepEqual(model.relationships, relationships);
   model.redo();
-  assert.deepEqual([contents()["/a"], contents()["/c"]], ["1", "2"]);
+  assert.deepEqual(contents(), adopted);
 });
 
-test("what is chosen of what somebody else alone has changed, or changes nothing, is undone and not a step", () => {
+test("of parts that go together, none is undone where one is taken over", () => {
+  const edited = () => {
+    const model = new PackageModel({ parts: ["/a", "/b", "/c"].map((uri) => part(uri, "0")), relationships: [] });
+    model.edit({ parts: new Map([["/a", part("/a", "1")], ["/b", part("/b", "1")]]) });
+    model.edit(setting("/c", "1"));
+    return model;
+  };
+  const theirs = { parts: [part("/a", "2"), part("/b", "1"), part("/c", "1")], relationships: [] };
+  const taken = edited();
+  taken.adopt(theirs, { parts: new Map([["/a", part("/a", "2")]]) }, new Set(["/a", "/b"]));
+  taken.undo();
+  assert.deepEqual([[...taken.parts].map(({ content }) => content), taken.canUndo], [["2", "1", "0"], false]);
+  const kept = edited();
+  kept.adopt(theirs, { parts: new Map([["/a", part("/a", "1")]]) }, new Set(["/a", "/b"]));
+  kept.undo();
+  kept.undo();
+  assert.deepEqual([...kept.parts].map(({ content }) => content), ["0", "0", "0"]);
+});
+
+test("what is chosen of an earlier version is undone as one step, and none where nothing changes", () => {
   const model = new PackageModel({ parts: [part("/a", "0")], relationships: [] });
-  const mine = model.document();
-  model.adopt({ parts: [part("/a", "2")], relationships: [{ relationshipId: "theirs" }] }, ["/a"]);
-  model.choose({ parts: new Map([["/a", part("/a", "2")]]), relationships: [{ relationshipId: "theirs" }] });
+  model.choose({ parts: new Map([["/a", part("/a", "0")]]), relationships: [] });
   assert.equal(model.canUndo, false);
-  model.choose({ parts: new Map([["/a", mine.parts[0]]]), relationships: mine.relationships });
-  assert.deepEqual(model.document(), mine);
+  model.choose({ parts: new Map([["/a", part("/a", "1")]]), relationships: [{ relationshipId: "earlier" }] });
+  assert.deepEqual([model.part("/a").content, model.relationships.length], ["1", 1]);
   model.undo();
-  assert.deepEqual([model.part("/a").content, model.relationships.length], ["2", 1]);
+  assert.deepEqual([model.part("/a").content, model.relationships.length, model.canUndo], ["0", 0, false]);
 });
 
 test("what was saved is what both have from then on", () => {

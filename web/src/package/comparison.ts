@@ -93,7 +93,7 @@ export function madeWhole(
   return { ...chosen, parts };
 }
 
-/** Shows the differences; `use` gets what is chosen of all of them, and the parts that only they have changed. */
+/** Shows the differences; `use` gets what is chosen of all of them, and the names of the parts that go together. */
 export class PackageComparison implements Comparison {
   readonly element = element("div", { className: "package-comparison" });
 
@@ -106,7 +106,7 @@ export class PackageComparison implements Comparison {
     private mine: PackageModel,
     theirs: Document,
     private page: Page,
-    private use: (chosen: Edit, adopted: string[]) => void,
+    private use: (chosen: Edit, joint: ReadonlySet<string>) => void,
   ) {
     this.#theirs = new PackageModel(theirs);
     this.#relationshipsBy = mine.areRelationshipsChanged ? "mine" : "theirs";
@@ -140,8 +140,7 @@ export class PackageComparison implements Comparison {
     const { relationships } = this.#relationshipsBy === "theirs" ? this.#theirs : this.mine;
     const copies = this.#rows.flatMap((row) => row.copies);
     const outcome = madeWhole(this.mine, this.#theirs, { parts, relationships: [...relationships] }, copies);
-    const adopted = this.#rows.filter((row) => row.isAdopted && outcome.parts!.get(row.uri) === (row.result ?? null));
-    this.use(outcome, adopted.map(({ uri }) => uri));
+    this.use(outcome, workbookParts(this.mine, this.#theirs));
   }
 
   close(): void {
@@ -201,11 +200,6 @@ class ComparedPart {
 
   get isJoint(): boolean {
     return this.difference.joint !== undefined;
-  }
-
-  /** Whether it is taken from theirs, or put together with it, and is not changed in mine. */
-  get isAdopted(): boolean {
-    return this.#changedBy === "theirs" && this.side !== "mine";
   }
 
   get side(): string {

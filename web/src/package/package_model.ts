@@ -168,39 +168,41 @@ export class PackageModel {
   }
 
   /**
-   * Takes over from `theirs`, which is saved now, the parts `uris`, which are not changed here, and the relationships
-   * unless they are. That cannot be undone, and undoing what was done before does not undo it either.
+   * `chosen`, put together with `theirs`, which is saved now, takes the place of what is here. That is no step to undo;
+   * and of what it changes, what was done before is not undone any more, since theirs would be undone with it. Parts in
+   * `joint` go together in that.
    */
-  adopt(theirs: Document, uris: string[]): void {
-    const their = new Map(theirs.parts.map((part) => [part.partUri, part]));
-    const hasRelationships = !this.areRelationshipsChanged && !areSame(this.#relationships, theirs.relationships);
-    for (const uri of uris) {
-      putInto(this.#parts, uri, their.get(uri) ?? null);
-      putInto(this.#original, uri, their.get(uri) ?? null);
+  adopt(theirs: Document, chosen: Edit, joint: ReadonlySet<string>): void {
+    const changes = this.#changesIn(chosen);
+    const uris = new Set(changes.parts!.keys());
+    if ([...uris].some((uri) => joint.has(uri))) {
+      joint.forEach((uri) => uris.add(uri));
     }
-    if (hasRelationships) {
-      this.#relationships = this.#originalRelationships = theirs.relationships;
-    }
-    const without = ({ parts, relationships, ...rest }: Edit): Edit => ({
-      ...rest,
-      parts: new Map([...(parts ?? [])].filter(([uri]) => !uris.includes(uri))),
-      ...(relationships && !hasRelationships && { relationships }),
+    const without = ({ parts, relationships }: Edit): Edit => ({
+      parts: new Map([...(parts ?? [])].filter(([uri]) => !uris.has(uri))),
+      ...(relationships && !changes.relationships && { relationships }),
     });
     const isLeft = ({ after }: Step) => after.parts!.size > 0 || after.relationships !== undefined;
     const left = (steps: Step[]) =>
       steps.map(({ before, after }) => ({ before: without(before), after: without(after) })).filter(isLeft);
     [this.#done, this.#undone] = [left(this.#done), left(this.#undone)];
     this.saved(theirs);
-    this.#tell({ parts: new Map(uris.map((uri) => [uri, null])) });
+    this.#put(changes);
+    this.#tell(changes);
   }
 
   /** As edit(), but what changes nothing is left out, and is no step to undo. */
-  choose({ parts, relationships }: Edit): void {
-    const changes = [...(parts ?? [])].filter(([uri, part]) => !isSame(this.#parts.get(uri), part ?? undefined));
-    const isOther = relationships && !areSame(relationships, this.#relationships);
-    if (changes.length > 0 || isOther) {
-      this.edit({ parts: new Map(changes), ...(isOther && { relationships }) });
+  choose(chosen: Edit): void {
+    const changes = this.#changesIn(chosen);
+    if (changes.parts!.size > 0 || changes.relationships) {
+      this.edit(changes);
     }
+  }
+
+  #changesIn({ parts, relationships }: Edit): Edit {
+    const changed = [...(parts ?? [])].filter(([uri, part]) => !isSame(this.#parts.get(uri), part ?? undefined));
+    const isOther = relationships && !areSame(relationships, this.#relationships);
+    return { parts: new Map(changed), ...(isOther && { relationships }) };
   }
 
   get canUndo(): boolean {

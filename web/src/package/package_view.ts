@@ -118,16 +118,17 @@ export class PackageView implements DocumentView {
     this.#commit();
     const mine = this.#model;
     const document = documentOf(theirs);
-    return new PackageComparison(mine, document, this.page, (chosen, adopted) => {
+    return new PackageComparison(mine, document, this.page, (chosen, joint) => {
       if (this.#model !== mine) {
         throw new Error(this.page.text("package.differences.meanwhile"));
       }
-      if (!theirs.isEarlier) {
-        const changed = mine.changedParts();
-        mine.adopt(document, adopted);
-        this.#isSaved(changed);
+      if (theirs.isEarlier) {
+        mine.choose(chosen);
+        return;
       }
-      mine.choose(chosen);
+      const changed = mine.changedParts();
+      mine.adopt(document, chosen, joint);
+      this.#isSaved(changed);
     });
   }
 
