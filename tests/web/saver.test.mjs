@@ -393,6 +393,21 @@ test("a file that cannot be read is saved over only as it was when the person wa
   assert.equal(desk.disk, "two");
 });
 
+test("a file that could not be read for a moment is looked at again, and not saved over", async () => {
+  for (const [later, decisions, saved] of [["theirs", ["again", undefined], false], ["one", ["again"], true]]) {
+    const desk = new Desk().open();
+    desk.load = async () => ({ ...desk.loaded(), ...(desk.disk === "busy" && { unreadable: "out of memory" }) });
+    desk.disk = "busy";
+    desk.type("two");
+    desk.decide = () => {
+      desk.disk = later;
+      return decisions.shift();
+    };
+    assert.equal(await desk.saver.save(), saved);
+    assert.deepEqual([decisions, desk.disk, desk.saver.hasTheirs], [[], saved ? "two" : later, !saved]);
+  }
+});
+
 test("what somebody else saved is shown where nothing is unsaved, and told of where something is", async () => {
   const desk = new Desk().open();
   assert.equal(await desk.saver.followTheirs(), "same");

@@ -33,7 +33,7 @@ export type DocumentContent =
 export interface DocumentView {
   readonly element: HTMLElement;
 
-  /** Whether it holds only some parts of a document that was removed, and that they must not replace where it is back. */
+  /** Whether it holds only some parts of a document that was removed or could not be read, which they must not replace. */
   readonly isRemnant?: boolean;
 
   /**

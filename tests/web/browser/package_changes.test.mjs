@@ -444,7 +444,7 @@ browserTest("a document that somebody has damaged is saved over after asking, wi
   await replace(page, "Annual report", "Budget");
   session.write(NAME, before.subarray(0, 500));
   await page.keyboard.press("Control+s");
-  await dialog(page).getByText("cannot be read any more").waitFor();
+  await dialog(page).getByText("cannot be read at the moment").waitFor();
   await dialog(page).getByRole("button", { name: "Decide later" }).click();
   await dialog(page).waitFor({ state: "detached" });
   assert.equal(session.read(NAME).length, 500);
@@ -453,6 +453,45 @@ browserTest("a document that somebody has damaged is saved over after asking, wi
   await isSaved(page);
   assert.deepEqual(Object.keys(unpack(session.read(NAME))).sort(), Object.keys(unpack(before)).sort());
   assert.match(textIn(session.read(NAME), "word/header1.xml"), /Budget, page/);
+});
+
+browserTest("a document that can be read again is not saved over", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const { page } = session;
+  await replace(page, "Annual report", "Budget");
+  const theirs = archive(wordFiles(wordPicture("rId1")));
+  session.write(NAME, theirs.subarray(0, 500));
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByText("cannot be read at the moment").waitFor();
+  session.write(NAME, theirs);
+  await page.keyboard.press("Enter"); // "Try again"
+  await dialog(page).getByText("somebody else has saved").waitFor();
+  assert.ok(session.read(NAME).equals(theirs));
+});
+
+browserTest("the changed parts alone do not replace a document that could not be read for a moment", async (t) => {
+  const session = await open(t, NAME, wordFiles());
+  const before = session.read(NAME);
+  await replace(session.page, "Annual report", "Budget");
+  await session.waitForDraft(session.page, "Budget");
+  await storedOriginals(session.page, true);
+  await session.page.evaluate(() => localStorage.setItem("busy", "yes"));
+  // Then reading it fails, though it is the same as ever: another file is asked for.
+  await session.context.addInitScript(() => {
+    const { send } = WebSocket.prototype;
+    WebSocket.prototype.send = function (data) {
+      const text = typeof data === "string" ? data : new TextDecoder("latin1").decode(data);
+      const isRead = localStorage.getItem("busy") && text.includes("readRequest");
+      return send.call(this, isRead ? new TextEncoder().encode(text.replace("report.docx", "absent.docx")) : data);
+    };
+  });
+  const page = await reopen(session);
+  await page.getByRole("alert").getByText(/could not be read, and only the parts that you have changed are left/).waitFor();
+  await page.evaluate(() => localStorage.removeItem("busy"));
+  await page.keyboard.press("Control+s");
+  await dialog(page).getByRole("button", { name: "Save these parts" }).click();
+  await dialog(page).getByText("somebody else has saved").waitFor();
+  assert.ok(session.read(NAME).equals(before));
 });
 
 browserTest("unsaved changes to a document that cannot be read any more are there after a reload, and can be saved over it", async (t) => {
@@ -467,7 +506,7 @@ browserTest("unsaved changes to a document that cannot be read any more are ther
   await page.getByLabel("Find", { exact: true }).fill("Precious");
   await page.getByText("2 found").waitFor();
   await page.keyboard.press("Control+s");
-  await dialog(page).getByText("cannot be read any more").waitFor();
+  await dialog(page).getByText("cannot be read at the moment").waitFor();
   await dialog(page).getByRole("button", { name: "Save over it" }).click();
   await isSaved(page);
   const saved = session.read(NAME);
@@ -482,7 +521,7 @@ browserTest("unsaved changes are shown also where they are based on what cannot 
   const broken = session.read(NAME).subarray(0, 500);
   session.write(NAME, broken);
   await page.keyboard.press("Control+s");
-  await dialog(page).getByText("cannot be read any more").waitFor();
+  await dialog(page).getByText("cannot be read at the moment").waitFor();
   const version = await (await clientOf(t, session)).version(session.path(NAME));
   host.signal("SIGSTOP"); // so that the page does not hear of its save
   await dialog(page).getByRole("button", { name: "Save over it" }).click();

@@ -18,10 +18,10 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.broken.save": "Save anyway",
     "package.broken.cancel": "Go on editing",
     "package.incomplete":
-      "{name} has been removed or is not readable any more, and only the parts that you have changed are left here. They can be looked at, copied and exported.",
+      "{name} has been removed or could not be read, and only the parts that you have changed are left here. They can be looked at, copied and exported.",
     "package.incomplete.title": "Save only a few parts?",
     "package.incomplete.message":
-      "The document has been removed or is not readable any more, and with it all parts that you had not changed. Office programs will not open what is left: {parts}",
+      "The document has been removed or could not be read, and all parts that you had not changed are missing. Office programs will not open what is left: {parts}",
     "package.incomplete.save": "Save these parts",
     "package.incomplete.cancel": "Do not save",
     "package.mixed":
@@ -127,10 +127,10 @@ export const texts: Record<"en" | "de", Record<string, string>> = {
     "package.broken.save": "Trotzdem speichern",
     "package.broken.cancel": "Weiter bearbeiten",
     "package.incomplete":
-      "{name} wurde gelöscht oder ist nicht mehr lesbar; hier sind nur noch die Teile, die Sie geändert haben. Sie können angesehen, kopiert und exportiert werden.",
+      "{name} wurde gelöscht oder ließ sich nicht lesen; hier sind nur noch die Teile, die Sie geändert haben. Sie können angesehen, kopiert und exportiert werden.",
     "package.incomplete.title": "Nur wenige Teile speichern?",
     "package.incomplete.message":
-      "Das Dokument wurde gelöscht oder ist nicht mehr lesbar, und mit ihm alle Teile, die Sie nicht geändert hatten. Was übrig ist, öffnen Office-Programme nicht: {parts}",
+      "Das Dokument wurde gelöscht oder ließ sich nicht lesen; alle Teile, die Sie nicht geändert hatten, fehlen. Was übrig ist, öffnen Office-Programme nicht: {parts}",
     "package.incomplete.save": "Diese Teile speichern",
     "package.incomplete.cancel": "Nicht speichern",
     "package.mixed":

@@ -8,13 +8,13 @@ import { askComparing } from "./comparing.js";
 /**
  * Asks whose version stays. "mine": what the view holds, in which both may have been put together; it is to be
  * saved on the base of `theirs`. Nothing: the person wants to decide later. `theirs` is nothing where the
- * document was removed. What cannot be read can be saved over, too.
+ * document was removed. What cannot be read can be saved over, too, or be looked at "again", since that may pass.
  */
 export async function resolveConflict(
   name: string,
   view: DocumentView,
   theirs: LoadedDocument | undefined,
-): Promise<"mine" | "theirs" | undefined> {
+): Promise<"mine" | "theirs" | "again" | undefined> {
   if (!theirs) {
     return (await ask({
       title: text("conflict.removed.title", { name }),
@@ -26,8 +26,12 @@ export async function resolveConflict(
     return (await ask({
       title: text("conflict.unreadable.title", { name }),
       message: text("conflict.unreadable.message", { reason: theirs.unreadable }),
-      choices: [{ ...later(), isDefault: true }, { value: "mine", label: text("conflict.unreadable.save") }],
-    })) as "mine" | undefined;
+      choices: [
+        later(),
+        { value: "mine", label: text("conflict.unreadable.save") },
+        { value: "again", label: text("action.retry"), isDefault: true },
+      ],
+    })) as "mine" | "again" | undefined;
   }
   for (;;) {
     const choice = await ask({

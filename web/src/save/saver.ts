@@ -24,8 +24,8 @@ export interface SaveTarget {
   load(): Promise<LoadedDocument | undefined>;
   /** Shows what somebody else saved instead of what is unsaved. */
   replace(theirs: LoadedDocument): void;
-  /** Asks what to do about what somebody else saved (nothing: removed). Nothing: not now. */
-  resolve(theirs: LoadedDocument | undefined): Promise<"mine" | "theirs" | undefined>;
+  /** Asks what to do about what somebody else saved (nothing: removed). Nothing: not now; "again": look once more. */
+  resolve(theirs: LoadedDocument | undefined): Promise<"mine" | "theirs" | "again" | undefined>;
   /** One of the members of the saver has changed. */
   update(): void;
 }
@@ -213,7 +213,7 @@ export class Saver {
     } else if (decision === "mine") {
       this.#basedOn(version);
     }
-    return decision;
+    return decision === "again" ? "mine" : decision; // on the base that it has, so that it is asked about again
   }
 
   // Whether `theirs` is what may have been sent, and so has been saved.

@@ -201,7 +201,7 @@ export class OpenDocument {
     this.panel.remove();
   }
 
-  // With a draft, a document that was removed, or cannot be read any more, can still be shown, and saved anew.
+  // With a draft, a document that was removed, or cannot be read, can still be shown, and saved anew.
   async #load(signal: AbortSignal, draft?: Draft): Promise<LoadedDocument> {
     const { client } = this.around;
     try {
@@ -224,7 +224,8 @@ export class OpenDocument {
     this.#view?.close();
     this.#view = view;
     this.#loaded = loaded;
-    const version = draft && !view.isRemnant ? draft.version : loaded.version;
+    // What is left of a document alone is based on no version: a file that is there is looked at before it is replaced.
+    const version = view.isRemnant ? "" : (draft ?? loaded).version;
     const saver = (this.#saver = this.#makeSaver(version, draft && unsavedOf(draft, loaded, room)));
     this.draft = undefined;
     const hasFocus = this.panel.contains(document.activeElement);
