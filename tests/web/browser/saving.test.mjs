@@ -339,6 +339,22 @@ browserTest("Ctrl+S that follows an answer at once is not lost", async (t) => {
   await isSaved(page, "a.txt");
 });
 
+browserTest("each of two questions on top of each other has its own title", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page, host } = session;
+  await open(page, "a.txt");
+  await type(page, "mine ");
+  unlinkSync(session.path("a.txt"));
+  host.signal("SIGSTOP"); // until the second question is asked
+  await page.keyboard.press("Control+s");
+  await page.locator(".tab button").click();
+  await dialog(page).getByText("Close a.txt?").waitFor();
+  host.signal("SIGCONT");
+  await dialog(page).getByText("has been removed").waitFor();
+  const titles = await dialog(page).evaluateAll((all) => all.map((one) => document.getElementById(one.getAttribute("aria-labelledby")).textContent));
+  assert.deepEqual(titles, ["Close a.txt?", "a.txt has been removed"]);
+});
+
 browserTest("a save that cannot be made says what may be the matter, and keeps the text", { skip: process.getuid() === 0 && "root may write everywhere" }, async (t) => {
   const session = await Session.start(t, { "a.txt": "one\n" });
   const { page } = session;

@@ -11,10 +11,13 @@ export interface Question {
   body?: HTMLElement;
 }
 
+let asked = 0;
+
 /** The value of the choice that is taken; nothing when the dialog is closed without one. */
 export function ask({ title, message, choices, body }: Question): Promise<string | undefined> {
-  const heading = element("h2", { id: "dialog-title" }, title);
-  const explanation = element("p", { id: "dialog-message" }, message);
+  const id = `dialog-${++asked}`; // one dialog may be asked on top of another
+  const heading = element("h2", { id: `${id}-title` }, title);
+  const explanation = element("p", { id: `${id}-message` }, message);
   const buttons = choices.map(({ value, label, isDefault }) =>
     element("button", { value, autofocus: Boolean(isDefault), className: isDefault ? "main" : "" }, label),
   );
