@@ -321,6 +321,18 @@ browserTest("a save of a file that was removed asks first", async (t) => {
   assert.equal(session.read("a.txt").toString(), "still one\n");
 });
 
+browserTest("after a reload, unsaved changes to a file that was removed are said to be such", async (t) => {
+  const session = await Session.start(t, { "a.txt": "one\n" });
+  const { page } = session;
+  await open(page, "a.txt");
+  await type(page, "still ");
+  await session.waitForDraft(page, "still ");
+  unlinkSync(session.path("a.txt"));
+  await page.reload();
+  await page.getByText(/have been restored\. Meanwhile the file has been removed/).waitFor();
+  assert.match(await shownText(page), /^still one/);
+});
+
 browserTest("Ctrl+S that follows an answer at once is not lost", async (t) => {
   const session = await Session.start(t, { "a.txt": "one\n" });
   const { page } = session;

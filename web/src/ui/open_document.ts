@@ -241,7 +241,8 @@ export class OpenDocument {
     const outcome = await saver.noticed(loaded);
     if (saver.isUnsaved) {
       const { unreadable: reason } = loaded;
-      const key = outcome === "kept" && reason === undefined ? "document.restored.theirs" : "document.restored";
+      const what = loaded.version === "" ? "removed" : "theirs";
+      const key = outcome === "kept" && reason === undefined ? `document.restored.${what}` : "document.restored";
       this.around.tell(text(key, { name: this.name }));
       if (reason !== undefined) {
         this.around.tell(text("document.failed", { name: this.name, reason }), "problem");

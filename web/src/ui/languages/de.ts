@@ -62,6 +62,7 @@ export const de: Record<string, string> = {
   "image.compare": "Bilder lassen sich nicht vergleichen.",
   "document.restored": "{name}: Ihre ungespeicherten Änderungen sind wiederhergestellt.",
   "document.restored.theirs": "{name}: Ihre ungespeicherten Änderungen sind wiederhergestellt. Inzwischen hat jemand anderes gespeichert; beim Speichern können Sie beides vergleichen.",
+  "document.restored.removed": "{name}: Ihre ungespeicherten Änderungen sind wiederhergestellt. Inzwischen wurde die Datei entfernt; Sie können sie neu speichern.",
   "page.tools": "Dieses Dokument",
   "action.save": "Speichern",
   "action.save.title": "Speichern (Strg+S)",

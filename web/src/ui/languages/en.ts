@@ -62,6 +62,7 @@ export const en: Record<string, string> = {
   "image.compare": "Images cannot be compared.",
   "document.restored": "{name}: your unsaved changes have been restored.",
   "document.restored.theirs": "{name}: your unsaved changes have been restored. Meanwhile somebody else has saved it; when you save, you can compare both.",
+  "document.restored.removed": "{name}: your unsaved changes have been restored. Meanwhile the file has been removed; you can save it as a new one.",
   "page.tools": "This document",
   "action.save": "Save",
   "action.save.title": "Save (Ctrl+S)",
