@@ -5,7 +5,6 @@
 
 #include <atomic>
 #include <chrono>
-#include <optional>
 #include <stdexcept>
 #include <thread>
 
@@ -21,13 +20,16 @@ class SaveLocksTest : public testing::Test {
 protected:
     // Expects that ours is waited for while theirs is held for a moment.
     void expectWait() {
-        std::optional<SaveLocks::Held> held(theirs_.hold("/a.txt"));
+        std::atomic<bool> isHeld = false;
         std::atomic<bool> isFree = false;
         std::thread other([&] {
+            const SaveLocks::Held document = theirs_.hold("/a.txt");
+            isHeld = true;
+            isHeld.notify_one();
             std::this_thread::sleep_for(20ms);
             isFree = true;
-            held.reset();
         });
+        isHeld.wait(false);
         {
             const SaveLocks::Held document = ours_.hold("/a.txt");
             EXPECT_TRUE(isFree);
