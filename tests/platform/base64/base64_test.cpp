@@ -59,7 +59,8 @@ TEST(Base64, DecodesTheStandardsTestVectors) {
 
 TEST(Base64, AppendsTheTextOfBytesToAString) {
     std::mt19937 random(7);
-    for (const std::size_t length : {0, 1, 2, 3, 12'287, 12'288, 12'289, 24'576, 100'000}) {
+    for (const std::size_t length :
+         {0U, 1U, 2U, 3U, 12'287U, 12'288U, 12'289U, 24'576U, 100'000U}) {
         const std::string bytes = randomBytes(length, random);
         std::string text = "data:";
         base64encode(bytes, text);
