@@ -19,8 +19,6 @@ namespace host {
 
 namespace {
 
-using namespace std::chrono_literals;
-
 constexpr std::chrono::milliseconds pause{2};
 constexpr std::chrono::milliseconds stuckWait{100};  // longer than most saves take
 

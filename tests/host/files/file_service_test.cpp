@@ -311,7 +311,9 @@ TEST_F(FileServiceTest, HasOneCopyOfAnEarlierVersionAtATime) {
     std::atomic<bool> hadSeveral = false;
     *guard_.read = [&](const JsonMessage&) {
         ++begun;
-        hadSeveral = hadSeveral || ++copies > 1;
+        if (++copies > 1) {
+            hadSeveral = true;
+        }
         std::this_thread::sleep_for(std::chrono::milliseconds(20));
         --copies;
     };

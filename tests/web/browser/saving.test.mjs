@@ -309,13 +309,18 @@ browserTest("what is unsaved outlives a page that crashes, and knows what others
   assert.equal(session.read("a.txt").toString(), "theirs\n");
 });
 
-browserTest("a save of a file that was removed asks first", async (t) => {
+async function saveRemoved(t) {
   const session = await Session.start(t, { "a.txt": "one\n" });
-  const { page } = session;
-  await open(page, "a.txt");
-  await type(page, "still ");
+  await open(session.page, "a.txt");
+  await type(session.page, "still ");
   unlinkSync(session.path("a.txt"));
-  await page.keyboard.press("Control+s");
+  await session.page.keyboard.press("Control+s");
+  return session;
+}
+
+browserTest("a save of a file that was removed asks first", async (t) => {
+  const session = await saveRemoved(t);
+  const { page } = session;
   await dialog(page).getByText("has been removed").waitFor();
   await dialog(page).getByRole("button", { name: "Save as new" }).click();
   await isSaved(page, "a.txt");
@@ -335,12 +340,8 @@ browserTest("after a reload, unsaved changes to a file that was removed are said
 });
 
 browserTest("Ctrl+S that follows an answer at once is not lost", async (t) => {
-  const session = await Session.start(t, { "a.txt": "one\n" });
+  const session = await saveRemoved(t);
   const { page } = session;
-  await open(page, "a.txt");
-  await type(page, "still ");
-  unlinkSync(session.path("a.txt"));
-  await page.keyboard.press("Control+s");
   await dialog(page).getByRole("button", { name: "Decide later" }).evaluate(async (later) => {
     later.click();
     for (let turn = 0; turn < 100; ++turn) {

@@ -6,7 +6,7 @@ import { test } from "node:test";
 import { room } from "../room.mjs";
 
 const { PackageModel, findDifferences, fittingText, madeWhole } = await room(
-  ...["package/comparison.ts", "package/package_model.ts", "package/relationships.ts"],
+  ...["package/comparison.ts", "package/fitting_text.ts", "package/package_model.ts"],
 );
 
 const WORKBOOK = "application/vnd.openxmlformats-officedocument.spreadsheetml.sheet.main+xml";

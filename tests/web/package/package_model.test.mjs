@@ -23,6 +23,14 @@ test("what is not edited is sent as it came", () => {
   assert.equal(document.relationships, loaded.relationships);
 });
 
+test("the main part is found however the relationship spells its name", () => {
+  for (const target of ["xl/book.xml", "/xl/book.xml", "./xl/book.xml", "XL/Book.xml", "xl\\book.xml", "xl/b%6Fok.xml"]) {
+    const relationships = [{ relationshipId: "r", relationshipType: "x/officeDocument", target, targetMode: "" }];
+    const model = new PackageModel({ parts: [part("/xl/book.xml", "")], relationships });
+    assert.equal(model.mainPart?.partUri, "/xl/book.xml", target);
+  }
+});
+
 test("edits are undone and done again, in order", () => {
   const model = new PackageModel(read());
   model.edit(setting("/a.xml", "1"));

@@ -9,10 +9,11 @@ import type { Document, Part } from "../../client/src/index.js";
 import type { Comparison, Page } from "../document_view.js";
 import { element, mergeArrow } from "../ui/dom.js";
 import { bytesText } from "../ui/text.js";
+import { type FittingText, fittingText } from "./fitting_text.js";
 import { areSame, isSame, type Edit, PackageModel } from "./package_model.js";
 import { byName, kindOf, partBytes, sizeOf, textOf } from "./part_kinds.js";
 import { decodePart, encodePart, type PartText } from "./part_text.js";
-import { type FittingText, fittingText, partKey, partsByKey, reachable } from "./relationships.js";
+import { partKey, partsByKey, reachable } from "./relationships.js";
 import { editorBasics, laidOut, lineEndOf } from "./xml_editor.js";
 import { copiedLayout, withoutLayout } from "./xml_formatting.js";
 
@@ -185,7 +186,7 @@ class ComparedPart {
     const name = textOf(this.uri);
     const isMerged = this.#isText() && !this.isJoint;
     this.#choice = sideChoice(page, name, isMerged ? ["mine", "theirs", "together"] : ["mine", "theirs"]);
-    this.#choice.value = this.#changedBy === "theirs" ? "theirs" : "mine";
+    this.#choice.value = this.#default;
     const open = element("button", { type: "button", className: "package-link" }, name);
     open.addEventListener("click", () => select(this));
     this.#choice.addEventListener("change", () => select(this));
@@ -195,7 +196,7 @@ class ComparedPart {
 
   /** Whether something else was chosen, or put together, than the comparison begins with. */
   get isEdited(): boolean {
-    return this.#choice.value !== (this.#changedBy === "theirs" ? "theirs" : "mine");
+    return this.#choice.value !== this.#default;
   }
 
   get isJoint(): boolean {
@@ -235,8 +236,8 @@ class ComparedPart {
     this.#merge?.view.destroy();
   }
 
-  get #changedBy(): Side | "both" {
-    return this.difference.joint ?? this.difference.changedBy;
+  get #default(): Side {
+    return (this.difference.joint ?? this.difference.changedBy) === "theirs" ? "theirs" : "mine";
   }
 
   #isText(): boolean {

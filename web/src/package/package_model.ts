@@ -3,6 +3,7 @@
 // another one in the place of a part, so what is not edited is sent back as it came.
 import type { Document, Part, Relationship } from "../../client/src/index.js";
 import type { LoadedDocument } from "../document_view.js";
+import { partsByKey, targetKey } from "./relationships.js";
 
 /** What is unsaved, as IndexedDB stores it. */
 export interface PackageDraft {
@@ -87,7 +88,8 @@ export class PackageModel {
   /** The part that the first relationship of the package whose type `matches` leads to. */
   relatedPart(matches: (type: string) => boolean): Part | undefined {
     const relationship = this.#relationships.find(({ relationshipType }) => matches(relationshipType));
-    return relationship && this.#parts.get(`/${relationship.target.replace(/^\//, "")}`);
+    const key = relationship && targetKey("/", relationship);
+    return key === undefined ? undefined : partsByKey(this.parts).get(key);
   }
 
   /** The part by which a reader begins: the text of a Word document, the workbook of a spreadsheet. */
